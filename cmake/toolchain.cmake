@@ -1,0 +1,19 @@
+# Warnings are errors; ccache and mold serve when present.
+add_compile_options(-Wall -Wextra -Wpedantic -Wconversion -Wsign-conversion -Wnon-virtual-dtor -Werror)
+
+find_program(VRX_CCACHE ccache)
+if(VRX_CCACHE)
+    set(CMAKE_CXX_COMPILER_LAUNCHER ${VRX_CCACHE})
+endif()
+find_program(VRX_MOLD mold)
+if(VRX_MOLD)
+    add_link_options(-fuse-ld=mold)
+endif()
+
+if(VRX_SANITIZE)
+    add_compile_options(-fsanitize=${VRX_SANITIZE} -fno-omit-frame-pointer -fno-sanitize-recover=all)
+    add_link_options(-fsanitize=${VRX_SANITIZE})
+endif()
+if(VRX_FUZZ)
+    add_compile_options(-fsanitize=fuzzer-no-link)
+endif()

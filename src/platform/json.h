@@ -1,0 +1,22 @@
+// JSON documents. Any thread may use it.
+#pragma once
+
+#include <string>
+#include <string_view>
+
+#include "platform/error.h"
+#include "platform/value.h"
+
+namespace vrx::platform {
+
+class Json {
+public:
+    virtual ~Json() = default;
+    // Integers beyond int64 become doubles; of members with the same name the last counts. The error's text says where
+    // it lies.
+    virtual Result<Value> parse(std::string_view document) const = 0;
+    // Compact, UTF-8. Fails for dates, data and numbers that are not finite.
+    virtual Result<std::string> serialize(const Value& root) const = 0;
+};
+
+}  // namespace vrx::platform

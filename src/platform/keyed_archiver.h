@@ -1,0 +1,83 @@
+// Keyed archiving with secure decoding: how records cross the IPC boundary. An object is archived as a set of keys
+// under the name of its class; decoding asks for each key with the class or the kinds of values it admits, and anything
+// else found there rejects the whole archive. One thread uses an encoder or decoder.
+#pragma once
+
+#include <cstdint>
+#include <initializer_list>
+#include <memory>
+#include <string_view>
+
+#include "platform/value.h"
+
+namespace vrx::platform {
+
+class KeyedEncoder;
+
+// What can be archived. A class T that can also be decoded has
+//     static constexpr std::string_view archiveClassName;
+//     static std::shared_ptr<T> initWithCoder(KeyedDecoder&);   // null when the archive does not make one
+class Archivable {
+public:
+    virtual ~Archivable() = default;
+    virtual std::string_view className() const = 0;
+    virtual void encodeWithCoder(KeyedEncoder& coder) const = 0;
+};
+
+class KeyedEncoder {
+public:
+    virtual ~KeyedEncoder() = default;
+    // A null value or absent object leaves the key out. Nulls and data inside a value, which decoding would refuse, are
+    // left out.
+    virtual void encodeObject(std::string_view key, const Value& value) = 0;
+    virtual void encodeObject(std::string_view key, const Archivable* object) = 0;
+    virtual void encodeInteger(std::string_view key, std::int64_t value) = 0;
+};
+
+// The types that a decoded value may have, and may hold at any depth. Numbers include booleans.
+class AllowedKinds {
+public:
+    enum Kind : unsigned { Strings = 1, Numbers = 2, Dates = 4, Arrays = 8, Dictionaries = 16 };
+    constexpr AllowedKinds(std::initializer_list<Kind> kinds) {
+        for (Kind kind : kinds) kinds_ |= kind;
+    }
+    bool admit(const Value& value) const;
+
+private:
+    unsigned kinds_ = 0;
+};
+
+class KeyedDecoder {
+public:
+    virtual ~KeyedDecoder() = default;
+
+    // The value under the key, null when there is none. A value that is not allowed rejects the archive.
+    virtual Value decodeValue(std::string_view key, AllowedKinds allowed) = 0;
+    // 0 when there is none.
+    virtual std::int64_t decodeInteger(std::string_view key) = 0;
+
+    // The object of exactly class T under the key, null when there is none. An object of any other class rejects the
+    // archive.
+    template <class T>
+    std::shared_ptr<T> decodeObject(std::string_view key) {
+        std::unique_ptr<KeyedDecoder> object = openObject(key, T::archiveClassName);
+        if (!object) return nullptr;
+        std::shared_ptr<T> decoded = T::initWithCoder(*object);
+        if (object->isRejected()) reject();
+        return decoded;
+    }
+
+    // A rejected archive gives no object, whatever was decoded from it.
+    void reject() { rejected_ = true; }
+    bool isRejected() const { return rejected_; }
+
+protected:
+    // The decoder of the object under the key; none when the key is absent or its object is of another class (which
+    // rejects).
+    virtual std::unique_ptr<KeyedDecoder> openObject(std::string_view key, std::string_view className) = 0;
+
+private:
+    bool rejected_ = false;
+};
+
+}  // namespace vrx::platform

@@ -1,0 +1,31 @@
+#include "platform/log.h"
+
+#include <cstdio>
+
+#include "platform/platform.h"
+
+namespace vrx::platform {
+
+SystemLog& systemLog() {
+    return Platform::current().systemLog();
+}
+
+std::string log_detail::roundedSeconds(Duration duration) {
+    char buffer[400];  // the largest double has 309 digits before its point
+    std::snprintf(buffer, sizeof buffer, "%.02f", duration.count());
+    return buffer;
+}
+
+std::string LogEntry::message(bool revealPrivate) const {
+    std::string text;
+    std::size_t position = 0;
+    for (const LogArgument& argument : arguments) {
+        log_detail::Placeholder placeholder = log_detail::nextPlaceholder(format, position);
+        text += format.substr(position, placeholder.begin - position);
+        text += argument.isPrivate && !revealPrivate ? "<private>" : argument.text;
+        position = placeholder.end;
+    }
+    return text.append(format.substr(position));
+}
+
+}  // namespace vrx::platform

@@ -1,0 +1,24 @@
+// Numbers out of the beginning of a text, as property values read them. Independent of the locale.
+#pragma once
+
+#include <cstdint>
+#include <string_view>
+
+#include "platform/value.h"
+
+namespace vrx::platform {
+
+// The number that the text begins with, after leading blanks; 0 when it begins with none. A magnitude out of range
+// becomes the nearest value.
+double leadingDecimal(std::string_view text);
+std::int64_t leadingInteger(std::string_view text);
+
+// A value as a number: a number by its value, true as 1, a string by what it begins with, anything else 0. The integer
+// reading cuts off a fraction and keeps to the range of int64; what is not a number at all (NaN) is 0.
+double numberFromValue(const Value& value);
+std::int64_t integerFromValue(const Value& value);
+
+// A double cut to an integer, kept within the integer's range; NaN is 0.
+std::int64_t clampedInteger(double value);
+
+}  // namespace vrx::platform

@@ -1,0 +1,30 @@
+// The watches this user has or had. Any thread may ask; each call reads the registry afresh.
+#pragma once
+
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "platform/date.h"
+
+namespace vrx::platform {
+
+struct PairedWatch {
+    std::optional<std::string> name;
+    std::optional<std::string> localizedModelName;
+    std::optional<std::string> serialNumber;
+    std::optional<Date> pairedDate;
+    bool isPaired = false;
+    bool isArchived = false;
+
+    std::string description() const { return name.value_or("(null)") + " (" + serialNumber.value_or("(null)") + ")"; }
+};
+
+class PairedDeviceRegistry {
+public:
+    virtual ~PairedDeviceRegistry() = default;
+    // Every watch it knows, archived ones and those of alternate accounts included.
+    virtual std::vector<PairedWatch> watches() const = 0;
+};
+
+}  // namespace vrx::platform

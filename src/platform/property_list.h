@@ -1,0 +1,22 @@
+// Property-list documents. Any thread may use it.
+#pragma once
+
+#include <string_view>
+
+#include "platform/error.h"
+#include "platform/value.h"
+
+namespace vrx::platform {
+
+enum class PropertyListFormat { Xml, Binary };
+
+class PropertyList {
+public:
+    virtual ~PropertyList() = default;
+    // Reads either form. The error's text says where in the document it lies.
+    virtual Result<Value> parse(const Data& document) const = 0;
+    // Fails for a value that a property list cannot hold: a null, wherever it stands.
+    virtual Result<Data> serialize(const Value& root, PropertyListFormat format) const = 0;
+};
+
+}  // namespace vrx::platform

@@ -1,0 +1,47 @@
+// Where work runs. All work that is not done on the calling thread is posted to one of the platform's queues.
+#pragma once
+
+#include <memory>
+#include <string>
+
+#include "platform/date.h"
+#include "platform/task.h"
+
+namespace vrx::platform {
+
+// Runs tasks that any thread may post. A serial queue (the main queue is one) runs them one at a time, in the order of
+// posting. A task must not throw.
+class Queue {
+public:
+    virtual ~Queue() = default;
+    virtual void post(Task task) = 0;
+    // Runs the task no earlier than the delay from now; a delay of 0 or less is post().
+    virtual void postAfter(Duration delay, Task task) = 0;
+};
+
+// A flag that threads can wait for; once set it stays set.
+class Event {
+public:
+    virtual ~Event() = default;
+    virtual void set() = 0;
+    virtual void wait() = 0;
+    // True when it was set within the time.
+    virtual bool waitFor(Duration limit) = 0;
+};
+
+enum class Priority { Background, UserInitiated };
+
+class Queues {
+public:
+    virtual ~Queues() = default;
+    // The queue of the main thread's event loop.
+    virtual Queue& mainQueue() = 0;
+    // A serial queue of its own; work already posted keeps it alive until it has run.
+    virtual std::shared_ptr<Queue> makeSerialQueue(std::string label) = 0;
+    // Workers that run tasks side by side. A task that waits for an Event never starves the others.
+    virtual Queue& workers(Priority priority) = 0;
+    // To be waited for on workers and connection threads, not on a serial queue whose tasks would have to set it.
+    virtual std::shared_ptr<Event> makeEvent() = 0;
+};
+
+}  // namespace vrx::platform
