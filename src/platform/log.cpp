@@ -10,6 +10,12 @@ SystemLog& systemLog() {
     return Platform::current().systemLog();
 }
 
+// Compiled formats were checked; these are never reached at run time.
+void log_detail::format_has_fewer_placeholders_than_arguments() {}
+void log_detail::format_has_more_placeholders_than_arguments() {}
+void log_detail::format_has_an_unknown_placeholder() {}
+void log_detail::argument_does_not_fit_its_placeholder() {}
+
 std::string log_detail::roundedSeconds(Duration duration) {
     char buffer[400];  // the largest double has 309 digits before its point
     std::snprintf(buffer, sizeof buffer, "%.02f", duration.count());
