@@ -98,7 +98,7 @@ constexpr bool fits(Kind kind) {
 template <class... Args>
 constexpr void checkFormat(std::string_view format) {
     std::size_t position = 0;
-    auto check = [&]<class T>(std::type_identity<T>) {
+    [[maybe_unused]] auto check = [&]<class T>(std::type_identity<T>) {
         Placeholder placeholder = nextPlaceholder(format, position);
         if (placeholder.kind == Kind::End) format_has_fewer_placeholders_than_arguments();
         if (!fits<T>(placeholder.kind)) argument_does_not_fit_its_placeholder();
@@ -139,8 +139,8 @@ void log(Level level, std::type_identity_t<LogFormat<std::decay_t<Args>...>> for
     if (!sink.isOn(level)) return;
     LogEntry entry{level, format.text, {}, format.file, format.line};
     entry.arguments.reserve(sizeof...(args));
-    std::size_t position = 0;
-    auto add = [&](const auto& value) {
+    [[maybe_unused]] std::size_t position = 0;
+    [[maybe_unused]] auto add = [&](const auto& value) {
         log_detail::Placeholder placeholder = log_detail::nextPlaceholder(format.text, position);
         position = placeholder.end;
         entry.arguments.push_back({log_detail::argumentText(value), placeholder.kind == log_detail::Kind::Private});

@@ -36,6 +36,17 @@ std::string describe(Date date) {
     return buffer;
 }
 
+std::string filled(std::string_view format, std::initializer_list<std::string_view> texts) {
+    std::string result;
+    for (std::string_view text : texts) {
+        std::size_t placeholder = format.find("%@");
+        if (placeholder == std::string_view::npos) break;
+        result.append(format.substr(0, placeholder)).append(text);
+        format.remove_prefix(placeholder + 2);
+    }
+    return result.append(format);
+}
+
 std::string Error::description() const {
     return text + " (" + domain + " " + std::to_string(code) + ")";
 }

@@ -4,6 +4,7 @@
 
 #include <concepts>
 #include <cstdint>
+#include <initializer_list>
 #include <map>
 #include <memory>
 #include <optional>
@@ -93,6 +94,9 @@ std::string describe(const std::map<K, T, Compare>& dictionary) {
     }
     return text + "}";
 }
+
+// The format with each "%@" replaced by the next text; what has no text stays.
+std::string filled(std::string_view format, std::initializer_list<std::string_view> texts);
 
 template <class T>
 concept Describable = requires(const T& value) {
