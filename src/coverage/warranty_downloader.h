@@ -1,0 +1,43 @@
+// Fetches one device's coverage record, caches it with its metadata and hands it over. Made for one download and kept
+// alive by it; any thread may start it.
+#pragma once
+
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "platform/task.h"
+#include "platform/url.h"
+#include "platform/value.h"
+
+namespace vrx {
+
+class VRXWarranty;
+
+class VRXWarrantyDownloader : public std::enable_shared_from_this<VRXWarrantyDownloader> {
+public:
+    // Success, exactly when there is a record, and the record.
+    using Completion = platform::OnceCallback<bool, std::shared_ptr<VRXWarranty>>;
+
+    // On behalf of an application, which is named as the source of the traffic.
+    static std::shared_ptr<VRXWarrantyDownloader> initWithCallingProcessBundleID(std::string callingProcessBundleID);
+
+    // Returns at once unless everything is at hand locally; completes on a worker, or where the server's versions were
+    // refused. A device without a serial number has no record.
+    void downloadWarrantyForSerialNumber(const std::optional<std::string>& serialNumber, Completion completionHandler);
+
+    // The download once the server's version is accepted.
+    void _downloadWarrantyForSerialNumber(const std::string& serialNumber, Completion completion);
+    // The coverage dictionary of a property-list file: of the serial number's own file beside the URL's when there is
+    // one, else of the URL's. Null when neither can be read.
+    platform::Value dictionaryFromURL(const platform::Url& url, const std::string& serialNumber) const;
+
+private:
+    explicit VRXWarrantyDownloader(std::string callingProcessBundleID)
+        : callingProcessBundleID_(std::move(callingProcessBundleID)) {}
+    void finish(const std::string& serialNumber, platform::Value coverage, Completion completion) const;
+
+    const std::string callingProcessBundleID_;
+};
+
+}  // namespace vrx

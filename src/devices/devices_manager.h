@@ -1,0 +1,28 @@
+// The inventory: this device and the watches paired with it. It has no state; each call reads the platform afresh and
+// gives new device objects. Any thread may call it. A device without a serial number is left out of the dictionaries,
+// which have no key for it.
+#pragma once
+
+#include <memory>
+#include <vector>
+
+#include "platform/paired_device_registry.h"
+#include "protocols/agent_device_provider.h"
+
+namespace vrx {
+
+class VRXDevicesManager final : public VRXAgentDeviceProvider {
+public:
+    // The one that all agents share.
+    static std::shared_ptr<VRXDevicesManager> sharedManager();
+
+    std::shared_ptr<VRXDevice> defaultDevice() override;
+    // Empty unless both this device and the coverage server support paired devices.
+    DevicesBySerialNumber pairedDevices() override;
+    DevicesBySerialNumber allDevices() override;
+
+    // The watches of the registry that are paired and not archived.
+    std::vector<platform::PairedWatch> _activePairedWatches() const;
+};
+
+}  // namespace vrx

@@ -1,0 +1,45 @@
+// What an agent needs of parts that need the agent in turn. Start-up, which knows them all, hands the factories in; one
+// that is not there leaves the agent without that ability: it then does nothing and replies that there is nothing.
+#pragma once
+
+#include <functional>
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "platform/date.h"
+#include "platform/task.h"
+#include "platform/value.h"
+#include "protocols/forward.h"
+
+namespace vrx {
+
+// Keeps the follow-ups that are shown in step with the devices and their records. Made afresh for each piece of work.
+class VRXFollowUpManaging {
+public:
+    virtual ~VRXFollowUpManaging() = default;
+    // Both give the device infos whose follow-up is shown afterwards.
+    virtual DeviceInfoList refreshFollowupWithDeviceInfos(const DeviceInfoList& deviceInfos) = 0;
+    virtual DeviceInfoList refreshFollowupWithDeviceInfo(const std::shared_ptr<VRXDeviceInfo>& deviceInfo,
+                                                         bool allowForcePost) = 0;
+    virtual void dismissFollowUpForSerialNumber(const std::string& serialNumber) = 0;
+    virtual void migrateLegacyFollowUpIfNeededWithDeviceInfo(const std::shared_ptr<VRXDeviceInfo>& deviceInfo) = 0;
+};
+
+// Answers whether an application is to be had. Made afresh for each question; it calls the reply exactly once.
+class VRXSupportManaging {
+public:
+    virtual ~VRXSupportManaging() = default;
+    virtual void checkIsAvailableInStore(std::string bundleIdentifier,
+                                         platform::OnceCallback<platform::Value> reply) = 0;
+    virtual void appSupportAvailability(std::string bundleIdentifier,
+                                        platform::OnceCallback<platform::Value> reply) = 0;
+};
+
+struct AgentCollaborators {
+    std::function<std::shared_ptr<VRXFollowUpManaging>()> makeFollowUp;
+    std::function<void(platform::Duration delay)> scheduleOutreach;
+    std::function<std::shared_ptr<VRXSupportManaging>()> makeSupportManager;
+};
+
+}  // namespace vrx

@@ -1,0 +1,197 @@
+#include "serverversion/server_version_utilities.h"
+
+#include <algorithm>
+#include <iterator>
+
+#include "platform/defaults_store.h"
+#include "platform/http_request.h"
+#include "platform/log.h"
+#include "platform/number_text.h"
+#include "platform/platform.h"
+#include "platform/property_list.h"
+#include "platform/text.h"
+
+namespace vrx {
+
+using platform::DefaultsStore;
+using platform::Dictionary;
+using platform::HttpRequest;
+using platform::HttpResponse;
+using platform::Level;
+using platform::Platform;
+using platform::Result;
+using platform::Value;
+
+namespace {
+
+constexpr std::string_view lowServerVersionKey = "LowServerVersion";
+constexpr std::string_view highServerVersionKey = "HighServerVersion";
+constexpr std::string_view serverVersionURLKey = "ServerVersionURL";
+constexpr std::string_view serverVersionOverrideKey = "ServerVersionOverride";
+constexpr std::string_view webFlowURLKey = "WebFlowURL";
+
+using VersionSet = VRXServerVersionUtilities::VersionSet;
+
+DefaultsStore& defaults() {
+    return Platform::current().defaultsStore();
+}
+
+Value clientVersionDictionary() {
+    Value dictionary = Dictionary{{std::string(lowServerVersionKey), defaults().integer(lowServerVersionKey)},
+                                  {std::string(highServerVersionKey), defaults().integer(highServerVersionKey)}};
+    log(Level::Default, "Using Client version: %@", dictionary);
+    return dictionary;
+}
+
+void storeServerVersionCache(const Value& dictionary) {
+    defaults().set(serverVersionCacheKey, dictionary);
+    log(Level::Default, "Caching Server version  %@", dictionary);
+}
+
+// A version of a version dictionary: a number as it is, a string's integer; nothing for what is missing or neither.
+std::optional<double> versionFrom(const Value& dictionary, std::string_view key) {
+    const Value& value = dictionary[key];
+    if (const std::string* text = value.asString()) return static_cast<double>(platform::leadingInteger(*text));
+    if (auto number = value.asNumber()) return number;
+    log(Level::Error, "Server version dictionary missing key '%@'", key);
+    return std::nullopt;
+}
+
+// The versions that the client shares with a server of the given version dictionary.
+std::optional<VersionSet> versionsSharedWith(const Value& server) {
+    log(Level::Default, "Server version  %@", server);
+    if (server.isNull()) {
+        log(Level::Error, "No server version dictionary found");
+        return std::nullopt;
+    }
+    if (!server.asDictionary()) {
+        log(Level::Error, "Incorrect serverDictionary format");
+        return std::nullopt;
+    }
+    std::optional<double> low = versionFrom(server, lowServerVersionKey);
+    if (!low) return std::nullopt;
+    std::optional<double> high = versionFrom(server, highServerVersionKey);
+    if (!high) return std::nullopt;
+    VersionSet serverSet{*low, *high};
+    log(Level::Default, "Server versions '%@'", serverSet);
+    VersionSet clientSet{static_cast<double>(defaults().integer(lowServerVersionKey)),
+                         static_cast<double>(defaults().integer(highServerVersionKey))};
+    log(Level::Default, "Client versions '%@'", clientSet);
+    VersionSet shared;
+    std::ranges::set_intersection(clientSet, serverSet, std::inserter(shared, shared.end()));
+    log(Level::Default, "clientAndServerSet '%@'", shared);
+    return shared;
+}
+
+// The dictionary of an answer to a document's request. A root of another kind comes back as it is.
+Value rootOfDocument(const std::string& url, const HttpResponse& response) {
+    if (!response.body) {
+        log(Level::Error, "Failed to fetch plist data from URL '%@' with error: %@", url, response.error);
+        return nullptr;
+    }
+    Result<Value> root = Platform::current().propertyList().parse(*response.body);
+    if (!root) {
+        log(Level::Error, "Error serializing plist file from URL '%@': %@", url, root.error());
+        return nullptr;
+    }
+    return *root;
+}
+
+}  // namespace
+
+void VRXServerVersionUtilities::_dictionaryFromURL(std::string url, bool shouldRetry, Completion<Value> completion) {
+    auto& sessions = Platform::current().httpSessions();
+    auto uncached = shouldRetry ? nullptr : sessions.makeUncached();
+    platform::HttpSession& session = shouldRetry ? sessions.shared() : *uncached;
+    HttpRequest request;
+    request.url = url;
+    session.send(std::move(request), [url = std::move(url), shouldRetry,
+                                      completion = std::move(completion)](HttpResponse response) mutable {
+        Value root = rootOfDocument(url, response);
+        if (root.isNull() || root.asDictionary()) {
+            completion(root);
+        } else if (shouldRetry) {
+            log(Level::Error, "Incorrect format in response detected. retrying...");
+            _dictionaryFromURL(url, false, std::move(completion));
+        } else {
+            log(Level::Error,
+                "Incorrect format in response detected from URL '%@'. Response: %@. Aborting without retry.", url,
+                root);
+            completion(nullptr);
+        }
+    });
+}
+
+Value VRXServerVersionUtilities::_getValidServerVersionCache() {
+    Value cache = defaults().get(serverVersionCacheKey);
+    if (cache.isNull() || cache.asDictionary()) return cache;
+    log(Level::Error, "Incorrect format stored in server version cache. Removing it.");
+    defaults().remove(serverVersionCacheKey);
+    return nullptr;
+}
+
+void VRXServerVersionUtilities::_supportedVersionsForClientAndServer(VRXServerLookupPolicy policy,
+                                                                     Completion<std::optional<VersionSet>> completion) {
+    Value override = defaults().get(serverVersionOverrideKey);
+    log(Level::Default, " Server lookup policy:%ld", policy);
+    if (!override.isNull()) {
+        log(Level::Default, "Using Overridden Server version  %@", override);
+        defaults().set(serverVersionCacheKey, override);
+        return completion(versionsSharedWith(override));
+    }
+
+    Value cache = _getValidServerVersionCache();
+    const bool isRefresh = policy == VRXServerLookupPolicyRefresh;
+    if (policy == VRXServerLookupPolicyLocal) {
+        if (cache.isNull()) return completion(versionsSharedWith(clientVersionDictionary()));
+        log(Level::Default, "Using Cached Server version: %@", cache);
+        return completion(versionsSharedWith(cache));
+    }
+    if (!isRefresh && !cache.isNull()) return completion(versionsSharedWith(cache));
+
+    // A refresh stores whatever it ends with; a default lookup only what it fetched, so that it asks again the next
+    // time.
+    auto finish = [isRefresh, cache, completion = std::move(completion)](Value fetched) mutable {
+        Value used = !fetched.isNull() ? fetched : !cache.isNull() ? cache : clientVersionDictionary();
+        if (isRefresh || !fetched.isNull()) storeServerVersionCache(used);
+        completion(versionsSharedWith(used));
+    };
+    _dictionaryFromURL(defaults().string(serverVersionURLKey).value_or(""), true, std::move(finish));
+}
+
+void VRXServerVersionUtilities::serverVersionSupported(Completion<bool> completion) {
+    auto answer = [completion = std::move(completion)](const std::optional<VersionSet>& shared) mutable {
+        const bool isSupported = shared && !shared->empty();
+        if (isSupported) log(Level::Default, "Server version supported by client version - '%@'", *shared);
+        completion(isSupported);
+    };
+    _supportedVersionsForClientAndServer(VRXServerLookupPolicyRefresh, std::move(answer));
+}
+
+void VRXServerVersionUtilities::isHighServerVersionFeaturesetEnabled(VRXServerLookupPolicy policy,
+                                                                     Completion<bool> completion) {
+    auto answer = [completion = std::move(completion)](const std::optional<VersionSet>& shared) mutable {
+        auto high = static_cast<double>(defaults().integer(highServerVersionKey));
+        const bool isEnabled = shared && shared->contains(high);
+        log(Level::Default, "High Server version supported - %@", isEnabled ? "YES" : "NO");
+        completion(isEnabled);
+    };
+    _supportedVersionsForClientAndServer(policy, std::move(answer));
+}
+
+void VRXServerVersionUtilities::isHighServerVersionFeaturesetEnabled(Completion<bool> completion) {
+    isHighServerVersionFeaturesetEnabled(VRXServerLookupPolicyDefault, std::move(completion));
+}
+
+bool VRXServerVersionUtilities::isHighServerVersionFeaturesetEnabled() {
+    bool isEnabled = false;  // set before the call returns: a local lookup never waits
+    isHighServerVersionFeaturesetEnabled(VRXServerLookupPolicyLocal, [&isEnabled](bool answer) { isEnabled = answer; });
+    return isEnabled;
+}
+
+Value VRXServerVersionUtilities::readWebURLOverride() {
+    log(Level::Default, "%s", "+[VRXServerVersionUtilities readWebURLOverride]");
+    return defaults().get(webFlowURLKey);
+}
+
+}  // namespace vrx

@@ -1,0 +1,71 @@
+// The object through which every request reaches devices and coverage records: each client connection has one of its
+// own, as have start-up and the activities that work through one. It has no state between requests. Requests may come
+// on any thread; a request under way keeps the agent alive until its reply is sent.
+#pragma once
+
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <string>
+
+#include "platform/completion_group.h"
+#include "platform/queue.h"
+#include "protocols/agent_collaborators.h"
+#include "protocols/agent_device_provider.h"
+#include "protocols/agent_protocol.h"
+#include "protocols/agent_warranty_provider.h"
+
+namespace vrx {
+
+class VRXAgent final : public VRXAgentProtocol, public std::enable_shared_from_this<VRXAgent> {
+public:
+    using SerialNumber = VRXAgentWarrantyProvider::SerialNumber;
+    using WarrantyReply = Reply<std::shared_ptr<VRXWarranty>>;
+
+    // An agent for the application with that bundle identifier, the settings app when there is none, with the default
+    // providers.
+    static std::shared_ptr<VRXAgent> initWithCallingProcessBundleID(const std::optional<std::string>& bundleIdentifier,
+                                                                    AgentCollaborators collaborators = {});
+    static std::shared_ptr<VRXAgent> initWithWarrantyProvider(
+        std::shared_ptr<VRXAgentWarrantyProvider> warrantyProvider,
+        std::shared_ptr<VRXAgentDeviceProvider> deviceProvider, AgentCollaborators collaborators = {});
+
+    void scheduleOutreachWithReply(Reply<bool> reply) override;
+    void checkIsAvailableInStore(std::string bundleIdentifier, Reply<platform::Value> reply) override;
+    void appSupportAvailability(std::string bundleIdentifier, Reply<platform::Value> reply) override;
+    void readWebURLOverride(Reply<std::optional<std::string>> reply) override;
+    void defaultDevice(Reply<std::shared_ptr<VRXDevice>> reply) override;
+    void pairedDevices(Reply<DeviceList> reply) override;
+    void getDefaultDeviceInfoUsingPolicy(VRXWarrantyLookupPolicy policy,
+                                         Reply<std::shared_ptr<VRXDeviceInfo>> reply) override;
+    void getDeviceInfoForSerialNumber(std::string serialNumber, VRXWarrantyLookupPolicy policy,
+                                      Reply<std::shared_ptr<VRXDeviceInfo>> reply) override;
+    // On the agent's policy queue; overlapping requests of one agent are answered when the lookups of all of them have
+    // ended.
+    void getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicy policy, bool updateFollowUps,
+                                      Reply<DeviceInfoList> reply) override;
+    void dismissFollowUpForSerialNumber(std::string serialNumber, Reply<bool> completion) override;
+
+    // The coverage record that the policy gives, null when it gives none: at once when no download is needed.
+    void getWarrantyUsingPolicy(VRXWarrantyLookupPolicy policy, WarrantyReply reply);
+    void getWarrantyUsingPolicy(VRXWarrantyLookupPolicy policy, const SerialNumber& serialNumber, WarrantyReply reply);
+
+    // Read and replaced whole; a request keeps to what it has read.
+    std::shared_ptr<VRXAgentWarrantyProvider> warrantyProvider() const;
+    void setWarrantyProvider(std::shared_ptr<VRXAgentWarrantyProvider> provider);
+    std::shared_ptr<VRXAgentDeviceProvider> deviceProvider() const;
+    void setDeviceProvider(std::shared_ptr<VRXAgentDeviceProvider> provider);
+
+private:
+    VRXAgent(std::shared_ptr<VRXAgentWarrantyProvider> warrantyProvider,
+             std::shared_ptr<VRXAgentDeviceProvider> deviceProvider, AgentCollaborators collaborators);
+
+    std::shared_ptr<platform::Queue> _policyLookupQueue;
+    platform::CompletionGroup _group;  // of the lookups of all-devices requests
+    mutable std::mutex providersMutex_;
+    std::shared_ptr<VRXAgentWarrantyProvider> warrantyProvider_;
+    std::shared_ptr<VRXAgentDeviceProvider> deviceProvider_;
+    const AgentCollaborators collaborators_;
+};
+
+}  // namespace vrx

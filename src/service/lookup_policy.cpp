@@ -1,0 +1,112 @@
+// The lookup policy of VRXAgent: which coverage record answers a request, the cached one, a downloaded one or none.
+
+#include <utility>
+
+#include "coverage/cache_metadata.h"
+#include "coverage/warranty.h"
+#include "platform/clock.h"
+#include "platform/locale.h"
+#include "platform/log.h"
+#include "platform/platform.h"
+#include "service/agent.h"
+
+namespace vrx {
+
+using platform::Date;
+using platform::Duration;
+using platform::Level;
+using platform::Platform;
+using platform::Value;
+
+namespace {
+
+using SerialNumber = VRXAgent::SerialNumber;
+
+// Whether the cached record matches the running system and the user may see it.
+bool isValid(VRXAgentWarrantyProvider& provider, const SerialNumber& serialNumber) {
+    Value version = provider.cachedWarrantyVersionForSerialNumber(serialNumber);
+    if (version != Value(currentCacheVersion)) {
+        log(Level::Default, "cached warranty is of outdated version '%@', current version is '%@', consider it invalid",
+            version, currentCacheVersion);
+        return false;
+    }
+    Value locale = provider.cachedWarrantyLocaleForSerialNumber(serialNumber);
+    std::string currentLocale = Platform::current().locale().preferredLocaleIdentifier();
+    if (locale != Value(currentLocale)) {
+        log(Level::Default, "cached warranty is for locale '%@', system is now in '%@', consider it invalid", locale,
+            currentLocale);
+        return false;
+    }
+    if (!provider.isSignedInToNimbus()) {
+        log(Level::Default, "user is signed out of Nimbus, cached warranty not allowed");
+        return false;
+    }
+    log(Level::Default, "cached warranty is for locale ('%@') and version ('%@') match system, consider it valid",
+        locale, version);
+    return true;
+}
+
+// Whether a valid cached record is still fresh. One that was stored in the future, by a clock that has been set back,
+// is.
+bool isFresh(VRXAgentWarrantyProvider& provider, const SerialNumber& serialNumber) {
+    std::optional<Date> lastUpdated = provider.lastUpdatedDateForSerialNumber(serialNumber).asDate();
+    if (!lastUpdated) {
+        log(Level::Default, "warranty validity expired, refresh it");
+        return false;
+    }
+    Duration remaining = provider.cachedWarrantyValidityDuration() + (*lastUpdated - Platform::current().clock().now());
+    if (remaining > Duration::zero()) {
+        log(Level::Default, "warranty valid for %.02f seconds", remaining);
+        return true;
+    }
+    log(Level::Default, "warranty validity expired %.02f seconds ago, refresh it", -remaining);
+    return false;
+}
+
+bool shouldDownload(VRXWarrantyLookupPolicy policy, bool cachedIsValid, VRXAgentWarrantyProvider& provider,
+                    const SerialNumber& serialNumber) {
+    if (policy == VRXWarrantyLookupPolicyRefresh) return true;
+    if (policy != VRXWarrantyLookupPolicyDefault) return false;
+    if (!cachedIsValid) {
+        log(Level::Default, "Default policy query: cached warranty is invalid, refresh it");
+        return true;
+    }
+    log(Level::Default, "Default policy query: cached warranty is valid, examine expiration date");
+    return !isFresh(provider, serialNumber);
+}
+
+}  // namespace
+
+void VRXAgent::getWarrantyUsingPolicy(VRXWarrantyLookupPolicy policy, const SerialNumber& serialNumber,
+                                      WarrantyReply reply) {
+    log(Level::Default, "getting warranty using policy %@: %lu", serialNumber, policy);
+    auto provider = warrantyProvider();
+
+    // The cached record, if it may be the answer.
+    std::shared_ptr<VRXWarranty> cached = provider->cachedWarrantyForSerialNumber(serialNumber);
+    if (!cached) {
+        log(Level::Default, "no cached warranty : %@", serialNumber);
+    } else {
+        log(Level::Default, "Has cached warranty : %@", serialNumber);
+        if (!isValid(*provider, serialNumber)) cached = nullptr;
+    }
+
+    const bool isDownloading = shouldDownload(policy, cached != nullptr, *provider, serialNumber);
+    log(Level::Default, "%s: shouldDownloadWarranty: %d", "-[VRXAgent getWarrantyUsingPolicy:serialNumber:withReply:]",
+        isDownloading);
+    if (policy == VRXWarrantyLookupPolicyRefresh) cached = nullptr;  // who asks for a new record gets no old one
+
+    auto answer = [serialNumber, cached = std::move(cached),
+                   reply = std::move(reply)](std::shared_ptr<VRXWarranty> downloaded) mutable {
+        log(Level::Default, "getWarrantyUsingPolicy completionBlock %{private}@ : %d", serialNumber,
+            downloaded != nullptr);
+        reply(downloaded ? std::move(downloaded) : std::move(cached));
+    };
+    if (!isDownloading) return answer(nullptr);
+    provider->downloadWarrantyForSerialNumber(
+        serialNumber,
+        [self = shared_from_this(), answer = std::move(answer)](
+            bool /*success*/, std::shared_ptr<VRXWarranty> warranty) mutable { answer(std::move(warranty)); });
+}
+
+}  // namespace vrx

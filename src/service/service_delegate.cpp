@@ -1,0 +1,46 @@
+#include "service/service_delegate.h"
+
+#include <array>
+#include <string>
+
+#include "platform/log.h"
+#include "platform/platform.h"
+#include "platform/vendor.h"
+#include "service/agent.h"
+
+namespace vrx {
+
+using platform::Bundle;
+using platform::Level;
+using platform::Platform;
+
+namespace {
+constexpr std::size_t callerPathBytes = 4096;
+}
+
+bool ServiceDelegate::shouldAcceptNewConnection(platform::ServiceListener& /*listener*/,
+                                                platform::ServiceConnection& connection) {
+    const std::string entitlement = platform::vendorIdentifier(platform::entitlementRemainder);
+    // Only the boolean counts: a string or a number that looks true is a mistake in the caller's bundle.
+    if (!connection.valueForEntitlement(entitlement).asBool().value_or(false)) {
+        log(Level::Error, "Rejecting connection to vrxagent: missing entitlement '%@'", entitlement);
+        return false;
+    }
+    std::int32_t processIdentifier = connection.processIdentifier();
+    std::optional<Bundle> bundle = _bundleForPID(processIdentifier);
+    std::optional<std::string> bundleIdentifier = bundle ? bundle->identifier : std::nullopt;
+    log(Level::Default, "connection added from %d with calling process: %@", processIdentifier, bundleIdentifier);
+    connection.setExportedInterface(VRXAgentProtocol::protocolName);
+    connection.setExportedObject(VRXAgent::initWithCallingProcessBundleID(bundleIdentifier, collaborators_));
+    connection.resume();
+    return true;
+}
+
+std::optional<Bundle> ServiceDelegate::_bundleForPID(std::int32_t processIdentifier) const {
+    std::array<char, callerPathBytes> buffer;
+    std::size_t length = Platform::current().bundleLookup().executablePath(processIdentifier, buffer);
+    if (length == 0) return std::nullopt;
+    return Platform::current().bundleLookup().bundleContaining(std::string(buffer.data(), length));
+}
+
+}  // namespace vrx

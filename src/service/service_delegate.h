@@ -1,0 +1,29 @@
+// Decides about each new client connection: only callers that hold the agent's entitlement are served, each by an agent
+// of its own that knows the caller's bundle identifier. Called on the listener's thread.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+
+#include "platform/bundle_lookup.h"
+#include "platform/service_listener.h"
+#include "protocols/agent_collaborators.h"
+
+namespace vrx {
+
+class ServiceDelegate final : public platform::ServiceListenerDelegate {
+public:
+    // The collaborators go to every agent.
+    explicit ServiceDelegate(AgentCollaborators collaborators) : collaborators_(std::move(collaborators)) {}
+
+    bool shouldAcceptNewConnection(platform::ServiceListener& listener,
+                                   platform::ServiceConnection& connection) override;
+
+    // The bundle that holds the process's executable, or nothing.
+    std::optional<platform::Bundle> _bundleForPID(std::int32_t processIdentifier) const;
+
+private:
+    const AgentCollaborators collaborators_;
+};
+
+}  // namespace vrx

@@ -1,0 +1,31 @@
+#include "service/start_up.h"
+
+#include "platform/log.h"
+#include "platform/platform.h"
+#include "platform/vendor.h"
+#include "service/register_defaults.h"
+
+namespace vrx {
+
+using platform::Platform;
+
+namespace {
+
+// What agents are given of the parts that need agents in turn. Follow-ups, outreach and the support app are not there
+// yet.
+AgentCollaborators collaborators() {
+    return {};
+}
+
+}  // namespace
+
+StartUp::StartUp() : delegate_(collaborators()) {
+    log(platform::Level::Default, "launched");
+    vrx_registerDefaults(Platform::current().defaultsStore());
+    listener_ = Platform::current().serviceListenerFactory().makeListener(
+        platform::vendorIdentifier(platform::serviceNameRemainder));
+    listener_->setDelegate(&delegate_);
+    listener_->resume();
+}
+
+}  // namespace vrx
