@@ -1,0 +1,381 @@
+#include "host/database.h"
+
+#include <fcntl.h>
+#include <sys/file.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <cstring>
+#include <ctime>
+
+#include "host/files.h"
+#include "platform/log.h"
+
+namespace vrx::host {
+
+using platform::Error;
+using platform::Level;
+using platform::MaybeError;
+
+namespace {
+
+constexpr int busyMilliseconds = 5000;
+
+constexpr const char* steps[] = {
+    // The agent's settings: a number or a text as itself, anything else as a binary property list.
+    "CREATE TABLE defaults (key TEXT PRIMARY KEY, value NOT NULL) WITHOUT ROWID",
+};
+
+void check(int result, sqlite3* connection) {
+    if (result == SQLITE_OK) return;
+    throw DatabaseError(result, connection ? sqlite3_errmsg(connection) : sqlite3_errstr(result));
+}
+
+bool isDamage(const DatabaseError& error) {
+    const int primary = error.code & 0xff;
+    return primary == SQLITE_CORRUPT || primary == SQLITE_NOTADB;
+}
+
+std::string timeSuffix() {
+    const std::time_t now = std::time(nullptr);
+    std::tm fields{};
+    gmtime_r(&now, &fields);
+    std::array<char, 32> text;
+    return {text.data(), std::strftime(text.data(), text.size(), "%Y%m%dT%H%M%SZ", &fields)};
+}
+
+// Which file a name stands for.
+struct FileIdentity {
+    dev_t device = 0;
+    ino_t inode = 0;
+    bool operator==(const FileIdentity&) const = default;
+    explicit operator bool() const { return inode != 0; }
+
+    // None when the name stands for nothing.
+    static FileIdentity of(const std::string& path) {
+        struct stat status;
+        if (stat(path.c_str(), &status) != 0) return {};
+        return {status.st_dev, status.st_ino};
+    }
+};
+
+// Held while the database is opened: of several processes that find it damaged, one sets it aside and the others find
+// the fresh one.
+class FolderLock {
+public:
+    explicit FolderLock(const std::string& folder) : file_(::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC)) {
+        if (file_ < 0) throw DatabaseError(SQLITE_CANTOPEN, systemError("open", folder, errno).text);
+        while (flock(file_, LOCK_EX) != 0 && errno == EINTR) {
+        }
+    }
+    ~FolderLock() { ::close(file_); }
+    FolderLock(const FolderLock&) = delete;
+    FolderLock& operator=(const FolderLock&) = delete;
+
+private:
+    int file_;
+};
+
+// SQLite would make the file readable for others; what it makes beside it has the file's own mode.
+void createPrivately(const std::string& path) {
+    int file = ::open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600);
+    if (file >= 0)
+        ::close(file);
+    else if (errno != EEXIST)
+        throw DatabaseError(SQLITE_CANTOPEN, systemError("create", path, errno).text);
+}
+
+}  // namespace
+
+const Database::Schema Database::currentSchema = steps;
+
+Statement::Statement(sqlite3* connection, const char* sql) : connection_(connection) {
+    check(sqlite3_prepare_v3(connection, sql, -1, SQLITE_PREPARE_PERSISTENT, &statement_, nullptr), connection);
+}
+
+Statement& Statement::bind(int parameter, std::string_view text) {
+    // An absent pointer would bind null.
+    check(sqlite3_bind_text64(statement_, parameter + 1, text.data() ? text.data() : "", text.size(), SQLITE_TRANSIENT,
+                              SQLITE_UTF8),
+          connection_);
+    return *this;
+}
+
+Statement& Statement::bind(int parameter, std::int64_t number) {
+    check(sqlite3_bind_int64(statement_, parameter + 1, number), connection_);
+    return *this;
+}
+
+Statement& Statement::bind(int parameter, double number) {
+    check(sqlite3_bind_double(statement_, parameter + 1, number), connection_);
+    return *this;
+}
+
+Statement& Statement::bind(int parameter, const platform::Data& bytes) {
+    const void* start = bytes.empty() ? static_cast<const void*>("") : bytes.data();
+    check(sqlite3_bind_blob64(statement_, parameter + 1, start, bytes.size(), SQLITE_TRANSIENT), connection_);
+    return *this;
+}
+
+Statement& Statement::bind(int parameter, std::nullptr_t) {
+    check(sqlite3_bind_null(statement_, parameter + 1), connection_);
+    return *this;
+}
+
+bool Statement::step() {
+    const int result = sqlite3_step(statement_);
+    if (result == SQLITE_ROW) return true;
+    if (result != SQLITE_DONE) check(result, connection_);
+    return false;
+}
+
+void Statement::reset() {
+    sqlite3_reset(statement_);
+    sqlite3_clear_bindings(statement_);
+}
+
+std::string_view Statement::text(int column) const {
+    const auto* start = reinterpret_cast<const char*>(sqlite3_column_text(statement_, column));
+    return {start ? start : "", static_cast<std::size_t>(sqlite3_column_bytes(statement_, column))};
+}
+
+std::span<const std::uint8_t> Statement::bytes(int column) const {
+    const auto* start = static_cast<const std::uint8_t*>(sqlite3_column_blob(statement_, column));
+    return {start, start ? static_cast<std::size_t>(sqlite3_column_bytes(statement_, column)) : 0};
+}
+
+Connection::Connection(const std::string& path) {
+    const int result =
+        sqlite3_open_v2(path.c_str(), &connection_, SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX, nullptr);
+    try {
+        check(result, connection_);
+        sqlite3_extended_result_codes(connection_, 1);
+        sqlite3_busy_timeout(connection_, busyMilliseconds);
+        execute("PRAGMA synchronous = FULL");
+    } catch (...) {
+        sqlite3_close(connection_);
+        throw;
+    }
+}
+
+Connection::~Connection() {
+    statements_.clear();
+    sqlite3_close(connection_);
+}
+
+void Connection::execute(const char* sql) {
+    check(sqlite3_exec(connection_, sql, nullptr, nullptr, nullptr), connection_);
+}
+
+Statement& Connection::statement(const char* sql) {
+    std::unique_ptr<Statement>& statement = statements_[sql];
+    if (!statement)
+        statement = std::make_unique<Statement>(connection_, sql);
+    else
+        statement->reset();
+    return *statement;
+}
+
+std::int64_t Connection::integer(const char* sql) {
+    Statement& query = statement(sql);
+    const std::int64_t result = query.step() ? query.integer(0) : 0;
+    query.reset();
+    return result;
+}
+
+void Connection::endStatements() {
+    for (sqlite3_stmt* used = sqlite3_next_stmt(connection_, nullptr); used;
+         used = sqlite3_next_stmt(connection_, used))
+        if (sqlite3_stmt_busy(used)) sqlite3_reset(used);
+}
+
+std::int64_t Connection::dataVersion() {
+    return integer("PRAGMA data_version");
+}
+
+// The connections of one opening. Reading has one of its own, so that it does not wait while a write waits.
+struct Database::Opening {
+    explicit Opening(const std::string& path) : path(path), writer(path) {
+        // A damaged database is set aside as it is: until it has passed, closing it must not write to it.
+        keepLogAtClose(writer, true);
+    }
+
+    ~Opening() {
+        // Closing the last connection takes the -wal file away by its name, which is not ours any more when another
+        // database has come to stand there.
+        if (FileIdentity::of(path) == file) return;
+        keepLogAtClose(writer, true);
+        if (reader) keepLogAtClose(*reader, true);
+    }
+
+    void passed() {
+        reader.emplace(path);
+        reader->dataVersion();  // opens the files
+        keepLogAtClose(writer, false);
+        file = FileIdentity::of(path);
+        wal = FileIdentity::of(path + "-wal");
+        shm = FileIdentity::of(path + "-shm");
+    }
+
+    static void keepLogAtClose(Connection& connection, bool keep) {
+        sqlite3_db_config(connection.connection_, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, keep ? 1 : 0, nullptr);
+    }
+
+    const std::string path;
+    Connection writer;
+    std::optional<Connection> reader;
+    FileIdentity file, wal, shm;
+    std::uint64_t number = 0;
+};
+
+Database::Database(std::string path, Schema schema) : path_(std::move(path)), schema_(schema) {}
+
+Database::~Database() = default;
+
+MaybeError Database::open() {
+    MaybeError error;
+    opening(error);
+    return error;
+}
+
+std::shared_ptr<Database::Opening> Database::opening(MaybeError& error) {
+    std::lock_guard lock(mutex_);
+    if (opening_ && FileIdentity::of(path_) == opening_->file) return opening_;
+    try {
+        FolderLock folder(path_.substr(0, path_.rfind('/') + 1));
+        if (opening_) leaveReplacedFile();
+        opening_ = openChecked();
+        opening_->number = ++openings_;
+        lastFailure_.clear();
+        return opening_;
+    } catch (const DatabaseError& failure) {
+        error = Error{"database", failure.code, "cannot open " + path_ + ": " + failure.what()};
+        if (std::exchange(lastFailure_, error->text) != error->text) log(Level::Error, "%@", error->text);
+        return nullptr;
+    }
+}
+
+// What stands beside the replaced file belongs to it, unless it came with the new one, which would take it for its own.
+void Database::leaveReplacedFile() {
+    log(Level::Error, "%@ was replaced and is opened again", path_);
+    const std::string aside = freeAsideName("replaced");
+    if (FileIdentity::of(path_ + "-wal") == opening_->wal) moveAside(aside, "-wal");
+    if (FileIdentity::of(path_ + "-shm") == opening_->shm) moveAside(aside, "-shm");
+    opening_.reset();
+}
+
+std::shared_ptr<Database::Opening> Database::openChecked() {
+    try {
+        return openOnce();
+    } catch (const DatabaseError& error) {
+        if (!isDamage(error)) throw;
+        const std::string aside = freeAsideName("damaged");
+        for (const char* suffix : {"-wal", "-shm", ""}) moveAside(aside, suffix);
+        log(Level::Error, "%@ is damaged (%@); it was set aside as %@ and a new one is made", path_, error.what(),
+            aside);
+        return openOnce();
+    }
+}
+
+std::shared_ptr<Database::Opening> Database::openOnce() const {
+    createPrivately(path_);
+    auto opening = std::make_shared<Opening>(path_);
+    Connection& writer = opening->writer;
+    writer.execute("PRAGMA journal_mode = WAL");
+    {
+        Statement check(writer.connection_, "PRAGMA quick_check(1)");
+        if (!check.step() || check.text(0) != "ok") throw DatabaseError(SQLITE_CORRUPT, std::string(check.text(0)));
+    }
+    migrate(writer);
+    opening->passed();
+    return opening;
+}
+
+void Database::migrate(Connection& writer) const {
+    writer.execute("BEGIN IMMEDIATE");
+    const auto newest = static_cast<std::int64_t>(schema_.size());
+    const std::int64_t version = writer.integer("PRAGMA user_version");
+    if (version > newest || version < 0)
+        throw DatabaseError(SQLITE_ERROR, "it was made by a newer version of the program (schema " +
+                                              std::to_string(version) + "; this one knows " + std::to_string(newest) +
+                                              ")");
+    for (std::int64_t step = version; step < newest; ++step) writer.execute(schema_[static_cast<std::size_t>(step)]);
+    if (version < newest) writer.execute(("PRAGMA user_version = " + std::to_string(newest)).c_str());
+    writer.execute("COMMIT");
+}
+
+std::string Database::freeAsideName(const std::string& reason) const {
+    const std::string name = path_ + "." + reason + "-" + timeSuffix();
+    auto isTaken = [](const std::string& candidate) {
+        for (const char* suffix : {"", "-wal", "-shm"})
+            if (FileIdentity::of(candidate + suffix)) return true;
+        return false;
+    };
+    std::string candidate = name;
+    for (int number = 2; isTaken(candidate); ++number) candidate = name + "-" + std::to_string(number);
+    return candidate;
+}
+
+void Database::moveAside(const std::string& asideName, const char* suffix) const {
+    const std::string from = path_ + suffix;
+    if (::rename(from.c_str(), (asideName + suffix).c_str()) != 0 && errno != ENOENT)
+        throw DatabaseError(SQLITE_CANTOPEN, systemError("set aside", from, errno).text);
+}
+
+// Damage that shows only in use: the next operation opens the database again, and examines it.
+Error Database::failed(const std::shared_ptr<Opening>& opening, const DatabaseError& error) {
+    if (isDamage(error)) {
+        std::lock_guard lock(mutex_);
+        if (opening_ == opening) opening_.reset();
+    }
+    return Error{"database", error.code, path_ + ": " + error.what()};
+}
+
+MaybeError Database::transaction(Connection& connection, const std::shared_ptr<Opening>& opening, const char* begin,
+                                 const std::function<void(Connection&)>& body) {
+    std::lock_guard lock(connection.mutex_);
+    try {
+        connection.execute(begin);
+        body(connection);
+        connection.endStatements();
+        connection.execute("COMMIT");
+        return std::nullopt;
+    } catch (const DatabaseError& error) {
+        connection.endStatements();
+        // Some failures have undone the transaction already.
+        if (!sqlite3_get_autocommit(connection.connection_))
+            sqlite3_exec(connection.connection_, "ROLLBACK", nullptr, nullptr, nullptr);
+        return failed(opening, error);
+    }
+}
+
+MaybeError Database::read(const std::function<void(Connection&)>& body) {
+    MaybeError error;
+    std::shared_ptr<Opening> current = opening(error);
+    return current ? transaction(*current->reader, current, "BEGIN", body) : error;
+}
+
+MaybeError Database::write(const std::function<void(Connection&)>& body) {
+    MaybeError error;
+    std::shared_ptr<Opening> current = opening(error);
+    return current ? transaction(current->writer, current, "BEGIN IMMEDIATE", body) : error;
+}
+
+MaybeError Database::peek(const std::function<void(Connection&, const Stamp&)>& body) {
+    MaybeError error;
+    std::shared_ptr<Opening> current = opening(error);
+    if (!current) return error;
+    Connection& reader = *current->reader;
+    std::lock_guard lock(reader.mutex_);
+    try {
+        body(reader, Stamp{current->number, reader.dataVersion()});
+        reader.endStatements();
+        return std::nullopt;
+    } catch (const DatabaseError& failure) {
+        reader.endStatements();
+        return failed(current, failure);
+    }
+}
+
+}  // namespace vrx::host
