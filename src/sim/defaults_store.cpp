@@ -1,0 +1,69 @@
+#include "sim/defaults_store.h"
+
+#include <utility>
+
+#include "platform/log.h"
+
+namespace vrx::sim {
+
+using platform::Dictionary;
+using platform::Value;
+
+Value DefaultsStore::get(std::string_view key) const {
+    checkOutsideUpdate();
+    for (const Dictionary* layer : {&stored_, &registered_})
+        if (auto entry = layer->find(key); entry != layer->end()) return entry->second;
+    return {};
+}
+
+void DefaultsStore::set(std::string_view key, Value value) {
+    checkOutsideUpdate();
+    writes_.emplace_back(key);
+    if (failingWrites_ > 0) {
+        --failingWrites_;
+        platform::log(platform::Level::Error, "cannot write default '%@'", key);
+        return;
+    }
+    write(key, std::move(value));
+}
+
+void DefaultsStore::write(std::string_view key, Value value) {
+    if (!value.isNull())
+        stored_.insert_or_assign(std::string(key), std::move(value));
+    else if (auto entry = stored_.find(key); entry != stored_.end())
+        stored_.erase(entry);
+}
+
+void DefaultsStore::update(std::string_view key, const std::function<Value(const Value&)>& change) {
+    auto changed = [&] {
+        Value present = get(key);
+        isUpdating_ = true;
+        Value value = change(present);
+        isUpdating_ = false;
+        return value;
+    };
+    Value value = changed();
+    if (interference_) {
+        write(key, *std::exchange(interference_, std::nullopt));
+        value = changed();
+    }
+    set(key, std::move(value));
+}
+
+void DefaultsStore::registerDefaults(const Dictionary& values) {
+    checkOutsideUpdate();
+    for (const auto& [key, value] : values) registered_.insert_or_assign(key, value);
+}
+
+Dictionary DefaultsStore::dictionaryRepresentation() const {
+    checkOutsideUpdate();
+    Dictionary all = stored_;
+    all.insert(registered_.begin(), registered_.end());
+    return all;
+}
+
+void DefaultsStore::checkOutsideUpdate() const {
+    if (isUpdating_) failures_.report("the function of an update used the settings");
+}
+
+}  // namespace vrx::sim

@@ -1,0 +1,46 @@
+// The settings in memory. What is stored survives a restart of the simulated process, what is registered does not.
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "platform/defaults_store.h"
+#include "sim/failures.h"
+
+namespace vrx::sim {
+
+class DefaultsStore final : public platform::DefaultsStore {
+public:
+    explicit DefaultsStore(const Failures& failures) : failures_(failures) {}
+
+    platform::Value get(std::string_view key) const override;
+    void set(std::string_view key, platform::Value value) override;
+    void update(std::string_view key, const std::function<platform::Value(const platform::Value&)>& change) override;
+    void registerDefaults(const platform::Dictionary& values) override;
+    platform::Dictionary dictionaryRepresentation() const override;
+
+    const platform::Dictionary& stored() const { return stored_; }
+    // The keys of all writes that were tried, in order, removals included.
+    const std::vector<std::string>& writes() const { return writes_; }
+
+    // As many writes fail from now on: each is logged and changes nothing.
+    void failWrites(int count) { failingWrites_ = count; }
+    // Another process writes to the key of the next update() while its function is at work, which makes it begin anew.
+    void interfereWithNextUpdate(platform::Value value) { interference_ = std::move(value); }
+    // What the end of the process takes with it.
+    void forgetRegistered() { registered_.clear(); }
+
+private:
+    void write(std::string_view key, platform::Value value);
+    void checkOutsideUpdate() const;
+
+    const Failures& failures_;
+    platform::Dictionary stored_;
+    platform::Dictionary registered_;
+    std::vector<std::string> writes_;
+    int failingWrites_ = 0;
+    std::optional<platform::Value> interference_;
+    bool isUpdating_ = false;
+};
+
+}  // namespace vrx::sim

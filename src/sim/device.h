@@ -1,0 +1,55 @@
+// Facts about the simulated device and its user, each set by the test.
+#pragma once
+
+#include <map>
+#include <optional>
+#include <set>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "platform/account_store.h"
+#include "platform/device_properties.h"
+#include "platform/paired_device_registry.h"
+
+namespace vrx::sim {
+
+class DeviceProperties final : public platform::DeviceProperties {
+public:
+    std::optional<std::string> string(std::string_view key) const override {
+        auto entry = strings.find(key);
+        return entry == strings.end() ? std::nullopt : std::optional(entry->second);
+    }
+    bool isInternalInstall() const override { return isInternal; }
+
+    std::map<std::string, std::string, std::less<>> strings{{"SerialNumber", "SIM00000001"},
+                                                            {"UserAssignedDeviceName", "Simulated Device"},
+                                                            {"ProductType", "Simulated1,1"},
+                                                            {"ProductVersion", "1.0"}};
+    bool isInternal = false;
+};
+
+class FeatureFlags final : public platform::FeatureFlags {
+public:
+    bool isEnabled(std::string_view domain, std::string_view flag) const override {
+        return enabled.contains({std::string(domain), std::string(flag)});
+    }
+
+    std::set<std::pair<std::string, std::string>> enabled;  // domain and flag
+};
+
+class PairedDeviceRegistry final : public platform::PairedDeviceRegistry {
+public:
+    std::vector<platform::PairedWatch> watches() const override { return all; }
+
+    std::vector<platform::PairedWatch> all;
+};
+
+class AccountStore final : public platform::AccountStore {
+public:
+    std::optional<platform::CloudAccount> primaryCloudAccount() const override { return primary; }
+
+    std::optional<platform::CloudAccount> primary = platform::CloudAccount{"user@cloud"};  // signed in
+};
+
+}  // namespace vrx::sim

@@ -1,0 +1,55 @@
+// A call stack besides the thread's own, on which one task at a time runs and can be suspended halfway. Used by one
+// thread. The address and thread sanitizers are told of each switch.
+#pragma once
+
+#include <ucontext.h>
+
+#include <cstddef>
+
+#include "platform/task.h"
+
+namespace vrx::sim {
+
+class Fiber {
+public:
+    Fiber();
+    // It must be idle.
+    ~Fiber();
+    Fiber(const Fiber&) = delete;
+    Fiber& operator=(const Fiber&) = delete;
+
+    // Runs the task until it suspends or ends. An exception that leaves the task ends the program.
+    void start(platform::Task task);
+    // Goes on with the suspended task until it suspends again or ends.
+    void resume() { enter(); }
+    // Called by the task: goes back to where start() or resume() was called.
+    void suspend() { leave(); }
+    // Whether it has no task.
+    bool isIdle() const { return !isBusy_; }
+
+private:
+    static void main() noexcept;
+    void runTasks();
+    void enter();
+    void leave();
+    void arrive();
+
+    std::byte* mapping_;  // a page that nobody may touch, and above it the stack
+    std::byte* stack_;
+    ucontext_t inside_;
+    ucontext_t outside_;
+    platform::Task task_;
+    bool isBusy_ = false;
+    bool hasStarted_ = false;
+    bool isEnding_ = false;
+
+    // What the sanitizers want to have back.
+    const void* outsideStack_ = nullptr;
+    std::size_t outsideStackBytes_ = 0;
+    void* outsideFakeStack_ = nullptr;
+    void* insideFakeStack_ = nullptr;
+    void* outsideThread_ = nullptr;
+    void* insideThread_ = nullptr;
+};
+
+}  // namespace vrx::sim

@@ -1,0 +1,82 @@
+// HTTP with scripted answers. A test lays down what is answered at a URL and reads afterwards what was sent. A URL for
+// which nothing is laid down refuses connections; a file URL reads the simulated files. Answers arrive on a worker,
+// after their delay in virtual time. Nothing is cached.
+#pragma once
+
+#include <deque>
+#include <functional>
+#include <map>
+#include <memory>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "platform/http_request.h"
+#include "sim/clock.h"
+#include "sim/files.h"
+#include "sim/queues.h"
+
+namespace vrx::sim {
+
+struct HttpAnswer {
+    platform::HttpResponse response;
+    platform::Duration delay{0.1};
+
+    static HttpAnswer ok(std::string_view body) { return status(200, body); }
+    static HttpAnswer status(int status, std::string_view body = {});
+    // The transport fails.
+    static HttpAnswer failure(std::string text = "connection lost");
+    // No answer ever comes; the request times out.
+    static HttpAnswer silence();
+
+    HttpAnswer after(platform::Duration time) const {
+        HttpAnswer answer = *this;
+        answer.delay = time;
+        return answer;
+    }
+};
+
+struct SentRequest {
+    platform::HttpRequest request;
+    bool isShared;        // through the shared session, else through one that bypasses caches
+    platform::Date date;  // when it was sent
+    std::string_view body() const { return {reinterpret_cast<const char*>(request.body.data()), request.body.size()}; }
+};
+
+class HttpSessions final : public platform::HttpSessions {
+public:
+    static constexpr platform::Duration defaultTimeout{60};
+
+    HttpSessions(const Clock& clock, Queues& queues, const Files& files);
+
+    platform::HttpSession& shared() override { return *shared_; }
+    std::shared_ptr<platform::HttpSession> makeUncached() override;
+
+    using Server = std::function<HttpAnswer(const platform::HttpRequest&)>;
+    // The standing answer at a URL, in place of the one before.
+    void answer(std::string url, HttpAnswer answer);
+    void answer(std::string url, Server server) { standing_[std::move(url)] = std::move(server); }
+    // Answers given before the standing one, each once, in the order in which they are laid down.
+    void answerOnce(std::string url, HttpAnswer answer) { once_[std::move(url)].push_back(std::move(answer)); }
+
+    // All requests, file URLs included, in the order in which they were sent.
+    const std::vector<SentRequest>& sent() const { return sent_; }
+    std::vector<SentRequest> sentTo(std::string_view url) const;
+
+private:
+    class Session;
+
+    void send(bool isShared, platform::HttpRequest request, platform::OnceCallback<platform::HttpResponse> completion);
+    HttpAnswer answerTo(const platform::HttpRequest& request);
+    HttpAnswer fileAnswer(const std::string& path) const;
+
+    const Clock& clock_;
+    Queues& queues_;
+    const Files& files_;
+    std::shared_ptr<platform::HttpSession> shared_;
+    std::map<std::string, Server> standing_;
+    std::map<std::string, std::deque<HttpAnswer>> once_;
+    std::vector<SentRequest> sent_;
+};
+
+}  // namespace vrx::sim

@@ -1,0 +1,98 @@
+// The queues under virtual time: one thread runs all work, in the order in which it is due and, of what is due at the
+// same time, in the order in which it was posted. Two runs of the same program do the same in the same order.
+//
+// Each task has a stack of its own: one that waits for an event is suspended while other work goes on and time passes,
+// just as a thread would be. A serial queue whose task waits, the main queue too, starts nothing meanwhile.
+//
+// The thread that owns the simulation is the test's body: it runs the queues, and where it waits for an event itself,
+// they run until the event is set.
+#pragma once
+
+#include <cstdint>
+#include <exception>
+#include <map>
+#include <memory>
+#include <optional>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "platform/queue.h"
+#include "sim/clock.h"
+#include "sim/failures.h"
+#include "sim/fiber.h"
+
+namespace vrx::sim {
+
+class Queues final : public platform::Queues {
+public:
+    Queues(Clock& clock, const Failures& failures);
+    ~Queues() override;
+
+    platform::Queue& mainQueue() override;
+    std::shared_ptr<platform::Queue> makeSerialQueue(std::string label) override;
+    platform::Queue& workers(platform::Priority priority) override;
+    std::shared_ptr<platform::Event> makeEvent() override;
+
+    // For the test's body. Run the work that is due now, by the end of a duration, or by a date; then it is that late.
+    void run() { runWork(clock_.elapsed()); }
+    void runFor(platform::Duration duration) { runWork(clock_.elapsed() + duration); }
+    void runUntil(platform::Date date) { runWork(clock_.elapsedAt(date)); }
+
+    // The label of the queue whose task is running: "main", "background", "userInitiated", a serial queue's own, and
+    // nothing in the test's body.
+    std::string currentLabel() const;
+    // Tasks that have not begun, delayed ones included.
+    std::size_t pendingCount() const;
+    // Tasks that wait for an event.
+    std::size_t waitingCount() const;
+
+    // Ends the simulation's work: a task that still waits is a failure, unless it was let go. Its wait never returns;
+    // the stack is unwound. What has not begun is discarded, and so is what is posted from now on.
+    void close();
+    // Tasks that wait when the simulation ends are none of this test's business.
+    void letWaitingTasksGo() { areWaitingTasksLetGo_ = true; }
+
+private:
+    class Lane;
+    class Event;
+
+    // A task under way.
+    struct Strand;
+
+    using Key = std::pair<platform::Duration, std::uint64_t>;  // when it is due, and its number
+    // A task that has not begun, or the continuation of one under way.
+    struct Work {
+        std::shared_ptr<Lane> lane;
+        platform::Task task;
+        Strand* strand = nullptr;
+    };
+
+    Key add(platform::Duration delay, Work work);
+    void runWork(platform::Duration until);
+    bool runNext(platform::Duration until);
+    void countWork(platform::Duration due);
+    void execute(Work work);
+    bool wait(Event& event, std::optional<platform::Duration> limit);
+    bool runUntilSet(const Event& event, std::optional<platform::Duration> limit);
+    void wake(Strand& strand);
+    bool isInBody(const char* what) const;
+    std::string waitingTasks() const;
+
+    Clock& clock_;
+    const Failures& failures_;
+    std::map<Key, Work> pending_;
+    std::uint64_t lastNumber_ = 0;
+    std::vector<std::unique_ptr<Strand>> strands_;
+    std::vector<Strand*> idle_;
+    Strand* current_ = nullptr;
+    int workAtThisTime_ = 0;
+    bool isClosed_ = false;
+    bool areWaitingTasksLetGo_ = false;
+
+    std::shared_ptr<Lane> main_;
+    std::shared_ptr<Lane> background_;
+    std::shared_ptr<Lane> userInitiated_;
+};
+
+}  // namespace vrx::sim

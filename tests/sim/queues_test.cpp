@@ -1,0 +1,227 @@
+// What a test writer relies on: order, virtual time, tasks that wait.
+#include <gmock/gmock.h>
+
+#include "sim/host.h"
+
+namespace vrx::sim {
+namespace {
+
+using namespace std::chrono_literals;
+using platform::Duration;
+using platform::Priority;
+using platform::Task;
+using testing::ElementsAre;
+using testing::HasSubstr;
+using testing::IsEmpty;
+
+class SimQueues : public testing::Test {
+protected:
+    SimQueues() {
+        host.failures.handler = [this](const std::string& text) { failures.push_back(text); };
+    }
+
+    // A task that notes its name and the virtual time at which it ran.
+    Task noting(std::string name) {
+        return [this, name] { note(name); };
+    }
+    void note(const std::string& name) {
+        auto seconds = std::chrono::duration_cast<std::chrono::seconds>(host.clock.elapsed());
+        notes.push_back(name + "@" + std::to_string(seconds.count()));
+    }
+
+    std::vector<std::string> failures;
+    std::vector<std::string> notes;
+    Host host;
+    platform::Queue& main = host.queues.mainQueue();
+    platform::Queue& worker = host.queues.workers(Priority::Background);
+};
+
+TEST_F(SimQueues, RunWhatIsDueInTheOrderOfTimeThenOfPosting) {
+    main.postAfter(2s, noting("late"));
+    worker.postAfter(1s, noting("first of two"));
+    main.postAfter(1s, noting("second of two"));
+    main.postAfter(-1s, noting("now"));
+    main.postAfter(Duration(std::nan("")), noting("no number"));
+    main.postAfter(Duration(std::numeric_limits<double>::infinity()), noting("never"));
+    EXPECT_THAT(notes, IsEmpty()) << "posting runs nothing";
+
+    host.run();
+    EXPECT_THAT(notes, ElementsAre("now@0", "no number@0"));
+    host.runFor(1s);
+    EXPECT_THAT(notes, ElementsAre("now@0", "no number@0", "first of two@1", "second of two@1"));
+    host.runUntil(Clock::start + 1h);
+    EXPECT_EQ(notes.back(), "late@2");
+    EXPECT_EQ(host.clock.now(), Clock::start + 1h);
+    EXPECT_EQ(host.queues.pendingCount(), 1u);
+}
+
+TEST_F(SimQueues, RunWorkThatComesUpMeanwhileInTheSameTurn) {
+    main.post([&] {
+        note("outer");
+        main.post(noting("inner"));
+        main.postAfter(5s, noting("delayed"));
+    });
+    host.runFor(10s);
+    EXPECT_THAT(notes, ElementsAre("outer@0", "inner@0", "delayed@5"));
+}
+
+TEST_F(SimQueues, SettingTheWallClockMovesNoTimer) {
+    main.postAfter(10s, noting("timer"));
+    host.clock.set(Clock::start - 24h);
+    host.runFor(9s);
+    EXPECT_THAT(notes, IsEmpty());
+    host.runUntil(Clock::start - 24h + 10s);
+    EXPECT_THAT(notes, ElementsAre("timer@10"));
+}
+
+TEST_F(SimQueues, KeepASerialQueueBusyWhileItsTaskWaits) {
+    auto event = host.queues.makeEvent();
+    auto serial = host.queues.makeSerialQueue("serial");
+    serial->post([&] {
+        note("begins");
+        event->wait();
+        note("ends");
+    });
+    serial->post(noting("next"));
+    main.post(noting("main"));
+    main.postAfter(3s, [&] { event->set(); });
+    host.runFor(2s);
+    EXPECT_THAT(notes, ElementsAre("begins@0", "main@0"));
+    EXPECT_EQ(host.queues.waitingCount(), 1u);
+    host.runFor(1s);
+    EXPECT_THAT(notes, ElementsAre("begins@0", "main@0", "ends@3", "next@3"));
+}
+
+TEST_F(SimQueues, EndWaitsInTheOrderOfTheirEventsNotOfTheirNesting) {
+    auto first = host.queues.makeEvent();
+    auto second = host.queues.makeEvent();
+    worker.post([&] {
+        first->wait();
+        note("first");
+        second->set();
+    });
+    worker.post([&] {
+        second->wait();
+        note("second");
+    });
+    worker.post([&] { first->set(); });
+    host.run();
+    EXPECT_THAT(notes, ElementsAre("first@0", "second@0"));
+}
+
+TEST_F(SimQueues, LimitWaitsInVirtualTime) {
+    auto event = host.queues.makeEvent();
+    auto outcome = [&](Duration limit) {
+        return [this, event, limit] { note(event->waitFor(limit) ? "set" : "late"); };
+    };
+    worker.post(outcome(0s));
+    worker.post(outcome(4s));
+    worker.post(outcome(6s));
+    worker.post(outcome(Duration(std::numeric_limits<double>::infinity())));
+    worker.postAfter(5s, [&] { event->set(); });
+    worker.postAfter(7s, outcome(0s));
+    host.runFor(10s);
+    EXPECT_THAT(notes, ElementsAre("late@0", "late@4", "set@5", "set@5", "set@7"));
+}
+
+TEST_F(SimQueues, RunWhileTheBodyWaitsAndNoLonger) {
+    auto event = host.queues.makeEvent();
+    main.postAfter(5s, [&] { event->set(); });
+    main.postAfter(6s, noting("later"));
+    EXPECT_FALSE(event->waitFor(2s));
+    EXPECT_EQ(host.clock.now(), Clock::start + 2s);
+    event->wait();
+    EXPECT_EQ(host.clock.now(), Clock::start + 5s);
+    EXPECT_THAT(notes, IsEmpty());
+}
+
+TEST_F(SimQueues, ReportAWaitThatNothingCanEnd) {
+    auto event = host.queues.makeEvent();
+    auto serial = host.queues.makeSerialQueue("stuck");
+    serial->post([&] { event->wait(); });
+    serial->post([&] { event->set(); });
+    event->wait();
+    EXPECT_THAT(failures, ElementsAre(AllOf(HasSubstr("nothing is left to set"), HasSubstr("'stuck'"))));
+    host.queues.letWaitingTasksGo();
+}
+
+TEST_F(SimQueues, ReportATaskThatStillWaitsAtTheEndAndFreeWhatItHolds) {
+    auto held = std::make_shared<int>();
+    std::weak_ptr<int> watch = held;
+    auto event = host.queues.makeEvent();
+    worker.post([held = std::move(held), event] {
+        auto alsoHeld = held;
+        event->waitFor(1h);
+        ADD_FAILURE() << "the wait of an abandoned task returned";
+    });
+    host.runFor(1s);
+    host.queues.close();
+    EXPECT_THAT(failures, ElementsAre(HasSubstr("'background' has been waiting since 2026-01-31 12:00:00")));
+    EXPECT_TRUE(watch.expired());
+}
+
+TEST_F(SimQueues, DiscardAtTheEndWhatHasNotBegun) {
+    platform::OnceCallback<int> callback([](int) {});
+    main.post([&, callback = std::move(callback)] { note("never"); });
+    auto repost = std::shared_ptr<void>(nullptr, [this](void*) { main.post(noting("posted by a destructor")); });
+    main.post([repost = std::move(repost)] {});
+    host.queues.close();
+    EXPECT_EQ(host.queues.pendingCount(), 0u);
+    EXPECT_THAT(notes, IsEmpty());
+    EXPECT_THAT(failures, IsEmpty());
+}
+
+TEST_F(SimQueues, ReportWorkThatNeverEnds) {
+    std::function<void()> again = [&] {
+        if (failures.empty()) main.post(again);
+    };
+    main.post(again);
+    host.run();
+    EXPECT_THAT(failures, ElementsAre(HasSubstr("without end")));
+}
+
+TEST_F(SimQueues, ReportATaskThatRunsTheQueuesItself) {
+    main.post([&] { host.run(); });
+    host.run();
+    EXPECT_THAT(failures, ElementsAre("a task on queue 'main' ran the queues"));
+}
+
+TEST_F(SimQueues, NameTheQueueOfTheRunningTask) {
+    std::vector<std::string> labels{host.queues.currentLabel()};
+    Task label = nullptr;
+    auto labelling = [&] { labels.push_back(host.queues.currentLabel()); };
+    main.post(labelling);
+    worker.post(labelling);
+    host.queues.workers(Priority::UserInitiated).post(labelling);
+    host.queues.makeSerialQueue("own")->post(labelling);
+    host.run();
+    EXPECT_THAT(labels, ElementsAre("", "main", "background", "userInitiated", "own"));
+}
+
+TEST_F(SimQueues, ReuseStacksAndLetAThousandTasksWait) {
+    auto event = host.queues.makeEvent();
+    int done = 0;
+    for (int round = 0; round < 2; ++round) {
+        for (int i = 0; i < 1000; ++i)
+            worker.post([&] {
+                volatile char depth[4096] = {};
+                depth[0] = depth[4095];
+                event->waitFor(1s);
+                ++done;
+            });
+        host.runFor(2s);
+    }
+    EXPECT_EQ(done, 2000);
+}
+
+TEST(SimQueuesDeathTest, AnExceptionMustNotLeaveATask) {
+    auto run = [] {
+        Host host;
+        host.queues.mainQueue().post([] { throw std::runtime_error("thrown by a task"); });
+        host.run();
+    };
+    EXPECT_DEATH(run(), "thrown by a task");
+}
+
+}  // namespace
+}  // namespace vrx::sim
