@@ -1,5 +1,6 @@
 #include "platform/number_text.h"
 
+#include <algorithm>
 #include <charconv>
 #include <cmath>
 #include <limits>
@@ -23,6 +24,16 @@ bool beginsWithDigits(std::string_view text) {
     return !text.empty() && text[0] >= '0' && text[0] <= '9';
 }
 
+// Whether the first digit of a number that is not 0 stands behind the decimal point, its exponent counted in.
+bool isBelowOne(std::string_view number) {
+    std::size_t exponentMark = std::min(number.find_first_of("eE"), number.size());
+    std::string_view digits = number.substr(0, exponentMark);
+    auto first = static_cast<std::int64_t>(std::min(digits.find_first_of("123456789"), digits.size()));
+    auto point = static_cast<std::int64_t>(std::min(digits.find('.'), digits.size()));
+    std::int64_t exponent = leadingInteger(number.substr(std::min(exponentMark + 1, number.size())));
+    return exponent < first - point + (first < point ? 1 : 0);
+}
+
 }  // namespace
 
 double leadingDecimal(std::string_view text) {
@@ -33,10 +44,7 @@ double leadingDecimal(std::string_view text) {
     if (error != std::errc::result_out_of_range) return number;
     // from_chars leaves the number alone: too large, or too close to zero.
     std::string_view digits = text.substr(0, static_cast<std::size_t>(end - text.data()));
-    std::size_t exponent = digits.find_first_of("eE");
-    bool tiny =
-        exponent == std::string_view::npos ? digits.find('.') <= 1 : digits.substr(exponent + 1).starts_with('-');
-    double magnitude = tiny ? 0.0 : std::numeric_limits<double>::max();
+    double magnitude = isBelowOne(digits) ? 0.0 : std::numeric_limits<double>::max();
     return digits.starts_with('-') ? -magnitude : magnitude;
 }
 
