@@ -1,0 +1,145 @@
+// Callbacks that are called exactly once, and groups of work.
+#include "platform/task.h"
+
+#include <gmock/gmock.h>
+
+#include <latch>
+#include <stdexcept>
+#include <thread>
+
+#include "platform/completion_group.h"
+
+namespace vrx::platform {
+namespace {
+
+using testing::ElementsAre;
+
+// The once-only rule is checked where assertions are compiled in.
+bool areAssertionsOn() {
+    bool on = false;
+    assert(on = true);
+    return on;
+}
+
+TEST(OnceCallback, TakesMoveOnlyThingsAndIsSpentByItsCall) {
+    int sum = 0;
+    OnceCallback<int> callback([&sum, held = std::make_unique<int>(1)](int number) { sum += *held + number; });
+    OnceCallback<int> moved = std::move(callback);
+    EXPECT_FALSE(callback);  // NOLINT: a callback that was moved away is none
+    moved(2);
+    EXPECT_EQ(sum, 3);
+    EXPECT_FALSE(moved);
+}
+
+TEST(OnceCallback, IsSpentBeforeItRuns) {
+    OnceCallback<> callback;
+    bool wasSpent = false;
+    callback = OnceCallback<>([&] { wasSpent = !callback; });
+    callback();
+    EXPECT_TRUE(wasSpent);
+}
+
+TEST(OnceCallback, MayBeDroppedWhenLetGoAtShutdownOrWhileAnExceptionPasses) {
+    OnceCallback<>([] {}).letGo();
+    {
+        ShutdownScope shutdown;
+        OnceCallback<> dropped([] {});
+    }
+    EXPECT_FALSE(ShutdownScope::isActive());
+    try {
+        OnceCallback<> dropped([] {});
+        throw std::runtime_error("passes");
+    } catch (const std::runtime_error&) {
+    }
+    OnceCallback<> none = nullptr;
+    OnceCallback<> replaced([] {});
+    replaced.letGo();
+    replaced = OnceCallback<>(nullptr);
+}
+
+TEST(OnceCallbackDeathTest, StopsOnASecondCallAndOnOneDroppedUnanswered) {
+    if (!areAssertionsOn()) GTEST_SKIP() << "built without assertions";
+    OnceCallback<> spent([] {});
+    spent();
+    EXPECT_DEATH(spent(), "a second time");
+    EXPECT_DEATH({ OnceCallback<> dropped([] {}); }, "dropped unanswered");
+    EXPECT_DEATH(
+        {
+            OnceCallback<> replaced([] {});
+            replaced = OnceCallback<>([] {});
+        },
+        "dropped unanswered");
+}
+
+// Keeps what is posted until it is told to run it.
+class ManualQueue final : public Queue {
+public:
+    void post(Task task) override { tasks_.push_back(std::move(task)); }
+    void postAfter(Duration, Task task) override { post(std::move(task)); }
+    void run() {
+        for (Task& task : std::exchange(tasks_, {})) task();
+    }
+
+private:
+    std::vector<Task> tasks_;
+};
+
+class CompletionGroupTest : public testing::Test {
+protected:
+    void notify(const char* name) {
+        group.notify(queue, [this, name] { notes.push_back(name); });
+    }
+    std::vector<std::string> notesAfterRun() {
+        queue->run();
+        return std::exchange(notes, {});
+    }
+
+    std::shared_ptr<ManualQueue> queue = std::make_shared<ManualQueue>();
+    std::vector<std::string> notes;
+    CompletionGroup group;
+};
+
+TEST_F(CompletionGroupTest, NotifiesOnTheQueueOnceNothingIsUnderWay) {
+    notify("empty");
+    EXPECT_THAT(notes, ElementsAre()) << "never on the spot";
+    EXPECT_THAT(notesAfterRun(), ElementsAre("empty"));
+
+    group.enter();
+    group.enter();
+    notify("first");
+    group.leave();
+    notify("second");
+    EXPECT_THAT(notesAfterRun(), ElementsAre());
+    group.leave();
+    EXPECT_THAT(notesAfterRun(), ElementsAre("first", "second"));
+
+    group.enter();
+    group.leave();
+    EXPECT_THAT(notesAfterRun(), ElementsAre()) << "notified once only";
+}
+
+TEST_F(CompletionGroupTest, CountsAcrossThreads) {
+    constexpr int count = 4;
+    int finished[count] = {};
+    for (int i = 0; i < count; ++i) group.enter();
+    int seen = 0;
+    group.notify(queue, [&] { seen = finished[0] + finished[1] + finished[2] + finished[3]; });
+    std::latch ready(count);
+    std::vector<std::thread> threads;
+    for (int i = 0; i < count; ++i)
+        threads.emplace_back([&, i] {
+            ready.arrive_and_wait();
+            for (int round = 0; round < 1000; ++round) {
+                group.enter();
+                group.leave();
+            }
+            finished[i] = 1;
+            group.leave();
+        });
+    for (std::thread& thread : threads) thread.join();
+    queue->run();
+    EXPECT_EQ(seen, count);
+}
+
+}  // namespace
+}  // namespace vrx::platform
