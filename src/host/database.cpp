@@ -334,7 +334,6 @@ Error Database::failed(const std::shared_ptr<Opening>& opening, const DatabaseEr
 
 MaybeError Database::transaction(Connection& connection, const std::shared_ptr<Opening>& opening, const char* begin,
                                  const std::function<void(Connection&)>& body) {
-    std::lock_guard lock(connection.mutex_);
     try {
         connection.execute(begin);
         body(connection);
@@ -351,23 +350,25 @@ MaybeError Database::transaction(Connection& connection, const std::shared_ptr<O
 }
 
 MaybeError Database::read(const std::function<void(Connection&)>& body) {
+    std::lock_guard lock(reading_);
     MaybeError error;
     std::shared_ptr<Opening> current = opening(error);
     return current ? transaction(*current->reader, current, "BEGIN", body) : error;
 }
 
 MaybeError Database::write(const std::function<void(Connection&)>& body) {
+    std::lock_guard lock(writing_);
     MaybeError error;
     std::shared_ptr<Opening> current = opening(error);
     return current ? transaction(current->writer, current, "BEGIN IMMEDIATE", body) : error;
 }
 
 MaybeError Database::peek(const std::function<void(Connection&, const Stamp&)>& body) {
+    std::lock_guard lock(reading_);
     MaybeError error;
     std::shared_ptr<Opening> current = opening(error);
     if (!current) return error;
     Connection& reader = *current->reader;
-    std::lock_guard lock(reader.mutex_);
     try {
         body(reader, Stamp{current->number, reader.dataVersion()});
         reader.endStatements();

@@ -82,7 +82,6 @@ private:
     // A statement left within its rows would keep the transaction open.
     void endStatements();
 
-    std::mutex mutex_;
     sqlite3* connection_ = nullptr;
     std::unordered_map<const char*, std::unique_ptr<Statement>> statements_;
 };
@@ -130,6 +129,10 @@ private:
 
     const std::string path_;
     const Schema schema_;
+
+    // One user each of the reading and the writing connection, over all openings; taken before mutex_.
+    std::mutex reading_;
+    std::mutex writing_;
 
     std::mutex mutex_;
     std::shared_ptr<Opening> opening_;
