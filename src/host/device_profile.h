@@ -1,0 +1,86 @@
+// The device profile, device.toml: who this device is, which watches are paired with it, the user's account and
+// language, and what a tester wants different from the bare machine. Every fact can be left out; what is left out is
+// the machine's own. Each read gives what the file says now; a file that cannot be understood is reported once, with
+// its line, and the last good one stays. Any thread may ask.
+#pragma once
+
+#include <map>
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "host/bare_machine.h"
+#include "host/current_copy.h"
+#include "platform/account_store.h"
+#include "platform/device_properties.h"
+#include "platform/locale.h"
+#include "platform/paired_device_registry.h"
+#include "platform/value.h"
+
+namespace vrx::host {
+
+// Executables that a tester has made into a bundle.
+struct ProfileBundle {
+    std::vector<std::string> executables;  // absolute paths
+    std::string identifier;
+    std::optional<std::string> name;
+    std::optional<std::string> vendor;
+    platform::Dictionary entitlements;  // booleans, numbers, texts and lists of texts
+};
+
+// What the file says.
+struct ProfileFacts {
+    std::optional<std::string> serialNumber;
+    std::optional<std::string> name;
+    std::optional<std::string> productType;
+    std::optional<std::string> productVersion;
+    bool isInternal = false;
+    std::map<std::string, std::map<std::string, bool>> featureFlags;  // by domain and flag
+    std::vector<platform::PairedWatch> watches;
+    std::optional<std::string> account;  // of the user who is signed in
+    std::optional<std::string> language;
+    std::optional<std::string> timeZone;
+    std::vector<ProfileBundle> bundles;
+
+    // Whether root or the agent's own user owns the file and nobody else can write it: only then may what it says
+    // about bundles be believed.
+    bool isTrusted = false;
+};
+
+class DeviceProfile final : public platform::DeviceProperties,
+                            public platform::FeatureFlags,
+                            public platform::PairedDeviceRegistry,
+                            public platform::AccountStore,
+                            public platform::Locale {
+public:
+    // An empty path, and a file that is not there, leave the bare machine's facts.
+    explicit DeviceProfile(std::string path, std::string machineRoot = "");
+
+    // The present facts of the file, never null.
+    std::shared_ptr<const ProfileFacts> facts() const { return facts_.get(); }
+    const std::string& path() const { return path_; }
+
+    std::optional<std::string> string(std::string_view key) const override;
+    bool isInternalInstall() const override;
+    bool isEnabled(std::string_view domain, std::string_view flag) const override;
+    std::vector<platform::PairedWatch> watches() const override;
+    std::optional<platform::CloudAccount> primaryCloudAccount() const override;
+    std::string preferredLocaleIdentifier() const override;
+    std::string decimalText(std::uint64_t number) const override;
+
+private:
+    const std::string path_;
+    const BareMachine machine_;
+    const CurrentCopy<ProfileFacts> facts_;
+};
+
+struct ProfileReading {
+    ProfileFacts facts;
+    std::vector<std::string> warnings;  // of keys that mean nothing: "PATH:LINE: …"
+};
+
+// The facts in a document; an error's text begins "PATH:LINE: ".
+platform::Result<ProfileReading> parseProfile(std::string_view document, const std::string& path);
+
+}  // namespace vrx::host
