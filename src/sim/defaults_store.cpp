@@ -1,12 +1,16 @@
 #include "sim/defaults_store.h"
 
+#include <cerrno>
 #include <utility>
 
+#include "codec/property_list.h"
 #include "platform/log.h"
 
 namespace vrx::sim {
 
 using platform::Dictionary;
+using platform::Error;
+using platform::MaybeError;
 using platform::Value;
 
 Value DefaultsStore::get(std::string_view key) const {
@@ -19,12 +23,20 @@ Value DefaultsStore::get(std::string_view key) const {
 void DefaultsStore::set(std::string_view key, Value value) {
     checkOutsideUpdate();
     writes_.emplace_back(key);
+    if (MaybeError error = writeError(value))
+        platform::log(platform::Level::Error, "Cannot write the setting %@: %@", key, *error);
+    else
+        write(key, std::move(value));
+}
+
+MaybeError DefaultsStore::writeError(const Value& value) {
     if (failingWrites_ > 0) {
         --failingWrites_;
-        platform::log(platform::Level::Error, "cannot write default '%@'", key);
-        return;
+        return Error{"system", ENOSPC, "no space left"};
     }
-    write(key, std::move(value));
+    if (value.isNull() || value.isNumber() || value.asString()) return std::nullopt;
+    auto stored = codec::serializePropertyList(value, platform::PropertyListFormat::Binary);
+    return stored ? std::nullopt : MaybeError(stored.error());
 }
 
 void DefaultsStore::write(std::string_view key, Value value) {

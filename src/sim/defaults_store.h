@@ -5,6 +5,7 @@
 #include <vector>
 
 #include "platform/defaults_store.h"
+#include "platform/error.h"
 #include "sim/failures.h"
 
 namespace vrx::sim {
@@ -23,7 +24,7 @@ public:
     // The keys of all writes that were tried, in order, removals included.
     const std::vector<std::string>& writes() const { return writes_; }
 
-    // As many writes fail from now on: each is logged and changes nothing.
+    // As many writes fail from now on, as one does whose value cannot be stored: it is logged and changes nothing.
     void failWrites(int count) { failingWrites_ = count; }
     // Another process writes to the key of the next update() while its function is at work, which makes it begin anew.
     void interfereWithNextUpdate(platform::Value value) { interference_ = std::move(value); }
@@ -31,6 +32,7 @@ public:
     void forgetRegistered() { registered_.clear(); }
 
 private:
+    platform::MaybeError writeError(const platform::Value& value);
     void write(std::string_view key, platform::Value value);
     void checkOutsideUpdate() const;
 

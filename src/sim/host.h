@@ -10,6 +10,7 @@
 // Declare it before whatever uses it. At its end no task may wait any longer; what has not begun is discarded.
 #pragma once
 
+#include "codec/codec.h"
 #include "platform/platform.h"
 #include "sim/bundle_lookup.h"
 #include "sim/clock.h"
@@ -50,6 +51,9 @@ public:
     Queues queues{clock, failures};
     HttpSessions http{clock, queues, files};
     ServiceListenerFactory listener{queues, failures};
+    codec::Json json;
+    codec::PropertyList propertyList;
+    codec::Digest digest;
     platform::Platform platform;
 
 private:

@@ -3,6 +3,7 @@
 
 #include <gmock/gmock.h>
 
+#include "platform/sha256_hash.h"
 #include "platform/value.h"
 #include "sim/host.h"
 
@@ -39,6 +40,13 @@ TEST(Filled, ReplacesPlaceholdersInTurnAndOnlyThose) {
     EXPECT_EQ(filled("%@_%@ %@", {"%@", "b"}), "%@_b %@");
     EXPECT_EQ(filled("none", {"a"}), "none");
     EXPECT_EQ(filled("", {}), "");
+}
+
+TEST(Sha256Hash, IsOfTheTextUpToItsFirstNul) {
+    sim::Host host;
+    EXPECT_EQ(sha256Hash(""), "e3b0c44298fc1c149afbf4c8996fb92427ae41e4649b934ca495991b7852b855");
+    EXPECT_EQ(sha256Hash(std::string_view("abc\0def", 7)),
+              "ba7816bf8f01cfea414140de5dae2223b00361a396177a9cb410ff61f20015ad");
 }
 
 TEST(Log, FillsEachPlaceholderAndRedactsWhatIsPrivate) {
