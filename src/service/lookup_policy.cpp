@@ -59,7 +59,7 @@ bool isFresh(VRXAgentWarrantyProvider& provider, const SerialNumber& serialNumbe
         log(Level::Default, "warranty valid for %.02f seconds", remaining);
         return true;
     }
-    log(Level::Default, "warranty validity expired %.02f seconds ago, refresh it", -remaining);
+    log(Level::Default, "warranty validity expired %.02f seconds ago, refresh it", Duration::zero() - remaining);
     return false;
 }
 

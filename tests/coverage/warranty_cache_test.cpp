@@ -1,0 +1,84 @@
+// The cache of records on disk, and the move from the older single-device layout.
+#include <gtest/gtest.h>
+
+#include <cerrno>
+
+#include "coverage/cache_metadata.h"
+#include "coverage/warranty.h"
+#include "sim/host.h"
+
+namespace vrx {
+namespace {
+
+using platform::dateFromEpoch;
+using platform::Dictionary;
+using platform::Value;
+
+class WarrantyCacheTest : public testing::Test {
+protected:
+    std::string pathOf(const std::string& serialNumber) const {
+        return host.files.homeDirectory() + "/Library/Application Support/com.orvane.Vireo/" +
+               platform::sha256Hash(serialNumber) + "_Warranty.plist";
+    }
+    static std::shared_ptr<VRXWarranty> record(Dictionary dictionary) {
+        return VRXWarranty::warrantyWithDictionary(std::move(dictionary));
+    }
+    sim::Host host;
+};
+
+TEST_F(WarrantyCacheTest, KeepsOneFileForEachSerialNumber) {
+    record({{"covered", true}})->cacheWarranty("A");
+    auto second = record({{"covered", false}, {"text", std::string("nul \0 inside", 12)}});
+    second->cacheWarranty("A");
+    EXPECT_EQ(host.files.paths(), std::vector{pathOf("A")});
+    auto cached = VRXWarranty::cachedWarrantyForSerialNumber("A");
+    ASSERT_TRUE(cached);
+    EXPECT_TRUE(cached->isEqual(second.get()));
+    EXPECT_FALSE(VRXWarranty::cachedWarrantyForSerialNumber("B"));
+    EXPECT_FALSE(VRXWarranty::cachedWarrantyForSerialNumber(std::nullopt));
+
+    second->cache();
+    EXPECT_TRUE(VRXWarranty::cachedWarrantyForSerialNumber(std::nullopt));
+    EXPECT_EQ(host.files.paths().size(), 2u);
+}
+
+TEST_F(WarrantyCacheTest, WhatCannotBeWrittenLeavesTheEarlierFile) {
+    auto first = record({{"covered", true}});
+    first->cacheWarranty("A");
+    record({{"covered", false}, {"kelURL", nullptr}})->cacheWarranty("A");
+    EXPECT_TRUE(VRXWarranty::cachedWarrantyForSerialNumber("A")->isEqual(first.get()));
+    host.files.fail(sim::Files::Operation::Replace, ENOSPC);
+    record({{"covered", false}})->cacheWarranty("A");
+    EXPECT_TRUE(VRXWarranty::cachedWarrantyForSerialNumber("A")->isEqual(first.get()));
+}
+
+TEST_F(WarrantyCacheTest, AFileCutAnywhereIsNoRecord) {
+    record({{"covered", true}, {"texts", platform::Array{"a", "b"}}})->cacheWarranty("A");
+    std::string whole = *host.files.content(pathOf("A"));
+    for (std::size_t length = 0; length < whole.size(); ++length) {
+        host.files.put(pathOf("A"), whole.substr(0, length));
+        ASSERT_FALSE(VRXWarranty::cachedWarrantyForSerialNumber("A")) << length;
+    }
+}
+
+TEST_F(WarrantyCacheTest, MigratesTheOlderLayout) {
+    EXPECT_FALSE(VRXWarranty::migrateLegacyCachedWarrantyIfNeededForSerialNumber("A"));
+    EXPECT_FALSE(host.log.contains("Migrating legacy warranty.."));
+
+    auto legacy = record({{"covered", true}});
+    legacy->cache();
+    host.defaults.set("CachedWarrantyLastUpdatedDate", dateFromEpoch(1700000000));
+    host.defaults.set("CachedWarrantyLocale", "en_US");
+    EXPECT_FALSE(VRXWarranty::migrateLegacyCachedWarrantyIfNeededForSerialNumber(std::nullopt));
+
+    auto moved = VRXWarranty::migrateLegacyCachedWarrantyIfNeededForSerialNumber("A");
+    ASSERT_TRUE(moved);
+    EXPECT_TRUE(moved->isEqual(legacy.get()));
+    EXPECT_EQ(host.files.paths(), std::vector{pathOf("A")});
+    EXPECT_EQ(host.defaults.dictionaryRepresentation(),
+              (Dictionary{{cacheMetadataKey("A", cachedWarrantyLastUpdatedDateKey), dateFromEpoch(1700000000)},
+                          {cacheMetadataKey("A", cachedWarrantyLocaleKey), "en_US"}}));
+}
+
+}  // namespace
+}  // namespace vrx

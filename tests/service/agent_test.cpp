@@ -1,0 +1,198 @@
+// The requests of clients, on an agent with its default providers, and the check of who may make them.
+#include "service/agent.h"
+
+#include <gtest/gtest.h>
+
+#include "coverage/warranty.h"
+#include "devices/device_info.h"
+#include "service/register_defaults.h"
+#include "service/start_up.h"
+#include "sim/host.h"
+
+namespace vrx {
+namespace {
+
+using platform::dateFromEpoch;
+using platform::Dictionary;
+using platform::Value;
+
+// Writes down what was asked of the follow-ups.
+class RecordingFollowUps final : public VRXFollowUpManaging {
+public:
+    explicit RecordingFollowUps(std::vector<std::string>& asked) : asked_(asked) {}
+    DeviceInfoList refreshFollowupWithDeviceInfos(const DeviceInfoList& infos) override {
+        asked_.push_back("refresh " + std::to_string(infos.size()));
+        return infos;
+    }
+    DeviceInfoList refreshFollowupWithDeviceInfo(const std::shared_ptr<VRXDeviceInfo>& info,
+                                                 bool allowForcePost) override {
+        asked_.push_back("refresh " + info->device()->serialNumber().value_or("-") + (allowForcePost ? " forced" : ""));
+        return {};
+    }
+    void dismissFollowUpForSerialNumber(const std::string& serialNumber) override {
+        asked_.push_back("dismiss " + serialNumber);
+    }
+    void migrateLegacyFollowUpIfNeededWithDeviceInfo(const std::shared_ptr<VRXDeviceInfo>&) override {}
+
+private:
+    std::vector<std::string>& asked_;
+};
+
+class AgentTest : public testing::Test {
+protected:
+    AgentTest() {
+        vrx_registerDefaults(host.defaults);
+        host.device.strings["SerialNumber"] = "PHONE";
+        host.flags.enabled = {{"Vireo", "Meridian_3_0"}};
+        host.watches.all = {{"Watch", {}, "WATCH", dateFromEpoch(5), true, false}};
+        host.defaults.set("WarrantyURL", "file:///data/Warranty.plist");
+        auto data =
+            host.propertyList.serialize(Dictionary{{"covered", true}}, platform::PropertyListFormat::Xml).value();
+        host.files.put("/data/Warranty.plist", std::string(data.begin(), data.end()));
+    }
+    std::shared_ptr<VRXAgent> makeAgent() {
+        AgentCollaborators collaborators;
+        collaborators.makeFollowUp = [this] { return std::make_shared<RecordingFollowUps>(followUps); };
+        return VRXAgent::initWithCallingProcessBundleID("com.example.client", collaborators);
+    }
+    // Runs everything that is due and gives what was replied, which must be one reply.
+    template <class T, class Ask>
+    T replyOf(Ask ask) {
+        std::optional<T> result;
+        ask(platform::OnceCallback<T>([&result](T answer) { result = std::move(answer); }));
+        host.runFor(platform::Duration(120));
+        EXPECT_TRUE(result) << "no reply";
+        return result ? *result : T();
+    }
+    std::shared_ptr<VRXDeviceInfo> info(const std::string& serialNumber, VRXWarrantyLookupPolicy policy) {
+        return replyOf<std::shared_ptr<VRXDeviceInfo>>(
+            [&](auto reply) { agent->getDeviceInfoForSerialNumber(serialNumber, policy, std::move(reply)); });
+    }
+
+    sim::Host host;
+    std::vector<std::string> followUps;
+    std::shared_ptr<VRXAgent> agent = makeAgent();
+};
+
+TEST_F(AgentTest, GivesThisDeviceWithItsRecord) {
+    auto ask = [this](VRXWarrantyLookupPolicy policy) {
+        return replyOf<std::shared_ptr<VRXDeviceInfo>>(
+            [&](auto reply) { agent->getDefaultDeviceInfoUsingPolicy(policy, std::move(reply)); });
+    };
+    auto cachedOnly = ask(VRXWarrantyLookupPolicyCachedOnly);
+    EXPECT_EQ(cachedOnly->device()->serialNumber(), "PHONE");
+    EXPECT_FALSE(cachedOnly->warranty());
+    EXPECT_TRUE(ask(VRXWarrantyLookupPolicyDefault)->warranty()->covered());
+    host.files.remove("/data/Warranty.plist");
+    EXPECT_TRUE(ask(VRXWarrantyLookupPolicyDefault)->warranty()) << "fresh in the cache";
+    EXPECT_FALSE(ask(VRXWarrantyLookupPolicyRefresh)->warranty());
+    EXPECT_EQ(followUps, std::vector<std::string>(4, "refresh PHONE"));
+}
+
+TEST_F(AgentTest, GivesAnyDeviceBySerialNumber) {
+    EXPECT_EQ(info("WATCH", 2)->device()->name(), "Watch");
+    auto unknown = info("STRANGER", 0);
+    EXPECT_EQ(unknown->device()->description(), "<unknown> (STRANGER) ((null)) - Other");
+    EXPECT_TRUE(unknown->warranty());
+
+    host.defaults.set("PairedBluetoothDevicesSerialNumbers", Dictionary{{"A", "NEVER"}, {"B", "WATCH"}});
+    host.defaults.set("PairedWatchesSerialNumbers", Dictionary{{"A", "PHONE"}, {"B", 5}});
+    EXPECT_EQ(info("A", 1)->device()->serialNumber(), "PHONE");
+    EXPECT_EQ(info("B", 1)->device()->serialNumber(), "WATCH");
+    EXPECT_EQ(host.log.lastMessage("Override Serial Number: %@ found for SN: %@"),
+              "Override Serial Number: WATCH found for SN: B");
+}
+
+TEST_F(AgentTest, GivesAllDevicesOnThePolicyQueue) {
+    auto ask = [this](bool updateFollowUps) {
+        return replyOf<DeviceInfoList>(
+            [&](auto reply) { agent->getAllDeviceInfosUsingPolicy(2, updateFollowUps, std::move(reply)); });
+    };
+    EXPECT_EQ(ask(false).size(), 2u);
+    EXPECT_TRUE(followUps.empty());
+    auto infos = ask(true);
+    EXPECT_EQ(infos.size(), 2u);
+    for (const auto& deviceInfo : infos) EXPECT_TRUE(deviceInfo->warranty());
+    EXPECT_EQ(followUps, std::vector<std::string>{"refresh 2"});
+
+    // Even when nothing has to be downloaded the reply comes later, from the queue.
+    bool replied = false;
+    agent->getAllDeviceInfosUsingPolicy(1, false, [&](DeviceInfoList) { replied = true; });
+    EXPECT_FALSE(replied);
+    host.run();
+    EXPECT_TRUE(replied);
+}
+
+TEST_F(AgentTest, OverlappingAllDevicesRequestsOfOneAgentEndTogether) {
+    host.http.answer("https://cdn.example/slow", sim::HttpAnswer::failure().after(platform::Duration(10)));
+    host.defaults.set("ServerVersionURL", "https://cdn.example/slow");
+    std::vector<std::string> replies;
+    auto ask = [&](std::shared_ptr<VRXAgent> asked, VRXWarrantyLookupPolicy policy, const char* name) {
+        asked->getAllDeviceInfosUsingPolicy(policy, false,
+                                            [&replies, name](DeviceInfoList) { replies.push_back(name); });
+    };
+    auto other = makeAgent();
+    ask(agent, 2, "refresh");
+    ask(agent, 1, "cached");
+    ask(other, 1, "other agent");
+    host.run();
+    EXPECT_EQ(replies, std::vector<std::string>{"other agent"});
+    host.runFor(platform::Duration(30));
+    EXPECT_EQ(replies, (std::vector<std::string>{"other agent", "refresh", "cached"}));
+}
+
+TEST_F(AgentTest, APendingReplyKeepsTheAgentAlive) {
+    std::weak_ptr<VRXAgent> watched = agent;
+    std::size_t count = 0;
+    agent->getAllDeviceInfosUsingPolicy(2, false, [&](DeviceInfoList infos) { count = infos.size(); });
+    agent.reset();
+    EXPECT_FALSE(watched.expired());
+    host.runFor(platform::Duration(120));
+    EXPECT_EQ(count, 2u);
+    EXPECT_TRUE(watched.expired());
+}
+
+TEST_F(AgentTest, AnswersTheSmallRequests) {
+    EXPECT_EQ(replyOf<DeviceList>([&](auto reply) { agent->pairedDevices(std::move(reply)); }).size(), 1u);
+    host.flags.enabled.clear();
+    EXPECT_TRUE(replyOf<DeviceList>([&](auto reply) { agent->pairedDevices(std::move(reply)); }).empty());
+    EXPECT_TRUE(replyOf<bool>([&](auto reply) { agent->dismissFollowUpForSerialNumber("WATCH", std::move(reply)); }));
+    EXPECT_EQ(followUps, std::vector<std::string>{"dismiss WATCH"});
+
+    auto override = [this] {
+        return replyOf<std::optional<std::string>>([&](auto reply) { agent->readWebURLOverride(std::move(reply)); });
+    };
+    host.defaults.set("WebFlowURL", "https://flow.example/");
+    EXPECT_EQ(override(), std::nullopt);
+    host.device.isInternal = true;
+    EXPECT_EQ(override(), "https://flow.example/");
+    agent->readWebURLOverride(nullptr);
+}
+
+TEST_F(AgentTest, OnlyEntitledCallersAreServed) {
+    StartUp startUp;
+    EXPECT_EQ(host.listener.serviceName(), "com.orvane.vrxagent");
+    const std::string entitlement = "com.orvane.private.vrxagent";
+    for (const Value& held : {Value(), Value(false), Value("true"), Value(1), Value(Dictionary{})}) {
+        host.log.clear();
+        EXPECT_FALSE(host.listener.connect(7, {{entitlement, held}})) << held.description();
+        EXPECT_EQ(
+            host.log.messages(platform::Level::Error),
+            std::vector<std::string>{"Rejecting connection to vrxagent: missing entitlement '" + entitlement + "'"});
+    }
+
+    host.bundles.addApplication(7, "com.example.client");
+    auto first = host.listener.connect(7, {{entitlement, true}});
+    auto second = host.listener.connect(8, {{entitlement, true}});
+    ASSERT_TRUE(first && first->isServing() && second && second->isServing());
+    EXPECT_NE(first->object(), second->object());
+    EXPECT_EQ(host.log.lastMessage("connection added from %d with calling process: %@"),
+              "connection added from 8 with calling process: (null)");
+    EXPECT_EQ(host.log.count("%s: callingProcessBundleID is nil. Falling back to Preferences Bundle ID"), 1);
+    EXPECT_EQ(
+        host.log.lastMessage("%s: callingProcess=%@"),
+        "-[VRXAgentDefaultWarrantyProvider initWithCallingProcessBundleID:]: callingProcess=com.orvane.Preferences");
+}
+
+}  // namespace
+}  // namespace vrx
