@@ -6,18 +6,25 @@
 #include <string_view>
 
 #include "platform/sha256_hash.h"
+#include "platform/text.h"
 
 namespace vrx {
 
-inline constexpr std::string_view cachedWarrantyLastUpdatedDateKey = "CachedWarrantyLastUpdatedDate";
-inline constexpr std::string_view cachedWarrantyLocaleKey = "CachedWarrantyLocale";
-inline constexpr std::string_view cachedWarrantyVersionKey = "CachedWarrantyVersion";
+// Keys with a "%@" for the hash.
+inline constexpr std::string_view cachedWarrantyLastUpdatedDateKey = "%@_CachedWarrantyLastUpdatedDate";
+inline constexpr std::string_view cachedWarrantyLocaleKey = "%@_CachedWarrantyLocale";
+inline constexpr std::string_view cachedWarrantyVersionKey = "%@_CachedWarrantyVersion";
 
 // The format that is written, and the only one that is read.
 inline constexpr std::string_view currentCacheVersion = "2";
 
 inline std::string cacheMetadataKey(std::string_view serialNumber, std::string_view key) {
-    return platform::sha256Hash(serialNumber).append("_").append(key);
+    return platform::filled(key, {platform::sha256Hash(serialNumber)});
+}
+
+// The key of the older single-device layout, which named no device.
+constexpr std::string_view legacyCacheMetadataKey(std::string_view key) {
+    return key.substr(std::string_view("%@_").size());
 }
 
 }  // namespace vrx

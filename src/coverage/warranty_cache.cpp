@@ -90,7 +90,7 @@ std::shared_ptr<VRXWarranty> VRXWarranty::migrateLegacyCachedWarrantyIfNeededFor
     warranty->cacheWarranty(serialNumber);
     DefaultsStore& defaults = Platform::current().defaultsStore();
     for (std::string_view key : {cachedWarrantyLastUpdatedDateKey, cachedWarrantyLocaleKey, cachedWarrantyVersionKey})
-        moveDefault(defaults, key, cacheMetadataKey(*serialNumber, key));
+        moveDefault(defaults, legacyCacheMetadataKey(key), cacheMetadataKey(*serialNumber, key));
     Platform::current().files().remove(_legacyWarrantyPath());
     return warranty;
 }
