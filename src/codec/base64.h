@@ -1,0 +1,17 @@
+// Bytes as base64 text, with padding. Any thread may call.
+#pragma once
+
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "platform/value.h"
+
+namespace vrx::codec {
+
+std::string base64FromData(const platform::Data& data);
+// White space between the characters counts for nothing. Nothing for another character, or where characters are
+// missing.
+std::optional<platform::Data> dataFromBase64(std::string_view text);
+
+}  // namespace vrx::codec

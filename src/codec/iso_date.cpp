@@ -1,0 +1,46 @@
+#include "codec/iso_date.h"
+
+#include <algorithm>
+#include <chrono>
+#include <cmath>
+#include <cstdio>
+
+namespace vrx::codec {
+
+using namespace std::chrono;
+
+std::optional<std::string> isoTextFromDate(platform::Date date) {
+    constexpr double yearOne = -62135596800.0;
+    constexpr double year10000 = 253402300800.0;
+    const double epoch = std::floor(platform::epochSeconds(date));
+    if (!(epoch >= yearOne && epoch < year10000)) return std::nullopt;
+
+    const sys_seconds instant(seconds(static_cast<std::int64_t>(epoch)));
+    const auto day = floor<days>(instant);
+    const year_month_day calendar(day);
+    const hh_mm_ss time(instant - day);
+    char text[64];
+    std::snprintf(text, sizeof text, "%04d-%02u-%02uT%02d:%02d:%02dZ", static_cast<int>(calendar.year()),
+                  static_cast<unsigned>(calendar.month()), static_cast<unsigned>(calendar.day()),
+                  static_cast<int>(time.hours().count()), static_cast<int>(time.minutes().count()),
+                  static_cast<int>(time.seconds().count()));
+    return text;
+}
+
+std::optional<platform::Date> dateFromIsoText(std::string_view text) {
+    constexpr std::string_view form = "0000-00-00T00:00:00Z";
+    auto fits = [](char c, char inForm) { return inForm == '0' ? c >= '0' && c <= '9' : c == inForm; };
+    if (!std::ranges::equal(text, form, fits)) return std::nullopt;
+    auto number = [&](std::size_t begin, std::size_t length) {
+        int result = 0;
+        for (char c : text.substr(begin, length)) result = result * 10 + (c - '0');
+        return result;
+    };
+    const year_month_day calendar(year(number(0, 4)), month(static_cast<unsigned>(number(5, 2))),
+                                  day(static_cast<unsigned>(number(8, 2))));
+    const int hour = number(11, 2), minute = number(14, 2), second = number(17, 2);
+    if (!calendar.ok() || number(0, 4) == 0 || hour > 23 || minute > 59 || second > 59) return std::nullopt;
+    return platform::Date(sys_seconds(sys_days(calendar)) + hours(hour) + minutes(minute) + seconds(second));
+}
+
+}  // namespace vrx::codec

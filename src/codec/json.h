@@ -1,0 +1,25 @@
+// JSON documents as values. Any thread may call.
+#pragma once
+
+#include <string>
+#include <string_view>
+
+#include "platform/error.h"
+#include "platform/value.h"
+
+namespace vrx::codec {
+
+// Strict: UTF-8 throughout, no comments, nothing after the root. Integers beyond int64 become doubles, numbers beyond
+// double are errors, and of members with the same name the last counts. The error's text gives the byte at which
+// reading ended, and quotes nothing of the document.
+platform::Result<platform::Value> parseJson(std::string_view document);
+
+// Compact. Fails for what JSON does not have: dates, data, numbers that are not finite, text that is not UTF-8.
+platform::Result<std::string> serializeJson(const platform::Value& root);
+
+// The JSON that programs print, which every value has: dates are ISO 8601 text, data is base64 text, a number that is
+// not finite is null, and what is no UTF-8 in a text is replaced. Without a line break at its end; OneLine has none.
+enum class JsonLayout { OneLine, Indented };
+std::string printedJson(const platform::Value& root, JsonLayout layout);
+
+}  // namespace vrx::codec

@@ -1,0 +1,61 @@
+#include "codec/number_format.h"
+
+#include <unicode/unum.h>
+
+#include <memory>
+#include <string_view>
+
+#include "codec/unicode.h"
+
+namespace vrx::codec {
+
+namespace {
+
+constexpr const char* commonStyle = "root";
+
+std::string languageOf(const char* locale) {
+    char language[ULOC_LANG_CAPACITY] = "";
+    UErrorCode status = U_ZERO_ERROR;
+    uloc_getLanguage(locale, language, sizeof language, &status);
+    return U_SUCCESS(status) ? language : "";
+}
+
+struct CloseFormat {
+    void operator()(void* format) const { unum_close(static_cast<UNumberFormat*>(format)); }
+};
+using Format = std::unique_ptr<void, CloseFormat>;
+
+Format openFormat(const char* locale) {
+    UErrorCode status = U_ZERO_ERROR;
+    Format format(unum_open(UNUM_DECIMAL, nullptr, 0, locale, nullptr, &status));
+    return U_SUCCESS(status) ? std::move(format) : nullptr;
+}
+
+// For a language it does not know, the library turns to that of the process's environment, and does not say so. It may
+// also answer with the present name of a language that was asked for by an old one.
+bool isOfEnvironment(const Format& format, const std::string& locale) {
+    UErrorCode status = U_ZERO_ERROR;
+    const char* valid = unum_getLocaleByType(static_cast<UNumberFormat*>(format.get()), ULOC_VALID_LOCALE, &status);
+    if (U_FAILURE(status) || !valid) return false;
+    const std::string language = languageOf(valid);
+    return language != languageOf(locale.c_str()) && language == languageOf(uloc_getDefault());
+}
+
+}  // namespace
+
+std::string decimalText(std::uint64_t number, const std::string& locale) {
+    const std::string digits = std::to_string(number);
+    Format format = openFormat(locale.empty() ? commonStyle : locale.c_str());
+    if (format && isOfEnvironment(format, locale)) format = openFormat(commonStyle);
+    if (!format) return digits;
+
+    char16_t units[128];  // 20 digits, in some scripts two units each, and separators
+    UErrorCode status = U_ZERO_ERROR;
+    const std::int32_t length =
+        unum_formatDecimal(static_cast<UNumberFormat*>(format.get()), digits.data(),
+                           static_cast<std::int32_t>(digits.size()), units, 128, nullptr, &status);
+    if (U_FAILURE(status)) return digits;
+    return utf8FromUtf16({units, static_cast<std::size_t>(length)}).value_or(digits);
+}
+
+}  // namespace vrx::codec

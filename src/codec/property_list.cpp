@@ -1,0 +1,27 @@
+#include "codec/property_list.h"
+
+#include "codec/binary_property_list.h"
+#include "codec/property_list_error.h"
+#include "codec/xml_property_list.h"
+#include "platform/limits.h"
+
+namespace vrx::codec {
+
+using platform::Data;
+using platform::Result;
+using platform::Value;
+
+Result<Value> parsePropertyList(const Data& document) {
+    if (document.size() > platform::limits::documentBytes)
+        return invalidPropertyList("byte " + std::to_string(platform::limits::documentBytes), "document too large");
+    return isBinaryPropertyList(document) ? parseBinaryPropertyList(document) : parseXmlPropertyList(document);
+}
+
+Result<Data> serializePropertyList(const Value& root, platform::PropertyListFormat format) {
+    if (platform::nestingDepth(root, platform::limits::documentDepth) > platform::limits::documentDepth)
+        return unwritablePropertyList("containers nested so deeply");
+    return format == platform::PropertyListFormat::Binary ? serializeBinaryPropertyList(root)
+                                                          : serializeXmlPropertyList(root);
+}
+
+}  // namespace vrx::codec

@@ -1,0 +1,21 @@
+// Property-list documents as values, in both forms: XML, and the binary one, "bplist00". Any thread may call.
+#pragma once
+
+#include "platform/error.h"
+#include "platform/property_list.h"
+#include "platform/value.h"
+
+namespace vrx::codec {
+
+// Reads either form. Unsigned integers beyond int64 become doubles, and of entries with the same key the last counts.
+// The error's text gives line and column in XML, the byte in the binary form. Memory stays within a small multiple of
+// the document, whatever it declares: contents that objects share or overlap count wherever they are used.
+platform::Result<platform::Value> parsePropertyList(const platform::Data& document);
+
+// Fails for what a property list cannot hold: a null anywhere, text that is not UTF-8, a date that is not finite, and
+// what is nested deeper than it may be to be read again. XML cannot hold control characters nor the years outside of 1
+// to 9999, and drops a date's fraction of a second.
+platform::Result<platform::Data> serializePropertyList(const platform::Value& root,
+                                                       platform::PropertyListFormat format);
+
+}  // namespace vrx::codec

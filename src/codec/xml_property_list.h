@@ -1,0 +1,12 @@
+// The XML form of property lists; what both forms have in common is in property_list.h. Any thread may call.
+#pragma once
+
+#include "platform/error.h"
+#include "platform/value.h"
+
+namespace vrx::codec {
+
+platform::Result<platform::Value> parseXmlPropertyList(const platform::Data& document);
+platform::Result<platform::Data> serializeXmlPropertyList(const platform::Value& root);
+
+}  // namespace vrx::codec
