@@ -151,6 +151,7 @@ Connection::Connection(const std::string& path) {
     try {
         check(result, connection_);
         sqlite3_extended_result_codes(connection_, 1);
+        keepLogAtClose(true);
         sqlite3_busy_timeout(connection_, busyMilliseconds);
         execute("PRAGMA synchronous = FULL");
     } catch (...) {
@@ -162,6 +163,10 @@ Connection::Connection(const std::string& path) {
 Connection::~Connection() {
     statements_.clear();
     sqlite3_close(connection_);
+}
+
+void Connection::keepLogAtClose(bool keep) {
+    sqlite3_db_config(connection_, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, keep ? 1 : 0, nullptr);
 }
 
 void Connection::execute(const char* sql) {
@@ -196,30 +201,24 @@ std::int64_t Connection::dataVersion() {
 
 // The connections of one opening. Reading has one of its own, so that it does not wait while a write waits.
 struct Database::Opening {
-    explicit Opening(const std::string& path) : path(path), writer(path) {
-        // A damaged database is set aside as it is: until it has passed, closing it must not write to it.
-        keepLogAtClose(writer, true);
-    }
+    explicit Opening(const std::string& path) : path(path), writer(path) {}
 
     ~Opening() {
         // Closing the last connection takes the -wal file away by its name, which is not ours any more when another
         // database has come to stand there.
         if (FileIdentity::of(path) == file) return;
-        keepLogAtClose(writer, true);
-        if (reader) keepLogAtClose(*reader, true);
+        writer.keepLogAtClose(true);
+        if (reader) reader->keepLogAtClose(true);
     }
 
+    // The database is sound: it is opened for reading, too, and is tidied up when it is closed.
     void passed() {
         reader.emplace(path);
         reader->dataVersion();  // opens the files
-        keepLogAtClose(writer, false);
+        for (Connection* connection : {&writer, &*reader}) connection->keepLogAtClose(false);
         file = FileIdentity::of(path);
         wal = FileIdentity::of(path + "-wal");
         shm = FileIdentity::of(path + "-shm");
-    }
-
-    static void keepLogAtClose(Connection& connection, bool keep) {
-        sqlite3_db_config(connection.connection_, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, keep ? 1 : 0, nullptr);
     }
 
     const std::string path;

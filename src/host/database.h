@@ -79,6 +79,9 @@ public:
 private:
     friend class Database;
 
+    // Whether closing leaves the files as they are, as it does at first: a damaged database is to be set aside
+    // untouched.
+    void keepLogAtClose(bool keep);
     // A statement left within its rows would keep the transaction open.
     void endStatements();
 

@@ -1,0 +1,16 @@
+// Offsets of time zones, by their names in the time-zone database. Any thread may call.
+#pragma once
+
+#include <chrono>
+#include <optional>
+#include <string>
+
+#include "platform/date.h"
+
+namespace vrx::codec {
+
+// How far the local time of a zone such as "Europe/Berlin" is ahead of GMT at the date; nothing for a name that is no
+// zone's.
+std::optional<std::chrono::seconds> timeZoneOffset(const std::string& zone, platform::Date at);
+
+}  // namespace vrx::codec

@@ -1,0 +1,60 @@
+#include "host/host.h"
+
+namespace vrx::host {
+
+using platform::MaybeError;
+using platform::Platform;
+
+Host::Host(const HostLocations& locations, platform::Level lowestLevel)
+    : home_(locations.home),
+      log_(lowestLevel),
+      facilities_{.systemLog = &log_},
+      platform_(facilities_),
+      current_(platform_),
+      queues_(mainLoop_),
+      files_(home_),
+      database_(home_ + "/host.db"),
+      defaults_(database_),
+      profile_(locations.profile),
+      clock_(profile_),
+      http_(queues_.workers(platform::Priority::UserInitiated)) {
+    facilities_.accountStore = &profile_;
+    facilities_.clock = &clock_;
+    facilities_.defaultsStore = &defaults_;
+    facilities_.deviceProperties = &profile_;
+    facilities_.digest = &digest_;
+    facilities_.featureFlags = &profile_;
+    facilities_.files = &files_;
+    facilities_.httpSessions = &http_;
+    facilities_.json = &json_;
+    facilities_.locale = &profile_;
+    facilities_.pairedDeviceRegistry = &profile_;
+    facilities_.propertyList = &propertyList_;
+    facilities_.queues = &queues_;
+    platform_ = Platform(facilities_);
+}
+
+// Tasks may use any facility to their end, and the current platform too: they end first.
+Host::~Host() {
+    http_.stop();
+    queues_.stop();
+}
+
+MaybeError Host::open(HomeUse use) {
+    if (MaybeError error = createDirectories(home_)) return error;
+    if (use == HomeUse::Agent)
+        if (MaybeError error = lock_.take(home_)) return error;
+    return database_.open();
+}
+
+void Host::setServiceListenerFactory(platform::ServiceListenerFactory* factory) {
+    facilities_.serviceListenerFactory = factory;
+    platform_ = Platform(facilities_);
+}
+
+void Host::setBundleLookup(platform::BundleLookup* lookup) {
+    facilities_.bundleLookup = lookup;
+    platform_ = Platform(facilities_);
+}
+
+}  // namespace vrx::host

@@ -1,0 +1,48 @@
+#include "host/host.h"
+
+#include <gmock/gmock.h>
+
+#include <future>
+
+#include "support.h"
+
+namespace vrx::host {
+namespace {
+
+using namespace std::chrono_literals;
+using platform::Platform;
+using ::testing::HasSubstr;
+
+TEST(Host, IsTheCurrentPlatformAndHasItsHomeToItself) {
+    TemporaryFolder folder;
+    const HostLocations locations{folder / "state/home", folder / "device.toml"};
+    writeFile(locations.profile, "[locale]\ntime_zone = 'Asia/Kolkata'\nlanguage = 'de'\n");
+    {
+        Host agent(locations, platform::Level::Error);
+        ASSERT_FALSE(agent.open(HomeUse::Agent));
+        Platform& platform = Platform::current();
+        EXPECT_EQ(platform.files().homeDirectory(), locations.home);
+        EXPECT_EQ(platform.clock().timeZoneOffset(), 5h + 30min);
+        writeFile(locations.profile, "[locale]\ntime_zone = 'America/Lima'\n");
+        EXPECT_EQ(platform.clock().timeZoneOffset(), -5h);
+        platform.defaultsStore().set("key", 1);
+        // Work that still runs at the end has the platform to the last.
+        std::promise<void> begun;
+        platform.queues().workers(platform::Priority::Background).post([&] {
+            begun.set_value();
+            for (int i = 0; i < 20; ++i) Platform::current().defaultsStore().set("key", i);
+        });
+        begun.get_future().wait();
+
+        EXPECT_THAT(Host(locations).open(HomeUse::Agent)->text, HasSubstr("another agent"));
+        EXPECT_FALSE(Host(locations).open(HomeUse::Tool));
+        EXPECT_EQ(&Platform::current(), &platform);
+    }
+    EXPECT_FALSE(Platform::hasCurrent());
+    Host next(locations);
+    ASSERT_FALSE(next.open(HomeUse::Agent));
+    EXPECT_EQ(Platform::current().defaultsStore().integer("key"), 19);
+}
+
+}  // namespace
+}  // namespace vrx::host
