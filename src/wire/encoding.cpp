@@ -6,6 +6,8 @@
 #include <string>
 #include <utility>
 
+#include "codec/unicode.h"
+
 namespace vrx::wire {
 
 using platform::Array;
@@ -57,6 +59,10 @@ std::optional<std::string> unescapedKey(std::string_view escaped) {
     }
     if (isCarriedAsString(key)) return std::nullopt;  // each key has one form only
     return key;
+}
+
+constexpr bool isNoCharacter(char32_t codePoint) {
+    return (codePoint >= 0xfdd0 && codePoint <= 0xfdef) || (codePoint & 0xfffe) == 0xfffe;
 }
 
 bool isLeftOut(const Value& value) {
@@ -297,29 +303,6 @@ private:
     std::size_t values_ = 0;
 };
 
-// The length of the well-formed UTF-8 sequence that begins here and that D-Bus carries; 0 when there is none.
-std::size_t sequenceLength(std::string_view bytes) {
-    auto at = [&](std::size_t i) -> std::uint32_t { return static_cast<unsigned char>(bytes[i]); };
-    const std::uint32_t lead = at(0);
-    const std::size_t length = lead < 0x80   ? 1
-                               : lead < 0xc2 ? 0
-                               : lead < 0xe0 ? 2
-                               : lead < 0xf0 ? 3
-                               : lead < 0xf5 ? 4
-                                             : 0;
-    if (length == 0 || length > bytes.size()) return 0;
-    if (length == 1) return lead != 0 ? 1 : 0;
-    std::uint32_t codePoint = lead & (0x7fu >> length);
-    for (std::size_t i = 1; i < length; ++i) {
-        if ((at(i) & 0xc0) != 0x80) return 0;
-        codePoint = codePoint << 6 | (at(i) & 0x3f);
-    }
-    constexpr std::uint32_t smallest[] = {0, 0, 0x80, 0x800, 0x10000};
-    const bool isSurrogate = codePoint >= 0xd800 && codePoint <= 0xdfff;
-    const bool isNoCharacter = (codePoint >= 0xfdd0 && codePoint <= 0xfdef) || (codePoint & 0xfffe) == 0xfffe;
-    return codePoint >= smallest[length] && codePoint <= 0x10ffff && !isSurrogate && !isNoCharacter ? length : 0;
-}
-
 }  // namespace
 
 int appendReply(sd_bus_message* message, const Value& root) {
@@ -348,9 +331,8 @@ bool isCarriedAsString(std::string_view bytes) {
                 continue;
             }
         }
-        std::size_t length = sequenceLength(bytes);
-        if (length == 0) return false;
-        bytes.remove_prefix(length);
+        const std::optional<char32_t> character = codec::takeCharacter(bytes);
+        if (!character || *character == 0 || isNoCharacter(*character)) return false;
     }
     return true;
 }

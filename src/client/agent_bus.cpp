@@ -1,0 +1,137 @@
+#include "client/agent_bus.h"
+
+#include <sys/socket.h>
+#include <sys/time.h>
+#include <sys/un.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+
+#include "wire/encoding.h"
+
+namespace vrx::client {
+
+using platform::Error;
+using platform::MaybeError;
+
+namespace {
+
+// Never 0, which the calls below take for "no limit" or "the usual one".
+std::uint64_t microsecondsUntil(Deadline deadline) {
+    using namespace std::chrono;
+    return static_cast<std::uint64_t>(
+        std::max<std::int64_t>(1, ceil<microseconds>(deadline - steady_clock::now()).count()));
+}
+
+bool meansEnded(int error) {
+    return error == ECONNRESET || error == ENOTCONN || error == EPIPE || error == ESHUTDOWN || error == ECONNABORTED ||
+           error == ECONNREFUSED;
+}
+
+MaybeError cannotConnect(const std::string& path, int error) {
+    return Error{"client", error, "no agent answers at " + path + ": " + std::strerror(error)};
+}
+
+// Releases what sd-bus fills in while it is alive.
+struct BusError {
+    sd_bus_error error = SD_BUS_ERROR_NULL;
+    ~BusError() { sd_bus_error_free(&error); }
+    bool is(const char* name) const { return sd_bus_error_has_name(&error, name) > 0; }
+    std::string text() const { return error.message ? error.message : error.name ? error.name : "unknown error"; }
+};
+
+struct MessageRelease {
+    void operator()(sd_bus_message* message) const { sd_bus_message_unref(message); }
+};
+using MessagePointer = std::unique_ptr<sd_bus_message, MessageRelease>;
+
+CallResult failed(int result, const BusError& error) {
+    if (result == -ETIMEDOUT) return Failure{Failure::Kind::TimedOut, "the agent has not replied in time"};
+    if (meansEnded(-result)) return ConnectionEnded{"the connection ended before the reply"};
+    if (error.is(wire::noReply)) return ConnectionEnded{error.text()};
+    if (error.is(wire::accessDenied) || error.is(wire::limitsExceeded) || error.is(wire::invalidArguments))
+        return Failure{Failure::Kind::Refused, error.text()};
+    return Failure{Failure::Kind::BadReply, error.text()};
+}
+
+}  // namespace
+
+MaybeError AgentBus::open(const std::string& path, Deadline deadline) {
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    if (path.size() >= sizeof address.sun_path) return cannotConnect(path, ENAMETOOLONG);
+    std::memcpy(address.sun_path, path.c_str(), path.size());
+
+    const int file = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    if (file < 0) return cannotConnect(path, errno);
+    // An agent that is busy lets clients wait in its queue; one whose queue is full, before it.
+    const std::uint64_t wait = microsecondsUntil(deadline);
+    const timeval limit{static_cast<time_t>(wait / 1'000'000), static_cast<suseconds_t>(wait % 1'000'000)};
+    setsockopt(file, SOL_SOCKET, SO_SNDTIMEO, &limit, sizeof limit);
+    int r = connect(file, reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0 ? 0 : -errno;
+    if (r >= 0) r = sd_bus_new(&bus_);
+    if (r >= 0) r = sd_bus_set_fd(bus_, file, file);
+    if (r < 0) {
+        ::close(file);
+        return cannotConnect(path, -r);
+    }
+    socket_ = file;
+    return std::nullopt;
+}
+
+int AgentBus::authenticate(Deadline deadline) {
+    int r = sd_bus_is_open(bus_) > 0 ? 1 : sd_bus_start(bus_);
+    while (r >= 0 && sd_bus_is_ready(bus_) == 0) {
+        r = sd_bus_process(bus_, nullptr);
+        if (r == 0) r = sd_bus_wait(bus_, microsecondsUntil(deadline));
+        if (r == 0 && std::chrono::steady_clock::now() >= deadline) r = -ETIMEDOUT;
+    }
+    return r;
+}
+
+CallResult AgentBus::call(const wire::Operation& operation, const CallArguments& arguments, Deadline deadline) {
+    BusError error;
+    if (int r = authenticate(deadline); r < 0) return failed(r, error);
+
+    sd_bus_message* message = nullptr;
+    int r = sd_bus_message_new_method_call(bus_, &message, wire::serviceName, wire::objectPath, wire::interfaceName,
+                                           operation.member);
+    const MessagePointer call(message);
+    if (r >= 0) r = appendArguments(message, operation.signature, arguments);
+    if (r == -EINVAL)
+        return Failure{Failure::Kind::Refused,
+                       "an argument holds what the bus does not carry: text in UTF-8 without NUL it does"};
+    if (r < 0) return failed(r, error);
+
+    r = sd_bus_call(bus_, message, microsecondsUntil(deadline), &error.error, &message);
+    if (r < 0) return failed(r, error);
+    const MessagePointer reply(message);
+    platform::Result<platform::Value> root = wire::readReply(message);
+    if (!root) return Failure{Failure::Kind::BadReply, root.error().text};
+    return std::move(root).value();
+}
+
+int AgentBus::appendArguments(sd_bus_message* message, const char* signature, const CallArguments& arguments) {
+    for (const char* type = signature; *type != '\0'; ++type) {
+        int r = 0;
+        if (*type == 's') {
+            if (!wire::isCarriedAsString(arguments.text)) return -EINVAL;
+            r = sd_bus_message_append_basic(message, *type, std::string(arguments.text).c_str());
+        } else if (*type == 't') {
+            r = sd_bus_message_append_basic(message, *type, &arguments.policy);
+        } else {
+            const int flag = arguments.flag ? 1 : 0;
+            r = sd_bus_message_append_basic(message, *type, &flag);
+        }
+        if (r < 0) return r;
+    }
+    return 0;
+}
+
+void AgentBus::interrupt() const {
+    shutdown(socket_, SHUT_RDWR);
+}
+
+}  // namespace vrx::client

@@ -1,0 +1,57 @@
+// One connection to the agent, for one call at a time. One thread uses it; interrupt() may come from any.
+#pragma once
+
+#include <systemd/sd-bus.h>
+
+#include <chrono>
+#include <string>
+#include <variant>
+
+#include "client/agent_connection.h"
+#include "platform/error.h"
+#include "platform/value.h"
+#include "wire/names.h"
+
+namespace vrx::client {
+
+using Deadline = std::chrono::steady_clock::time_point;
+
+// An operation takes one of each at the most.
+struct CallArguments {
+    std::string_view text = {};
+    VRXWarrantyLookupPolicy policy = VRXWarrantyLookupPolicyDefault;
+    bool flag = false;
+};
+
+// The connection ended before there was a reply.
+struct ConnectionEnded {
+    std::string text;
+};
+
+using CallResult = std::variant<platform::Value, Failure, ConnectionEnded>;
+
+class AgentBus {
+public:
+    AgentBus() = default;
+    ~AgentBus() { sd_bus_close_unref(bus_); }
+    AgentBus(const AgentBus&) = delete;
+    AgentBus& operator=(const AgentBus&) = delete;
+
+    // Opens the socket: an error's text is for people. What follows may be interrupted.
+    platform::MaybeError open(const std::string& socketPath, Deadline deadline);
+
+    // The archived root of the operation's reply. After anything else the connection is of no more use.
+    CallResult call(const wire::Operation& operation, const CallArguments& arguments, Deadline deadline);
+
+    // Ends the connection and the call under way.
+    void interrupt() const;
+
+private:
+    int authenticate(Deadline deadline);
+    int appendArguments(sd_bus_message* message, const char* signature, const CallArguments& arguments);
+
+    sd_bus* bus_ = nullptr;
+    int socket_ = -1;  // the bus's
+};
+
+}  // namespace vrx::client

@@ -1,0 +1,85 @@
+#include "client/local_platform.h"
+
+#include <chrono>
+#include <cstdlib>
+#include <ctime>
+#include <mutex>
+#include <string>
+
+#include "codec/number_format.h"
+#include "platform/clock.h"
+#include "platform/defaults_store.h"
+#include "platform/locale.h"
+#include "platform/log.h"
+#include "platform/platform.h"
+
+namespace vrx::client {
+
+using platform::Dictionary;
+using platform::Platform;
+using platform::Value;
+
+namespace {
+
+class SystemClock final : public platform::Clock {
+    platform::Date now() const override { return std::chrono::system_clock::now(); }
+    std::chrono::seconds timeZoneOffset() const override {
+        const std::time_t now = std::time(nullptr);
+        std::tm local{};
+        localtime_r(&now, &local);
+        return std::chrono::seconds(local.tm_gmtoff);
+    }
+};
+
+class EnvironmentLocale final : public platform::Locale {
+    std::string preferredLocaleIdentifier() const override {
+        for (const char* variable : {"LC_ALL", "LC_MESSAGES", "LANG"}) {
+            const char* value = std::getenv(variable);
+            if (!value || *value == '\0') continue;
+            std::string identifier(value);  // such as de_DE.UTF-8 or de_DE@euro
+            identifier.resize(std::min(identifier.find_first_of(".@"), identifier.size()));
+            return identifier == "C" || identifier == "POSIX" ? "en_US" : identifier;
+        }
+        return "en_US";
+    }
+    std::string decimalText(std::uint64_t number) const override {
+        return codec::decimalText(number, preferredLocaleIdentifier());
+    }
+};
+
+// The agent's registered defaults that records read; nothing is stored.
+class FixedDefaults final : public platform::DefaultsStore {
+    Value get(std::string_view key) const override { return values_[key]; }
+    void set(std::string_view, Value) override {}
+    void update(std::string_view, const std::function<Value(const Value&)>&) override {}
+    void registerDefaults(const Dictionary&) override {}
+    Dictionary dictionaryRepresentation() const override { return *values_.asDictionary(); }
+
+    const Value values_ = Dictionary{{"OneDayInterval", 86400.0}};
+};
+
+class NoLog final : public platform::SystemLog {
+    bool isOn(platform::Level) const override { return false; }
+    void write(const platform::LogEntry&) override {}
+};
+
+struct LocalPlatform {
+    SystemClock clock;
+    EnvironmentLocale locale;
+    FixedDefaults defaults;
+    NoLog log;
+    Platform platform{{.clock = &clock, .defaultsStore = &defaults, .locale = &locale, .systemLog = &log}};
+};
+
+}  // namespace
+
+void installPlatformIfNone() {
+    static std::mutex mutex;
+    std::lock_guard lock(mutex);
+    if (Platform::hasCurrent()) return;
+    // It stays to the end of the process: records may be read by then still.
+    static LocalPlatform& local = *new LocalPlatform;
+    Platform::setCurrent(&local.platform);
+}
+
+}  // namespace vrx::client

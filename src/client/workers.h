@@ -1,0 +1,36 @@
+// Threads on which replies come: made as they are needed, up to a number, and kept. Any thread may post.
+#pragma once
+
+#include <condition_variable>
+#include <deque>
+#include <mutex>
+#include <thread>
+#include <vector>
+
+#include "platform/task.h"
+
+namespace vrx::client {
+
+class Workers {
+public:
+    explicit Workers(std::size_t most) : most_(most) {}
+    // Runs what has been posted, and waits for it.
+    ~Workers();
+    Workers(const Workers&) = delete;
+    Workers& operator=(const Workers&) = delete;
+
+    void post(platform::Task task);
+
+private:
+    void run();
+
+    const std::size_t most_;
+    std::mutex mutex_;
+    std::condition_variable hasWork_;
+    std::deque<platform::Task> tasks_;
+    std::size_t idle_ = 0;
+    bool isEnding_ = false;
+    std::vector<std::thread> threads_;
+};
+
+}  // namespace vrx::client

@@ -1,0 +1,54 @@
+// Serves one accepted client, on the thread that calls serve(), until it goes or the service ends: takes each request
+// when the operation of the one before has returned, and sends replies as they come, from whatever thread.
+#pragma once
+
+#include <systemd/sd-bus.h>
+
+#include <array>
+#include <atomic>
+#include <memory>
+#include <unordered_map>
+
+#include "host/service/peer_identity.h"
+#include "host/service/reply_box.h"
+#include "host/service/server_bus.h"
+#include "host/service/service_limits.h"
+#include "protocols/agent_protocol.h"
+#include "wire/names.h"
+
+namespace vrx::host {
+
+class ClientSession final : public ReplySender {
+public:
+    ClientSession(Descriptor socket, const PeerIdentity& peer, std::shared_ptr<VRXAgentProtocol> agent,
+                  std::shared_ptr<ReplyBox> box, const ServiceLimits& limits);
+    ~ClientSession() override;
+
+    // To stop it, set the flag and wake the box.
+    void serve(const std::atomic<bool>& isStopping);
+
+    void send(const RequestReply& reply) override;
+
+private:
+    // What sd-bus hands to the handler: an operation's own place among `methods_`.
+    struct Method {
+        ClientSession* session;
+        wire::OperationIndex operation;
+    };
+    static const std::vector<sd_bus_vtable>& methodTable();
+    static int onCall(sd_bus_message* call, void* method, sd_bus_error* error);
+    int handle(sd_bus_message* call, wire::OperationIndex operation, sd_bus_error* error);
+    bool waitUntilReady(std::chrono::steady_clock::time_point authenticationEnd) const;
+
+    const PeerIdentity& peer_;
+    const std::shared_ptr<VRXAgentProtocol> agent_;
+    const std::shared_ptr<ReplyBox> box_;
+    const ServiceLimits& limits_;
+    std::array<Method, wire::operations.size()> methods_;
+    ServerBus bus_;
+    RequestNumber lastRequest_ = 0;
+    std::unordered_map<RequestNumber, MessagePointer> openCalls_;
+    bool isCutOff_ = false;
+};
+
+}  // namespace vrx::host

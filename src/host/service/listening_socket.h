@@ -1,0 +1,37 @@
+// The socket at which clients connect: the one that the service manager passed, else one bound at a path, which takes
+// the place of a file that a dead agent left there and goes with its owner. Main thread.
+#pragma once
+
+#include <sys/types.h>
+
+#include <string>
+
+#include "host/service/descriptor.h"
+#include "platform/error.h"
+
+namespace vrx::host {
+
+class ListeningSocket {
+public:
+    ListeningSocket() = default;
+    ~ListeningSocket();
+    ListeningSocket(const ListeningSocket&) = delete;
+    ListeningSocket& operator=(const ListeningSocket&) = delete;
+
+    // The error's code is EADDRINUSE when somebody answers at the path. The file is for its user alone, except in
+    // /run/vrxagent, a system service's, where every user may connect.
+    platform::MaybeError open(const std::string& path);
+
+    bool isOpen() const { return static_cast<bool>(file_); }
+    int number() const { return file_.number(); }
+
+private:
+    platform::MaybeError bind(const std::string& path);
+
+    Descriptor file_;
+    std::string boundPath_;  // empty for one that was passed: the service manager keeps it
+    dev_t device_ = 0;
+    ino_t inode_ = 0;
+};
+
+}  // namespace vrx::host

@@ -1,0 +1,58 @@
+// The agent's end of one client's socket, in D-Bus's protocol: takes the client through authentication and hands out
+// its messages. It answers Hello, with which stock tools begin although there is no bus daemon. Made on any thread and
+// then used by one.
+#pragma once
+
+#include <sys/types.h>
+#include <systemd/sd-bus.h>
+
+#include <cstdint>
+#include <memory>
+
+#include "host/service/descriptor.h"
+
+namespace vrx::host {
+
+struct MessageRelease {
+    void operator()(sd_bus_message* message) const { sd_bus_message_unref(message); }
+};
+using MessagePointer = std::unique_ptr<sd_bus_message, MessageRelease>;
+
+class ServerBus {
+public:
+    enum class Step {
+        Progress,  // there may be more to do at once
+        Idle,      // nothing more until the socket is ready
+        Ended,     // the client has gone, or was cut off
+    };
+
+    // Messages are admitted from that process only.
+    ServerBus(Descriptor socket, pid_t peer);
+    ~ServerBus();
+    ServerBus(const ServerBus&) = delete;
+    ServerBus& operator=(const ServerBus&) = delete;
+
+    // Takes one step: a part of the authentication, or one message. To be called until it is idle before each wait,
+    // because a message may have come together with the end of the authentication and wait in sd-bus's own buffer.
+    Step step();
+
+    bool isAuthenticated() const;
+    std::size_t unsentMessages() const;
+
+    // For a poll(): what to wait for on the socket.
+    int socket() const { return socket_; }
+    short events() const;
+
+    sd_bus* bus() const { return bus_; }
+
+private:
+    enum class Incoming { Nothing, Admitted, Refused };
+    Incoming examineIncoming() const;
+
+    sd_bus* bus_ = nullptr;
+    int socket_;
+    const pid_t peer_;
+    int state_ = 0;  // a negative errno once the connection is over
+};
+
+}  // namespace vrx::host

@@ -1,0 +1,60 @@
+// One client's connection, from its acceptance on: tells the listener's delegate who the client is, and once resumed
+// serves it on a thread of its own. Main thread.
+#pragma once
+
+#include <atomic>
+#include <functional>
+#include <memory>
+#include <string>
+#include <thread>
+
+#include "host/service/bundle_lookup.h"
+#include "host/service/descriptor.h"
+#include "host/service/peer_identity.h"
+#include "host/service/reply_box.h"
+#include "host/service/service_limits.h"
+#include "platform/service_listener.h"
+
+namespace vrx::host {
+
+class ServiceConnection final : public platform::ServiceConnection {
+public:
+    // onEnd is called on the connection's thread when it has nothing more to do.
+    ServiceConnection(Descriptor socket, PeerIdentity peer, const BundleLookup& bundles, const ServiceLimits& limits,
+                      std::function<void()> onEnd);
+    // Ends the connection. Waits for the operation under way, if any, to return; its reply goes nowhere.
+    ~ServiceConnection() override;
+
+    std::int32_t processIdentifier() const override { return peer_.processIdentifier(); }
+    platform::Value valueForEntitlement(std::string_view name) const override;
+    void setExportedInterface(std::string_view protocolName) override;
+    void setExportedObject(std::shared_ptr<VRXAgentProtocol> object) override { object_ = std::move(object); }
+    void resume() override;
+
+    const PeerIdentity& peer() const { return peer_; }
+    bool isResumed() const { return thread_.joinable(); }
+    bool hasEnded() const { return hasEnded_; }
+    // Begins to end it, without waiting.
+    void stop();
+
+    // For a refusal: what to tell the client, and its socket, which is then no longer the connection's.
+    std::string refusal() const;
+    Descriptor takeSocket() { return std::move(socket_); }
+
+private:
+    void serve();
+
+    Descriptor socket_;
+    const PeerIdentity peer_;
+    const BundleLookup& bundles_;
+    const ServiceLimits& limits_;
+    const std::function<void()> onEnd_;
+    mutable std::string missingEntitlement_;
+    std::shared_ptr<VRXAgentProtocol> object_;
+    const std::shared_ptr<ReplyBox> box_ = std::make_shared<ReplyBox>();
+    std::atomic<bool> isStopping_ = false;
+    std::atomic<bool> hasEnded_ = false;
+    std::thread thread_;
+};
+
+}  // namespace vrx::host

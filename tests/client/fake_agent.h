@@ -1,0 +1,177 @@
+// An agent whose answers a test sets, behind the host's real listener: the listener runs on a thread of its own, as the
+// agent's main thread, and entitles callers as the test says.
+#pragma once
+
+#include <condition_variable>
+#include <functional>
+#include <mutex>
+#include <thread>
+
+#include "client/agent_connection.h"
+#include "host/main_loop.h"
+#include "host/service/service_listener.h"
+#include "host/system_log.h"
+#include "platform/limits.h"
+#include "platform/platform.h"
+#include "wire/names.h"
+
+namespace vrx::test {
+
+using platform::Value;
+
+// A gate for threads to meet at.
+class Signal {
+public:
+    void set() {
+        std::lock_guard lock(mutex_);
+        isSet_ = true;
+        changed_.notify_all();
+    }
+    void wait() {
+        std::unique_lock lock(mutex_);
+        changed_.wait(lock, [this] { return isSet_; });
+    }
+
+private:
+    std::mutex mutex_;
+    std::condition_variable changed_;
+    bool isSet_ = false;
+};
+
+// Answers at once, unless the test gives an answer of its own.
+class FakeAgent : public VRXAgentProtocol {
+public:
+    std::function<void(std::string, Reply<std::shared_ptr<VRXDeviceInfo>>)> onDeviceInfo;
+    std::function<void(Reply<bool>)> onOutreach;
+    std::function<void(std::string, Reply<Value>)> onStore;
+
+    std::shared_ptr<VRXDevice> device =
+        VRXDevice::deviceWithName("Phone", "SN1", platform::dateFromEpoch(1.5e9), VRXDeviceTypeDefault);
+    Value record = platform::Dictionary{{"covered", true}};
+    std::vector<std::string> requests;  // with their arguments
+
+    std::shared_ptr<VRXDeviceInfo> info() const {
+        return VRXDeviceInfo::deviceInfoWithDevice(device, VRXWarranty::initWithDictionary(record));
+    }
+
+    void scheduleOutreachWithReply(Reply<bool> reply) override {
+        note("outreach");
+        if (onOutreach) return onOutreach(std::move(reply));
+        reply(true);
+    }
+    void checkIsAvailableInStore(std::string bundle, Reply<Value> reply) override {
+        note("store " + bundle);
+        if (onStore) return onStore(std::move(bundle), std::move(reply));
+        reply(platform::Dictionary{{"price", 0.5}, {"$id", 7}});
+    }
+    void appSupportAvailability(std::string bundle, Reply<Value> reply) override {
+        note("support " + bundle);
+        reply(nullptr);
+    }
+    void readWebURLOverride(Reply<std::optional<std::string>> reply) override {
+        note("url");
+        reply("https://web.example");
+    }
+    void defaultDevice(Reply<std::shared_ptr<VRXDevice>> reply) override {
+        note("device");
+        reply(device);
+    }
+    void pairedDevices(Reply<DeviceList> reply) override {
+        note("paired");
+        reply({device, VRXDevice::deviceWithName(std::nullopt, std::nullopt, std::nullopt, VRXDeviceTypeWatch)});
+    }
+    void getDefaultDeviceInfoUsingPolicy(VRXWarrantyLookupPolicy policy,
+                                         Reply<std::shared_ptr<VRXDeviceInfo>> reply) override {
+        note("info " + std::to_string(policy));
+        reply(info());
+    }
+    void getDeviceInfoForSerialNumber(std::string serialNumber, VRXWarrantyLookupPolicy policy,
+                                      Reply<std::shared_ptr<VRXDeviceInfo>> reply) override {
+        note("info " + serialNumber + " " + std::to_string(policy));
+        if (onDeviceInfo) return onDeviceInfo(std::move(serialNumber), std::move(reply));
+        reply(info());
+    }
+    void getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicy policy, bool updateFollowUps,
+                                      Reply<DeviceInfoList> reply) override {
+        note("all " + std::to_string(policy) + (updateFollowUps ? " update" : ""));
+        // From another thread, as the agent does.
+        std::thread([infos = DeviceInfoList{info(), info()}, reply = std::move(reply)]() mutable {
+            reply(std::move(infos));
+        }).detach();
+    }
+    void dismissFollowUpForSerialNumber(std::string serialNumber, Reply<bool> completion) override {
+        note("dismiss " + serialNumber);
+        completion(true);
+    }
+
+private:
+    void note(std::string request) {
+        std::lock_guard lock(mutex_);
+        requests.push_back(std::move(request));
+    }
+    std::mutex mutex_;
+};
+
+// The service of a fake agent, at a socket in a temporary folder.
+class FakeService final : public platform::ServiceListenerDelegate {
+public:
+    explicit FakeService(std::shared_ptr<FakeAgent> agent, const host::ServiceLimits& limits = {},
+                         bool isEntitled = true)
+        : agent_(std::move(agent)), isEntitled_(isEntitled) {
+        char name[] = "/tmp/vrx-client-XXXXXX";
+        folder_ = mkdtemp(name);
+        start(limits);
+    }
+    ~FakeService() override {
+        stop();
+        rmdir(folder_.c_str());
+    }
+
+    std::string socketPath() const { return folder_ + "/socket"; }
+
+    void start(const host::ServiceLimits& limits = {}) {
+        Signal isReady;
+        thread_ = std::thread([this, &isReady, limits] {
+            host::MainLoop loop;
+            host::ServiceListenerFactory factory(loop.event(), bundles_, limits);
+            auto error = factory.open(socketPath());
+            if (error) throw std::runtime_error(error->text);
+            auto listener = factory.makeListener("");
+            listener->setDelegate(this);
+            listener->resume();
+            loop_ = &loop;
+            isReady.set();
+            loop.run();
+        });
+        isReady.wait();
+    }
+
+    // The agent's process ends.
+    void stop() {
+        if (!thread_.joinable()) return;
+        loop_->stop();
+        thread_.join();
+    }
+
+private:
+    bool shouldAcceptNewConnection(platform::ServiceListener&, platform::ServiceConnection& connection) override {
+        // Test programs have no bundle; the refusal names the entitlement all the same.
+        if (connection.valueForEntitlement("test.entitlement").isNull() && !isEntitled_) return false;
+        connection.setExportedInterface(VRXAgentProtocol::protocolName);
+        connection.setExportedObject(agent_);
+        connection.resume();
+        return true;
+    }
+
+    host::SystemLog log_{platform::Level::Error};
+    platform::Platform platform_{{.systemLog = &log_}};
+    platform::ScopedPlatform current_{platform_};
+    const std::shared_ptr<FakeAgent> agent_;
+    const bool isEntitled_;
+    std::string folder_;
+    host::BundleLookup bundles_;
+    std::thread thread_;
+    host::MainLoop* loop_ = nullptr;
+};
+
+}  // namespace vrx::test
