@@ -1,0 +1,202 @@
+#include "coverage_server/coverage_service.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <map>
+#include <sstream>
+
+#include "coverage_server/misbehaviour.h"
+
+namespace vrx::coverage_server {
+
+namespace {
+
+constexpr const char* jsonType = "application/json";
+
+struct Target {
+    std::optional<Endpoint> endpoint;
+    bool isMoved;
+};
+
+Target targetOf(std::string_view path) {
+    const bool isMoved = path.starts_with(movedPrefix);
+    if (isMoved) path.remove_prefix(movedPrefix.size());
+    if (path == coveragePath) return {Endpoint::Coverage, isMoved};
+    if (path == serverVersionPath) return {Endpoint::ServerVersion, isMoved};
+    if (path == tokenPath) return {Endpoint::Token, isMoved};
+    return {std::nullopt, isMoved};
+}
+
+std::string joined(const std::vector<std::string>& reasons) {
+    std::string text;
+    for (const std::string& reason : reasons) text.append(text.empty() ? "" : "; ").append(reason);
+    return text;
+}
+
+void refuse(httplib::Response& response, int status, std::string& reason, std::string text) {
+    reason = std::move(text);
+    response.status = status;
+    response.set_content(dumped({{"reason", reason}}), jsonType);
+}
+
+// What a client sends must not steer a terminal.
+std::string printable(std::string text) {
+    constexpr std::size_t longest = 300;
+    if (text.size() > longest) text.resize(longest);
+    std::ranges::replace_if(
+        text, [](char c) { return c < ' ' || c == '\x7f'; }, '?');
+    return text;
+}
+
+std::map<std::string, std::string> keyValueLines(const std::string& text) {
+    std::map<std::string, std::string> entries;
+    std::istringstream lines(text);
+    for (std::string line; std::getline(lines, line);) {
+        if (line.ends_with('\r')) line.pop_back();
+        const std::size_t equals = line.find('=');
+        if (equals != line.npos) entries[line.substr(0, equals)] = line.substr(equals + 1);
+    }
+    return entries;
+}
+
+std::map<std::string, std::string> members(const std::string& text) {
+    std::map<std::string, std::string> entries;
+    const Json json = Json::parse(text, nullptr, false);
+    if (json.is_object())
+        for (const auto& [name, value] : json.items())
+            if (value.is_string()) entries[name] = value;
+    return entries;
+}
+
+}  // namespace
+
+CoverageService::CoverageService(const CoverageServiceSettings& settings)
+    : isQuiet_(settings.isQuiet),
+      printsRequests_(settings.printsRequests),
+      records_(settings.records),
+      serverVersion_(settings.serverVersion),
+      tokens_(settings.tokens),
+      requiredHeaders_(settings.requiredHeaders) {}
+
+bool CoverageService::admit(Connection& connection) {
+    log_.countConnection();
+    const FaultPlan plan = faults_.take(Endpoint::Connection);
+    if (plan.description.empty()) return true;
+    print("#" + std::to_string(connection.id()) + " connection fault=" + plan.description);
+    return misbehave(plan, connection);
+}
+
+void CoverageService::serve(const httplib::Request& request, httplib::Response& response, Connection& connection) {
+    const Target target = targetOf(request.path);
+    SeenRequest seen;
+    seen.time = std::chrono::system_clock::now();
+    seen.connection = connection.id();
+    seen.requestOfConnection = connection.requests();
+    if (target.endpoint) seen.endpoint = nameOf(*target.endpoint);
+    seen.method = request.method;
+    seen.path = request.target;
+    seen.headers = request.headers;
+    seen.body = request.body;
+    seen.bodyBytes = request.body.size();
+    Connection::Exchange& exchange = connection.exchange;
+    exchange.request = log_.begin(std::move(seen));
+
+    if (!target.endpoint) return refuse(response, 404, exchange.reason, "no such path");
+    const FaultPlan plan = target.isMoved ? FaultPlan{} : faults_.take(*target.endpoint);
+    exchange.fault = plan.description;
+    if (!connection.pause(plan.delay)) return connection.takeOver(0);
+    if (!plan.fault || plan.fault->kind->bendsAnswer) answer(*target.endpoint, request, response, exchange.reason);
+    if (plan.fault) misbehave(*plan.fault, *target.endpoint, request, response, connection);
+}
+
+void CoverageService::answer(Endpoint endpoint, const httplib::Request& request, httplib::Response& response,
+                             std::string& reason) {
+    if (endpoint == Endpoint::Coverage) return answerCoverage(request, response, reason);
+    if (endpoint == Endpoint::Token) return answerToken(request, response, reason);
+    if (request.method != "GET" && request.method != "HEAD")
+        return refuse(response, 405, reason, "the method is not GET");
+    serverVersion_.answer(request, response);
+}
+
+void CoverageService::answerCoverage(const httplib::Request& request, httplib::Response& response,
+                                     std::string& reason) const {
+    const Verdict verdict = judge(request, tokens_, requiredHeaders());
+    if (verdict.status != 200) return refuse(response, verdict.status, reason, joined(verdict.reasons));
+    std::string record;
+    try {
+        record = records_.record(verdict.serialNumber);
+    } catch (const std::runtime_error& error) {
+        return refuse(response, 500, reason, error.what());
+    }
+    if (record.empty()) return refuse(response, 404, reason, "no record for this serial number, and no default.json");
+    response.status = 200;
+    response.set_content(record, jsonType);
+}
+
+// Takes and gives JSON, or lines of key=value as text/plain, so that a credential helper can be one command of curl.
+void CoverageService::answerToken(const httplib::Request& request, httplib::Response& response, std::string& reason) {
+    if (request.method != "POST") return refuse(response, 405, reason, "the method is not POST");
+    const bool isPlain = request.get_header_value("Content-Type").starts_with("text/plain");
+    auto entries = isPlain ? keyValueLines(request.body) : members(request.body);
+    if (entries["account"].empty() || entries["service"].empty())
+        return refuse(response, 400, reason, "account and service are needed, as JSON strings or key=value lines");
+    const std::string token = tokens_.renew(entries["account"], entries["service"]);
+    response.status = 200;
+    if (isPlain)
+        response.set_content("token=" + token + "\n", "text/plain");
+    else
+        response.set_content(
+            dumped({{"account", entries["account"]}, {"service", entries["service"]}, {"token", token}}), jsonType);
+}
+
+void CoverageService::answered(const httplib::Request& request, const httplib::Response& response,
+                               const Connection& connection) {
+    const Connection::Exchange& exchange = connection.exchange;
+    const int status = connection.isTakenOver() ? connection.status() : response.status;
+    if (exchange.request == 0) log_.countMalformed(status);
+    const SeenRequest seen =
+        exchange.request ? log_.finish(exchange.request, status, exchange.fault, exchange.reason) : SeenRequest{};
+
+    const auto taken = std::chrono::steady_clock::now() - exchange.begun;
+    std::string line = "#" + std::to_string(connection.id()) + "." + std::to_string(connection.requests()) + " ";
+    line += exchange.request ? request.method + " " + printable(request.target) : "malformed request";
+    line += " " + (status ? std::to_string(status) : "unanswered");
+    line += " " + std::to_string(std::chrono::duration_cast<Milliseconds>(taken).count()) + "ms";
+    if (!exchange.fault.empty()) line += " fault=" + printable(exchange.fault);
+    if (!exchange.reason.empty()) line += " (" + printable(exchange.reason) + ")";
+    print(line);
+    if (printsRequests_ && seen.id) {
+        const std::string text = dumped(seen.json(true)) + "\n";
+        std::fwrite(text.data(), 1, text.size(), stdout);
+        std::fflush(stdout);
+    }
+}
+
+void CoverageService::handshakeFailed(const Connection& connection) {
+    log_.countHandshakeFailure();
+    print("#" + std::to_string(connection.id()) + " TLS handshake failed");
+}
+
+void CoverageService::ended(const Connection& connection) {
+    log_.countEnded(connection.bytesSent());
+}
+
+void CoverageService::refused() {
+    log_.countRefused();
+}
+
+void CoverageService::print(const std::string& line) const {
+    if (!isQuiet_) std::fprintf(stderr, "%s\n", line.c_str());
+}
+
+std::vector<std::string> CoverageService::requiredHeaders() const {
+    std::lock_guard lock(mutex_);
+    return requiredHeaders_;
+}
+
+void CoverageService::setRequiredHeaders(std::vector<std::string> names) {
+    std::lock_guard lock(mutex_);
+    requiredHeaders_ = std::move(names);
+}
+
+}  // namespace vrx::coverage_server

@@ -1,0 +1,73 @@
+// The served port: coverage, server-version document and token renewal, each with the faults that are asked for.
+#pragma once
+
+#include <chrono>
+#include <filesystem>
+#include <functional>
+#include <mutex>
+#include <string>
+#include <vector>
+
+#include "coverage_server/coverage_records.h"
+#include "coverage_server/coverage_request.h"
+#include "coverage_server/faults.h"
+#include "coverage_server/http_server.h"
+#include "coverage_server/request_log.h"
+#include "coverage_server/server_version_document.h"
+#include "coverage_server/tokens.h"
+
+namespace vrx::coverage_server {
+
+inline constexpr std::string_view coveragePath = "/api/v2/coverage/summary";
+inline constexpr std::string_view serverVersionPath = "/library/ORVANE/asset/vrxV2.plist";
+inline constexpr std::string_view tokenPath = "/token/renew";
+// Under this prefix everything is served once more, without faults: where redirects can lead to.
+inline constexpr std::string_view movedPrefix = "/moved";
+
+struct CoverageServiceSettings {
+    std::filesystem::path records;
+    std::vector<std::string> tokens;
+    std::vector<std::string> requiredHeaders = defaultRequiredHeaders;
+    ServerVersionSettings serverVersion;
+    bool isQuiet = false;         // no line on stderr for each request
+    bool printsRequests = false;  // each as JSON on stdout, tokens hidden
+};
+
+class CoverageService final : public HttpService {
+public:
+    explicit CoverageService(const CoverageServiceSettings& settings);
+
+    bool admit(Connection& connection) override;
+    void handshakeFailed(const Connection& connection) override;
+    void serve(const httplib::Request& request, httplib::Response& response, Connection& connection) override;
+    void answered(const httplib::Request& request, const httplib::Response& response,
+                  const Connection& connection) override;
+    void ended(const Connection& connection) override;
+    void refused() override;
+
+    FaultList& faults() { return faults_; }
+    RequestLog& log() { return log_; }
+    Tokens& tokens() { return tokens_; }
+    ServerVersionDocument& serverVersion() { return serverVersion_; }
+    std::vector<std::string> requiredHeaders() const;
+    void setRequiredHeaders(std::vector<std::string> names);
+
+private:
+    void answer(Endpoint endpoint, const httplib::Request& request, httplib::Response& response, std::string& reason);
+    void answerCoverage(const httplib::Request& request, httplib::Response& response, std::string& reason) const;
+    void answerToken(const httplib::Request& request, httplib::Response& response, std::string& reason);
+    void print(const std::string& line) const;
+
+    const bool isQuiet_;
+    const bool printsRequests_;
+    const CoverageRecords records_;
+    ServerVersionDocument serverVersion_;
+    Tokens tokens_;
+    FaultList faults_;
+    RequestLog log_;
+
+    mutable std::mutex mutex_;
+    std::vector<std::string> requiredHeaders_;
+};
+
+}  // namespace vrx::coverage_server

@@ -1,0 +1,217 @@
+// A coverage server and CDN for development and tests, on loopback only.
+#include <pthread.h>
+#include <signal.h>
+#include <unistd.h>
+
+#include <CLI/CLI.hpp>
+#include <cstdio>
+#include <exception>
+#include <optional>
+
+#include "coverage_server/certificate.h"
+#include "coverage_server/control_service.h"
+#include "coverage_server/coverage_service.h"
+#include "coverage_server/http_server.h"
+
+using namespace vrx::coverage_server;
+
+namespace {
+
+constexpr int exitFailed = 1;
+constexpr int exitUsage = 2;
+
+struct Options {
+    int port = 0;
+    int controlPort = 0;
+    long keepAlive = 60;
+    int readyDescriptor = -1;
+    bool hasTls = false;
+    CertificateSettings certificate;
+    CoverageServiceSettings service;
+    std::vector<Fault> faults;
+};
+
+std::string footer() {
+    std::string text =
+        "\nEndpoints\n"
+        "  POST /api/v2/coverage/summary            judges the request: 401 for its token, 400 for anything else, "
+        "both\n"
+        "                                           with {\"reason\"}; else the record of the serial number\n"
+        "  GET  /library/ORVANE/asset/vrxV2.plist   the server-version document\n"
+        "  POST /token/renew                        {\"account\",\"service\"} -> {\"account\",\"service\",\"token\"}, "
+        "or as\n"
+        "                                           text/plain lines key=value -> token=...; the old token, and those\n"
+        "                                           given at start, are no longer valid\n"
+        "  /moved/...                               the same once more, without faults\n"
+        "\nFaults: ENDPOINT:KIND[=VALUE][,count=N][,skip=N][,code=N]\n"
+        "  ENDPOINT is coverage, server-version, token, any, or connection (delay, close, reset, hang, not-http; "
+        "before\n"
+        "  TLS). Without count a fault happens to every request; skip lets so many pass first. A request takes every\n"
+        "  delay and the first other fault that applies to it, in the order in which they were given. Examples:\n"
+        "    coverage:status=401,count=2     server-version:delay=200ms     any:bomb=2GiB,skip=1,count=1\n\n";
+    for (const FaultKindInfo& kind : faultKinds()) {
+        std::string name(kind.name);
+        constexpr std::string_view values[] = {"", "=STATUS", "=SIZE", "=DURATION", "=TEXT"};
+        name += values[static_cast<int>(kind.value)];
+        name.resize(std::max<std::size_t>(name.size() + 1, 22), ' ');
+        text.append("  ").append(name).append(kind.help);
+        if (!kind.defaultValue.empty() && kind.defaultValue != "none")
+            text.append(" (").append(kind.defaultValue).append(")");
+        text += "\n";
+    }
+    text += "\nControl port (JSON)\n";
+    text += controlHelp;
+    text +=
+        "\nOn stdout: a line \"control on URL\", with --tls a line \"certificate FILE\", and last, when requests are "
+        "served,\n"
+        "\"listening on URL\". SIGUSR1 prints the counters on stderr; SIGTERM and SIGINT end the server.\n"
+        "Exit codes: 0 ended by a signal, 1 could not start, 2 usage.";
+    return text;
+}
+
+// The exit code when there is nothing more to do.
+std::optional<int> parse(int argc, char** argv, Options& options) {
+    CLI::App app("A coverage server and CDN for development and tests. Listens on 127.0.0.1 only.");
+    app.footer(footer());
+    app.set_version_flag("--version", VRX_VERSION);
+    const CLI::Range ports(0, 65535);
+    ServerVersionSettings& serverVersion = options.service.serverVersion;
+    bool noEtag = false, noLastModified = false, noConditional = false;
+    std::string format = "xml";
+    std::vector<std::string> faults;
+
+    app.add_option("--port", options.port, "Port to serve, 0 for any")->check(ports)->capture_default_str();
+    app.add_option("--control-port", options.controlPort, "Port of the control address, 0 for any")
+        ->check(ports)
+        ->capture_default_str();
+    app.add_option("--keep-alive", options.keepAlive, "Seconds that an idle connection is kept; 0: one request each")
+        ->check(CLI::Range(0, 86400))
+        ->capture_default_str();
+    app.add_option("--ready-fd", options.readyDescriptor,
+                   "Writes {\"url\",\"control\",\"certificate\",\"pid\"} to this descriptor when ready, and closes it");
+    app.add_option("--records", options.service.records,
+                   "Folder of records: SERIAL.json, else default.json, read for each request. Strings such as @now+30d "
+                   "or @now-12h:ms become epoch numbers")
+        ->check(CLI::ExistingDirectory);
+    app.add_option("--token", options.service.tokens, "A valid token, repeatable (development-token)");
+    app.add_option("--require-header", options.service.requiredHeaders,
+                   "A header that a coverage request needs, repeatable, in place of X-Orvane-Client-Info, "
+                   "X-Orvane-Device-Id and X-Orvane-Account-*; none for none. NAME* is any one that begins so");
+    app.add_option("--fault", faults, "A fault, repeatable; see below");
+
+    const char* document = "Server-version document";
+    app.add_option("--low-version", serverVersion.lowVersion, "LowServerVersion; none leaves it out")
+        ->capture_default_str()
+        ->group(document);
+    app.add_option("--high-version", serverVersion.highVersion, "HighServerVersion; none leaves it out")
+        ->capture_default_str()
+        ->group(document);
+    app.add_flag("--versions-as-strings", serverVersion.versionsAsStrings, "Strings in place of integers")
+        ->group(document);
+    app.add_option("--plist-format", format, "xml or binary")
+        ->check(CLI::IsMember({"xml", "binary"}))
+        ->capture_default_str()
+        ->group(document);
+    app.add_option("--server-version-file", serverVersion.file, "A file to serve as it is instead")
+        ->check(CLI::ExistingFile)
+        ->group(document);
+    app.add_option("--cache-control", serverVersion.cacheControl, "Its Cache-Control, empty for none")
+        ->capture_default_str()
+        ->group(document);
+    app.add_flag("--no-etag", noEtag, "Without ETag")->group(document);
+    app.add_flag("--no-last-modified", noLastModified, "Without Last-Modified")->group(document);
+    app.add_flag("--no-conditional", noConditional, "Never answers 304")->group(document);
+
+    auto* tls =
+        app.add_flag("--tls", options.hasTls, "TLS, with a self-signed certificate made at start")->group("TLS");
+    app.add_option("--tls-certificate", options.certificate.file,
+                   "Where to write the certificate (a temporary file); removed at the end")
+        ->needs(tls)
+        ->group("TLS");
+    app.add_option("--tls-name", options.certificate.name, "Its host name, in place of localhost and 127.0.0.1")
+        ->needs(tls)
+        ->group("TLS");
+    app.add_option("--tls-days", options.certificate.days, "Its validity; negative for one that has expired")
+        ->check(CLI::Range(-10000, 10000))
+        ->capture_default_str()
+        ->needs(tls)
+        ->group("TLS");
+
+    app.add_flag("--print-requests", options.service.printsRequests,
+                 "Prints each request as a line of JSON on stdout when it has been answered, tokens hidden");
+    app.add_flag("--quiet", options.service.isQuiet, "No line on stderr for each request");
+
+    try {
+        app.parse(argc, argv);
+        for (const std::string& fault : faults) options.faults.push_back(parseFault(std::string_view(fault)));
+    } catch (const CLI::ParseError& error) {
+        return app.exit(error) == 0 ? 0 : exitUsage;
+    } catch (const std::invalid_argument& error) {
+        std::fprintf(stderr, "--fault: %s\n", error.what());
+        return exitUsage;
+    }
+    serverVersion.etag = !noEtag;
+    serverVersion.lastModified = !noLastModified;
+    serverVersion.conditional = !noConditional;
+    serverVersion.isBinary = format == "binary";
+    std::erase(options.service.requiredHeaders, "none");
+    if (options.service.tokens.empty()) options.service.tokens = {"development-token"};
+    return std::nullopt;
+}
+
+void announce(const Options& options, const std::string& url, const std::string& control,
+              const std::string& certificate) {
+    std::printf("control on %s\n", control.c_str());
+    if (!certificate.empty()) std::printf("certificate %s\n", certificate.c_str());
+    std::printf("listening on %s\n", url.c_str());
+    std::fflush(stdout);
+    if (options.readyDescriptor < 0) return;
+    const Json json = {{"url", url},
+                       {"control", control},
+                       {"certificate", certificate.empty() ? Json(nullptr) : Json(certificate)},
+                       {"pid", getpid()}};
+    const std::string line = dumped(json) + "\n";
+    if (write(options.readyDescriptor, line.data(), line.size()) != static_cast<ssize_t>(line.size()))
+        std::fprintf(stderr, "cannot write to --ready-fd %d\n", options.readyDescriptor);
+    if (options.readyDescriptor > STDERR_FILENO) close(options.readyDescriptor);
+}
+
+void run(const Options& options) {
+    // Every thread leaves these signals to this one.
+    sigset_t signals;
+    sigemptyset(&signals);
+    for (int signal : {SIGTERM, SIGINT, SIGUSR1}) sigaddset(&signals, signal);
+    pthread_sigmask(SIG_BLOCK, &signals, nullptr);
+
+    std::optional<TlsContext> tls;
+    if (options.hasTls) tls.emplace(options.certificate);
+    CoverageService coverage(options.service);
+    for (const Fault& fault : options.faults) coverage.faults().add(fault);
+    ControlService controlled(coverage);
+    HttpServer server(coverage, options.port, tls ? tls->get() : nullptr, std::chrono::seconds(options.keepAlive));
+    HttpServer control(controlled, options.controlPort, nullptr, std::chrono::seconds(60));
+    // Writing to a client that has gone is an error of that connection and nothing more.
+    std::signal(SIGPIPE, SIG_IGN);
+
+    const std::string host = "127.0.0.1:";
+    announce(options, (tls ? "https://" : "http://") + host + std::to_string(server.port()),
+             "http://" + host + std::to_string(control.port()), tls ? tls->certificateFile() : "");
+    int signal = 0;
+    while (sigwait(&signals, &signal) == 0 && signal == SIGUSR1)
+        std::fprintf(stderr, "%s\n", dumped(coverage.log().counters(), 2).c_str());
+    coverage.log().end();
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    Options options;
+    if (std::optional<int> code = parse(argc, argv, options)) return *code;
+    try {
+        run(options);
+    } catch (const std::exception& error) {
+        std::fprintf(stderr, "vrx-coverage-server: %s\n", error.what());
+        return exitFailed;
+    }
+    return 0;
+}

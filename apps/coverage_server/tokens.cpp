@@ -1,0 +1,43 @@
+#include "coverage_server/tokens.h"
+
+#include <algorithm>
+#include <random>
+
+namespace vrx::coverage_server {
+
+bool Tokens::isValid(const std::string& token) const {
+    std::lock_guard lock(mutex_);
+    return initial_.contains(token) ||
+           std::ranges::any_of(renewed_, [&](const auto& entry) { return entry.second == token; });
+}
+
+std::string Tokens::renew(const std::string& account, const std::string& service) {
+    std::lock_guard lock(mutex_);
+    std::random_device random;
+    std::string token =
+        "renewed-" + std::to_string(++renewals_) + "-" + std::to_string(random()) + std::to_string(random());
+    constexpr std::size_t accountsAtMost = 1000;
+    if (renewed_.size() >= accountsAtMost) renewed_.clear();
+    initial_.clear();
+    return renewed_[{account, service}] = token;
+}
+
+void Tokens::add(const std::string& token) {
+    std::lock_guard lock(mutex_);
+    initial_.insert(token);
+}
+
+void Tokens::clear() {
+    std::lock_guard lock(mutex_);
+    initial_.clear();
+    renewed_.clear();
+}
+
+std::vector<std::string> Tokens::list() const {
+    std::lock_guard lock(mutex_);
+    std::vector<std::string> tokens(initial_.begin(), initial_.end());
+    for (const auto& [owner, token] : renewed_) tokens.push_back(token);
+    return tokens;
+}
+
+}  // namespace vrx::coverage_server
