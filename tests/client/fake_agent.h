@@ -136,12 +136,12 @@ public:
             host::ServiceListenerFactory factory(loop.event(), bundles_, limits);
             auto error = factory.open(socketPath());
             if (error) throw std::runtime_error(error->text);
-            auto listener = factory.makeListener("");
-            listener->setDelegate(this);
-            listener->resume();
+            listen(factory);
+            factory_ = &factory;
             loop_ = &loop;
             isReady.set();
             loop.run();
+            listener_.reset();
         });
         isReady.wait();
     }
@@ -153,7 +153,24 @@ public:
         thread_.join();
     }
 
+    // The agent ends and comes back, while its service manager keeps the socket.
+    void restart() {
+        Signal isBack;
+        loop_->post([&] {
+            listener_.reset();
+            listen(*factory_);
+            isBack.set();
+        });
+        isBack.wait();
+    }
+
 private:
+    void listen(host::ServiceListenerFactory& factory) {
+        listener_ = factory.makeListener("");
+        listener_->setDelegate(this);
+        listener_->resume();
+    }
+
     bool shouldAcceptNewConnection(platform::ServiceListener&, platform::ServiceConnection& connection) override {
         // Test programs have no bundle; the refusal names the entitlement all the same.
         if (connection.valueForEntitlement("test.entitlement").isNull() && !isEntitled_) return false;
@@ -172,6 +189,8 @@ private:
     host::BundleLookup bundles_;
     std::thread thread_;
     host::MainLoop* loop_ = nullptr;
+    host::ServiceListenerFactory* factory_ = nullptr;
+    std::unique_ptr<platform::ServiceListener> listener_;
 };
 
 }  // namespace vrx::test

@@ -1,0 +1,234 @@
+#include "client/agent_connection.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <barrier>
+
+#include "client/fake_agent.h"
+
+namespace vrx::test {
+namespace {
+
+using client::AgentConnection;
+using client::Failure;
+using testing::ElementsAre;
+using testing::HasSubstr;
+
+// What only the encoding's exceptions carry.
+const Value awkwardRecord = platform::Dictionary{
+    {"covered", true},
+    {"", "empty key"},
+    {"$class", "VRXDevice"},
+    {"$$", platform::Dictionary{{"$date", 5}}},
+    {std::string("k\0y", 3), std::string("v\0lue", 5)},
+    {"\xef\xbf\xbe", "\xef\xb7\x90"},
+    {"list", platform::Array{1, 2.5, false, "x", platform::Array{}, platform::Dictionary{}}},
+    {"large", std::int64_t{1} << 62},
+};
+
+TEST(AgentConnection, AsksEveryOperationAndWaits) {
+    auto agent = std::make_shared<FakeAgent>();
+    agent->record = awkwardRecord;
+    FakeService service(agent);
+    AgentConnection connection({.socketPath = service.socketPath()});
+
+    EXPECT_TRUE(*connection.scheduleOutreachWithReply());
+    EXPECT_EQ(*connection.checkIsAvailableInStore("com.example"),
+              Value(platform::Dictionary{{"price", 0.5}, {"$id", 7}}));
+    EXPECT_TRUE(connection.appSupportAvailability("com.example")->isNull());
+    EXPECT_EQ(*connection.readWebURLOverride(), "https://web.example");
+    auto device = *connection.defaultDevice();
+    EXPECT_EQ(device->name(), "Phone");
+    EXPECT_EQ(device->activationDate(), agent->device->activationDate());
+    auto paired = *connection.pairedDevices();
+    ASSERT_EQ(paired.size(), 2u);
+    EXPECT_EQ(paired[1]->name(), std::nullopt);
+    EXPECT_EQ(paired[1]->deviceType(), VRXDeviceTypeWatch);
+    EXPECT_EQ((*connection.getDefaultDeviceInfoUsingPolicy(VRXWarrantyLookupPolicyRefresh))->device()->serialNumber(),
+              "SN1");
+    auto info = *connection.getDeviceInfoForSerialNumber("SN7", 77);
+    EXPECT_EQ(info->warranty()->dictionaryRepresentation(), awkwardRecord);
+    EXPECT_TRUE(info->warranty()->covered());
+    EXPECT_EQ(connection.getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicyCachedOnly, true)->size(), 2u);
+    EXPECT_TRUE(*connection.dismissFollowUpForSerialNumber("SN1"));
+    EXPECT_THAT(agent->requests, ElementsAre("outreach", "store com.example", "support com.example", "url", "device",
+                                             "paired", "info 2", "info SN7 77", "all 1 update", "dismiss SN1"));
+}
+
+TEST(AgentConnection, RepliesLaterOnAThreadOfItsOwn) {
+    auto agent = std::make_shared<FakeAgent>();
+    FakeService service(agent);
+    std::atomic<int> replies = 0;
+    {
+        AgentConnection connection({.socketPath = service.socketPath(), .connections = 3});
+        VRXAgentProtocol& remote = connection;
+        Signal done;
+        auto count = [&](const auto& answer) {
+            EXPECT_TRUE(answer);
+            if (++replies == 8) done.set();
+        };
+        remote.scheduleOutreachWithReply(count);
+        remote.checkIsAvailableInStore("x", [&](Value answer) { count(answer.asDictionary()); });
+        remote.appSupportAvailability("x", [&](Value answer) { count(answer.isNull()); });
+        remote.defaultDevice(count);
+        remote.pairedDevices([&](DeviceList answer) { count(answer.size() == 2); });
+        remote.getDefaultDeviceInfoUsingPolicy(0, count);
+        remote.getDeviceInfoForSerialNumber("SN1", 0, count);
+        remote.getAllDeviceInfosUsingPolicy(0, false, [&](DeviceInfoList answer) { count(answer.size() == 2); });
+        done.wait();
+        remote.readWebURLOverride(nullptr);
+        remote.dismissFollowUpForSerialNumber("SN1", [&](bool) { ++replies; });
+    }
+    EXPECT_EQ(replies, 9);
+}
+
+TEST(AgentConnection, TellsWhyThereIsNoAnswer) {
+    auto agent = std::make_shared<FakeAgent>();
+    FakeService service(agent);
+    Signal isAsked;
+    VRXAgentProtocol::Reply<bool> held;
+    agent->onOutreach = [&](VRXAgentProtocol::Reply<bool> reply) {
+        held = std::move(reply);
+        isAsked.set();
+    };
+    agent->onStore = [](std::string, VRXAgentProtocol::Reply<Value> reply) { reply("no dictionary"); };
+
+    AgentConnection connection({.socketPath = service.socketPath()});
+    EXPECT_EQ(connection.checkIsAvailableInStore("x").failure().kind, Failure::Kind::BadReply);
+    EXPECT_EQ(connection.dismissFollowUpForSerialNumber(std::string("S\0N", 3)).failure().kind, Failure::Kind::Refused);
+    auto tooLong = connection.dismissFollowUpForSerialNumber(std::string(1 << 20, 'x'));
+    EXPECT_EQ(tooLong.failure().kind, Failure::Kind::Refused);
+    EXPECT_THAT(tooLong.failure().text, HasSubstr("longer than 1024"));
+
+    AgentConnection hasty({.socketPath = service.socketPath(), .timeLimit = platform::Duration(0.05)});
+    EXPECT_EQ(hasty.scheduleOutreachWithReply().failure().kind, Failure::Kind::TimedOut);
+    isAsked.wait();
+    held(true);  // late, and for nobody
+    EXPECT_TRUE(*connection.defaultDevice());
+
+    std::string failed;
+    {
+        AgentConnection nobody({.socketPath = "/nowhere/socket"}, [&](std::string_view operation, const Failure& why) {
+            EXPECT_EQ(why.kind, Failure::Kind::NotReachable);
+            EXPECT_THAT(why.text, HasSubstr("/nowhere/socket"));
+            failed = operation;
+        });
+        Signal isDone;
+        nobody.defaultDevice([&](std::shared_ptr<VRXDevice> device) {
+            EXPECT_EQ(device, nullptr);
+            EXPECT_EQ(failed, "defaultDevice");
+            isDone.set();
+        });
+        isDone.wait();
+    }
+    EXPECT_EQ(failed, "defaultDevice");
+}
+
+TEST(AgentConnection, TellsItsUserWhatTheAgentSaidOfARefusal) {
+    FakeService service(std::make_shared<FakeAgent>(), {}, false);
+    AgentConnection connection({.socketPath = service.socketPath()});
+    for (int i = 0; i < 3; ++i) {
+        auto answer = connection.defaultDevice();
+        ASSERT_FALSE(answer);
+        EXPECT_EQ(answer.failure().kind, Failure::Kind::Refused);
+        EXPECT_THAT(answer.failure().text, HasSubstr("client_tests does not hold the entitlement test.entitlement"));
+    }
+}
+
+TEST(AgentConnection, AsksAgainOnceWhenTheAgentEnded) {
+    auto agent = std::make_shared<FakeAgent>();
+    FakeService service(agent);
+    AgentConnection connection({.socketPath = service.socketPath()});
+    ASSERT_TRUE(connection.defaultDevice());
+    service.stop();
+    service.start();
+    EXPECT_TRUE(connection.defaultDevice()) << "the kept connection has ended";
+
+    // The agent ends while it owes a reply: once, and then each time.
+    std::mutex mutex;
+    std::condition_variable isAsked;
+    std::atomic<bool> answersSecond = true;
+    std::vector<VRXAgentProtocol::Reply<bool>> held;
+    agent->onOutreach = [&](VRXAgentProtocol::Reply<bool> reply) {
+        std::lock_guard lock(mutex);
+        if (answersSecond && held.size() == 1) return reply(true);
+        held.push_back(std::move(reply));
+        isAsked.notify_all();
+    };
+    auto restartAtRequest = [&](std::size_t number) {
+        {
+            std::unique_lock lock(mutex);
+            isAsked.wait(lock, [&] { return held.size() >= number; });
+        }
+        service.restart();
+    };
+    std::thread once(restartAtRequest, 1);
+    auto answer = connection.scheduleOutreachWithReply();
+    EXPECT_TRUE(answer) << answer.failure().text;
+    once.join();
+
+    answersSecond = false;
+    std::thread twice([&] {
+        restartAtRequest(2);
+        restartAtRequest(3);
+    });
+    EXPECT_EQ(connection.scheduleOutreachWithReply().failure().kind, Failure::Kind::NotReachable);
+    twice.join();
+    EXPECT_EQ(held.size(), 3u) << "not a third time";
+    for (auto& reply : held) reply(true);
+}
+
+TEST(AgentConnection, IsServedAtTheSameTimeAsOthers) {
+    auto agent = std::make_shared<FakeAgent>();
+    FakeService service(agent);
+    std::barrier bothInside(2);
+    agent->onDeviceInfo = [&](std::string, VRXAgentProtocol::Reply<std::shared_ptr<VRXDeviceInfo>> reply) {
+        bothInside.arrive_and_wait();
+        reply(agent->info());
+    };
+    AgentConnection connection({.socketPath = service.socketPath()});
+    std::thread other([&] { EXPECT_TRUE(connection.getDeviceInfoForSerialNumber("SN1", 0)); });
+    EXPECT_TRUE(connection.getDeviceInfoForSerialNumber("SN2", 0));
+    other.join();
+}
+
+TEST(AgentConnection, EndsItsCallsWhenItGoes) {
+    auto agent = std::make_shared<FakeAgent>();
+    FakeService service(agent);
+    Signal isAsked;
+    VRXAgentProtocol::Reply<bool> held;
+    agent->onOutreach = [&](VRXAgentProtocol::Reply<bool> reply) {
+        held = std::move(reply);
+        isAsked.set();
+    };
+    std::atomic<int> failures = 0;
+    std::atomic<int> replies = 0;
+    {
+        AgentConnection connection({.socketPath = service.socketPath(), .connections = 1},
+                                   [&](std::string_view, const Failure&) { ++failures; });
+        connection.scheduleOutreachWithReply([&](bool isDone) { replies += isDone ? 100 : 1; });
+        connection.defaultDevice([&](std::shared_ptr<VRXDevice> device) { replies += device ? 100 : 1; });
+        isAsked.wait();
+    }
+    EXPECT_EQ(failures, 2);
+    EXPECT_EQ(replies, 2);
+    held(true);
+}
+
+TEST(AgentConnection, GivesRecordsTheirDerivedTextsWithoutAPlatform) {
+    platform::Platform* before = platform::Platform::hasCurrent() ? &platform::Platform::current() : nullptr;
+    platform::Platform::setCurrent(nullptr);
+    AgentConnection connection({.socketPath = "/nowhere"});
+    const double inThreeDays =
+        std::chrono::duration<double>(std::chrono::system_clock::now().time_since_epoch()).count() + 2.5 * 86400;
+    auto record = VRXWarranty::initWithDictionary(
+        platform::Dictionary{{"qxOfferEligibleUntil", inThreeDays}, {"qxLocalizedOfferPluralDescFormat", "%@ days"}});
+    EXPECT_EQ(record->daysEligible(), 3u);
+    EXPECT_EQ(record->qxLocalizedOfferDesc(), Value("3 days"));
+    platform::Platform::setCurrent(before);
+}
+
+}  // namespace
+}  // namespace vrx::test
