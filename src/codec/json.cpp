@@ -49,7 +49,7 @@ class JsonReader {
 
 public:
     // The events of nlohmann::json; false ends the parse.
-    bool null() { return add(Value()); }
+    bool null() { return add({}); }
     bool boolean(bool value) { return add(value); }
     bool number_integer(Json::number_integer_t value) { return add(value); }
     bool number_unsigned(Json::number_unsigned_t value) { return add(value); }
@@ -73,7 +73,7 @@ public:
     const std::string& complaint() const { return complaint_; }
 
 private:
-    bool add(Value value) { return withinLimit(builder_.add(std::move(value))); }
+    bool add(Value&& value) { return withinLimit(builder_.add(std::move(value))); }
     bool end() {
         builder_.end();
         return true;

@@ -15,7 +15,7 @@ bool ValueBuilder::expectsKey() const {
     return !open_.empty() && open_.back().isDictionary && !open_.back().hasKey;
 }
 
-bool ValueBuilder::add(Value value) {
+bool ValueBuilder::add(Value&& value) {
     if (!count()) return false;
     place(std::move(value));
     return true;
@@ -54,7 +54,7 @@ bool ValueBuilder::count() {
     return true;
 }
 
-void ValueBuilder::place(Value value) {
+void ValueBuilder::place(Value&& value) {
     if (open_.empty()) {
         root_ = std::move(value);
     } else if (Container& container = open_.back(); container.isDictionary) {

@@ -20,7 +20,7 @@ public:
     bool isComplete() const { return count_ > 0 && open_.empty(); }
 
     // These return false when a limit is passed; complaint() says which.
-    bool add(platform::Value value);
+    bool add(platform::Value&& value);
     bool beginArray() { return begin(false); }
     bool beginDictionary() { return begin(true); }
     const char* complaint() const { return complaint_; }
@@ -42,7 +42,7 @@ private:
 
     bool begin(bool isDictionary);
     bool count();
-    void place(platform::Value value);
+    void place(platform::Value&& value);
 
     std::vector<Container> open_;
     platform::Value root_;
