@@ -34,24 +34,6 @@ struct Node final : platform::Archivable {
     std::shared_ptr<Node> next;
 };
 
-// What is left of a value in its archive.
-Value kept(const Value& value) {
-    auto isKept = [](const Value& v) { return !v.isNull() && !v.asData(); };
-    if (const auto* elements = value.asArray()) {
-        platform::Array list;
-        for (const Value& element : *elements)
-            if (isKept(element)) list.push_back(kept(element));
-        return list;
-    }
-    if (const auto* entries = value.asDictionary()) {
-        platform::Dictionary dictionary;
-        for (const auto& [key, element] : *entries)
-            if (isKept(element)) dictionary[key] = kept(element);
-        return dictionary;
-    }
-    return isKept(value) ? value : Value();
-}
-
 void require(bool holds) {
     if (!holds) std::abort();
 }
@@ -72,7 +54,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t siz
     Node node;
     node.value = value;
     const auto restored = codec::unarchive<Node>(codec::archive(node));
-    require(restored && same((*restored)->value, kept(value)));
+    require(restored && same(codec::archiveValue((*restored)->value), codec::archiveValue(value)));
 
     if (const auto sent = codec::unarchive<Node>(value)) {
         const auto again = codec::unarchive<Node>(codec::archive(**sent));
