@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <array>
 #include <cstdio>
+#include <filesystem>
 
 #include "codec/json.h"
 #include "codec/unicode.h"
@@ -79,6 +80,12 @@ std::string printableValue(const Value& value) {
     if (const std::string* text = value.asString()) return printable(*text);
     if (value.asDate() || value.isNull()) return printable(value.description());
     return printable(codec::printedJson(value, codec::JsonLayout::OneLine));
+}
+
+std::string absolutePath(const std::string& path) {
+    std::string result = std::filesystem::absolute(path).lexically_normal();
+    while (result.size() > 1 && result.ends_with('/')) result.pop_back();
+    return result;
 }
 
 std::string table(const std::vector<std::vector<std::string>>& rows) {

@@ -39,6 +39,9 @@ Outcome failed(ExitCode code, std::string problem, std::string advice);
 std::string printable(std::string_view text);
 std::string printableValue(const platform::Value& value);
 
+// A path from the command line, in the form that the host needs: absolute, without a slash at its end.
+std::string absolutePath(const std::string& path);
+
 // Left-aligned columns, a line each row, the first row being the heading; cells are made printable.
 std::string table(const std::vector<std::vector<std::string>>& rows);
 

@@ -75,6 +75,15 @@ std::string offerText(const VRXWarranty& record) {
     return "until " + textOf(record.qxOfferEligibleUntil()) + ", days left: " + std::to_string(record.daysEligible());
 }
 
+// An entry of a list, whose form is the server's affair: of a dictionary the values, such as "Repairs: at no cost".
+std::string entryText(const Value& entry) {
+    const Dictionary* parts = entry.asDictionary();
+    if (!parts) return printableValue(entry);
+    std::string text;
+    for (const auto& [key, part] : *parts) text += (text.empty() ? "" : ": ") + printableValue(part);
+    return text;
+}
+
 std::string textOf(const VRXWarranty& record) {
     std::string text;
     auto line = [&](const std::string& name, const std::string& content) {
@@ -88,14 +97,14 @@ std::string textOf(const VRXWarranty& record) {
     sent("Description", record.coverageLocalizedDesc());
     sent("Expiration", record.coverageLocalizedExpirationLabel());
     if (const Array* details = record.coverageDetailsArray().asArray())
-        for (const Value& detail : *details) sent("Detail", detail);
+        for (const Value& detail : *details) line("Detail", entryText(detail));
     if (const Array* benefits = record.benefitDetailsArray().asArray())
-        for (const Value& benefit : *benefits) sent("Benefit", benefit);
+        for (const Value& benefit : *benefits) line("Benefit", entryText(benefit));
     line("Offer", offerText(record));
     if (record.qxOfferEligible()) {
         sent("Offer label", record.qxLocalizedOfferLabel());
         sent("Offer text", record.qxLocalizedOfferDesc());
-        sent("Offer details", record.qxLocalizedOfferDetailsEligibility());
+        sent("Offer period", record.qxLocalizedOfferDetailsEligibility());
     }
     return text;
 }

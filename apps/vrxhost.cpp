@@ -238,7 +238,7 @@ int run(int argc, const char* const* argv) {
     // Within the home, which must be there.
     auto inHome = [&options](auto verb) {
         return [&options, verb]() -> Outcome {
-            const std::string path = wire::findLocations(options.places).home.path;
+            const std::string path = absolutePath(wire::findLocations(options.places).home.path);
             const std::string database = Home::databasePath(path);
             std::error_code error;
             if (!std::filesystem::exists(database, error))

@@ -1,0 +1,74 @@
+// vrxagent: the agent. Serves its clients until SIGTERM or SIGINT. Exit codes: 0 ended cleanly, 1 could not start or go
+// on, 2 usage.
+#include <systemd/sd-daemon.h>
+
+#include <CLI/CLI.hpp>
+#include <cstdio>
+#include <exception>
+#include <map>
+
+#include "command_line.h"
+#include "host/host.h"
+#include "host/service/bundle_lookup.h"
+#include "host/service/service_listener.h"
+#include "platform/log.h"
+#include "service/start_up.h"
+#include "wire/locations.h"
+
+namespace {
+
+using vrx::host::BundleLookup;
+using vrx::host::HomeUse;
+using vrx::host::Host;
+using vrx::host::ServiceListenerFactory;
+using vrx::platform::Level;
+using vrx::platform::MaybeError;
+
+int cannotStart(const std::string& why) {
+    std::fprintf(stderr, "vrxagent: %s\n", vrx::apps::printable(why).c_str());
+    return 1;
+}
+
+int serve(const vrx::wire::Locations& places, Level logLevel) {
+    Host host({.home = vrx::apps::absolutePath(places.home.path), .profile = places.profile.path}, logLevel);
+    if (MaybeError error = host.open(HomeUse::Agent)) return cannotStart(error->text);
+    BundleLookup bundles([&] { return host.profile().facts(); });
+    ServiceListenerFactory factory(host.mainLoop().event(), bundles);
+    if (MaybeError error = factory.open(places.socket.path)) return cannotStart(error->text);
+    host.setBundleLookup(&bundles);
+    host.setServiceListenerFactory(&factory);
+
+    const vrx::StartUp startUp;
+    log(Level::Default, "ready: home %@, profile %@, socket %@", host.home(), places.profile.path, places.socket.path);
+    sd_notify(0, "READY=1");
+    host.mainLoop().run();
+    sd_notify(0, "STOPPING=1");
+    return 0;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    CLI::App app("Keeps track of the hardware coverage of this device and its paired watches.", "vrxagent");
+    vrx::wire::LocationOverrides places;
+    Level logLevel = Level::Default;
+    const std::map<std::string, Level> levels{
+        {"debug", Level::Debug}, {"default", Level::Default}, {"error", Level::Error}};
+    app.add_option("--home", places.home, "Where settings and cached records are kept")->type_name("PATH");
+    app.add_option("--device", places.profile, "The device profile")->type_name("PATH");
+    app.add_option("--socket", places.socket, "The socket at which clients connect")->type_name("PATH");
+    app.add_option("--log-level", logLevel, "The lowest level that is logged: debug, default or error")
+        ->type_name("LEVEL")
+        ->transform(CLI::CheckedTransformer(levels).description(""));
+    app.set_version_flag("--version", "vrxagent " VRX_VERSION);
+    try {
+        app.parse(argc, argv);
+    } catch (const CLI::ParseError& error) {
+        return app.exit(error) == 0 ? 0 : 2;
+    }
+    try {
+        return serve(vrx::wire::findLocations(places), logLevel);
+    } catch (const std::exception& error) {
+        return cannotStart(error.what());
+    }
+}
