@@ -78,6 +78,7 @@ private:
         if (!widths || table < header.size() || table > trailer || objectCount_ > (trailer - table) / offsetWidth_)
             return complain(trailer, "the trailer does not fit the document");
         offsetTable_ = static_cast<std::size_t>(table);
+        contents_.reserve(static_cast<std::size_t>(std::min<std::uint64_t>(objectCount_, limits::documentValues)));
         return true;
     }
 
@@ -206,7 +207,9 @@ private:
         for (std::size_t i = 0; i < object.count && complaint_.empty(); ++i) {
             const Value key = readKey(object, i);
             const std::string* name = key.asString();
-            if (name) entries.insert_or_assign(*name, readReferred(object, object.count + i, depth + 1));
+            if (!name) break;
+            // Most writers, ours among them, write keys in order: they belong at the end.
+            entries.insert_or_assign(entries.end(), *name, readReferred(object, object.count + i, depth + 1));
         }
         return entries;
     }
