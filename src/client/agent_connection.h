@@ -70,7 +70,7 @@ private:
 };
 
 struct ConnectionOptions {
-    std::string socketPath;               // empty: where wire::findLocations() says
+    std::string socketPath = {};          // empty: where wire::findLocations() says
     platform::Duration timeLimit{420.0};  // of a call, in seconds: longer than any download of the agent
     std::size_t connections = 8;
 };

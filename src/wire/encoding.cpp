@@ -331,6 +331,11 @@ bool isCarriedAsString(std::string_view bytes) {
                 continue;
             }
         }
+        const auto first = static_cast<unsigned char>(bytes.front());
+        if (first > 0 && first < 0x80) {
+            bytes.remove_prefix(1);
+            continue;
+        }
         const std::optional<char32_t> character = codec::takeCharacter(bytes);
         if (!character || *character == 0 || isNoCharacter(*character)) return false;
     }

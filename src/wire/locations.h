@@ -10,9 +10,9 @@ namespace vrx::wire {
 
 // What the command line says: --home, --device, --socket.
 struct LocationOverrides {
-    std::optional<std::string> home;
-    std::optional<std::string> profile;
-    std::optional<std::string> socket;
+    std::optional<std::string> home = {};
+    std::optional<std::string> profile = {};
+    std::optional<std::string> socket = {};
 };
 
 struct Location {

@@ -69,6 +69,13 @@ Refusals::~Refusals() {
 }
 
 void Refusals::refuse(Descriptor socket, pid_t peer, const char* errorName, std::string text) {
+    if (!thread_.joinable()) {
+        try {
+            thread_ = std::thread([this] { run(); });
+        } catch (const std::system_error&) {
+            return;  // no thread to be had: the client learns nothing
+        }
+    }
     {
         std::lock_guard lock(mutex_);
         if (count_ >= limits_.refusals) return;
@@ -77,7 +84,6 @@ void Refusals::refuse(Descriptor socket, pid_t peer, const char* errorName, std:
                                                       steady_clock::now() + limits_.refusal));
     }
     eventfd_write(wakeFile_.number(), 1);
-    if (!thread_.joinable()) thread_ = std::thread([this] { run(); });
 }
 
 void Refusals::run() {

@@ -122,6 +122,7 @@ private:
     }
 
     void refuse(ServiceConnection& connection, const char* errorName, std::string text) {
+        if (connection.isResumed()) return;  // it ends with its object
         if (Descriptor socket = connection.takeSocket())
             refusals_.refuse(std::move(socket), connection.processIdentifier(), errorName, std::move(text));
     }
