@@ -53,8 +53,8 @@ TEST(AgentConnection, AsksEveryOperationAndWaits) {
     EXPECT_TRUE(info->warranty()->covered());
     EXPECT_EQ(connection.getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicyCachedOnly, true)->size(), 2u);
     EXPECT_TRUE(*connection.dismissFollowUpForSerialNumber("SN1"));
-    EXPECT_THAT(agent->requests, ElementsAre("outreach", "store com.example", "support com.example", "url", "device",
-                                             "paired", "info 2", "info SN7 77", "all 1 update", "dismiss SN1"));
+    EXPECT_THAT(agent->requests(), ElementsAre("outreach", "store com.example", "support com.example", "url", "device",
+                                               "paired", "info 2", "info SN7 77", "all 1 update", "dismiss SN1"));
 }
 
 TEST(AgentConnection, RepliesLaterOnAThreadOfItsOwn) {

@@ -48,8 +48,12 @@ public:
     std::shared_ptr<VRXDevice> device =
         VRXDevice::deviceWithName("Phone", "SN1", platform::dateFromEpoch(1.5e9), VRXDeviceTypeDefault);
     Value record = platform::Dictionary{{"covered", true}};
-    std::vector<std::string> requests;  // with their arguments
 
+    // The requests so far, with their arguments.
+    std::vector<std::string> requests() {
+        std::lock_guard lock(mutex_);
+        return requests_;
+    }
     std::shared_ptr<VRXDeviceInfo> info() const {
         return VRXDeviceInfo::deviceInfoWithDevice(device, VRXWarranty::initWithDictionary(record));
     }
@@ -107,9 +111,10 @@ public:
 private:
     void note(std::string request) {
         std::lock_guard lock(mutex_);
-        requests.push_back(std::move(request));
+        requests_.push_back(std::move(request));
     }
     std::mutex mutex_;
+    std::vector<std::string> requests_;
 };
 
 // The service of a fake agent, at a socket in a temporary folder.

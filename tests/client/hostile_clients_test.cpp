@@ -60,7 +60,7 @@ TEST_F(HostileClients, WriteGarbage) {
         EXPECT_TRUE(client.isClosedByAgent()) << "a message is too long, by its header";
     }
     expectGoesOn(service);
-    EXPECT_EQ(agent->requests.size(), 2u);
+    EXPECT_EQ(agent->requests().size(), 2u);
 }
 
 TEST_F(HostileClients, NeverSpeak) {
@@ -144,7 +144,7 @@ TEST_F(HostileClients, HandTheirConnectionToAnotherProcess) {
     }
     EXPECT_TRUE(client.isClosedByAgent());
     wait(nullptr);
-    EXPECT_EQ(agent->requests.size(), 1u);
+    EXPECT_EQ(agent->requests().size(), 1u);
 }
 
 TEST_F(HostileClients, RunAnotherProgram) {
@@ -179,7 +179,7 @@ TEST_F(HostileClients, RunAnotherProgram) {
     int status = 0;
     wait(&status);
     EXPECT_EQ(status, 0);
-    EXPECT_EQ(agent->requests.size(), 1u);
+    EXPECT_EQ(agent->requests().size(), 1u);
     unlink(callFile.c_str());
 }
 
