@@ -105,6 +105,7 @@ std::string table(const std::vector<std::vector<std::string>>& rows) {
             result += line[column];
             if (column + 1 < line.size()) result.append(widths[column] - characters(line[column]) + 2, ' ');
         }
+        result.erase(result.find_last_not_of(' ') + 1);
         result += '\n';
     }
     return result;
