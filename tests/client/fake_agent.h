@@ -27,6 +27,10 @@ public:
         isSet_ = true;
         changed_.notify_all();
     }
+    void reset() {
+        std::lock_guard lock(mutex_);
+        isSet_ = false;
+    }
     void wait() {
         std::unique_lock lock(mutex_);
         changed_.wait(lock, [this] { return isSet_; });
@@ -146,6 +150,7 @@ public:
             loop_ = &loop;
             isReady.set();
             loop.run();
+            mayEnd_.wait();
             listener_.reset();
         });
         isReady.wait();
@@ -155,7 +160,9 @@ public:
     void stop() {
         if (!thread_.joinable()) return;
         loop_->stop();
+        mayEnd_.set();  // the loop is of no more use to this thread
         thread_.join();
+        mayEnd_.reset();
     }
 
     // The agent ends and comes back, while its service manager keeps the socket.
@@ -194,6 +201,7 @@ private:
     host::BundleLookup bundles_;
     std::thread thread_;
     host::MainLoop* loop_ = nullptr;
+    Signal mayEnd_;
     host::ServiceListenerFactory* factory_ = nullptr;
     std::unique_ptr<platform::ServiceListener> listener_;
 };
