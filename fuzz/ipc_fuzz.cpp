@@ -135,11 +135,12 @@ void fuzzRequests(const std::string& bytes) {
     platform::ScopedPlatform current(platform);
     int ends[2];
     require(socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0, ends) == 0);
-    host::Descriptor client(ends[1]);
+    const host::Descriptor client(ends[1]);
+    host::Descriptor agentEnd(ends[0]);
     auto peer = host::PeerIdentity::ofPeer(ends[0]);
     require(static_cast<bool>(peer));
     host::ServiceLimits limits;
-    host::ClientSession session(host::Descriptor(ends[0]), *peer, std::make_shared<Agent>(),
+    host::ClientSession session(std::move(agentEnd), *peer, std::make_shared<Agent>(),
                                 std::make_shared<host::ReplyBox>(), limits);
     std::string hex;
     for (char digit : std::to_string(getuid())) hex += std::string("3") + digit;
