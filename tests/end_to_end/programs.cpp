@@ -1,0 +1,174 @@
+#include "programs.h"
+
+#include <fcntl.h>
+#include <poll.h>
+#include <spawn.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <sys/un.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <array>
+#include <atomic>
+#include <csignal>
+#include <filesystem>
+#include <fstream>
+
+#include "codec/json.h"
+
+extern char** environ;
+
+namespace vrx::end_to_end {
+
+namespace {
+
+std::vector<char*> pointers(const Arguments& texts) {
+    std::vector<char*> result;
+    for (const std::string& text : texts) result.push_back(const_cast<char*>(text.c_str()));
+    result.push_back(nullptr);
+    return result;
+}
+
+// Where the agent sends its service manager's notices.
+class NoticeSocket {
+public:
+    explicit NoticeSocket(const std::string& path) : file_(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0)) {
+        sockaddr_un address{};
+        address.sun_family = AF_UNIX;
+        path.copy(address.sun_path, sizeof address.sun_path - 1);
+        unlink(path.c_str());
+        EXPECT_EQ(bind(file_, reinterpret_cast<sockaddr*>(&address), sizeof address), 0);
+    }
+    ~NoticeSocket() { close(file_); }
+    NoticeSocket(const NoticeSocket&) = delete;
+    NoticeSocket& operator=(const NoticeSocket&) = delete;
+
+    // Whether a notice came before the process ended.
+    bool isNotified(const Process& process) const {
+        std::array<pollfd, 2> files{{{file_, POLLIN, 0}, {process.endedFile(), POLLIN, 0}}};
+        poll(files.data(), files.size(), -1);
+        return (files[0].revents & POLLIN) != 0;
+    }
+
+private:
+    const int file_;
+};
+
+}  // namespace
+
+std::string fileText(const std::string& path) {
+    std::ifstream file(path, std::ios::binary);
+    return {std::istreambuf_iterator<char>(file), {}};
+}
+
+Process::Process(const std::string& folder, const std::string& program, const Arguments& arguments,
+                 const Arguments& environment) {
+    static std::atomic<int> count = 0;
+    files_ = folder + "/process-" + std::to_string(++count);
+    posix_spawn_file_actions_t actions;
+    posix_spawn_file_actions_init(&actions);
+    posix_spawn_file_actions_addopen(&actions, 0, "/dev/null", O_RDONLY, 0);
+    posix_spawn_file_actions_addopen(&actions, 1, (files_ + ".out").c_str(), O_WRONLY | O_CREAT, 0600);
+    posix_spawn_file_actions_addopen(&actions, 2, (files_ + ".err").c_str(), O_WRONLY | O_CREAT, 0600);
+    Arguments words{program};
+    words.insert(words.end(), arguments.begin(), arguments.end());
+    Arguments variables = environment;
+    for (char** variable = environ; *variable; ++variable) variables.emplace_back(*variable);
+    EXPECT_EQ(
+        posix_spawn(&pid_, program.c_str(), &actions, nullptr, pointers(words).data(), pointers(variables).data()), 0)
+        << program;
+    posix_spawn_file_actions_destroy(&actions);
+    pidFile_ = static_cast<int>(syscall(SYS_pidfd_open, pid_, 0));
+}
+
+Process::~Process() {
+    if (!result_) {
+        signal(SIGKILL);
+        wait();
+    }
+    close(pidFile_);
+}
+
+void Process::signal(int number) const {
+    kill(pid_, number);
+}
+
+int Process::wait() {
+    if (result_) return *result_;
+    int status = 0;
+    waitpid(pid_, &status, 0);
+    result_ = WIFEXITED(status) ? WEXITSTATUS(status) : -WTERMSIG(status);
+    return *result_;
+}
+
+std::string Process::output() const {
+    return fileText(files_ + ".out");
+}
+
+std::string Process::errors() const {
+    return fileText(files_ + ".err");
+}
+
+Place::Place() {
+    umask(022);  // a bundle that others can write is none
+    std::string pattern = std::filesystem::canonical(std::filesystem::temp_directory_path()) / "vrx-XXXXXX";
+    folder_ = mkdtemp(pattern.data());
+    std::filesystem::create_directory(*this / "app");
+    for (const char* name : {"vrxctl", "bundle.toml"})
+        std::filesystem::copy(std::string(VRX_PROGRAMS "/") + name, *this / "app");
+    std::filesystem::copy(VRX_SOURCE "/examples/device.toml", folder_);
+    std::filesystem::copy(VRX_SOURCE "/examples/coverage", *this / "coverage");
+}
+
+Place::~Place() {
+    agent_.reset();
+    std::filesystem::remove_all(folder_);
+}
+
+void Place::write(const std::string& name, const std::string& text) const {
+    std::ofstream(*this / name, std::ios::binary) << text;
+}
+
+void Place::start() {
+    const NoticeSocket notices(*this / "notices");
+    agent_ = std::make_unique<Process>(
+        folder_, VRX_PROGRAMS "/vrxagent",
+        Arguments{"--home", *this / "home", "--device", *this / "device.toml", "--socket", *this / "socket"},
+        Arguments{"NOTIFY_SOCKET=" + *this / "notices"});
+    isReady_ = notices.isNotified(*agent_);
+}
+
+int Place::stop() {
+    agent_->signal(SIGTERM);
+    return agent_->wait();
+}
+
+void Place::useCoverageFiles() {
+    for (auto [key, file] : {std::pair("WarrantyURL", "coverage/Warranty.plist"),
+                             std::pair("ServerVersionURL", "coverage/ServerVersion.plist")})
+        ASSERT_EQ(vrxhost({"defaults", "write", key, "--string", "file://" + *this / file}).code, 0);
+}
+
+Place::Outcome Place::vrxctl(const Arguments& arguments, const std::string& socket) const {
+    Arguments all{"--socket", *this / socket};
+    all.insert(all.end(), arguments.begin(), arguments.end());
+    return run(*this / "app/vrxctl", all);
+}
+
+Place::Outcome Place::vrxhost(const Arguments& arguments, const std::string& home) const {
+    Arguments all{"--home", *this / home};
+    all.insert(all.end(), arguments.begin(), arguments.end());
+    return run(VRX_PROGRAMS "/vrxhost", all);
+}
+
+Place::Outcome Place::run(const std::string& program, const Arguments& arguments) const {
+    Process process(folder_, program, arguments);
+    const int code = process.wait();
+    Outcome outcome{code, process.output(), process.errors(), {}};
+    if (auto document = codec::parseJson(outcome.output)) outcome.document = *document;
+    return outcome;
+}
+
+}  // namespace vrx::end_to_end

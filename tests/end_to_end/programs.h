@@ -1,0 +1,83 @@
+// The real programs in a folder of their own that goes away: started, stopped and asked without waiting for anything
+// but what they do.
+#pragma once
+
+#include <gtest/gtest.h>
+
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "platform/value.h"
+
+namespace vrx::end_to_end {
+
+using Arguments = std::vector<std::string>;
+
+std::string fileText(const std::string& path);
+
+// A child process with its standard output and error in files.
+class Process {
+public:
+    // The environment is this process's, with the given variables in front.
+    Process(const std::string& folder, const std::string& program, const Arguments& arguments,
+            const Arguments& environment = {});
+    ~Process();  // kills it, if it has not been waited for
+    Process(const Process&) = delete;
+    Process& operator=(const Process&) = delete;
+
+    void signal(int number) const;
+    // Its exit code, or the negative signal that ended it.
+    int wait();
+    // Readable once it has ended.
+    int endedFile() const { return pidFile_; }
+
+    std::string output() const;
+    std::string errors() const;
+
+private:
+    std::string files_;
+    int pid_ = 0;
+    int pidFile_ = -1;
+    std::optional<int> result_;
+};
+
+// A folder with an agent's home, profile, socket and coverage files, and an entitled copy of vrxctl.
+class Place {
+public:
+    Place();
+    ~Place();
+    Place(const Place&) = delete;
+    Place& operator=(const Place&) = delete;
+
+    std::string operator/(const std::string& name) const { return folder_ + "/" + name; }
+    void write(const std::string& name, const std::string& text) const;
+
+    // An agent of this place: comes back once it is ready or has ended.
+    void start();
+    bool isReady() const { return isReady_; }
+    Process& agent() { return *agent_; }
+    // SIGTERM, and what wait() gives.
+    int stop();
+    // Has the running agent take records and server versions from the coverage files.
+    void useCoverageFiles();
+
+    struct Outcome {
+        int code;
+        std::string output;
+        std::string errors;
+        platform::Value document;  // of the output, null when it is no JSON
+    };
+    Outcome vrxctl(const Arguments& arguments, const std::string& socket = "socket") const;
+    Outcome vrxhost(const Arguments& arguments, const std::string& home = "home") const;
+    // A path in the programs' folder, or here.
+    Outcome run(const std::string& program, const Arguments& arguments) const;
+
+private:
+    std::string folder_;
+    std::unique_ptr<Process> agent_;
+    bool isReady_ = false;
+};
+
+}  // namespace vrx::end_to_end
