@@ -111,7 +111,7 @@ class Agent final : public VRXAgentProtocol {
         reply(platform::Dictionary{{id, 1}});
     }
     void appSupportAvailability(std::string id, Reply<platform::Value> reply) override { reply(id); }
-    void readWebURLOverride(Reply<std::optional<std::string>> reply) override { reply(std::nullopt); }
+    void readWebURLOverride(Reply<std::optional<std::string>> reply) override { reply("u"); }
     void defaultDevice(Reply<std::shared_ptr<VRXDevice>> reply) override { reply(nullptr); }
     void pairedDevices(Reply<DeviceList> reply) override { reply({}); }
     void getDefaultDeviceInfoUsingPolicy(VRXWarrantyLookupPolicy,

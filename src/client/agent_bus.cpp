@@ -36,7 +36,7 @@ MaybeError cannotConnect(const std::string& path, int error) {
 
 // Releases what sd-bus fills in while it is alive.
 struct BusError {
-    sd_bus_error error = SD_BUS_ERROR_NULL;
+    sd_bus_error error{};
     ~BusError() { sd_bus_error_free(&error); }
     bool is(const char* name) const { return sd_bus_error_has_name(&error, name) > 0; }
     std::string text() const { return error.message ? error.message : error.name ? error.name : "unknown error"; }
