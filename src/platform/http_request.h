@@ -25,14 +25,14 @@ struct HttpRequest {
     HttpHeaders headers;
     Data body;
     std::optional<Duration> timeout;  // total, from resolving to the last byte; the session's own when absent
-    std::optional<std::string> sourceApplication;  // the bundle identifier of the application that the traffic is for
+    std::optional<std::string> sourceApplication{};  // the bundle identifier of the application that the traffic is for
 };
 
 struct HttpResponse {
     int status = 0;  // 0 when there is no HTTP response
-    HttpHeaders headers;
-    std::optional<Data> body;  // absent when none arrived
-    MaybeError error;          // of the transport
+    HttpHeaders headers{};
+    std::optional<Data> body{};  // absent when none arrived
+    MaybeError error{};          // of the transport
 };
 
 class HttpSession {
