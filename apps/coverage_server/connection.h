@@ -22,7 +22,8 @@ class Connection final : public httplib::Stream {
 public:
     // What the service notes of the request under way, begun anew with each.
     struct Exchange {
-        std::uint64_t request = 0;  // its number in the log, 0 when it was too malformed to be served
+        bool isServed = false;      // false for what was too malformed
+        std::uint64_t request = 0;  // its number in the log
         std::string fault;
         std::string reason;
         std::chrono::steady_clock::time_point begun;

@@ -153,13 +153,13 @@ void CoverageService::answered(const httplib::Request& request, const httplib::R
                                const Connection& connection) {
     const Connection::Exchange& exchange = connection.exchange;
     const int status = connection.isTakenOver() ? connection.status() : response.status;
-    if (exchange.request == 0) log_.countMalformed(status);
+    if (!exchange.isServed) log_.countMalformed(status);
     const SeenRequest seen =
-        exchange.request ? log_.finish(exchange.request, status, exchange.fault, exchange.reason) : SeenRequest{};
+        exchange.isServed ? log_.finish(exchange.request, status, exchange.fault, exchange.reason) : SeenRequest{};
 
     const auto taken = std::chrono::steady_clock::now() - exchange.begun;
     std::string line = "#" + std::to_string(connection.id()) + "." + std::to_string(connection.requests()) + " ";
-    line += exchange.request ? request.method + " " + printable(request.target) : "malformed request";
+    line += exchange.isServed ? request.method + " " + printable(request.target) : "malformed request";
     line += " " + (status ? std::to_string(status) : "unanswered");
     line += " " + std::to_string(std::chrono::duration_cast<Milliseconds>(taken).count()) + "ms";
     if (!exchange.fault.empty()) line += " fault=" + printable(exchange.fault);

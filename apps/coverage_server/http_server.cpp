@@ -28,6 +28,7 @@ thread_local Connection* servedConnection = nullptr;
 HttpServer::HttpServer(HttpService& service, int port, SSL_CTX* tls, std::chrono::seconds keepAlive)
     : service_(service), tls_(tls), keepAlive_(keepAlive), listener_(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0)) {
     auto serve = [this](const httplib::Request& request, httplib::Response& response) {
+        servedConnection->exchange.isServed = true;
         service_.serve(request, response, *servedConnection);
     };
     Get(".*", serve).Post(".*", serve).Put(".*", serve).Patch(".*", serve).Delete(".*", serve).Options(".*", serve);
@@ -122,8 +123,11 @@ void HttpServer::serveConnection(int socket, std::uint64_t id) {
                     }
                 };
                 bool isClosed = false;
-                while (!isClosed && connection.awaitRequest(idle))
+                while (!isClosed && connection.awaitRequest(idle)) {
                     if (!process_request(connection, keepAlive_.count() == 0, isClosed, keepCompressed)) break;
+                    // Where the next request would begin after a malformed one, nobody knows.
+                    if (!connection.exchange.isServed) break;
+                }
             }
         }
         service_.ended(connection);

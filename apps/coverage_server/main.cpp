@@ -93,11 +93,13 @@ std::optional<int> parse(int argc, char** argv, Options& options) {
                    "Folder of records: SERIAL.json, else default.json, read for each request. Strings such as @now+30d "
                    "or @now-12h:ms become epoch numbers")
         ->check(CLI::ExistingDirectory);
-    app.add_option("--token", options.service.tokens, "A valid token, repeatable (development-token)");
+    app.add_option("--token", options.service.tokens, "A valid token, repeatable (development-token)")
+        ->allow_extra_args(false);
     app.add_option("--require-header", options.service.requiredHeaders,
                    "A header that a coverage request needs, repeatable, in place of X-Orvane-Client-Info, "
-                   "X-Orvane-Device-Id and X-Orvane-Account-*; none for none. NAME* is any one that begins so");
-    app.add_option("--fault", faults, "A fault, repeatable; see below");
+                   "X-Orvane-Device-Id and X-Orvane-Account-*; none for none. NAME* is any one that begins so")
+        ->allow_extra_args(false);
+    app.add_option("--fault", faults, "A fault, repeatable; see below")->allow_extra_args(false);
 
     const char* document = "Server-version document";
     app.add_option("--low-version", serverVersion.lowVersion, "LowServerVersion; none leaves it out")

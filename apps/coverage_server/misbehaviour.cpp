@@ -169,6 +169,15 @@ void answer(httplib::Response& response, std::string body, const char* type) {
     response.set_content(std::move(body), type);
 }
 
+// Another document in place of the genuine one, to be cached as that would be; an answer without one stays as it is.
+void bend(httplib::Response& response, std::string body) {
+    if (response.status != 200) return;
+    const std::string type = response.get_header_value("Content-Type");
+    const std::string cacheControl = response.get_header_value("Cache-Control");
+    answer(response, std::move(body), type.c_str());
+    if (!cacheControl.empty()) response.set_header("Cache-Control", cacheControl);
+}
+
 std::string withNulls(const std::string& record, const std::string& name) {
     Json json = Json::parse(record, nullptr, false);
     if (!json.is_object()) return record;
@@ -223,9 +232,8 @@ void misbehave(const Fault& fault, Endpoint endpoint, const httplib::Request& re
             return answer(response, "<!DOCTYPE html><html><body><h1>Sign in to this network</h1></body></html>\n",
                           "text/html");
         case FaultKind::Array:
-            return answer(response, endpoint == Endpoint::ServerVersion ? arrayLike(body) : "[" + body + "]",
-                          mediaType(endpoint));
-        case FaultKind::Nulls: return answer(response, withNulls(body, fault.value), mediaType(endpoint));
+            return bend(response, endpoint == Endpoint::ServerVersion ? arrayLike(body) : "[" + body + "]");
+        case FaultKind::Nulls: return bend(response, withNulls(body, fault.value));
         case FaultKind::Body: return answer(response, fault.value, mediaType(endpoint));
         case FaultKind::Empty: return answer(response, "", mediaType(endpoint));
         case FaultKind::Large: return sendLarge(fault.number, endpoint, connection);

@@ -13,6 +13,7 @@ namespace vrx::coverage_server {
 namespace {
 
 constexpr std::size_t requestsKept = 4096;
+constexpr std::size_t bytesKept = 32 * 1024 * 1024;
 constexpr std::size_t bodyBytesKept = 16 * 1024;
 
 std::string isoTime(std::chrono::system_clock::time_point time) {
@@ -60,6 +61,13 @@ Json SeenRequest::json(bool hidesTokens) const {
             {"reason", reason.empty() ? Json(nullptr) : Json(reason)}};
 }
 
+std::size_t SeenRequest::bytes() const {
+    constexpr std::size_t each = 100;
+    std::size_t bytes = body.size() + path.size() + each;
+    for (const auto& [name, value] : headers) bytes += name.size() + value.size() + each;
+    return bytes;
+}
+
 std::uint64_t RequestLog::begin(SeenRequest request) {
     if (request.body.size() > bodyBytesKept) request.body.resize(bodyBytesKept);
     std::lock_guard lock(mutex_);
@@ -67,8 +75,12 @@ std::uint64_t RequestLog::begin(SeenRequest request) {
     ++counters_.requests;
     if (request.requestOfConnection > 1) ++counters_.onReusedConnections;
     ++counters_.byEndpoint[request.endpoint.empty() ? "other" : request.endpoint];
+    keptBytes_ += request.bytes();
     kept_.push_back(std::move(request));
-    if (kept_.size() > requestsKept) kept_.pop_front();
+    while (kept_.size() > requestsKept || keptBytes_ > bytesKept) {
+        keptBytes_ -= kept_.front().bytes();
+        kept_.pop_front();
+    }
     changed_.notify_all();
     return lastId_;
 }
@@ -129,6 +141,7 @@ RequestLog::Seen RequestLog::requests(std::size_t atLeast, bool answered, std::c
 void RequestLog::clearRequests() {
     std::lock_guard lock(mutex_);
     kept_.clear();
+    keptBytes_ = 0;
 }
 
 Json RequestLog::counters() const {

@@ -32,6 +32,7 @@ struct SeenRequest {
     std::string reason;
 
     Json json(bool hidesTokens) const;
+    std::size_t bytes() const;  // that keeping it takes, about
 };
 
 class RequestLog {
@@ -65,6 +66,7 @@ private:
     bool isEnding_ = false;
     std::uint64_t lastId_ = 0;
     std::deque<SeenRequest> kept_;
+    std::size_t keptBytes_ = 0;
 
     struct Counters {
         std::uint64_t connections = 0, ended = 0, refused = 0, handshakeFailures = 0;
