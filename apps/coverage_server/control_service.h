@@ -10,7 +10,7 @@ namespace vrx::coverage_server {
 
 inline constexpr std::string_view controlHelp =
     "  GET    /faults        the faults, with what is left of their counts\n"
-    "  POST   /faults        adds a fault, or an array of them: a specification as a string, or\n"
+    "  POST   /faults        adds a fault, or an array of them: a description as a string, or\n"
     "                        {\"endpoint\",\"kind\",\"value\",\"count\",\"skip\",\"code\"}; gives their ids\n"
     "  DELETE /faults        removes all; /faults/ID removes one\n"
     "  GET    /requests      the requests seen, in order (at most the last 4096): id, time, connection,\n"

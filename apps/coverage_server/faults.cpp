@@ -178,7 +178,7 @@ Fault parseFault(std::string_view spec) {
 Fault parseFault(const Json& json) {
     if (json.is_string()) return parseFault(std::string_view(json.get_ref<const std::string&>()));
     if (!json.is_object() || !json.contains("kind") || !json["kind"].is_string())
-        refuse("a fault is a specification as a string, or an object with the members endpoint and kind");
+        refuse("a fault is a description as a string, or an object with the members endpoint and kind");
     auto text = [](const Json& value) { return value.is_string() ? value.get<std::string>() : dumped(value); };
     std::optional<std::string> value;
     if (json.contains("value") && !json["value"].is_null()) value = text(json["value"]);

@@ -71,7 +71,7 @@ struct Fault {
 
 // "ENDPOINT:KIND[=VALUE][,count=N][,skip=N][,code=N]". Throws std::invalid_argument, whose text says what is wrong.
 Fault parseFault(std::string_view spec);
-// A specification as a string, or an object of endpoint, kind, value, count, skip and code.
+// A description as a string, or an object of endpoint, kind, value, count, skip and code.
 Fault parseFault(const Json& json);
 
 // What happens to one request, or to one connection: waiting, then at most one thing more.
