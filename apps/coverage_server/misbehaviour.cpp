@@ -163,10 +163,10 @@ void hang(Connection& connection) {
     connection.endAbruptly(false);
 }
 
-void answer(httplib::Response& response, std::string body, const char* type) {
+void answer(httplib::Response& response, const std::string& body, const char* type) {
     response.status = 200;
     response.headers.clear();
-    response.set_content(std::move(body), type);
+    response.set_content(body, type);
 }
 
 // Another document in place of the genuine one, to be cached as that would be; an answer without one stays as it is.
@@ -174,7 +174,7 @@ void bend(httplib::Response& response, std::string body) {
     if (response.status != 200) return;
     const std::string type = response.get_header_value("Content-Type");
     const std::string cacheControl = response.get_header_value("Cache-Control");
-    answer(response, std::move(body), type.c_str());
+    answer(response, body, type.c_str());
     if (!cacheControl.empty()) response.set_header("Cache-Control", cacheControl);
 }
 

@@ -8,7 +8,6 @@
 
 namespace vrx::client {
 
-using platform::AllowedKinds;
 using platform::Result;
 using platform::Value;
 using wire::OperationIndex;
@@ -43,7 +42,7 @@ struct Decoder<std::optional<std::string>> {
 template <>
 struct Decoder<Value> {
     static Answer<Value> decode(const Value& root) {
-        using enum AllowedKinds::Kind;
+        using enum platform::AllowedKinds::Kind;
         if (root.isNull()) return Value();
         Result<Value> value = codec::unarchiveValue(root, {Dictionaries, Arrays, Strings, Numbers, Dates});
         if (!value) return badReply(value.error().text);

@@ -44,7 +44,7 @@ bool isOfEnvironment(const Format& format, const std::string& locale) {
 }  // namespace
 
 std::string decimalText(std::uint64_t number, const std::string& locale) {
-    const std::string digits = std::to_string(number);
+    std::string digits = std::to_string(number);
     Format format = openFormat(locale.empty() ? commonStyle : locale.c_str());
     if (format && isOfEnvironment(format, locale)) format = openFormat(commonStyle);
     if (!format) return digits;

@@ -14,7 +14,6 @@
 
 namespace vrx {
 
-using platform::DefaultsStore;
 using platform::Duration;
 using platform::Level;
 using platform::PairedWatch;

@@ -16,7 +16,6 @@
 
 namespace vrx {
 
-using platform::DefaultsStore;
 using platform::Level;
 using platform::Platform;
 using platform::Value;

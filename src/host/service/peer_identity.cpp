@@ -17,7 +17,6 @@
 
 namespace vrx::host {
 
-using platform::Error;
 using platform::Result;
 
 namespace {

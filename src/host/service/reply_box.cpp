@@ -16,14 +16,14 @@ void ReplyBox::put(RequestReply reply) {
     {
         std::lock_guard lock(mutex_);
         if (!sender_) return;
-        if (std::this_thread::get_id() == servingThread_) {
-            sender = sender_;
-        } else {
+        if (std::this_thread::get_id() != servingThread_) {
             pending_.push_back(std::move(reply));
             if (!hasPending_.exchange(true)) wake();
+            return;
         }
+        sender = sender_;
     }
-    if (sender) sender->send(reply);
+    sender->send(reply);
 }
 
 void ReplyBox::wake() {

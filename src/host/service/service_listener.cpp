@@ -96,7 +96,8 @@ private:
     void turnAway() {
         log(Level::Error, "A client was turned away: too many open files");
         spare_ = Descriptor();
-        Descriptor(accept4(socket_, nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
+        Descriptor client(accept4(socket_, nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
+        client = Descriptor();
         spare_ = openSpare();
     }
 
