@@ -170,7 +170,7 @@ void answer(httplib::Response& response, const std::string& body, const char* ty
 }
 
 // Another document in place of the genuine one, to be cached as that would be; an answer without one stays as it is.
-void bend(httplib::Response& response, std::string body) {
+void bend(httplib::Response& response, const std::string& body) {
     if (response.status != 200) return;
     const std::string type = response.get_header_value("Content-Type");
     const std::string cacheControl = response.get_header_value("Cache-Control");
