@@ -44,6 +44,7 @@ MaybeError Host::open(HomeUse use) {
     if (MaybeError error = createDirectories(home_)) return error;
     if (use == HomeUse::Agent)
         if (MaybeError error = lock_.take(home_)) return error;
+    profile_.facts();  // what is wrong with it is said now, and what is good is there to stay when an edit is not
     return database_.open();
 }
 

@@ -95,9 +95,10 @@ TEST_F(Agent, SetsADamagedDatabaseAside) {
     EXPECT_EQ(kept, 1u);
 }
 
-TEST_F(Agent, StartsWithAProfileItCannotRead) {
+TEST_F(Agent, KeepsTheLastGoodProfileAndStartsWithoutOne) {
+    place_.write("device.toml", "[device]\nserial_number = ");  // before anybody asked
+    EXPECT_EQ(place_.vrxctl({"device", "--json"}).document["device"]["serialNumber"], Value("VRXPHONE0001"));
     ASSERT_EQ(place_.stop(), 0);
-    place_.write("device.toml", "[device]\nserial_number = ");
     place_.start();
     ASSERT_TRUE(place_.isReady()) << place_.agent().errors();
     const Place::Outcome device = place_.vrxctl({"device", "--json"});
