@@ -168,14 +168,15 @@ TYPED_TEST(QueuesContract, LetPostedWorkOutliveItsQueueAndFreeItWhenRun) {
     auto held = std::make_shared<int>();
     std::weak_ptr<int> watch = held;
     auto freed = this->queues.makeEvent();
+    bool hasRun = false;
     this->queues.makeSerialQueue("forgotten")
-        ->post([held = std::shared_ptr<int>(held.get(), [held, freed](int*) mutable {
-                    held.reset();
-                    freed->set();
-                })] {});
+        ->post([&hasRun, held = std::shared_ptr<int>(held.get(), [held, freed](int*) mutable {
+                             held.reset();
+                             freed->set();
+                         })] { hasRun = true; });
     held.reset();
-    EXPECT_FALSE(watch.expired());
     this->subject.runUntil(freed);
+    EXPECT_TRUE(hasRun);
     EXPECT_TRUE(watch.expired());
 }
 
