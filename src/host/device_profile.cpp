@@ -191,6 +191,7 @@ ProfileFacts readFacts(Table& root) {
         facts.productType = device.string("product_type");
         facts.productVersion = device.string("product_version");
         facts.isInternal = device.boolean("internal").value_or(false);
+        facts.contentSizeCategory = device.string("content_size");
     });
     root.table("features", [&](Table& features) {
         features.each([&](const std::string& domain, const toml::node& node) {
@@ -288,6 +289,10 @@ bool DeviceProfile::isInternalInstall() const {
     return facts()->isInternal;
 }
 
+std::optional<std::string> DeviceProfile::preferredContentSizeCategory() const {
+    return facts()->contentSizeCategory;
+}
+
 bool DeviceProfile::isEnabled(std::string_view domain, std::string_view flag) const {
     const std::shared_ptr<const ProfileFacts> facts = this->facts();
     auto flags = facts->featureFlags.find(std::string(domain));
@@ -298,12 +303,6 @@ bool DeviceProfile::isEnabled(std::string_view domain, std::string_view flag) co
 
 std::vector<PairedWatch> DeviceProfile::watches() const {
     return facts()->watches;
-}
-
-std::optional<platform::CloudAccount> DeviceProfile::primaryCloudAccount() const {
-    const std::shared_ptr<const ProfileFacts> facts = this->facts();
-    if (!facts->account) return std::nullopt;
-    return platform::CloudAccount{*facts->account};
 }
 
 std::string DeviceProfile::preferredLocaleIdentifier() const {

@@ -12,7 +12,6 @@
 
 #include "host/bare_machine.h"
 #include "host/current_copy.h"
-#include "platform/account_store.h"
 #include "platform/device_properties.h"
 #include "platform/locale.h"
 #include "platform/paired_device_registry.h"
@@ -36,6 +35,7 @@ struct ProfileFacts {
     std::optional<std::string> productType;
     std::optional<std::string> productVersion;
     bool isInternal = false;
+    std::optional<std::string> contentSizeCategory;
     std::map<std::string, std::map<std::string, bool>> featureFlags;  // by domain and flag
     std::vector<platform::PairedWatch> watches;
     std::optional<std::string> account;  // of the user who is signed in
@@ -51,7 +51,6 @@ struct ProfileFacts {
 class DeviceProfile final : public platform::DeviceProperties,
                             public platform::FeatureFlags,
                             public platform::PairedDeviceRegistry,
-                            public platform::AccountStore,
                             public platform::Locale {
 public:
     // An empty path, and a file that is not there, leave the bare machine's facts.
@@ -63,9 +62,9 @@ public:
 
     std::optional<std::string> string(std::string_view key) const override;
     bool isInternalInstall() const override;
+    std::optional<std::string> preferredContentSizeCategory() const override;
     bool isEnabled(std::string_view domain, std::string_view flag) const override;
     std::vector<platform::PairedWatch> watches() const override;
-    std::optional<platform::CloudAccount> primaryCloudAccount() const override;
     std::string preferredLocaleIdentifier() const override;
     std::string decimalText(std::uint64_t number) const override;
 

@@ -16,9 +16,10 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel)
       database_(home_ + "/host.db"),
       defaults_(database_),
       profile_(locations.profile),
+      accounts_(profile_),
       clock_(profile_),
       http_(queues_.workers(platform::Priority::UserInitiated)) {
-    facilities_.accountStore = &profile_;
+    facilities_.accountStore = &accounts_;
     facilities_.clock = &clock_;
     facilities_.defaultsStore = &defaults_;
     facilities_.deviceProperties = &profile_;

@@ -11,6 +11,7 @@
 #include <string>
 
 #include "codec/codec.h"
+#include "host/account_store.h"
 #include "host/clock.h"
 #include "host/database.h"
 #include "host/defaults_store.h"
@@ -73,6 +74,7 @@ private:
     Database database_;
     DefaultsStore defaults_;
     DeviceProfile profile_;
+    AccountStore accounts_;
     Clock clock_;
     HttpSessions http_;
 };

@@ -1,13 +1,39 @@
-// The user's cloud accounts. Any thread may ask.
+// The user's cloud accounts, their credentials and the standard headers of their requests. Each call reads the present
+// state, as a fresh store would; any thread may ask.
 #pragma once
 
+#include <cstdint>
 #include <optional>
 #include <string>
+#include <string_view>
+#include <vector>
+
+#include "platform/error.h"
+#include "platform/http_request.h"
+#include "platform/task.h"
 
 namespace vrx::platform {
 
 struct CloudAccount {
     std::string identifier;
+    std::optional<std::string> altDSID{};  // the alternate directory identifier
+};
+
+// The account that signs requests for a cloud account.
+struct AuthenticationAccount {
+    std::string identifier;
+    std::optional<std::string> altDSID{};
+};
+
+struct RenewalOptions {
+    bool avoidUI = true;
+    std::vector<std::string> services;
+};
+
+struct RenewalResult {
+    static constexpr std::int64_t renewed = 0;  // any other code: failed
+    std::int64_t code = renewed;
+    MaybeError error{};
 };
 
 class AccountStore {
@@ -15,6 +41,25 @@ public:
     virtual ~AccountStore() = default;
     // Nothing when the user is signed out.
     virtual std::optional<CloudAccount> primaryCloudAccount() const = 0;
+    virtual std::optional<AuthenticationAccount> authenticationAccount(const CloudAccount& account) const = 0;
+    // The token of the stored credential for a service.
+    virtual std::optional<std::string> credentialToken(const AuthenticationAccount& account,
+                                                       std::string_view service) const = 0;
+    // Completes once, on a thread of its own, never before it returns; by then a renewed token is stored.
+    virtual void renewCredentials(const AuthenticationAccount& account, RenewalOptions options,
+                                  OnceCallback<RenewalResult> completion) = 0;
+    // Of the media-store account that belongs to a cloud account.
+    virtual std::optional<std::string> storefront(const CloudAccount& account) const = 0;
+    virtual std::optional<std::int64_t> storeAccountIdentifier(const CloudAccount& account) const = 0;
+};
+
+// The headers that account services expect of every request. Their names and values are the platform's.
+class AccountSession {
+public:
+    virtual ~AccountSession() = default;
+    virtual void addClientInformationHeader(HttpRequest& request) const = 0;
+    virtual void addDeviceIdentifierHeader(HttpRequest& request) const = 0;
+    virtual HttpHeaders accountHeaders(const HttpRequest& request) const = 0;
 };
 
 }  // namespace vrx::platform

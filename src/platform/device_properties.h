@@ -14,6 +14,8 @@ public:
     virtual std::optional<std::string> string(std::string_view key) const = 0;
     // Whether the installed OS is an internal build.
     virtual bool isInternalInstall() const = 0;
+    // The text-size setting of the user interface.
+    virtual std::optional<std::string> preferredContentSizeCategory() const = 0;
 };
 
 class FeatureFlags {

@@ -4,7 +4,9 @@
 
 namespace vrx::platform {
 
+class AccountSession;
 class AccountStore;
+class BackgroundActivities;
 class BundleLookup;
 class Clock;
 class DefaultsStore;
@@ -12,20 +14,31 @@ class DeviceProperties;
 class Digest;
 class FeatureFlags;
 class Files;
+class FollowUpControllers;
 class HttpSessions;
+class InstalledApps;
 class Json;
 class Locale;
+class LocalizedStrings;
+class NotificationCenter;
 class PairedDeviceRegistry;
+class ProcessLifecycle;
 class PropertyList;
+class PurchaseHistory;
 class Queues;
 class ServiceListenerFactory;
+class Store;
 class SystemLog;
+class TelephonyNetworkInfo;
+class UuidSource;
 
 class Platform {
 public:
     // A platform need not have all of them: a client that only reads records does without most.
     struct Facilities {
+        AccountSession* accountSession = nullptr;
         AccountStore* accountStore = nullptr;
+        BackgroundActivities* backgroundActivities = nullptr;
         BundleLookup* bundleLookup = nullptr;
         Clock* clock = nullptr;
         DefaultsStore* defaultsStore = nullptr;
@@ -33,14 +46,23 @@ public:
         Digest* digest = nullptr;
         FeatureFlags* featureFlags = nullptr;
         Files* files = nullptr;
+        FollowUpControllers* followUpControllers = nullptr;
         HttpSessions* httpSessions = nullptr;
+        InstalledApps* installedApps = nullptr;
         Json* json = nullptr;
         Locale* locale = nullptr;
+        LocalizedStrings* localizedStrings = nullptr;
+        NotificationCenter* notificationCenter = nullptr;
         PairedDeviceRegistry* pairedDeviceRegistry = nullptr;
+        ProcessLifecycle* processLifecycle = nullptr;
         PropertyList* propertyList = nullptr;
+        PurchaseHistory* purchaseHistory = nullptr;
         Queues* queues = nullptr;
         ServiceListenerFactory* serviceListenerFactory = nullptr;
+        Store* store = nullptr;
         SystemLog* systemLog = nullptr;
+        TelephonyNetworkInfo* telephonyNetworkInfo = nullptr;
+        UuidSource* uuidSource = nullptr;
     };
 
     // The facilities are not owned and must outlive the platform.
@@ -53,7 +75,11 @@ public:
     static void setCurrent(Platform* platform);
 
     // Each ends the program when the platform does not have the facility.
+    AccountSession& accountSession() const { return need(facilities_.accountSession, "AccountSession"); }
     AccountStore& accountStore() const { return need(facilities_.accountStore, "AccountStore"); }
+    BackgroundActivities& backgroundActivities() const {
+        return need(facilities_.backgroundActivities, "BackgroundActivities");
+    }
     BundleLookup& bundleLookup() const { return need(facilities_.bundleLookup, "BundleLookup"); }
     Clock& clock() const { return need(facilities_.clock, "Clock"); }
     DefaultsStore& defaultsStore() const { return need(facilities_.defaultsStore, "DefaultsStore"); }
@@ -61,18 +87,33 @@ public:
     Digest& digest() const { return need(facilities_.digest, "Digest"); }
     FeatureFlags& featureFlags() const { return need(facilities_.featureFlags, "FeatureFlags"); }
     Files& files() const { return need(facilities_.files, "Files"); }
+    FollowUpControllers& followUpControllers() const {
+        return need(facilities_.followUpControllers, "FollowUpControllers");
+    }
     HttpSessions& httpSessions() const { return need(facilities_.httpSessions, "HttpSessions"); }
+    InstalledApps& installedApps() const { return need(facilities_.installedApps, "InstalledApps"); }
     Json& json() const { return need(facilities_.json, "Json"); }
     Locale& locale() const { return need(facilities_.locale, "Locale"); }
+    LocalizedStrings& localizedStrings() const { return need(facilities_.localizedStrings, "LocalizedStrings"); }
+    NotificationCenter& notificationCenter() const {
+        return need(facilities_.notificationCenter, "NotificationCenter");
+    }
     PairedDeviceRegistry& pairedDeviceRegistry() const {
         return need(facilities_.pairedDeviceRegistry, "PairedDeviceRegistry");
     }
+    ProcessLifecycle& processLifecycle() const { return need(facilities_.processLifecycle, "ProcessLifecycle"); }
     PropertyList& propertyList() const { return need(facilities_.propertyList, "PropertyList"); }
+    PurchaseHistory& purchaseHistory() const { return need(facilities_.purchaseHistory, "PurchaseHistory"); }
     Queues& queues() const { return need(facilities_.queues, "Queues"); }
     ServiceListenerFactory& serviceListenerFactory() const {
         return need(facilities_.serviceListenerFactory, "ServiceListenerFactory");
     }
+    Store& store() const { return need(facilities_.store, "Store"); }
     SystemLog& systemLog() const { return need(facilities_.systemLog, "SystemLog"); }
+    TelephonyNetworkInfo& telephonyNetworkInfo() const {
+        return need(facilities_.telephonyNetworkInfo, "TelephonyNetworkInfo");
+    }
+    UuidSource& uuidSource() const { return need(facilities_.uuidSource, "UuidSource"); }
 
 private:
     [[noreturn]] static void missing(const char* facility);

@@ -2,6 +2,7 @@
 // that is not there leaves the agent without that ability: it then does nothing and replies that there is nothing.
 #pragma once
 
+#include <cstddef>
 #include <functional>
 #include <memory>
 #include <optional>
@@ -22,8 +23,12 @@ public:
     virtual DeviceInfoList refreshFollowupWithDeviceInfos(const DeviceInfoList& deviceInfos) = 0;
     virtual DeviceInfoList refreshFollowupWithDeviceInfo(const std::shared_ptr<VRXDeviceInfo>& deviceInfo,
                                                          bool allowForcePost) = 0;
+    // Posts what is due. Whether any was, posted or not.
+    virtual bool postFollowUpWithDevicesInfo(const DeviceInfoList& deviceInfos) = 0;
     virtual void dismissFollowUpForSerialNumber(const std::string& serialNumber) = 0;
     virtual void migrateLegacyFollowUpIfNeededWithDeviceInfo(const std::shared_ptr<VRXDeviceInfo>& deviceInfo) = 0;
+    // How many are shown; 0 when that cannot be told.
+    virtual std::size_t pendingFollowUpCount() = 0;
 };
 
 // Answers whether an application is to be had. Made afresh for each question; it calls the reply exactly once.

@@ -8,7 +8,6 @@
 #include <utility>
 #include <vector>
 
-#include "platform/account_store.h"
 #include "platform/device_properties.h"
 #include "platform/paired_device_registry.h"
 
@@ -21,12 +20,14 @@ public:
         return entry == strings.end() ? std::nullopt : std::optional(entry->second);
     }
     bool isInternalInstall() const override { return isInternal; }
+    std::optional<std::string> preferredContentSizeCategory() const override { return contentSizeCategory; }
 
     std::map<std::string, std::string, std::less<>> strings{{"SerialNumber", "SIM00000001"},
                                                             {"UserAssignedDeviceName", "Simulated Device"},
                                                             {"ProductType", "Simulated1,1"},
                                                             {"ProductVersion", "1.0"}};
     bool isInternal = false;
+    std::optional<std::string> contentSizeCategory;
 };
 
 class FeatureFlags final : public platform::FeatureFlags {
@@ -43,13 +44,6 @@ public:
     std::vector<platform::PairedWatch> watches() const override { return all; }
 
     std::vector<platform::PairedWatch> all;
-};
-
-class AccountStore final : public platform::AccountStore {
-public:
-    std::optional<platform::CloudAccount> primaryCloudAccount() const override { return primary; }
-
-    std::optional<platform::CloudAccount> primary = platform::CloudAccount{"user@cloud"};  // signed in
 };
 
 }  // namespace vrx::sim

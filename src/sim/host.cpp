@@ -3,7 +3,8 @@
 namespace vrx::sim {
 
 Host::Host()
-    : platform({.accountStore = &accounts,
+    : platform({.accountSession = &accountSession,
+                .accountStore = &accounts,
                 .bundleLookup = &bundles,
                 .clock = &clock,
                 .defaultsStore = &defaults,

@@ -12,6 +12,7 @@
 
 #include "codec/codec.h"
 #include "platform/platform.h"
+#include "sim/account_store.h"
 #include "sim/bundle_lookup.h"
 #include "sim/clock.h"
 #include "sim/defaults_store.h"
@@ -45,10 +46,11 @@ public:
     DeviceProperties device;
     FeatureFlags flags;
     PairedDeviceRegistry watches;
-    AccountStore accounts;
     Locale locale;
     BundleLookup bundles;
     Queues queues{clock, failures};
+    AccountStore accounts{queues};
+    AccountSession accountSession;
     HttpSessions http{clock, queues, files};
     ServiceListenerFactory listener{queues, failures};
     codec::Json json;

@@ -73,7 +73,7 @@ TEST_F(DeviceProfileTest, GivesEveryFactOfTheFile) {
     EXPECT_TRUE(profile.isEnabled("Coverage", "Watches"));
     EXPECT_FALSE(profile.isEnabled("Coverage", "Other"));
     EXPECT_FALSE(profile.isEnabled("Other", "Watches"));
-    EXPECT_EQ(profile.primaryCloudAccount()->identifier, "ada");
+    EXPECT_EQ(profile.facts()->account, "ada");
     EXPECT_EQ(profile.preferredLocaleIdentifier(), "de_DE");
     EXPECT_EQ(profile.decimalText(1234567), "1.234.567");
 

@@ -32,7 +32,9 @@ public:
     void dismissFollowUpForSerialNumber(const std::string& serialNumber) override {
         asked_.push_back("dismiss " + serialNumber);
     }
+    bool postFollowUpWithDevicesInfo(const DeviceInfoList&) override { return false; }
     void migrateLegacyFollowUpIfNeededWithDeviceInfo(const std::shared_ptr<VRXDeviceInfo>&) override {}
+    std::size_t pendingFollowUpCount() override { return 0; }
 
 private:
     std::vector<std::string>& asked_;

@@ -1,0 +1,72 @@
+// The settings app's follow-up service: items that it shows to the user for a client, until the client clears them.
+// Any thread may ask; each request returns when the service has answered.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "platform/date.h"
+#include "platform/error.h"
+#include "platform/value.h"
+
+namespace vrx::platform {
+
+struct FollowUpAction {
+    std::optional<std::string> label{};
+    std::optional<std::string> url{};  // without one, the target decides what opens
+
+    bool operator==(const FollowUpAction&) const = default;
+};
+
+// How an item is shown: bits of its display style.
+namespace follow_up_style {
+inline constexpr std::uint64_t withRowBadge = 1;
+inline constexpr std::uint64_t notification = 2;
+inline constexpr std::uint64_t withoutRowBadge = 16;
+}  // namespace follow_up_style
+
+// Keys of an item's user info by which the settings app renders the days until its expiration date itself.
+inline constexpr std::string_view DaysLeftRoundsUpKey = "DaysLeftRoundsUp";  // boolean: a day begun counts
+inline constexpr std::string_view OneDayLeftTextKey = "OneDayLeftText";      // the text while one day or none is left
+inline constexpr std::string_view DaysLeftFormatKey = "DaysLeftFormat";      // else, with "%@" for the number
+
+struct FollowUpItem {
+    std::string uniqueIdentifier;
+    std::optional<std::string> groupIdentifier{};
+    std::optional<std::string> targetBundleIdentifier{};
+    std::optional<std::string> extensionIdentifier{};
+    std::uint64_t displayStyle = 0;
+    std::optional<std::string> title{};
+    std::optional<std::string> informativeFooterText{};
+    std::optional<Date> expirationDate{};
+    Dictionary userInfo{};
+    std::vector<FollowUpAction> actions{};
+
+    bool operator==(const FollowUpItem&) const = default;
+};
+
+// Requests on behalf of one client identifier.
+class FollowUpController {
+public:
+    virtual ~FollowUpController() = default;
+    // Replaces a pending item of the same unique identifier in its place; an error leaves that one as it was.
+    virtual MaybeError postFollowUpItem(const FollowUpItem& item) = 0;
+    // All of them or, with an error, none. An identifier under which nothing is pending is no error.
+    virtual MaybeError clearPendingFollowUpItems(const std::vector<std::string>& uniqueIdentifiers) = 0;
+    // What was posted and not yet cleared, whether or not it has expired, in the order of first posting.
+    virtual Result<std::vector<FollowUpItem>> pendingFollowUpItems() = 0;
+};
+
+class FollowUpControllers {
+public:
+    virtual ~FollowUpControllers() = default;
+    virtual std::unique_ptr<FollowUpController> makeController(std::string clientIdentifier) = 0;
+    // The bundle identifier of the settings app, the target of items that it shows at its root.
+    virtual std::string settingsAppBundleIdentifier() const = 0;
+};
+
+}  // namespace vrx::platform
