@@ -47,6 +47,9 @@ public:
     void _setupFollowUpItem(platform::FollowUpItem& item, const std::shared_ptr<VRXDeviceInfo>& deviceInfo) const;
 
 private:
+    void update(platform::FollowUpItem& item, const std::shared_ptr<VRXDeviceInfo>& deviceInfo);
+    bool repost(const DeviceInfoList& deviceInfos);
+
     const std::shared_ptr<VRXFollowUpProvider> followUpProvider_;
 };
 

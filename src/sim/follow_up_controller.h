@@ -25,7 +25,7 @@ public:
     std::vector<platform::FollowUpItem>& pending(const std::string& clientIdentifier) {
         return pending_[clientIdentifier];
     }
-    // As many requests of the kind fail from now on, with an error whose text says which request it was.
+    // As many requests of the kind fail from now on and change nothing; the error's text says "failed to post".
     void fail(Request request, int count = 1) { failures_[request] = count; }
     // Every request of every client, failed ones included: "list", "post IDENTIFIER", "clear IDENTIFIER IDENTIFIER".
     const std::vector<std::string>& asked() const { return asked_; }
@@ -34,7 +34,8 @@ public:
 private:
     class Controller;
 
-    platform::MaybeError scriptedFailure(Request request, std::string_view name);
+    // Writes the request down and gives the failure that is scripted for it.
+    platform::MaybeError begin(Request request, std::string text);
 
     std::map<std::string, std::vector<platform::FollowUpItem>> pending_;
     std::map<Request, int> failures_;
