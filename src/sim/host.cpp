@@ -13,12 +13,16 @@ Host::Host()
                 .featureFlags = &flags,
                 .files = &files,
                 .httpSessions = &http,
+                .installedApps = &installedApps,
                 .json = &json,
                 .locale = &locale,
+                .localizedStrings = &localizedStrings,
                 .pairedDeviceRegistry = &watches,
                 .propertyList = &propertyList,
+                .purchaseHistory = &purchaseHistory,
                 .queues = &queues,
                 .serviceListenerFactory = &listener,
+                .store = &store,
                 .systemLog = &log}),
       scope_(platform) {}
 

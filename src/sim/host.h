@@ -23,6 +23,7 @@
 #include "sim/locale.h"
 #include "sim/queues.h"
 #include "sim/service_listener.h"
+#include "sim/store.h"
 #include "sim/system_log.h"
 
 namespace vrx::sim {
@@ -53,6 +54,10 @@ public:
     AccountSession accountSession;
     HttpSessions http{clock, queues, files};
     ServiceListenerFactory listener{queues, failures};
+    Store store{queues};
+    PurchaseHistory purchaseHistory{queues};
+    InstalledApps installedApps;
+    LocalizedStrings localizedStrings;
     codec::Json json;
     codec::PropertyList propertyList;
     codec::Digest digest;
