@@ -4,6 +4,7 @@
 #include "platform/platform.h"
 #include "platform/vendor.h"
 #include "service/register_defaults.h"
+#include "support/orvane_support_manager.h"
 
 namespace vrx {
 
@@ -11,10 +12,11 @@ using platform::Platform;
 
 namespace {
 
-// What agents are given of the parts that need agents in turn. Follow-ups, outreach and the support app are not there
-// yet.
+// What agents are given of the parts that need agents in turn.
 AgentCollaborators collaborators() {
-    return {};
+    AgentCollaborators collaborators;
+    collaborators.makeSupportManager = [] { return std::make_shared<VRXOrvaneSupportManager>(); };
+    return collaborators;
 }
 
 }  // namespace
