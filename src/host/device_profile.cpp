@@ -209,6 +209,14 @@ ProfileFacts readFacts(Table& root) {
             facts.language = localeIdentifierFromPosix(*language);
         facts.timeZone = locale.string("time_zone");
     });
+    root.table("store", [&](Table& store) {
+        facts.storeLookupURL = store.string("lookup_url");
+        facts.purchaseHistoryURL = store.string("purchase_history_url");
+    });
+    root.table("applications", [&](Table& applications) {
+        facts.applicationFolders = applications.strings("folders");
+        if (auto folder = applications.string("companion")) facts.companionFolder = *folder;
+    });
     root.tables("bundles", [&](Table& bundle) { facts.bundles.push_back(readBundle(bundle)); });
     return facts;
 }

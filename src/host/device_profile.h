@@ -42,6 +42,10 @@ struct ProfileFacts {
     std::optional<std::string> language;
     std::optional<std::string> timeZone;
     std::vector<ProfileBundle> bundles;
+    std::optional<std::string> storeLookupURL;
+    std::optional<std::string> purchaseHistoryURL;
+    std::vector<std::string> applicationFolders;
+    std::string companionFolder = "/usr/share/vrxagent/companion";
 
     // Whether root or the agent's own user owns the file and nobody else can write it: only then may what it says
     // about bundles be believed.

@@ -18,7 +18,11 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel)
       profile_(locations.profile),
       accounts_(profile_),
       clock_(profile_),
-      http_(queues_.workers(platform::Priority::UserInitiated)) {
+      http_(queues_.workers(platform::Priority::UserInitiated)),
+      store_(profile_),
+      purchases_(profile_),
+      apps_(profile_),
+      strings_(profile_) {
     facilities_.accountStore = &accounts_;
     facilities_.clock = &clock_;
     facilities_.defaultsStore = &defaults_;
@@ -27,11 +31,15 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel)
     facilities_.featureFlags = &profile_;
     facilities_.files = &files_;
     facilities_.httpSessions = &http_;
+    facilities_.installedApps = &apps_;
     facilities_.json = &json_;
     facilities_.locale = &profile_;
+    facilities_.localizedStrings = &strings_;
     facilities_.pairedDeviceRegistry = &profile_;
     facilities_.propertyList = &propertyList_;
+    facilities_.purchaseHistory = &purchases_;
     facilities_.queues = &queues_;
+    facilities_.store = &store_;
     facilities_.uuidSource = &uuids_;
     platform_ = Platform(facilities_);
 }

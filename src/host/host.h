@@ -19,8 +19,11 @@
 #include "host/files.h"
 #include "host/home_lock.h"
 #include "host/http.h"
+#include "host/installed_apps.h"
+#include "host/localized_strings.h"
 #include "host/main_loop.h"
 #include "host/queues.h"
+#include "host/store.h"
 #include "host/system_log.h"
 #include "host/uuid.h"
 #include "platform/bundle_lookup.h"
@@ -79,6 +82,10 @@ private:
     Clock clock_;
     HttpSessions http_;
     UuidSource uuids_;
+    Store store_;
+    PurchaseHistory purchases_;
+    InstalledApps apps_;
+    LocalizedStrings strings_;
 };
 
 }  // namespace vrx::host

@@ -6,6 +6,7 @@
 #include "platform/vendor.h"
 #include "service/agent.h"
 #include "service/register_defaults.h"
+#include "support/orvane_support_manager.h"
 
 namespace vrx {
 
@@ -13,10 +14,11 @@ using platform::Platform;
 
 namespace {
 
-// What agents are given of the parts that need agents in turn. Outreach and the support app are not there yet.
+// What agents are given of the parts that need agents in turn. Outreach is not there yet.
 AgentCollaborators collaborators() {
     AgentCollaborators collaborators;
     collaborators.makeFollowUp = [] { return std::make_shared<VRXFollowUp>(); };
+    collaborators.makeSupportManager = [] { return std::make_shared<VRXOrvaneSupportManager>(); };
     return collaborators;
 }
 

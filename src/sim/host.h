@@ -24,6 +24,7 @@
 #include "sim/locale.h"
 #include "sim/queues.h"
 #include "sim/service_listener.h"
+#include "sim/store.h"
 #include "sim/system_log.h"
 #include "sim/uuid.h"
 
@@ -56,6 +57,10 @@ public:
     AccountSession accountSession;
     HttpSessions http{clock, queues, files};
     ServiceListenerFactory listener{queues, failures};
+    Store store{queues};
+    PurchaseHistory purchaseHistory{queues};
+    InstalledApps installedApps;
+    LocalizedStrings localizedStrings;
     codec::Json json;
     codec::PropertyList propertyList;
     codec::Digest digest;

@@ -1,0 +1,32 @@
+// What the user's store account has bought. Any thread may ask.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "platform/task.h"
+
+namespace vrx::platform {
+
+struct PurchaseQuery {
+    std::int64_t accountIdentifier = 0;  // of the store account; 0 for none
+    std::vector<std::string> bundleIdentifiers{};
+};
+
+struct Purchase {
+    std::optional<std::string> bundleIdentifier{};
+    std::optional<std::string> title{};
+    std::optional<std::string> developerName{};
+    std::optional<std::string> productURL{};
+};
+
+class PurchaseHistory {
+public:
+    virtual ~PurchaseHistory() = default;
+    // Hands the purchases over once, at any time, on another thread; none when they cannot be had.
+    virtual void runQuery(PurchaseQuery query, OnceCallback<std::vector<Purchase>> resultHandler) = 0;
+};
+
+}  // namespace vrx::platform

@@ -1,0 +1,31 @@
+// Whether the support app is installed, was purchased or is offered in the Marketplace, with the data that a client
+// shows of it. Made for one question and kept alive by it; any thread may ask.
+//
+// Answers are dictionaries: "AppAvailabilityType" tells the class of the answer, the other keys are texts and
+// addresses.
+#pragma once
+
+#include <memory>
+#include <string>
+
+#include "platform/task.h"
+#include "platform/value.h"
+#include "protocols/agent_collaborators.h"
+
+namespace vrx {
+
+class VRXOrvaneSupportManager final : public VRXSupportManaging,
+                                      public std::enable_shared_from_this<VRXOrvaneSupportManager> {
+public:
+    using Reply = platform::OnceCallback<platform::Value>;
+
+    // Whether the Marketplace offers the application. Null when the lookup failed; replies on any thread.
+    void checkIsAvailableInStore(std::string bundleIdentifier, Reply reply) override;
+    // Installed, else purchased, else offered. Holds the calling thread while the purchases are asked for.
+    void appSupportAvailability(std::string bundleIdentifier, Reply reply) override;
+
+    // Whether the user's account has bought it: what is known within 5 seconds, for which the calling thread waits.
+    platform::Dictionary checkAppIsPurchased(const std::string& bundleIdentifier) const;
+};
+
+}  // namespace vrx
