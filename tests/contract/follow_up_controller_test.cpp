@@ -3,6 +3,8 @@
 
 #include <gmock/gmock.h>
 
+#include "host/follow_up_controller.h"
+#include "host/support.h"
 #include "sim/host.h"
 
 namespace vrx {
@@ -24,6 +26,18 @@ private:
     sim::Host host_;
 };
 
+class RealService {
+public:
+    platform::FollowUpControllers& controllers() { return *service_; }
+    void restart() { service_.emplace(database_.emplace(folder_ / "host.db")); }
+
+private:
+    host::LogRecorder log_;
+    host::TemporaryFolder folder_;
+    std::optional<host::Database> database_{folder_ / "host.db"};
+    std::optional<host::FollowUpControllers> service_{*database_};
+};
+
 template <class Subject>
 class FollowUpControllerContract : public testing::Test {
 protected:
@@ -43,7 +57,7 @@ struct Names {
         return std::is_same_v<Subject, SimulatedService> ? "Simulated" : "Real";
     }
 };
-using Subjects = testing::Types<SimulatedService>;
+using Subjects = testing::Types<SimulatedService, RealService>;
 TYPED_TEST_SUITE(FollowUpControllerContract, Subjects, Names);
 
 TYPED_TEST(FollowUpControllerContract, KeepsItemsWholeAcrossProcesses) {
