@@ -6,17 +6,13 @@
 
 namespace vrx::apps {
 
-namespace {
+Home::Home(const std::string& path) : path_(path), files_(path), database_(databasePath(path)) {
+    vrx_registerDefaults(defaults_);
+}
 
 Outcome notReachable(std::string problem) {
     return failed(ExitCode::NotReachable, std::move(problem),
                   "An agent makes it at its first start; name the agent's home with --home.");
-}
-
-}  // namespace
-
-Home::Home(const std::string& path) : files_(path), database_(databasePath(path)) {
-    vrx_registerDefaults(defaults_);
 }
 
 CommandLine::Verb inHome(const wire::LocationOverrides& places, std::function<Outcome(Home&)> verb) {

@@ -8,5 +8,6 @@ int main(int argc, char** argv) {
     line.app().add_option("--home", places.home, "The agent's home")->type_name("PATH");
     addDefaultsVerbs(line, places);
     addCacheVerb(line, places);
+    addFollowUpVerbs(line, places);
     return line.run(argc, argv);
 }

@@ -9,5 +9,6 @@ namespace vrx::apps {
 
 void addDefaultsVerbs(CommandLine& line, const wire::LocationOverrides& places);
 void addCacheVerb(CommandLine& line, const wire::LocationOverrides& places);
+void addFollowUpVerbs(CommandLine& line, const wire::LocationOverrides& places);
 
 }  // namespace vrx::apps

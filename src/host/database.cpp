@@ -20,11 +20,12 @@ using platform::MaybeError;
 
 namespace {
 
-constexpr int busyMilliseconds = 5000;
-
 constexpr const char* steps[] = {
     // The agent's settings: a number or a text as itself, anything else as a binary property list.
     "CREATE TABLE defaults (key TEXT PRIMARY KEY, value NOT NULL) WITHOUT ROWID",
+    // Follow-ups, in the order of their first posting: the item as a binary property list.
+    "CREATE TABLE follow_ups (position INTEGER PRIMARY KEY, client TEXT NOT NULL, identifier TEXT NOT NULL, "
+    "item NOT NULL, UNIQUE (client, identifier))",
 };
 
 void check(int result, sqlite3* connection) {
@@ -145,14 +146,14 @@ std::span<const std::uint8_t> Statement::bytes(int column) const {
     return {start, start ? static_cast<std::size_t>(sqlite3_column_bytes(statement_, column)) : 0};
 }
 
-Connection::Connection(const std::string& path) {
+Connection::Connection(const std::string& path, std::chrono::milliseconds busyLimit) {
     const int result =
         sqlite3_open_v2(path.c_str(), &connection_, SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX, nullptr);
     try {
         check(result, connection_);
         sqlite3_extended_result_codes(connection_, 1);
         keepLogAtClose(true);
-        sqlite3_busy_timeout(connection_, busyMilliseconds);
+        sqlite3_busy_timeout(connection_, static_cast<int>(busyLimit.count()));
         execute("PRAGMA synchronous = FULL");
     } catch (...) {
         sqlite3_close(connection_);
@@ -220,7 +221,8 @@ Connection::CommitMark Connection::commitMark() {
 
 // The connections of one opening. Reading has one of its own, so that it does not wait while a write waits.
 struct Database::Opening {
-    explicit Opening(const std::string& path) : path(path), writer(path) {}
+    Opening(const std::string& path, std::chrono::milliseconds busyLimit)
+        : path(path), busyLimit(busyLimit), writer(path, busyLimit) {}
 
     ~Opening() {
         // Closing the last connection takes the -wal file away by its name, which is not ours any more when another
@@ -232,7 +234,7 @@ struct Database::Opening {
 
     // The database is sound: it is opened for reading, too, and is tidied up when it is closed.
     void passed() {
-        reader.emplace(path);
+        reader.emplace(path, busyLimit);
         reader->findIndexHeader();
         for (Connection* connection : {&writer, &*reader}) connection->keepLogAtClose(false);
         file = FileIdentity::of(path);
@@ -241,13 +243,15 @@ struct Database::Opening {
     }
 
     const std::string path;
+    const std::chrono::milliseconds busyLimit;
     Connection writer;
     std::optional<Connection> reader;
     FileIdentity file, wal, shm;
     std::uint64_t number = 0;
 };
 
-Database::Database(std::string path, Schema schema) : path_(std::move(path)), schema_(schema) {}
+Database::Database(std::string path, Schema schema, std::chrono::milliseconds busyLimit)
+    : path_(std::move(path)), schema_(schema), busyLimit_(busyLimit) {}
 
 Database::~Database() = default;
 
@@ -298,7 +302,7 @@ std::shared_ptr<Database::Opening> Database::openChecked() {
 
 std::shared_ptr<Database::Opening> Database::openOnce() const {
     createPrivately(path_);
-    auto opening = std::make_shared<Opening>(path_);
+    auto opening = std::make_shared<Opening>(path_, busyLimit_);
     Connection& writer = opening->writer;
     writer.execute("PRAGMA journal_mode = WAL");
     {

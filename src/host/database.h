@@ -9,6 +9,7 @@
 #include <sys/stat.h>
 
 #include <array>
+#include <chrono>
 #include <cstdint>
 #include <functional>
 #include <memory>
@@ -64,7 +65,7 @@ private:
 // One connection to the database, used by one thread at a time.
 class Connection {
 public:
-    explicit Connection(const std::string& path);
+    Connection(const std::string& path, std::chrono::milliseconds busyLimit);
     ~Connection();
     Connection(const Connection&) = delete;
     Connection& operator=(const Connection&) = delete;
@@ -100,15 +101,15 @@ public:
     using Schema = std::span<const char* const>;
     static const Schema currentSchema;
 
-    // Nothing is opened before the first use, or open().
-    explicit Database(std::string path, Schema schema = currentSchema);
+    // Nothing is opened before the first use, or open(). A write waits for other writers up to the limit.
+    explicit Database(std::string path, Schema schema = currentSchema,
+                      std::chrono::milliseconds busyLimit = std::chrono::seconds(5));
     ~Database();
 
     // An error names the file and the reason: it cannot be written, or a newer version of the program has made it.
     platform::MaybeError open();
 
     // Run the body within one transaction; an error undoes the whole of it. The body must not use the database again.
-    // A write waits some seconds for other writers.
     platform::MaybeError read(const std::function<void(Connection&)>& body);
     platform::MaybeError write(const std::function<void(Connection&)>& body);
 
@@ -137,6 +138,7 @@ private:
 
     const std::string path_;
     const Schema schema_;
+    const std::chrono::milliseconds busyLimit_;
 
     // One user each of the reading and the writing connection, over all openings; taken before mutex_.
     std::mutex reading_;

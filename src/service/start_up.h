@@ -9,6 +9,8 @@
 
 namespace vrx {
 
+class VRXAgent;
+
 class StartUp {
 public:
     // Does all of start-up up to the open listener; the program then runs its main loop. The current platform must be
@@ -17,6 +19,7 @@ public:
 
 private:
     ServiceDelegate delegate_;
+    std::shared_ptr<VRXAgent> agent_;  // of the settings app
     std::unique_ptr<platform::ServiceListener> listener_;
 };
 
