@@ -11,11 +11,12 @@ namespace {
 using Options = std::vector<const CLI::Option*>;
 using Verbs = std::vector<const CLI::App*>;
 
-// What help shows: an option without a group is hidden.
+// What help shows: an option without a group is hidden. That there is help is said once, for the whole program.
 Options optionsOf(const CLI::App& app) {
     Options options;
     for (const CLI::Option* option : app.get_options())
-        if (!option->get_group().empty()) options.push_back(option);
+        if (!option->get_group().empty() && (option != app.get_help_ptr() || !app.get_parent()))
+            options.push_back(option);
     for (const CLI::App* group : app.get_subcommands([](const CLI::App* inner) { return inner->get_name().empty(); })) {
         const Options inner = optionsOf(*group);
         options.insert(options.end(), inner.begin(), inner.end());
@@ -65,7 +66,7 @@ std::string manOptions(const CLI::App& app) {
     std::string text;
     for (const CLI::Option* option : optionsOf(app)) {
         const bool isPositional = option->get_positional() && option->get_lnames().empty();
-        text += ".TP\n\\fB" + roff(option->get_name(isPositional, true)) + "\\fR";
+        text += ".TP\n\\fB" + roff(replaced(option->get_name(isPositional, true), {{',', ", "}})) + "\\fR";
         if (!isPositional && !typeOf(*option).empty()) text += " \\fI" + roff(typeOf(*option)) + "\\fR";
         text += "\n" + roff(option->get_description()) + "\n";
     }
@@ -108,7 +109,8 @@ std::vector<Candidate> candidatesOf(const CLI::App& app) {
     std::vector<Candidate> candidates;
     for (const CLI::App* verb : verbsOf(app)) candidates.push_back({verb->get_name(), verb->get_description()});
     for (const CLI::Option* option : optionsOf(app))
-        for (const std::string& name : option->get_lnames()) candidates.push_back({"--" + name, option->get_description()});
+        for (const std::string& name : option->get_lnames())
+            candidates.push_back({"--" + name, option->get_description()});
     return candidates;
 }
 
@@ -127,19 +129,21 @@ std::string verbCases(const CLI::App& app) {
 
 std::string bashCompletion(const CLI::App& app) {
     const std::string function = "_" + replaced(app.get_name(), {{'-', "_"}});
-    std::string text = function + "() {\n    local verb=\"\" word candidates=\"\"\n"
-                                  "    for word in \"${COMP_WORDS[@]:1:COMP_CWORD-1}\"; do\n" +
+    std::string text = function +
+                       "() {\n    local verb=\"\" word candidates=\"\"\n"
+                       "    for word in \"${COMP_WORDS[@]:1:COMP_CWORD-1}\"; do\n" +
                        verbCases(app) + "    done\n    case \"$verb\" in\n";
     forEach(app, "", [&](const CLI::App& verb, const std::string& path) {
         std::string words;
         for (const Candidate& candidate : candidatesOf(verb)) words += (words.empty() ? "" : " ") + candidate.word;
         text += "        " + verbPattern(path) + ") candidates=\"" + words + "\" ;;\n";
     });
-    return text + "    esac\n    mapfile -t COMPREPLY < <(compgen -W \"$candidates\" -- \"${COMP_WORDS[COMP_CWORD]}\")\n}\n" +
+    return text +
+           "    esac\n    mapfile -t COMPREPLY < <(compgen -W \"$candidates\" -- \"${COMP_WORDS[COMP_CWORD]}\")\n}\n" +
            "complete -o default -F " + function + " " + app.get_name() + "\n";
 }
 
-std::string quoted(const std::string& text) {
+std::string shellQuoted(const std::string& text) {
     return "'" + replaced(text, {{'\'', "'\\''"}}) + "'";
 }
 
@@ -150,7 +154,8 @@ std::string zshCompletion(const CLI::App& app) {
                        verbCases(app) + "done\ncase \"$verb\" in\n";
     forEach(app, "", [&](const CLI::App& verb, const std::string& path) {
         text += "    " + verbPattern(path) + ") candidates=(";
-        for (const Candidate& candidate : candidatesOf(verb)) text += "\n        " + quoted(candidate.word + ":" + candidate.help);
+        for (const Candidate& candidate : candidatesOf(verb))
+            text += "\n        " + shellQuoted(candidate.word + ":" + candidate.help);
         text += ") ;;\n";
     });
     return text + "esac\n_describe -o " + app.get_name() + " candidates || _files\n";
@@ -172,9 +177,9 @@ std::string fishCompletion(const CLI::App& app) {
         for (const Candidate& candidate : candidatesOf(verb)) {
             const bool isOption = candidate.word.starts_with("--");
             text += "complete -c " + app.get_name();
-            if (!isOption || !path.empty()) text += " -n " + quoted(condition);
+            if (!isOption || !path.empty()) text += " -n " + shellQuoted(condition);
             text += isOption ? " -l " + candidate.word.substr(2) : " -f -a " + candidate.word;
-            text += " -d " + quoted(candidate.help) + "\n";
+            text += " -d " + shellQuoted(candidate.help) + "\n";
         }
     });
     return text;
@@ -195,12 +200,11 @@ std::string manual(const CLI::App& app, ManualForm form) {
 void addManualOption(CLI::App& app) {
     static const std::map<std::string, ManualForm> forms{
         {"man", ManualForm::Man}, {"bash", ManualForm::Bash}, {"zsh", ManualForm::Zsh}, {"fish", ManualForm::Fish}};
-    app.add_option_function<ManualForm>(
-           "--manual",
-           [&app](const ManualForm& form) {
-               std::fputs(manual(app, form).c_str(), stdout);
-               throw CLI::Success();
-           })
+    app.add_option_function<ManualForm>("--manual",
+                                        [&app](const ManualForm& form) {
+                                            std::fputs(manual(app, form).c_str(), stdout);
+                                            throw CLI::Success();
+                                        })
         ->transform(CLI::CheckedTransformer(forms))
         ->trigger_on_parse()
         ->group("");
