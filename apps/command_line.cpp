@@ -7,6 +7,7 @@
 
 #include "codec/json.h"
 #include "codec/unicode.h"
+#include "manual.h"
 
 namespace vrx::apps {
 
@@ -116,6 +117,7 @@ CommandLine::CommandLine(const std::string& program, const std::string& purpose)
     app_.require_subcommand(1);
     app_.set_version_flag("--version", program + " " VRX_VERSION);
     app_.add_flag("--json", isJson_, "Print one JSON document instead of text")->disable_flag_override();
+    addManualOption(app_);
     app_.footer("Exit codes: 0 done, 1 no answer, 2 usage, 3 not reachable, 4 refused, 5 timed out.");
 }
 
@@ -146,6 +148,8 @@ Outcome CommandLine::read(int argc, const char* const* argv) {
         return {.document = {{"help", app_.help()}}, .text = app_.help()};
     } catch (const CLI::CallForVersion& version) {
         return {.document = {{"release", VRX_VERSION}}, .text = version.what() + std::string("\n")};
+    } catch (const CLI::Success&) {  // the option has printed what it gives
+        return {.isShown = true};
     } catch (const CLI::ParseError& error) {
         return failed(ExitCode::Usage, error.what(), "See " + program_ + " --help.");
     }

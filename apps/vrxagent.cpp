@@ -11,6 +11,7 @@
 #include "host/host.h"
 #include "host/service/bundle_lookup.h"
 #include "host/service/service_listener.h"
+#include "manual.h"
 #include "platform/log.h"
 #include "service/start_up.h"
 #include "wire/locations.h"
@@ -61,6 +62,7 @@ int main(int argc, char** argv) {
         ->type_name("LEVEL")
         ->transform(CLI::CheckedTransformer(levels).description(""));
     app.set_version_flag("--version", "vrxagent " VRX_VERSION);
+    vrx::apps::addManualOption(app);
     try {
         app.parse(argc, argv);
     } catch (const CLI::ParseError& error) {

@@ -6,6 +6,7 @@
 #include <mutex>
 #include <string_view>
 
+#include "codec/icu.h"
 #include "codec/unicode.h"
 
 namespace vrx::codec {
@@ -14,21 +15,37 @@ namespace {
 
 constexpr const char* commonStyle = "root";
 
+struct Functions {
+    decltype(&::uloc_getDefault) getDefault = icu().function<decltype(getDefault)>("uloc_getDefault");
+    decltype(&::uloc_getLanguage) getLanguage = icu().function<decltype(getLanguage)>("uloc_getLanguage");
+    decltype(&::unum_open) open = icu().function<decltype(open)>("unum_open");
+    decltype(&::unum_close) close = icu().function<decltype(close)>("unum_close");
+    decltype(&::unum_formatDecimal) format = icu().function<decltype(format)>("unum_formatDecimal");
+    decltype(&::unum_getLocaleByType) getLocale = icu().function<decltype(getLocale)>("unum_getLocaleByType");
+
+    bool areThere() const { return getDefault && getLanguage && open && close && format && getLocale; }
+};
+
+const Functions& functions() {
+    static const Functions functions;
+    return functions;
+}
+
 std::string languageOf(const char* locale) {
     char language[ULOC_LANG_CAPACITY] = "";
     UErrorCode status = U_ZERO_ERROR;
-    uloc_getLanguage(locale, language, sizeof language, &status);
+    functions().getLanguage(locale, language, sizeof language, &status);
     return U_SUCCESS(status) ? language : "";
 }
 
 struct CloseFormat {
-    void operator()(void* format) const { unum_close(static_cast<UNumberFormat*>(format)); }
+    void operator()(void* format) const { functions().close(static_cast<UNumberFormat*>(format)); }
 };
 using Format = std::unique_ptr<void, CloseFormat>;
 
 Format openFormat(const char* locale) {
     UErrorCode status = U_ZERO_ERROR;
-    Format format(unum_open(UNUM_DECIMAL, nullptr, 0, locale, nullptr, &status));
+    Format format(functions().open(UNUM_DECIMAL, nullptr, 0, locale, nullptr, &status));
     return U_SUCCESS(status) ? std::move(format) : nullptr;
 }
 
@@ -36,13 +53,14 @@ Format openFormat(const char* locale) {
 // also answer with the present name of a language that was asked for by an old one.
 bool isOfEnvironment(const Format& format, const std::string& locale) {
     UErrorCode status = U_ZERO_ERROR;
-    const char* valid = unum_getLocaleByType(static_cast<UNumberFormat*>(format.get()), ULOC_VALID_LOCALE, &status);
+    const char* valid = functions().getLocale(static_cast<UNumberFormat*>(format.get()), ULOC_VALID_LOCALE, &status);
     if (U_FAILURE(status) || !valid) return false;
     const std::string language = languageOf(valid);
-    return language != languageOf(locale.c_str()) && language == languageOf(uloc_getDefault());
+    return language != languageOf(locale.c_str()) && language == languageOf(functions().getDefault());
 }
 
 Format formatFor(const std::string& locale) {
+    if (!functions().areThere()) return nullptr;
     Format format = openFormat(locale.empty() ? commonStyle : locale.c_str());
     return format && isOfEnvironment(format, locale) ? openFormat(commonStyle) : std::move(format);
 }
@@ -53,7 +71,7 @@ std::string text(const Format& format, std::uint64_t number) {
     char16_t units[128];  // 20 digits, in some scripts two units each, and separators
     UErrorCode status = U_ZERO_ERROR;
     const std::int32_t length =
-        unum_formatDecimal(static_cast<UNumberFormat*>(format.get()), digits.data(),
+        functions().format(static_cast<UNumberFormat*>(format.get()), digits.data(),
                            static_cast<std::int32_t>(digits.size()), units, 128, nullptr, &status);
     if (U_FAILURE(status)) return digits;
     return utf8FromUtf16({units, static_cast<std::size_t>(length)}).value_or(digits);

@@ -4,9 +4,28 @@
 
 #include <cmath>
 
+#include "codec/icu.h"
+
 namespace vrx::codec {
 
+namespace {
+
+struct Functions {
+    decltype(&::ucal_getCanonicalTimeZoneID) getCanonicalID =
+        icu().function<decltype(getCanonicalID)>("ucal_getCanonicalTimeZoneID");
+    decltype(&::ucal_open) open = icu().function<decltype(open)>("ucal_open");
+    decltype(&::ucal_close) close = icu().function<decltype(close)>("ucal_close");
+    decltype(&::ucal_setMillis) setMillis = icu().function<decltype(setMillis)>("ucal_setMillis");
+    decltype(&::ucal_get) get = icu().function<decltype(get)>("ucal_get");
+
+    bool areThere() const { return getCanonicalID && open && close && setMillis && get; }
+};
+
+}  // namespace
+
 std::optional<std::chrono::seconds> timeZoneOffset(const std::string& zone, platform::Date at) {
+    static const Functions functions;
+    if (!functions.areThere()) return std::nullopt;
     const std::u16string name(zone.begin(), zone.end());  // names are ASCII; another character matches none
     const auto length = static_cast<std::int32_t>(name.size());
     UErrorCode status = U_ZERO_ERROR;
@@ -14,14 +33,14 @@ std::optional<std::chrono::seconds> timeZoneOffset(const std::string& zone, plat
     // An unknown zone would silently be taken for GMT, but has no canonical name.
     char16_t canonical[128];
     UBool isSystem = false;
-    ucal_getCanonicalTimeZoneID(name.data(), length, canonical, 128, &isSystem, &status);
+    functions.getCanonicalID(name.data(), length, canonical, 128, &isSystem, &status);
     if (U_FAILURE(status)) return std::nullopt;
 
-    UCalendar* calendar = ucal_open(name.data(), length, "en", UCAL_GREGORIAN, &status);
-    ucal_setMillis(calendar, std::floor(platform::epochSeconds(at) * 1000), &status);
+    UCalendar* calendar = functions.open(name.data(), length, "en", UCAL_GREGORIAN, &status);
+    functions.setMillis(calendar, std::floor(platform::epochSeconds(at) * 1000), &status);
     const std::int32_t milliseconds =
-        ucal_get(calendar, UCAL_ZONE_OFFSET, &status) + ucal_get(calendar, UCAL_DST_OFFSET, &status);
-    ucal_close(calendar);
+        functions.get(calendar, UCAL_ZONE_OFFSET, &status) + functions.get(calendar, UCAL_DST_OFFSET, &status);
+    functions.close(calendar);
     if (U_FAILURE(status)) return std::nullopt;
     return std::chrono::seconds(milliseconds / 1000);
 }

@@ -1,9 +1,7 @@
 #include "host/system_log.h"
 
-#define SD_JOURNAL_SUPPRESS_LOCATION  // the entry brings its own
 #include <sys/stat.h>
 #include <syslog.h>
-#include <systemd/sd-journal.h>
 #include <unistd.h>
 
 #include <array>
@@ -94,42 +92,32 @@ std::string timeStamp() {
     return std::string(text.data(), length) + "." + milliseconds + "Z";
 }
 
+std::string journalRecord(const LogEntry& entry) {
+    std::string record = "MESSAGE=" + escaped(entry.message());
+    record.append("\nPRIORITY=").append(std::to_string(journalPriority(entry.level)));
+    record.append("\nCODE_FILE=").append(entry.file).append("\nCODE_LINE=").append(std::to_string(entry.line));
+    record.append("\nSUBSYSTEM=").append(subsystem()).append("\nCATEGORY=").append(platform::logCategory);
+    return record.append("\nSYSLOG_IDENTIFIER=").append(program_invocation_short_name).append("\n");
+}
+
+std::string lineRecord(const LogEntry& entry) {
+    return timeStamp() + " " + levelName(entry.level) + " " + subsystem() + ":" + std::string(platform::logCategory) +
+           " " + escaped(entry.message()) + "\n";
+}
+
 }  // namespace
 
-SystemLog::SystemLog(Level lowest, int file) : lowest_(lowest), file_(file), isJournal_(isJournalStream(file)) {}
+SystemLog::SystemLog(Level lowest, int file)
+    : lowest_(lowest),
+      isJournal_(isJournalStream(file)),
+      writer_(file, isJournal_ ? LogWriter::Form::Journal : LogWriter::Form::Lines) {}
 
 void SystemLog::write(const LogEntry& entry) {
     if (!isOn(entry.level)) return;
-    int saved = errno;
-    isJournal_ ? writeToJournal(entry) : writeLine(entry);
+    const int saved = errno;
+    writer_.add(isJournal_ ? journalRecord(entry) : lineRecord(entry));
+    if (entry.level == Level::Error) writer_.flush();
     errno = saved;
-}
-
-void SystemLog::writeToJournal(const LogEntry& entry) const {
-    const std::array fields{
-        "MESSAGE=" + escaped(entry.message()),
-        "PRIORITY=" + std::to_string(journalPriority(entry.level)),
-        "CODE_FILE=" + std::string(entry.file),
-        "CODE_LINE=" + std::to_string(entry.line),
-        "SUBSYSTEM=" + subsystem(),
-        "CATEGORY=" + std::string(platform::logCategory),
-    };
-    std::array<iovec, fields.size()> parts;
-    for (std::size_t i = 0; i < fields.size(); ++i) parts[i] = {const_cast<char*>(fields[i].data()), fields[i].size()};
-    if (sd_journal_sendv(parts.data(), parts.size()) < 0) writeLine(entry);
-}
-
-void SystemLog::writeLine(const LogEntry& entry) const {
-    std::string line = timeStamp() + " " + levelName(entry.level) + " " + subsystem() + ":" +
-                       std::string(platform::logCategory) + " " + escaped(entry.message()) + "\n";
-    // One write, so that lines of several threads and processes stay whole; what a full pipe refuses is lost.
-    std::string_view rest = line;
-    while (!rest.empty()) {
-        ssize_t count = ::write(file_, rest.data(), rest.size());
-        if (count < 0 && errno == EINTR) continue;
-        if (count <= 0) return;
-        rest.remove_prefix(static_cast<std::size_t>(count));
-    }
 }
 
 }  // namespace vrx::host

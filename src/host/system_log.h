@@ -1,7 +1,9 @@
 // The log: the journal when standard error is connected to it, else one line an entry on standard error. Private
-// arguments are redacted in both, and nothing in an argument can begin a line of its own. Any thread may log.
+// arguments are redacted in both, and nothing in an argument can begin a line of its own. Any thread may log; an error
+// is written before the call returns, everything else soon after.
 #pragma once
 
+#include "host/log_writer.h"
 #include "platform/log.h"
 
 namespace vrx::host {
@@ -14,13 +16,13 @@ public:
     bool isOn(platform::Level level) const override { return level >= lowest_; }
     void write(const platform::LogEntry& entry) override;
 
-private:
-    void writeToJournal(const platform::LogEntry& entry) const;
-    void writeLine(const platform::LogEntry& entry) const;
+    // Writes what was logged before: for what ends the process without a word.
+    void flush() { writer_.flush(); }
 
+private:
     const platform::Level lowest_;
-    const int file_;
     const bool isJournal_;
+    LogWriter writer_;
 };
 
 }  // namespace vrx::host

@@ -1,7 +1,10 @@
 #include "host/system_log.h"
 
 #include <gmock/gmock.h>
+#include <sys/wait.h>
 #include <unistd.h>
+
+#include <csignal>
 
 #include "support.h"
 
@@ -41,6 +44,35 @@ TEST(SystemLog, LeavesOutWhatIsBelowItsLevel) {
     EXPECT_NE(written(entry, Level::Debug), "");
     entry.level = Level::Default;
     EXPECT_EQ(written(entry, Level::Error), "");
+}
+
+TEST(LogWriter, WritesEverythingInOrderWhateverEndsTheProcess) {
+    for (const bool isCrash : {false, true}) {
+        int ends[2];
+        ASSERT_EQ(pipe(ends), 0);
+        const pid_t child = fork();
+        if (child == 0) {
+            ::close(ends[0]);
+            {
+                LogWriter writer(ends[1], LogWriter::Form::Lines);
+                for (int i = 0; i < 3000; ++i) writer.add(std::to_string(i) + std::string(200, '.') + "\n");
+                if (isCrash) raise(SIGABRT);
+            }
+            _exit(0);
+        }
+        ::close(ends[1]);
+        std::string text;
+        char bytes[4096];
+        while (const ssize_t size = ::read(ends[0], bytes, sizeof bytes))
+            if (size > 0) text.append(bytes, static_cast<std::size_t>(size));
+        ::close(ends[0]);
+        int status = 0;
+        waitpid(child, &status, 0);
+        EXPECT_EQ(WIFSIGNALED(status), isCrash);
+        std::string expected;
+        for (int i = 0; i < 3000; ++i) expected += std::to_string(i) + std::string(200, '.') + "\n";
+        EXPECT_EQ(text, expected) << (isCrash ? "crash" : "exit");
+    }
 }
 
 }  // namespace

@@ -1,0 +1,66 @@
+// Takes the log's records from all threads and writes them on a thread of its own, some at a time, in the order in
+// which they came: whoever logs waits for no file and no journal. A record is written within milliseconds, at once by
+// flush(), and before the process ends, cleanly or by a crash; kill -9 loses the last milliseconds. The thread comes
+// with the first record and sleeps while there is none.
+#pragma once
+
+#include <condition_variable>
+#include <mutex>
+#include <string>
+#include <string_view>
+#include <thread>
+#include <vector>
+
+namespace vrx::host {
+
+class LogWriter {
+public:
+    enum class Form {
+        Lines,    // to the file
+        Journal,  // each a datagram of the journal's, NAME=VALUE lines; to the file what the journal does not take
+    };
+
+    // The file is not owned.
+    LogWriter(int file, Form form);
+    // Writes what is left.
+    ~LogWriter();
+    LogWriter(const LogWriter&) = delete;
+    LogWriter& operator=(const LogWriter&) = delete;
+
+    // A record ends with a line break.
+    void add(std::string_view record);
+    // Returns when everything that was added before has been written.
+    void flush();
+
+private:
+    struct Batch {
+        std::string bytes;
+        std::vector<std::size_t> ends;  // of its records
+        std::string_view record(std::size_t index) const;
+    };
+    class CrashGuard;
+
+    void run();
+    bool isFull() const;  // under mutex_
+    void write(const Batch& batch) const;
+    void writeToFile(std::string_view bytes) const;
+    void sendToJournal(const Batch& batch) const;
+    void sendLargeToJournal(std::string_view record) const;
+    void flushInCrash();
+
+    const int file_;
+    const int journal_;  // a socket, or -1
+
+    std::mutex writing_;  // taken before mutex_
+    Batch writtenBatch_;  // its memory is used again; under writing_
+
+    std::mutex mutex_;
+    std::condition_variable changed_;
+    std::condition_variable hasRoom_;
+    Batch pending_;
+    bool isIdle_ = false;  // the thread waits for a first record
+    bool isEnding_ = false;
+    std::thread thread_;
+};
+
+}  // namespace vrx::host
