@@ -1,5 +1,6 @@
 // vrxagent: the agent. Serves its clients until SIGTERM or SIGINT. Exit codes: 0 ended cleanly, 1 could not start or go
 // on, 2 usage.
+#include <sys/prctl.h>
 #include <systemd/sd-daemon.h>
 
 #include <CLI/CLI.hpp>
@@ -30,6 +31,8 @@ int cannotStart(const std::string& why) {
 }
 
 int serve(const vrx::wire::Locations& places, Level logLevel) {
+    // A capability that the service manager gave is for the agent alone, not for the programs that it starts.
+    prctl(PR_CAP_AMBIENT, PR_CAP_AMBIENT_CLEAR_ALL, 0, 0, 0);
     Host host({.home = vrx::apps::absolutePath(places.home.path), .profile = places.profile.path}, logLevel);
     if (MaybeError error = host.open(HomeUse::Agent)) return cannotStart(error->text);
     BundleLookup bundles([&] { return host.profile().facts(); });
