@@ -193,6 +193,17 @@ Outcome all(AgentConnection& agent, VRXWarrantyLookupPolicy policy, bool updateF
     });
 }
 
+Outcome outreach(AgentConnection& agent) {
+    return outcomeOf(agent, agent.scheduleOutreachWithReply(), [](bool isScheduled) {
+        if (!isScheduled)
+            return failed(ExitCode::NoAnswer, "the agent schedules no outreach",
+                          "Use a vrxctl of the agent's own release.");
+        return Outcome{
+            .document = {{"scheduled", true}},
+            .text = "An outreach begins in a second, once the network is there; vrxhost activities shows it.\n"};
+    });
+}
+
 Outcome webUrl(AgentConnection& agent) {
     return outcomeOf(agent, agent.readWebURLOverride(), [](const std::optional<std::string>& url) {
         return Outcome{.document = {{"webURL", valueOf(url)}},
@@ -274,6 +285,7 @@ int run(int argc, const char* const* argv) {
     allVerb->add_flag("--update-follow-ups", options.updateFollowUps, "Bring the shown follow-ups up to date as well")
         ->disable_flag_override();
     addPolicy(allVerb, options);
+    line.add("outreach", "Has the agent look for offers now", asking(outreach));
     line.add("web-url", "Shows the web-flow URL that a tester has set", asking(webUrl));
     return line.run(argc, argv);
 }

@@ -34,7 +34,8 @@ Value expectCode(int code, const Arguments& arguments, Run run) {
 }
 
 const std::vector<Arguments> verbs{
-    {"device"}, {"paired"}, {"info", "--policy", "cached"}, {"info", "X"}, {"all", "--policy", "1"}, {"web-url"}};
+    {"device"},   {"paired"}, {"info", "--policy", "cached"}, {"info", "X"}, {"all", "--policy", "1"},
+    {"outreach"}, {"web-url"}};
 
 class CommandLine : public testing::Test {
 protected:
