@@ -86,6 +86,19 @@ void createPrivately(const std::string& path) {
         throw DatabaseError(SQLITE_CANTOPEN, systemError("create", path, errno).text);
 }
 
+// For looking: where a log lies beside the database, the index of the two is only read, or made in memory when nobody
+// keeps it; where none does, no index is needed.
+std::string lookingUri(const std::string& path) {
+    std::string uri = "file:";
+    for (const char character : path) {
+        if (character == '%' || character == '?' || character == '#')
+            uri.append(character == '%' ? "%25" : character == '?' ? "%3f" : "%23");
+        else
+            uri.push_back(character);
+    }
+    return uri + (FileIdentity::of(path + "-wal") ? "?readonly_shm=1" : "?immutable=1");
+}
+
 }  // namespace
 
 const Database::Schema Database::currentSchema = steps;
@@ -145,9 +158,11 @@ std::span<const std::uint8_t> Statement::bytes(int column) const {
     return {start, start ? static_cast<std::size_t>(sqlite3_column_bytes(statement_, column)) : 0};
 }
 
-Connection::Connection(const std::string& path) {
-    const int result =
-        sqlite3_open_v2(path.c_str(), &connection_, SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX, nullptr);
+Connection::Connection(const std::string& path, DatabaseUse use) {
+    const bool isLooking = use == DatabaseUse::Looking;
+    const int flags = isLooking ? SQLITE_OPEN_READONLY | SQLITE_OPEN_URI : SQLITE_OPEN_READWRITE;
+    const int result = sqlite3_open_v2((isLooking ? lookingUri(path) : path).c_str(), &connection_,
+                                       flags | SQLITE_OPEN_NOMUTEX, nullptr);
     try {
         check(result, connection_);
         sqlite3_extended_result_codes(connection_, 1);
@@ -189,6 +204,11 @@ std::int64_t Connection::integer(const char* sql) {
     return result;
 }
 
+void Connection::checkSoundness() {
+    Statement check(connection_, "PRAGMA quick_check(1)");
+    if (!check.step() || check.text(0) != "ok") throw DatabaseError(SQLITE_CORRUPT, std::string(check.text(0)));
+}
+
 void Connection::endStatements() {
     for (sqlite3_stmt* used = sqlite3_next_stmt(connection_, nullptr); used;
          used = sqlite3_next_stmt(connection_, used))
@@ -220,34 +240,35 @@ Connection::CommitMark Connection::commitMark() {
 
 // The connections of one opening. Reading has one of its own, so that it does not wait while a write waits.
 struct Database::Opening {
-    explicit Opening(const std::string& path) : path(path), writer(path) {}
+    explicit Opening(const std::string& path) : path(path) {}
 
     ~Opening() {
         // Closing the last connection takes the -wal file away by its name, which is not ours any more when another
         // database has come to stand there.
         if (FileIdentity::of(path) == file) return;
-        writer.keepLogAtClose(true);
-        if (reader) reader->keepLogAtClose(true);
+        for (auto* connection : {&writer, &reader})
+            if (*connection) (*connection)->keepLogAtClose(true);
     }
 
     // The database is sound: it is opened for reading, too, and is tidied up when it is closed.
     void passed() {
         reader.emplace(path);
         reader->findIndexHeader();
-        for (Connection* connection : {&writer, &*reader}) connection->keepLogAtClose(false);
+        for (auto* connection : {&writer, &reader}) (*connection)->keepLogAtClose(false);
         file = FileIdentity::of(path);
         wal = FileIdentity::of(path + "-wal");
         shm = FileIdentity::of(path + "-shm");
     }
 
     const std::string path;
-    Connection writer;
+    std::optional<Connection> writer;  // none for looking
     std::optional<Connection> reader;
     FileIdentity file, wal, shm;
     std::uint64_t number = 0;
 };
 
-Database::Database(std::string path, Schema schema) : path_(std::move(path)), schema_(schema) {}
+Database::Database(std::string path, Schema schema, DatabaseUse use)
+    : path_(std::move(path)), schema_(schema), use_(use) {}
 
 Database::~Database() = default;
 
@@ -284,6 +305,7 @@ void Database::leaveReplacedFile() {
 }
 
 std::shared_ptr<Database::Opening> Database::openChecked() {
+    if (use_ == DatabaseUse::Looking) return openToLook();
     try {
         return openOnce();
     } catch (const DatabaseError& error) {
@@ -299,25 +321,36 @@ std::shared_ptr<Database::Opening> Database::openChecked() {
 std::shared_ptr<Database::Opening> Database::openOnce() const {
     createPrivately(path_);
     auto opening = std::make_shared<Opening>(path_);
-    Connection& writer = opening->writer;
+    Connection& writer = opening->writer.emplace(path_);
     writer.execute("PRAGMA journal_mode = WAL");
-    {
-        Statement check(writer.connection_, "PRAGMA quick_check(1)");
-        if (!check.step() || check.text(0) != "ok") throw DatabaseError(SQLITE_CORRUPT, std::string(check.text(0)));
-    }
+    writer.checkSoundness();
     migrate(writer);
     opening->passed();
     return opening;
 }
 
+std::shared_ptr<Database::Opening> Database::openToLook() const {
+    auto opening = std::make_shared<Opening>(path_);
+    Connection& reader = opening->reader.emplace(path_, DatabaseUse::Looking);
+    reader.checkSoundness();
+    if (checkedVersion(reader) < static_cast<std::int64_t>(schema_.size()))
+        throw DatabaseError(SQLITE_ERROR, "it was made by an older version of the program");
+    opening->file = FileIdentity::of(path_);
+    return opening;
+}
+
+std::int64_t Database::checkedVersion(Connection& connection) const {
+    const auto newest = static_cast<std::int64_t>(schema_.size());
+    const std::int64_t version = connection.integer("PRAGMA user_version");
+    if (version <= newest && version >= 0) return version;
+    throw DatabaseError(SQLITE_ERROR, "it was made by a newer version of the program (schema " +
+                                          std::to_string(version) + "; this one knows " + std::to_string(newest) + ")");
+}
+
 void Database::migrate(Connection& writer) const {
     writer.execute("BEGIN IMMEDIATE");
     const auto newest = static_cast<std::int64_t>(schema_.size());
-    const std::int64_t version = writer.integer("PRAGMA user_version");
-    if (version > newest || version < 0)
-        throw DatabaseError(SQLITE_ERROR, "it was made by a newer version of the program (schema " +
-                                              std::to_string(version) + "; this one knows " + std::to_string(newest) +
-                                              ")");
+    const std::int64_t version = checkedVersion(writer);
     for (std::int64_t step = version; step < newest; ++step) writer.execute(schema_[static_cast<std::size_t>(step)]);
     if (version < newest) writer.execute(("PRAGMA user_version = " + std::to_string(newest)).c_str());
     writer.execute("COMMIT");
@@ -378,7 +411,8 @@ MaybeError Database::write(const std::function<void(Connection&)>& body) {
     std::lock_guard lock(writing_);
     MaybeError error;
     std::shared_ptr<Opening> current = opening(error);
-    return current ? transaction(current->writer, current, "BEGIN IMMEDIATE", body) : error;
+    if (current && !current->writer) error = Error{"database", SQLITE_READONLY, path_ + ": is only looked at"};
+    return error ? error : transaction(*current->writer, current, "BEGIN IMMEDIATE", body);
 }
 
 MaybeError Database::peek(const std::function<void(Connection&, const Stamp&)>& body) {

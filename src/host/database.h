@@ -31,6 +31,9 @@ public:
     const int code;  // SQLite's
 };
 
+// Looking changes no file: it makes, mends and migrates nothing, and where that is needed it fails.
+enum class DatabaseUse { Full, Looking };
+
 // A prepared statement: bind, then step through its rows. Columns and parameters count from 0. What it hands out lives
 // until the next step.
 class Statement {
@@ -64,7 +67,7 @@ private:
 // One connection to the database, used by one thread at a time.
 class Connection {
 public:
-    explicit Connection(const std::string& path);
+    explicit Connection(const std::string& path, DatabaseUse use = DatabaseUse::Full);
     ~Connection();
     Connection(const Connection&) = delete;
     Connection& operator=(const Connection&) = delete;
@@ -86,6 +89,7 @@ private:
     // untouched.
     void keepLogAtClose(bool keep);
     void findIndexHeader();
+    void checkSoundness();
     // A statement left within its rows would keep the transaction open.
     void endStatements();
 
@@ -101,10 +105,11 @@ public:
     static const Schema currentSchema;
 
     // Nothing is opened before the first use, or open().
-    explicit Database(std::string path, Schema schema = currentSchema);
+    explicit Database(std::string path, Schema schema = currentSchema, DatabaseUse use = DatabaseUse::Full);
     ~Database();
 
-    // An error names the file and the reason: it cannot be written, or a newer version of the program has made it.
+    // An error names the file and the reason: it cannot be written, or a newer version of the program has made it; for
+    // looking also that it is not there, damaged or of an older version.
     platform::MaybeError open();
 
     // Run the body within one transaction; an error undoes the whole of it. The body must not use the database again.
@@ -127,6 +132,8 @@ private:
     std::shared_ptr<Opening> opening(platform::MaybeError& error);
     std::shared_ptr<Opening> openChecked();
     std::shared_ptr<Opening> openOnce() const;
+    std::shared_ptr<Opening> openToLook() const;
+    std::int64_t checkedVersion(Connection& connection) const;
     void migrate(Connection& writer) const;
     void leaveReplacedFile();
     std::string freeAsideName(const std::string& reason) const;
@@ -137,6 +144,7 @@ private:
 
     const std::string path_;
     const Schema schema_;
+    const DatabaseUse use_;
 
     // One user each of the reading and the writing connection, over all openings; taken before mutex_.
     std::mutex reading_;
