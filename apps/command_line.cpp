@@ -48,9 +48,9 @@ std::size_t characters(std::string_view text) {
         std::count_if(text.begin(), text.end(), [](char byte) { return (byte & 0xc0) != 0x80; }));
 }
 
-bool hasJsonFlag(int argc, const char* const* argv) {
+bool hasFlag(int argc, const char* const* argv, const std::string& flag) {
     return std::any_of(argv + 1, argv + argc,
-                       [](std::string_view argument) { return argument == "--json" || argument == "--json=true"; });
+                       [&](std::string_view argument) { return argument == flag || argument == flag + "=true"; });
 }
 
 }  // namespace
@@ -121,7 +121,9 @@ CommandLine::CommandLine(const std::string& program, const std::string& purpose)
 
 CLI::App* CommandLine::add(const std::string& name, const std::string& help, Verb verb, CLI::App* group) {
     CLI::App* app = (group ? group : &app_)->add_subcommand(name, help)->fallthrough();
-    app->callback([this, verb = std::move(verb)] { chosen_ = verb; });
+    app->callback([this, app, verb = std::move(verb)] {
+        if (app->get_subcommands().empty()) chosen_ = verb;
+    });
     return app;
 }
 
@@ -130,7 +132,9 @@ CLI::App* CommandLine::addGroup(const std::string& name, const std::string& help
 }
 
 int CommandLine::run(int argc, const char* const* argv) {
-    isJson_ = hasJsonFlag(argc, argv);  // also where reading ends before it comes to the flag
+    // Also where reading ends before it comes to the flag.
+    isJson_ = hasFlag(argc, argv, "--json");
+    isWatch_ = hasFlag(argc, argv, "--watch");
     return report(read(argc, argv));
 }
 
@@ -147,8 +151,7 @@ Outcome CommandLine::read(int argc, const char* const* argv) {
     }
 }
 
-int CommandLine::report(const Outcome& outcome) const {
-    int code = static_cast<int>(outcome.code);
+bool CommandLine::show(const Outcome& outcome) const {
     if (isJson_) {
         Dictionary document = outcome.document;
         document["version"] = documentVersion;
@@ -157,11 +160,17 @@ int CommandLine::report(const Outcome& outcome) const {
             document["error"] = Dictionary{{"kind", outcome.kind.empty() ? kindOf(outcome.code) : outcome.kind},
                                            {"message", outcome.problem},
                                            {"advice", outcome.advice}};
-        std::puts(codec::printedJson(document, codec::JsonLayout::Indented).c_str());
+        const auto layout = isWatch_ ? codec::JsonLayout::OneLine : codec::JsonLayout::Indented;
+        std::puts(codec::printedJson(document, layout).c_str());
     } else {
         std::fputs(outcome.text.c_str(), stdout);
     }
-    const bool isWritten = std::fflush(stdout) == 0 && std::ferror(stdout) == 0;
+    return std::fflush(stdout) == 0 && std::ferror(stdout) == 0;
+}
+
+int CommandLine::report(const Outcome& outcome) const {
+    const bool isWritten = outcome.isShown || show(outcome);
+    const int code = static_cast<int>(outcome.code);
     if (!outcome.problem.empty())
         std::fprintf(stderr, "%s: %s\n", program_.c_str(), printable(outcome.problem).c_str());
     if (!outcome.advice.empty()) std::fprintf(stderr, "%s\n", printable(outcome.advice).c_str());

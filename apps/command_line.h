@@ -4,7 +4,8 @@
 //     {"version": 1, "ok": true, …what the verb gives…}
 //     {"version": 1, "ok": false, "error": {"kind": "not-reachable", "message": …, "advice": …}, …what is known…}
 //
-// Without it, standard output is text for people. In both, standard error says what went wrong and what to try next.
+// Without it, standard output is text for people. In both, standard error says what went wrong and what to try next. A
+// verb with --watch shows an outcome after the other, each document on a line of its own.
 // One thread.
 #pragma once
 
@@ -29,7 +30,8 @@ struct Outcome {
     // Why it is not done, and what to try next.
     std::string problem{};
     std::string advice{};
-    std::string kind{};  // the error's kind, when the code's own says too little
+    std::string kind{};    // the error's kind, when the code's own says too little
+    bool isShown = false;  // by show(): nothing of it is left to print
 };
 
 Outcome failed(ExitCode code, std::string problem, std::string advice);
@@ -53,12 +55,16 @@ public:
 
     // For options that every verb has; they may stand before and behind the verb.
     CLI::App& app() { return app_; }
-    // A verb, or with a group one of the verbs below it. What it returns takes the options of this verb alone.
+    // A verb, or with a group one of the verbs below it. What it returns takes the options of this verb alone. A verb
+    // that has verbs below it is run when none of them is named.
     CLI::App* add(const std::string& name, const std::string& help, Verb verb, CLI::App* group = nullptr);
     CLI::App* addGroup(const std::string& name, const std::string& help);
 
     // Reads the arguments, runs the verb, prints its outcome and gives the program's exit code.
     int run(int argc, const char* const* argv);
+
+    // Prints an outcome while the verb goes on. Whether it could be written.
+    bool show(const Outcome& outcome) const;
 
 private:
     Outcome read(int argc, const char* const* argv);
@@ -67,6 +73,7 @@ private:
     CLI::App app_;
     const std::string program_;
     bool isJson_ = false;
+    bool isWatch_ = false;
     Verb chosen_;
 };
 

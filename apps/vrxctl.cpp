@@ -204,6 +204,14 @@ Outcome outreach(AgentConnection& agent) {
     });
 }
 
+// The agent says that it has done so, whatever became of it.
+Outcome dismiss(AgentConnection& agent, const std::string& serialNumber) {
+    return outcomeOf(agent, agent.dismissFollowUpForSerialNumber(serialNumber), [&](bool isDone) {
+        if (!isDone) return failed(ExitCode::NoAnswer, "the agent did not dismiss the follow-up", "");
+        return Outcome{.document = {{"serialNumber", serialNumber}}};
+    });
+}
+
 Outcome webUrl(AgentConnection& agent) {
     return outcomeOf(agent, agent.readWebURLOverride(), [](const std::optional<std::string>& url) {
         return Outcome{.document = {{"webURL", valueOf(url)}},
@@ -285,6 +293,10 @@ int run(int argc, const char* const* argv) {
     allVerb->add_flag("--update-follow-ups", options.updateFollowUps, "Bring the shown follow-ups up to date as well")
         ->disable_flag_override();
     addPolicy(allVerb, options);
+    line.add("dismiss", "Dismisses the follow-up of a device for good",
+             asking([&](AgentConnection& agent) { return dismiss(agent, *options.serialNumber); }))
+        ->add_option("SERIAL", options.serialNumber, "Serial number")
+        ->required();
     line.add("outreach", "Has the agent look for offers now", asking(outreach));
     line.add("web-url", "Shows the web-flow URL that a tester has set", asking(webUrl));
     return line.run(argc, argv);

@@ -20,11 +20,12 @@ using platform::MaybeError;
 
 namespace {
 
-constexpr int busyMilliseconds = 5000;
-
 constexpr const char* steps[] = {
     // The agent's settings: a number or a text as itself, anything else as a binary property list.
     "CREATE TABLE defaults (key TEXT PRIMARY KEY, value NOT NULL) WITHOUT ROWID",
+    // Follow-ups, in the order of their first posting: the item as a binary property list.
+    "CREATE TABLE follow_ups (position INTEGER PRIMARY KEY, client TEXT NOT NULL, identifier TEXT NOT NULL, "
+    "item NOT NULL, UNIQUE (client, identifier))",
 };
 
 void check(int result, sqlite3* connection) {
@@ -158,8 +159,7 @@ std::span<const std::uint8_t> Statement::bytes(int column) const {
     return {start, start ? static_cast<std::size_t>(sqlite3_column_bytes(statement_, column)) : 0};
 }
 
-Connection::Connection(const std::string& path, DatabaseUse use) {
-    const bool isLooking = use == DatabaseUse::Looking;
+Connection::Connection(const std::string& path, std::chrono::milliseconds busyLimit, bool isLooking) {
     const int flags = isLooking ? SQLITE_OPEN_READONLY | SQLITE_OPEN_URI : SQLITE_OPEN_READWRITE;
     const int result = sqlite3_open_v2((isLooking ? lookingUri(path) : path).c_str(), &connection_,
                                        flags | SQLITE_OPEN_NOMUTEX, nullptr);
@@ -167,7 +167,7 @@ Connection::Connection(const std::string& path, DatabaseUse use) {
         check(result, connection_);
         sqlite3_extended_result_codes(connection_, 1);
         keepLogAtClose(true);
-        sqlite3_busy_timeout(connection_, busyMilliseconds);
+        sqlite3_busy_timeout(connection_, static_cast<int>(busyLimit.count()));
         execute("PRAGMA synchronous = FULL");
     } catch (...) {
         sqlite3_close(connection_);
@@ -240,7 +240,7 @@ Connection::CommitMark Connection::commitMark() {
 
 // The connections of one opening. Reading has one of its own, so that it does not wait while a write waits.
 struct Database::Opening {
-    explicit Opening(const std::string& path) : path(path) {}
+    Opening(const std::string& path, std::chrono::milliseconds busyLimit) : path(path), busyLimit(busyLimit) {}
 
     ~Opening() {
         // Closing the last connection takes the -wal file away by its name, which is not ours any more when another
@@ -252,7 +252,7 @@ struct Database::Opening {
 
     // The database is sound: it is opened for reading, too, and is tidied up when it is closed.
     void passed() {
-        reader.emplace(path);
+        reader.emplace(path, busyLimit);
         reader->findIndexHeader();
         for (auto* connection : {&writer, &reader}) (*connection)->keepLogAtClose(false);
         file = FileIdentity::of(path);
@@ -261,14 +261,15 @@ struct Database::Opening {
     }
 
     const std::string path;
+    const std::chrono::milliseconds busyLimit;
     std::optional<Connection> writer;  // none for looking
     std::optional<Connection> reader;
     FileIdentity file, wal, shm;
     std::uint64_t number = 0;
 };
 
-Database::Database(std::string path, Schema schema, DatabaseUse use)
-    : path_(std::move(path)), schema_(schema), use_(use) {}
+Database::Database(std::string path, Schema schema, std::chrono::milliseconds busyLimit, bool isLooking)
+    : path_(std::move(path)), schema_(schema), busyLimit_(busyLimit), isLooking_(isLooking) {}
 
 Database::~Database() = default;
 
@@ -305,7 +306,7 @@ void Database::leaveReplacedFile() {
 }
 
 std::shared_ptr<Database::Opening> Database::openChecked() {
-    if (use_ == DatabaseUse::Looking) return openToLook();
+    if (isLooking_) return openToLook();
     try {
         return openOnce();
     } catch (const DatabaseError& error) {
@@ -320,8 +321,8 @@ std::shared_ptr<Database::Opening> Database::openChecked() {
 
 std::shared_ptr<Database::Opening> Database::openOnce() const {
     createPrivately(path_);
-    auto opening = std::make_shared<Opening>(path_);
-    Connection& writer = opening->writer.emplace(path_);
+    auto opening = std::make_shared<Opening>(path_, busyLimit_);
+    Connection& writer = opening->writer.emplace(path_, busyLimit_);
     writer.execute("PRAGMA journal_mode = WAL");
     writer.checkSoundness();
     migrate(writer);
@@ -330,8 +331,8 @@ std::shared_ptr<Database::Opening> Database::openOnce() const {
 }
 
 std::shared_ptr<Database::Opening> Database::openToLook() const {
-    auto opening = std::make_shared<Opening>(path_);
-    Connection& reader = opening->reader.emplace(path_, DatabaseUse::Looking);
+    auto opening = std::make_shared<Opening>(path_, busyLimit_);
+    Connection& reader = opening->reader.emplace(path_, busyLimit_, true);
     reader.checkSoundness();
     if (checkedVersion(reader) < static_cast<std::int64_t>(schema_.size()))
         throw DatabaseError(SQLITE_ERROR, "it was made by an older version of the program");

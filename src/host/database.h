@@ -9,6 +9,7 @@
 #include <sys/stat.h>
 
 #include <array>
+#include <chrono>
 #include <cstdint>
 #include <functional>
 #include <memory>
@@ -30,9 +31,6 @@ public:
     DatabaseError(int code, const std::string& text) : std::runtime_error(text), code(code) {}
     const int code;  // SQLite's
 };
-
-// Looking changes no file: it makes, mends and migrates nothing, and where that is needed it fails.
-enum class DatabaseUse { Full, Looking };
 
 // A prepared statement: bind, then step through its rows. Columns and parameters count from 0. What it hands out lives
 // until the next step.
@@ -67,7 +65,7 @@ private:
 // One connection to the database, used by one thread at a time.
 class Connection {
 public:
-    explicit Connection(const std::string& path, DatabaseUse use = DatabaseUse::Full);
+    Connection(const std::string& path, std::chrono::milliseconds busyLimit, bool isLooking = false);
     ~Connection();
     Connection(const Connection&) = delete;
     Connection& operator=(const Connection&) = delete;
@@ -104,16 +102,20 @@ public:
     using Schema = std::span<const char* const>;
     static const Schema currentSchema;
 
-    // Nothing is opened before the first use, or open().
-    explicit Database(std::string path, Schema schema = currentSchema, DatabaseUse use = DatabaseUse::Full);
+    // Nothing is opened before the first use, or open(). A write waits for other writers up to the limit.
+    explicit Database(std::string path, Schema schema = currentSchema,
+                      std::chrono::milliseconds busyLimit = std::chrono::seconds(5))
+        : Database(std::move(path), schema, busyLimit, false) {}
+    // For reading only. It changes no file: where one would have to be made, mended or migrated, it cannot be opened.
+    static Database toLookAt(std::string path, Schema schema = currentSchema) {
+        return {std::move(path), schema, std::chrono::seconds(5), true};
+    }
     ~Database();
 
-    // An error names the file and the reason: it cannot be written, or a newer version of the program has made it; for
-    // looking also that it is not there, damaged or of an older version.
+    // An error names the file and the reason: it cannot be written, or a newer version of the program has made it.
     platform::MaybeError open();
 
     // Run the body within one transaction; an error undoes the whole of it. The body must not use the database again.
-    // A write waits some seconds for other writers.
     platform::MaybeError read(const std::function<void(Connection&)>& body);
     platform::MaybeError write(const std::function<void(Connection&)>& body);
 
@@ -129,6 +131,7 @@ public:
 private:
     struct Opening;
 
+    Database(std::string path, Schema schema, std::chrono::milliseconds busyLimit, bool isLooking);
     std::shared_ptr<Opening> opening(platform::MaybeError& error);
     std::shared_ptr<Opening> openChecked();
     std::shared_ptr<Opening> openOnce() const;
@@ -144,7 +147,8 @@ private:
 
     const std::string path_;
     const Schema schema_;
-    const DatabaseUse use_;
+    const std::chrono::milliseconds busyLimit_;
+    const bool isLooking_;
 
     // One user each of the reading and the writing connection, over all openings; taken before mutex_.
     std::mutex reading_;

@@ -15,6 +15,7 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel)
       files_(home_),
       database_(home_ + "/host.db"),
       defaults_(database_),
+      followUps_(database_),
       profile_(locations.profile),
       accounts_(profile_),
       clock_(profile_),
@@ -26,6 +27,7 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel)
     facilities_.digest = &digest_;
     facilities_.featureFlags = &profile_;
     facilities_.files = &files_;
+    facilities_.followUpControllers = &followUps_;
     facilities_.httpSessions = &http_;
     facilities_.json = &json_;
     facilities_.locale = &profile_;

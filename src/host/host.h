@@ -17,6 +17,7 @@
 #include "host/defaults_store.h"
 #include "host/device_profile.h"
 #include "host/files.h"
+#include "host/follow_up_controller.h"
 #include "host/home_lock.h"
 #include "host/http.h"
 #include "host/main_loop.h"
@@ -73,6 +74,7 @@ private:
     Files files_;
     Database database_;
     DefaultsStore defaults_;
+    FollowUpControllers followUps_;
     DeviceProfile profile_;
     AccountStore accounts_;
     Clock clock_;

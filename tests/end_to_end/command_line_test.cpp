@@ -34,7 +34,7 @@ Value expectCode(int code, const Arguments& arguments, Run run) {
 }
 
 const std::vector<Arguments> verbs{
-    {"device"},   {"paired"}, {"info", "--policy", "cached"}, {"info", "X"}, {"all", "--policy", "1"},
+    {"device"},   {"paired"}, {"info", "--policy", "cached"}, {"info", "X"}, {"all", "--policy", "1"}, {"dismiss", "X"},
     {"outreach"}, {"web-url"}};
 
 class CommandLine : public testing::Test {
@@ -81,7 +81,11 @@ TEST_F(CommandLine, VerbsAnswer) {
 
 TEST_F(CommandLine, NoAgentIsNotReachable) {
     for (const Arguments& verb : verbs) EXPECT_EQ(expect(3, verb)["error"]["kind"], Value("not-reachable"));
-    for (const Arguments& verb : {Arguments{"defaults", "list"}, {"defaults", "write", "K", "1"}, {"cache", "X"}})
+    for (const Arguments& verb : {Arguments{"defaults", "list"},
+                                  {"defaults", "write", "K", "1"},
+                                  {"cache", "X"},
+                                  {"followups", "--watch"},
+                                  {"followups", "clear", "X"}})
         expectHost(3, verb);
     EXPECT_FALSE(std::filesystem::exists(place_ / "home"));
 }
@@ -134,7 +138,8 @@ TEST_F(CommandLine, UsageErrors) {
                                        {"all", "--timeout", "0"},
                                        {"all", "--timeout", "nan"},
                                        {"all", "--timeout", "1s"},
-                                       {"all", "--bogus"}})
+                                       {"all", "--bogus"},
+                                       {"dismiss"}})
         EXPECT_EQ(expect(2, arguments)["error"]["kind"], Value("usage"));
     for (const Arguments& arguments : {Arguments{"defaults"},
                                        {"defaults", "read"},
@@ -144,6 +149,9 @@ TEST_F(CommandLine, UsageErrors) {
                                        {"defaults", "write", "K", "1", "--int", "2"},
                                        {"defaults", "write", "K", "--date", "today"},
                                        {"defaults", "list", "--device", "x"},
+                                       {"followups", "clear"},
+                                       {"followups", "post", "x", "--watch"},
+                                       {"followups", "--device", "x", "clear", "y"},
                                        {"cache"}})
         EXPECT_EQ(expectHost(2, arguments)["error"]["kind"], Value("usage"));
     expect(0, {"--help"});

@@ -244,7 +244,7 @@ TEST_F(DefaultsStoreTest, LookingReadsWhatIsThereAndChangesNothing) {
     };
     auto expectLook = [&](const char* when) {
         const Dictionary before = contents();
-        Database database(path(), Database::currentSchema, DatabaseUse::Looking);
+        Database database = Database::toLookAt(path());
         DefaultsStore store(database);
         EXPECT_EQ(store.get("key"), Value(when));
         store.set("key", "looked");
@@ -274,27 +274,28 @@ TEST_F(DefaultsStoreTest, LookingReadsWhatIsThereAndChangesNothing) {
     expectLook("ended");
     EXPECT_THAT(folder.names(), ElementsAre("host.db"));
 
-    const char* const next[] = {Database::currentSchema[0], "CREATE TABLE more (x)"};
-    EXPECT_THAT(Database(path(), next, DatabaseUse::Looking).open()->text, HasSubstr("older version"));
+    std::vector<const char*> next(Database::currentSchema.begin(), Database::currentSchema.end());
+    next.push_back("CREATE TABLE more (x)");
+    EXPECT_THAT(Database::toLookAt(path(), next).open()->text, HasSubstr("older version"));
     writeFile(folder / "damaged 1%?#.db", std::string(8192, 'x'));
     for (const char* name : {"absent.db", "damaged 1%?#.db"})
-        EXPECT_TRUE(Database(folder / name, Database::currentSchema, DatabaseUse::Looking).open()) << name;
+        EXPECT_TRUE(Database::toLookAt(folder / name).open()) << name;
     EXPECT_THAT(folder.names(), ElementsAre("damaged 1%?#.db", "host.db"));
 }
 
 TEST_F(DefaultsStoreTest, ChangesTheSchemaAsAWholeOrNotAtAll) {
     const char* const broken[] = {Database::currentSchema[0], "CREATE TABLE more (x)", "nonsense"};
-    const char* const sound[] = {Database::currentSchema[0], "CREATE TABLE more (x)"};
+    const Database::Schema older(broken, 1);
     {
-        Database first(path());
+        Database first(path(), older);
         DefaultsStore(first).set("key", 1);
     }
     EXPECT_TRUE(Database(path(), broken).open());
-    Database next(path(), sound);
+    Database next(path(), Database::Schema(broken, 2));
     EXPECT_FALSE(next.open()) << next.open()->text;
     EXPECT_EQ(DefaultsStore(next).integer("key"), 1);
     EXPECT_FALSE(execute(next, "INSERT INTO more VALUES (1)"));
-    EXPECT_TRUE(Database(path()).open());  // which is the older program now
+    EXPECT_TRUE(Database(path(), older).open());
 }
 
 TEST_F(DefaultsStoreTest, OpensAReplacedFileAgainAndKeepsItsOwnLogOutOfIt) {

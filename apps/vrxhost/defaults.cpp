@@ -1,0 +1,132 @@
+// vrxhost defaults: the agent's settings.
+#include "codec/iso_date.h"
+#include "codec/json.h"
+#include "home.h"
+#include "verbs.h"
+
+namespace vrx::apps {
+
+using platform::Dictionary;
+using platform::Result;
+using platform::Value;
+
+namespace {
+
+const char* typeName(const Value& value) {
+    switch (value.type()) {
+        case Value::Type::Null: return "nothing";
+        case Value::Type::Bool: return "boolean";
+        case Value::Type::Integer: return "integer";
+        case Value::Type::Double: return "float";
+        case Value::Type::Date: return "date";
+        case Value::Type::String: return "string";
+        case Value::Type::Data: return "data";
+        case Value::Type::Array: return "array";
+        case Value::Type::Dictionary: return "dictionary";
+    }
+    return "";
+}
+
+Dictionary settingDocument(const std::string& key, const Value& value, bool isRegistered) {
+    return {{"key", key}, {"value", value}, {"type", typeName(value)}, {"registered", isRegistered}};
+}
+
+constexpr const char* registeredMark = "registered";
+
+Outcome listDefaults(Home& home) {
+    platform::Array documents;
+    std::vector<std::vector<std::string>> rows{{"KEY", "TYPE", "FROM", "VALUE"}};
+    for (const auto& [key, value] : home.defaults().dictionaryRepresentation()) {
+        const bool isRegistered = home.stored().get(key).isNull();
+        documents.emplace_back(settingDocument(key, value, isRegistered));
+        rows.push_back({key, typeName(value), isRegistered ? registeredMark : "stored", printableValue(value)});
+    }
+    return {.document = {{"defaults", documents}}, .text = table(rows)};
+}
+
+Outcome readDefault(Home& home, const std::string& key) {
+    const Value value = home.defaults().get(key);
+    if (value.isNull())
+        return failed(ExitCode::NoAnswer, "nothing is stored or registered under " + key, "See vrxhost defaults list.");
+    const bool isRegistered = home.stored().get(key).isNull();
+    return {.document = settingDocument(key, value, isRegistered),
+            .text = printableValue(value) + (isRegistered ? std::string("  (") + registeredMark + ")\n" : "\n")};
+}
+
+// The store only logs that it could not write.
+Outcome storeDefault(Home& home, const std::string& key, const Value& value) {
+    home.defaults().set(key, value);
+    if (home.stored().get(key) == value) return {.document = {{"key", key}, {"value", value}}};
+    Outcome outcome = failed(ExitCode::NoAnswer, "the database could not be written", "The line above says why.");
+    outcome.kind = "not-written";
+    return outcome;
+}
+
+Outcome deleteDefault(Home& home, const std::string& key) {
+    const bool wasStored = !home.stored().get(key).isNull();
+    Outcome outcome = storeDefault(home, key, nullptr);
+    if (outcome.code != ExitCode::Done) return outcome;
+    return {.document = {{"key", key}, {"deleted", wasStored}},
+            .text = wasStored ? "" : "Nothing was stored under " + printable(key) + ".\n"};
+}
+
+struct Setting {
+    std::string key;
+    Value value;
+};
+
+void addKey(CLI::App* verb, Setting& setting) {
+    verb->add_option("KEY", setting.key, "The setting's name")->required();
+}
+
+// One of a JSON value and the typed options.
+void addValue(CLI::App* verb, Setting& setting) {
+    CLI::Option_group* group = verb->add_option_group("value", "The value, in one of these forms");
+    auto add = [&]<class T>(const char* name, const char* type, const char* help, std::type_identity<T>) {
+        group
+            ->add_option_function<T>(
+                name, [&setting](const T& value) { setting.value = value; }, help)
+            ->type_name(type);
+    };
+    auto json = [&setting](const std::string& text) {
+        Result<Value> value = codec::parseJson(text);
+        if (!value)
+            throw CLI::ValidationError("VALUE",
+                                       "no JSON value, " + value.error().text + "; a text is given with --string");
+        if (value->isNull()) throw CLI::ValidationError("VALUE", "null cannot be stored; use defaults delete");
+        setting.value = *value;
+    };
+    group->add_option_function<std::string>("VALUE", json, "A JSON value")->type_name("JSON");
+    add("--string", "TEXT", "A text", std::type_identity<std::string>());
+    add("--int", "N", "A whole number", std::type_identity<std::int64_t>());
+    add("--float", "X", "A number", std::type_identity<double>());
+    add("--bool", "true|false", "A boolean", std::type_identity<bool>());
+    auto date = [&setting](const std::string& text) {
+        const auto value = codec::dateFromIsoText(text);
+        if (!value) throw CLI::ValidationError("--date", "'" + text + "' is no date such as 2026-01-31T12:00:00Z");
+        setting.value = *value;
+    };
+    group->add_option_function<std::string>("--date", date, "A date in UTC: 2026-01-31T12:00:00Z")->type_name("DATE");
+    group->require_option(1);
+}
+
+}  // namespace
+
+void addDefaultsVerbs(CommandLine& line, const wire::LocationOverrides& places) {
+    auto setting = std::make_shared<Setting>();
+    CLI::App* group = line.addGroup("defaults", "The agent's settings");
+    line.add("list", "Lists all settings, stored and registered", inHome(places, listDefaults), group);
+    addKey(line.add("read", "Shows a setting",
+                    inHome(places, [setting](Home& home) { return readDefault(home, setting->key); }), group),
+           *setting);
+    CLI::App* write = line.add(
+        "write", "Stores a setting",
+        inHome(places, [setting](Home& home) { return storeDefault(home, setting->key, setting->value); }), group);
+    addKey(write, *setting);
+    addValue(write, *setting);
+    addKey(line.add("delete", "Removes a stored setting; a registered value holds again",
+                    inHome(places, [setting](Home& home) { return deleteDefault(home, setting->key); }), group),
+           *setting);
+}
+
+}  // namespace vrx::apps

@@ -1,0 +1,295 @@
+// vrxhost followups: what the settings app shows to the user, and what a tester has it show.
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <cmath>
+#include <cstdio>
+#include <system_error>
+
+#include "codec/iso_date.h"
+#include "codec/json.h"
+#include "home.h"
+#include "home_watch.h"
+#include "host/clock.h"
+#include "host/device_profile.h"
+#include "host/follow_up_document.h"
+#include "platform/number_text.h"
+#include "platform/text.h"
+#include "platform/vendor.h"
+#include "verbs.h"
+
+namespace vrx::apps {
+
+using platform::Array;
+using platform::Date;
+using platform::Dictionary;
+using platform::Duration;
+using platform::FollowUpItem;
+using platform::MaybeError;
+using platform::Result;
+using platform::Value;
+
+namespace {
+
+// The agent's.
+std::string clientIdentifier() {
+    return platform::vendorIdentifier(".Vireo");
+}
+
+Outcome failedWith(const char* kind, const platform::Error& error) {
+    Outcome outcome = failed(ExitCode::NoAnswer, error.text, "");
+    outcome.kind = kind;
+    return outcome;
+}
+
+// How an item looks at a moment.
+class Shown {
+public:
+    Shown(const FollowUpItem& item, Date now, Duration day) : item_(item), userInfo_(item.userInfo) {
+        if (!item.expirationDate) return;
+        isExpired_ = *item.expirationDate <= now;
+        const double days = (*item.expirationDate - now) / day;
+        if (!std::isfinite(days)) return;
+        const bool roundsUp = userInfo_[platform::DaysLeftRoundsUpKey].asBool().value_or(false);
+        const double whole = std::max(0.0, roundsUp ? std::ceil(days) : std::floor(days));
+        daysLeft_ = platform::clampedInteger(whole);
+        if (!isExpired_) nextChange_ = *item.expirationDate - std::max(0.0, roundsUp ? whole - 1 : whole) * day;
+    }
+
+    bool isExpired() const { return isExpired_; }
+    // Of the days that the keys of the user info count; nothing without an expiration date.
+    std::optional<std::int64_t> daysLeft() const { return daysLeft_; }
+    // When there will be fewer days left, or it expires.
+    std::optional<Date> nextChange() const { return nextChange_; }
+    // The item of the layout that knew one device.
+    bool isLegacy() const { return item_.uniqueIdentifier == clientIdentifier(); }
+    // An item is set up without a badge first, when the end of the offer is far, and keeps that bit when it gets one.
+    bool hasBadge() const { return (item_.displayStyle & platform::follow_up_style::withRowBadge) != 0; }
+    std::optional<std::string> serialNumber() const { return text("FollowupSerialNumber"); }
+
+    // The text that the settings app makes of the days left, if the user info says how.
+    std::optional<std::string> relativeText(const platform::Locale& locale) const {
+        if (!daysLeft_) return std::nullopt;
+        if (*daysLeft_ <= 1) return text(platform::OneDayLeftTextKey);
+        const auto format = text(platform::DaysLeftFormatKey);
+        if (!format) return std::nullopt;
+        return platform::filled(*format, {locale.decimalText(static_cast<std::uint64_t>(*daysLeft_))});
+    }
+
+private:
+    std::optional<std::string> text(std::string_view key) const {
+        const std::string* text = userInfo_[key].asString();
+        return text ? std::optional(*text) : std::nullopt;
+    }
+
+    const FollowUpItem& item_;
+    const Value userInfo_;
+    bool isExpired_ = false;
+    std::optional<std::int64_t> daysLeft_;
+    std::optional<Date> nextChange_;
+};
+
+std::optional<std::string> deviceName(const host::DeviceProfile& profile,
+                                      const std::optional<std::string>& serialNumber) {
+    if (!serialNumber) return std::nullopt;
+    if (profile.string("SerialNumber") == serialNumber) return profile.string("UserAssignedDeviceName");
+    for (const platform::PairedWatch& watch : profile.watches())
+        if (watch.serialNumber == serialNumber) return watch.name ? watch.name : watch.localizedModelName;
+    return std::nullopt;
+}
+
+template <class T>
+Value valueOf(const std::optional<T>& value) {
+    return value ? Value(*value) : Value();
+}
+
+// The listing, and when it will look different by itself.
+struct Listing {
+    Outcome outcome;
+    std::optional<Date> nextChange{};
+};
+
+void append(Listing& listing, Array& documents, const FollowUpItem& item, const Shown& shown,
+            const host::DeviceProfile& profile) {
+    const auto serialNumber = shown.serialNumber();
+    const auto name = deviceName(profile, serialNumber);
+    const auto relativeText = shown.relativeText(profile);
+    const auto expires = item.expirationDate ? codec::isoTextFromDate(*item.expirationDate) : std::nullopt;
+    const bool differs = relativeText && relativeText != item.informativeFooterText;
+    documents.emplace_back(Dictionary{{"item", host::followUpDocument(item)},
+                                      {"derived", Dictionary{{"deviceName", valueOf(name)},
+                                                             {"serialNumber", valueOf(serialNumber)},
+                                                             {"badge", shown.hasBadge()},
+                                                             {"expired", shown.isExpired()},
+                                                             {"expires", valueOf(expires)},
+                                                             {"legacy", shown.isLegacy()},
+                                                             {"daysLeft", valueOf(shown.daysLeft())},
+                                                             {"relativeText", valueOf(relativeText)},
+                                                             {"differsFromFooter", differs}}}});
+
+    std::string& text = listing.outcome.text;
+    text += printable(item.title.value_or("(no title)")) + (shown.isExpired() ? "  [expired]" : "") +
+            (shown.isLegacy() ? "  [legacy]" : "") + "\n";
+    auto line = [&](const std::string& field, const std::optional<std::string>& content, const char* remark = "") {
+        text +=
+            "  " + field + std::string(16 - field.size(), ' ') + printable(content.value_or("none")) + remark + "\n";
+    };
+    line("Device", serialNumber ? name.value_or("(unknown)") + ", " + *serialNumber : "none is named");
+    line("Text", item.informativeFooterText);
+    line("Days left text", relativeText, differs ? "  (differs from the text)" : "");
+    line("Badge", shown.hasBadge() ? "yes" : "no");
+    line("Expires", item.expirationDate ? platform::describe(*item.expirationDate) : "never");
+    line("Target", item.targetBundleIdentifier);
+    line("Extension", item.extensionIdentifier);
+    for (const platform::FollowUpAction& action : item.actions)
+        line("Action", action.label.value_or("(no label)") + (action.url ? ", " + *action.url : ""));
+    line("Identifier", item.uniqueIdentifier);
+}
+
+Listing list(Home& home, const host::DeviceProfile& profile) {
+    const auto items = home.followUps().makeController(clientIdentifier())->pendingFollowUpItems();
+    if (!items) return {failedWith("not-read", items.error())};
+    Duration day(home.defaults().number("OneDayInterval"));
+    if (!(day.count() > 0)) day = std::chrono::days(1);
+    const Date now = host::Clock(profile).now();
+
+    Listing listing;
+    Array documents;
+    for (const FollowUpItem& item : *items) {
+        const Shown shown(item, now, day);
+        append(listing, documents, item, shown, profile);
+        if (const auto change = shown.nextChange(); change && change < listing.nextChange.value_or(Date::max()))
+            listing.nextChange = change;
+    }
+    listing.outcome.document = {{"followUps", documents}};
+    if (items->empty()) listing.outcome.text = "No follow-up is pending.\n";
+    return listing;
+}
+
+// The listing now, and after each change of it, until a signal.
+Outcome watch(const CommandLine& line, Home& home, const host::DeviceProfile& profile) try {
+    HomeWatch changes(home);
+    Outcome last;
+    for (auto wake = HomeWatch::Wake::Look; wake == HomeWatch::Wake::Look;) {
+        const Listing listing = list(home, profile);
+        if (listing.outcome.code != ExitCode::Done) return listing.outcome;
+        if (listing.outcome.document != last.document) {
+            last = listing.outcome;
+            last.text.insert(0, "== " + platform::describe(host::Clock(profile).now()) + "\n");
+            last.isShown = line.show(last);
+            if (!last.isShown) return last;
+        }
+        wake = changes.wait(listing.nextChange);
+        if (wake == HomeWatch::Wake::Gone) return notReachable("the database of " + home.path() + " is gone");
+    }
+    return last;
+} catch (const std::system_error& error) {
+    return failedWith("not-watched", {"system", error.code().value(), error.what()});
+}
+
+Result<std::string> readAll(const std::string& file) {
+    std::FILE* stream = file == "-" ? stdin : std::fopen(file.c_str(), "re");
+    if (!stream) return host::systemError("open", file, errno);
+    std::string text;
+    std::array<char, 4096> part;
+    while (const std::size_t size = std::fread(part.data(), 1, part.size(), stream)) text.append(part.data(), size);
+    const int error = std::ferror(stream) ? errno : 0;
+    if (stream != stdin) std::fclose(stream);
+    if (error) return host::systemError("read", file, error);
+    return text;
+}
+
+// An item as the listing prints it; the expiration date may be a text as well, and nothing is taken that an item could
+// not mean.
+Result<FollowUpItem> readItem(const std::string& file) {
+    const auto mistake = [&](const std::string& what) { return platform::Error{"follow-up", 0, file + ": " + what}; };
+    const Result<std::string> text = readAll(file);
+    if (!text) return text.error();
+    Result<Value> root = codec::parseJson(*text);
+    if (!root) return mistake(root.error().text);
+    Value document = *root;
+    if (const std::string* date = document["expirationDate"].asString()) {
+        const auto expires = codec::dateFromIsoText(*date);
+        if (!expires) return mistake("\"expirationDate\" is neither seconds nor a date such as 2026-01-31T12:00:00Z");
+        Dictionary changed = *document.asDictionary();
+        changed["expirationDate"] = platform::epochSeconds(*expires);
+        document = changed;
+    }
+    Result<FollowUpItem> item = host::followUpFromDocument(document);
+    if (!item) return mistake(item.error().text);
+    if (item->uniqueIdentifier.empty()) return mistake("\"uniqueIdentifier\" is empty");
+    if (document["displayStyle"].asInteger().value_or(0) < 0) return mistake("\"displayStyle\" is below 0");
+    return item;
+}
+
+bool isPending(const std::vector<FollowUpItem>& items, const std::string& identifier) {
+    return std::any_of(items.begin(), items.end(),
+                       [&](const FollowUpItem& item) { return item.uniqueIdentifier == identifier; });
+}
+
+Outcome post(Home& home, const std::string& file) {
+    constexpr const char* advice = "vrxhost followups --json shows items in the form that is wanted.";
+    const Result<FollowUpItem> item = readItem(file);
+    if (!item) return failed(ExitCode::Usage, item.error().text, advice);
+    const auto controller = home.followUps().makeController(clientIdentifier());
+    const auto before = controller->pendingFollowUpItems();
+    if (!before) return failedWith("not-read", before.error());
+    const bool isReplaced = isPending(*before, item->uniqueIdentifier);
+    if (const MaybeError error = controller->postFollowUpItem(*item)) {
+        if (error->domain == "property list") return failed(ExitCode::Usage, file + ": " + error->text, advice);
+        return failedWith("not-written", *error);
+    }
+    return {.document = {{"uniqueIdentifier", item->uniqueIdentifier}, {"replaced", isReplaced}},
+            .text = (isReplaced ? "Replaced " : "Posted ") + printable(item->uniqueIdentifier) + ".\n"};
+}
+
+Outcome clear(Home& home, const std::vector<std::string>& identifiers) {
+    const auto controller = home.followUps().makeController(clientIdentifier());
+    const auto before = controller->pendingFollowUpItems();
+    if (!before) return failedWith("not-read", before.error());
+    if (const MaybeError error = controller->clearPendingFollowUpItems(identifiers))
+        return failedWith("not-written", *error);
+    Array cleared, notPending;
+    Outcome outcome;
+    for (const std::string& identifier : identifiers) {
+        const bool wasPending = isPending(*before, identifier);
+        (wasPending ? cleared : notPending).emplace_back(identifier);
+        if (!wasPending) outcome.text += "Nothing that can be read was pending under " + printable(identifier) + ".\n";
+    }
+    outcome.document = {{"cleared", cleared}, {"notPending", notPending}};
+    return outcome;
+}
+
+}  // namespace
+
+void addFollowUpVerbs(CommandLine& line, const wire::LocationOverrides& places) {
+    struct Options {
+        std::optional<std::string> profile;
+        bool isWatch = false;
+        std::string file;
+        std::vector<std::string> identifiers;
+    };
+    auto options = std::make_shared<Options>();
+    CLI::App* listing =
+        line.add("followups", "Shows what the settings app would", inHome(places, [options, &line](Home& home) {
+                     const host::DeviceProfile profile(wire::findLocations({.profile = options->profile}).profile.path);
+                     return options->isWatch ? watch(line, home, profile) : list(home, profile).outcome;
+                 }));
+    CLI::Option* watch = listing->add_flag("--watch", options->isWatch, "Show it again after each change");
+    watch->disable_flag_override();
+    CLI::Option* device =
+        listing->add_option("--device", options->profile, "The agent's device profile, for names and language");
+    device->type_name("PATH");
+
+    CLI::App* post =
+        line.add("post", "Posts an item, or replaces the pending one of the same identifier",
+                 inHome(places, [options](Home& home) { return apps::post(home, options->file); }), listing);
+    post->add_option("FILE", options->file, "The item as JSON; - for standard input")->required();
+    CLI::App* clear =
+        line.add("clear", "Clears items",
+                 inHome(places, [options](Home& home) { return apps::clear(home, options->identifiers); }), listing);
+    clear->add_option("ID", options->identifiers, "Unique identifiers of items")->required();
+    for (CLI::App* change : {post, clear}) change->excludes(watch)->excludes(device);
+}
+
+}  // namespace vrx::apps

@@ -1,0 +1,58 @@
+// An agent's home as vrxhost sees it, beside the agent: it makes no home and no database of its own. One thread.
+#pragma once
+
+#include <functional>
+#include <string>
+
+#include "codec/codec.h"
+#include "command_line.h"
+#include "host/database.h"
+#include "host/defaults_store.h"
+#include "host/files.h"
+#include "host/follow_up_controller.h"
+#include "host/system_log.h"
+#include "platform/platform.h"
+#include "wire/locations.h"
+
+namespace vrx::apps {
+
+// What is in it, and the platform that the agent's own classes read it through.
+class Home {
+public:
+    explicit Home(const std::string& path);
+
+    static std::string databasePath(const std::string& home) { return home + "/host.db"; }
+
+    platform::MaybeError open() { return database_.open(); }
+    const std::string& path() const { return path_; }
+    host::Database& database() { return database_; }
+    platform::DefaultsStore& defaults() { return defaults_; }
+    // Without the registered values.
+    const platform::DefaultsStore& stored() const { return stored_; }
+    const platform::Files& files() const { return files_; }
+    platform::FollowUpControllers& followUps() { return followUps_; }
+
+private:
+    const std::string path_;
+    host::SystemLog log_;
+    codec::Digest digest_;
+    codec::PropertyList propertyList_;
+    host::Files files_;
+    host::Database database_;
+    host::DefaultsStore stored_{database_};
+    host::DefaultsStore defaults_{database_};
+    host::FollowUpControllers followUps_{database_};
+    platform::Platform platform_{{.defaultsStore = &defaults_,
+                                  .digest = &digest_,
+                                  .files = &files_,
+                                  .propertyList = &propertyList_,
+                                  .systemLog = &log_}};
+    platform::ScopedPlatform current_{platform_};
+};
+
+Outcome notReachable(std::string problem);
+
+// A verb that is run within the home, which must be there. The places are read when it runs.
+CommandLine::Verb inHome(const wire::LocationOverrides& places, std::function<Outcome(Home&)> verb);
+
+}  // namespace vrx::apps

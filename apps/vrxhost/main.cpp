@@ -1,0 +1,13 @@
+// vrxhost: looks into the agent's home beside the agent, and changes its settings, for testers.
+#include "verbs.h"
+
+int main(int argc, char** argv) {
+    using namespace vrx::apps;
+    CommandLine line("vrxhost", "Looks into the home of a coverage agent, and changes its settings, for testers.");
+    vrx::wire::LocationOverrides places;
+    line.app().add_option("--home", places.home, "The agent's home")->type_name("PATH");
+    addDefaultsVerbs(line, places);
+    addCacheVerb(line, places);
+    addFollowUpVerbs(line, places);
+    return line.run(argc, argv);
+}

@@ -1,0 +1,14 @@
+// The verbs of vrxhost, by family. Each function adds one family with its options to the command line; the places hold
+// what the options for all verbs say, and must outlive it.
+#pragma once
+
+#include "command_line.h"
+#include "wire/locations.h"
+
+namespace vrx::apps {
+
+void addDefaultsVerbs(CommandLine& line, const wire::LocationOverrides& places);
+void addCacheVerb(CommandLine& line, const wire::LocationOverrides& places);
+void addFollowUpVerbs(CommandLine& line, const wire::LocationOverrides& places);
+
+}  // namespace vrx::apps
