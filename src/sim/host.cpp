@@ -13,6 +13,7 @@ Host::Host()
                 .digest = &digest,
                 .featureFlags = &flags,
                 .files = &files,
+                .followUpControllers = &followUps,
                 .httpSessions = &http,
                 .json = &json,
                 .locale = &locale,

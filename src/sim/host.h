@@ -20,6 +20,7 @@
 #include "sim/device.h"
 #include "sim/failures.h"
 #include "sim/files.h"
+#include "sim/follow_up_controller.h"
 #include "sim/http.h"
 #include "sim/locale.h"
 #include "sim/notification_center.h"
@@ -46,6 +47,7 @@ public:
     SystemLog log;
     DefaultsStore defaults{failures};
     Files files;
+    FollowUpControllers followUps;
     DeviceProperties device;
     FeatureFlags flags;
     PairedDeviceRegistry watches;
