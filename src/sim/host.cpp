@@ -5,6 +5,7 @@ namespace vrx::sim {
 Host::Host()
     : platform({.accountSession = &accountSession,
                 .accountStore = &accounts,
+                .backgroundActivities = &activities,
                 .bundleLookup = &bundles,
                 .clock = &clock,
                 .defaultsStore = &defaults,
@@ -16,11 +17,19 @@ Host::Host()
                 .httpSessions = &http,
                 .json = &json,
                 .locale = &locale,
+                .notificationCenter = &notifications,
                 .pairedDeviceRegistry = &watches,
+                .processLifecycle = &process,
                 .propertyList = &propertyList,
                 .queues = &queues,
                 .serviceListenerFactory = &listener,
-                .systemLog = &log}),
+                .systemLog = &log,
+                .telephonyNetworkInfo = &telephony}),
       scope_(platform) {}
+
+Host::~Host() {
+    queues.close();
+    process.kill();
+}
 
 }  // namespace vrx::sim
