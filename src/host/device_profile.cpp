@@ -37,6 +37,15 @@ public:
     std::optional<std::string> string(const char* key) { return scalar<std::string>(key, "a string"); }
     std::optional<bool> boolean(const char* key) { return scalar<bool>(key, "true or false"); }
 
+    // A time in seconds.
+    std::optional<platform::Duration> duration(const char* key) {
+        const toml::node* node = find(key);
+        if (!node) return std::nullopt;
+        const std::optional<double> seconds = node->is_number() ? node->value<double>() : std::nullopt;
+        if (!seconds || !(*seconds >= 0)) reject(key, *node, "a number of seconds");
+        return platform::Duration(*seconds);
+    }
+
     std::string requiredString(const char* key) {
         std::optional<std::string> text = string(key);
         if (!text || text->empty()) throw ProfileError{table_.source().begin.line, prefix_ + key + " is missing"};
@@ -152,6 +161,10 @@ PairedWatch readWatch(Table& table) {
     return watch;
 }
 
+platform::Carrier readCarrier(Table& table) {
+    return {.mobileCountryCode = table.string("mcc"), .mobileNetworkCode = table.string("mnc")};
+}
+
 std::optional<Value> entitlementValue(const toml::node& node) {
     if (const auto* flag = node.as_boolean()) return flag->get();
     if (const auto* number = node.as_integer()) return number->get();
@@ -209,6 +222,15 @@ ProfileFacts readFacts(Table& root) {
             facts.language = localeIdentifierFromPosix(*language);
         facts.timeZone = locale.string("time_zone");
     });
+    root.tables("carriers", [&](Table& carrier) {
+        const std::string slot = "slot " + std::to_string(facts.carriers.size() + 1);
+        facts.carriers[carrier.string("service").value_or(slot)] = readCarrier(carrier);
+    });
+    root.table("network", [&](Table& network) { facts.networkAvailable = network.boolean("available"); });
+    root.table("activities", [&](Table& activities) {
+        facts.shouldDefer = activities.boolean("should_defer");
+        facts.minimumInterval = activities.duration("minimum_interval");
+    });
     root.tables("bundles", [&](Table& bundle) { facts.bundles.push_back(readBundle(bundle)); });
     return facts;
 }
@@ -228,7 +250,11 @@ public:
 
     std::shared_ptr<const ProfileFacts> operator()(const Result<FileContent>& file,
                                                    std::shared_ptr<const ProfileFacts> last) {
-        if (!last) last = std::make_shared<const ProfileFacts>();
+        if (!last) {
+            ProfileFacts substitute;
+            substitute.isSubstitute = true;
+            last = std::make_shared<const ProfileFacts>(substitute);
+        }
         if (!file && file.error().code == ENOENT) return std::make_shared<const ProfileFacts>();
         Result<ProfileReading> reading = file ? parseProfile(textOf(*file), path_) : file.error();
         if (!reading) {

@@ -15,6 +15,7 @@
 #include "platform/device_properties.h"
 #include "platform/locale.h"
 #include "platform/paired_device_registry.h"
+#include "platform/telephony_network_info.h"
 #include "platform/value.h"
 
 namespace vrx::host {
@@ -42,7 +43,13 @@ struct ProfileFacts {
     std::optional<std::string> language;
     std::optional<std::string> timeZone;
     std::vector<ProfileBundle> bundles;
+    std::map<std::string, platform::Carrier> carriers;  // by cellular service
+    std::optional<bool> networkAvailable;               // else the machine's routes tell
+    std::optional<bool> shouldDefer;                    // else its power supply
+    std::optional<platform::Duration> minimumInterval;  // between the runs of an activity that schedules itself
 
+    // Whether these are not the file's, because nobody has understood it since the process began.
+    bool isSubstitute = false;
     // Whether root or the agent's own user owns the file and nobody else can write it: only then may what it says
     // about bundles be believed.
     bool isTrusted = false;

@@ -4,7 +4,8 @@
 //     Host host({.home = home, .profile = profile});
 //     if (MaybeError error = host.open(HomeUse::Agent)) …        // tell, and exit
 //     host.setServiceListenerFactory(…);                         // before anything asks for it
-//     …
+//     …                                                          // the agent's start-up
+//     host.start(version);
 //     host.mainLoop().run();
 #pragma once
 
@@ -12,17 +13,24 @@
 
 #include "codec/codec.h"
 #include "host/account_store.h"
+#include "host/background_activities.h"
 #include "host/clock.h"
 #include "host/database.h"
 #include "host/defaults_store.h"
 #include "host/device_profile.h"
+#include "host/file_watch.h"
 #include "host/files.h"
 #include "host/follow_up_controller.h"
 #include "host/home_lock.h"
 #include "host/http.h"
+#include "host/machine_conditions.h"
 #include "host/main_loop.h"
+#include "host/notification_center.h"
+#include "host/process_lifecycle.h"
+#include "host/profile_notifier.h"
 #include "host/queues.h"
 #include "host/system_log.h"
+#include "host/telephony_network_info.h"
 #include "platform/bundle_lookup.h"
 #include "platform/platform.h"
 #include "platform/service_listener.h"
@@ -52,10 +60,17 @@ public:
     void setServiceListenerFactory(platform::ServiceListenerFactory* factory);
     void setBundleLookup(platform::BundleLookup* lookup);
 
+    // For an agent of that version, when its start-up is done: activities fire from now on, and what has changed while
+    // no agent ran is notified. Once.
+    void start(const std::string& agentVersion);
+
     MainLoop& mainLoop() { return mainLoop_; }
+    ProcessLifecycle& lifecycle() { return lifecycle_; }
     const DeviceProfile& profile() const { return profile_; }
     Database& database() { return database_; }
     const std::string& home() const { return home_; }
+    // For the program that this process executes next.
+    Descriptor releaseHomeLock() { return lock_.release(); }
 
 private:
     const std::string home_;
@@ -69,6 +84,7 @@ private:
     codec::PropertyList propertyList_;
     codec::Digest digest_;
     MainLoop mainLoop_;  // takes over signals before the first thread
+    ProcessLifecycle lifecycle_{mainLoop_};
     Queues queues_;
     HomeLock lock_;
     Files files_;
@@ -79,6 +95,12 @@ private:
     AccountStore accounts_;
     Clock clock_;
     HttpSessions http_;
+    TelephonyNetworkInfo telephony_{profile_};
+    NotificationCenter notifications_;
+    ProfileNotifier profileNotifier_{profile_, database_, notifications_};
+    MachineConditions conditions_;
+    BackgroundActivities activities_;
+    std::unique_ptr<FileWatch> databaseWatch_;
 };
 
 }  // namespace vrx::host

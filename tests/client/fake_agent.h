@@ -142,7 +142,8 @@ public:
         Signal isReady;
         thread_ = std::thread([this, &isReady, limits] {
             host::MainLoop loop;
-            host::ServiceListenerFactory factory(loop.event(), bundles_, limits);
+            host::ProcessLifecycle lifecycle(loop);
+            host::ServiceListenerFactory factory(loop.event(), bundles_, lifecycle, limits);
             auto error = factory.open(socketPath());
             if (error) throw std::runtime_error(error->text);
             listen(factory);
