@@ -75,6 +75,7 @@ StartUp::StartUp()
     vrx_registerDefaults(Platform::current().defaultsStore());
     monitorActivities();
     agent_ = VRXAgent::initWithCallingProcessBundleID(settingsApp(), agentCollaborators_);
+    agent_->performMigrationIfNeeded();
     startMonitors();
     openListener();
 }
