@@ -91,8 +91,7 @@ void VRXFollowUpPost::end(ActivityRun& run, BackgroundActivityResult result) {
 }
 
 std::optional<Date> VRXFollowUpPost::nextFollowUpPostDateWithDevicesInfo(const DeviceInfoList& deviceInfos) {
-    return nextPostDate(deviceInfos, PostDateSettings::read(Platform::current().defaultsStore()),
-                        Platform::current().clock().now());
+    return nextPostDate(deviceInfos, PostDateSettings::read(), Platform::current().clock().now());
 }
 
 std::shared_ptr<platform::RepeatingTimer> VRXFollowUpPost::followUpPostTimer() const {

@@ -49,8 +49,7 @@ void VRXFollowUpRefresh::refresh(const DeviceInfoList& deviceInfos) {
 
 std::optional<Date> VRXFollowUpRefresh::nextFollowUpRefreshDateWithDevicesInfo(const DeviceInfoList& deviceInfos,
                                                                                bool isInitialCall) {
-    return nextRefreshDate(deviceInfos, isInitialCall, RefreshDateSettings::read(Platform::current().defaultsStore()),
-                           Platform::current().clock().now());
+    return nextRefreshDate(deviceInfos, isInitialCall, RefreshDateSettings::read(), Platform::current().clock().now());
 }
 
 }  // namespace vrx

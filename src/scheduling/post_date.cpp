@@ -1,7 +1,9 @@
 #include "scheduling/post_date.h"
 
 #include "devices/device_info.h"
+#include "followup/serial_number_hashes.h"
 #include "platform/defaults_store.h"
+#include "platform/platform.h"
 #include "platform/sha256_hash.h"
 #include "scheduling/date_rules.h"
 
@@ -36,14 +38,9 @@ std::optional<Date> withOffer(const std::optional<Date>& next, const VRXDeviceIn
 
 }  // namespace
 
-PostDateSettings PostDateSettings::read(const platform::DefaultsStore& defaults) {
-    PostDateSettings settings;
-    platform::Value hashes = defaults.get("FollowupPostedSerialNumberHashes");
-    if (const platform::Array* list = hashes.asArray())
-        for (const platform::Value& hash : *list)
-            if (const std::string* text = hash.asString()) settings.postedSerialNumberHashes.insert(*text);
-    settings.outreachDelay = platform::Duration(defaults.number("PostUpgradeOutreachDelay"));
-    return settings;
+PostDateSettings PostDateSettings::read() {
+    const double delay = platform::Platform::current().defaultsStore().number("PostUpgradeOutreachDelay");
+    return {serialNumberHashes(postedSerialNumberHashesKey), platform::Duration(delay)};
 }
 
 std::optional<Date> nextPostDate(const DeviceInfoList& deviceInfos, const PostDateSettings& settings, Date now) {

@@ -9,17 +9,14 @@
 #include "platform/date.h"
 #include "protocols/forward.h"
 
-namespace vrx::platform {
-class DefaultsStore;
-}
-
 namespace vrx {
 
 struct PostDateSettings {
     std::set<std::string> postedSerialNumberHashes;  // of the devices whose follow-up has been posted before
     platform::Duration outreachDelay{};              // after a device's activation
 
-    static PostDateSettings read(const platform::DefaultsStore& defaults);
+    // As they are stored now.
+    static PostDateSettings read();
 };
 
 // Nothing when no device waits for its post. A date in the past when an offer has ended that was never posted.

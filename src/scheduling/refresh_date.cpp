@@ -2,6 +2,7 @@
 
 #include "devices/device_info.h"
 #include "platform/defaults_store.h"
+#include "platform/platform.h"
 #include "scheduling/date_rules.h"
 
 namespace vrx {
@@ -36,7 +37,8 @@ std::optional<Date> withOffer(const std::optional<Date>& next, const VRXDeviceIn
 
 }  // namespace
 
-RefreshDateSettings RefreshDateSettings::read(const platform::DefaultsStore& defaults) {
+RefreshDateSettings RefreshDateSettings::read() {
+    const platform::DefaultsStore& defaults = platform::Platform::current().defaultsStore();
     return {Duration(defaults.number("OneDayInterval")), Duration(defaults.number("PostUpgradeOutreachDelay"))};
 }
 

@@ -8,17 +8,14 @@
 #include "platform/date.h"
 #include "protocols/forward.h"
 
-namespace vrx::platform {
-class DefaultsStore;
-}
-
 namespace vrx {
 
 struct RefreshDateSettings {
     platform::Duration oneDay{};
     platform::Duration outreachDelay{};  // after a device's activation
 
-    static RefreshDateSettings read(const platform::DefaultsStore& defaults);
+    // As they are stored now.
+    static RefreshDateSettings read();
 };
 
 // Nothing when no device sets a date, which is so throughout a lone device's last day; a date in the past when an offer

@@ -40,6 +40,10 @@ public:
     void runFor(platform::Duration duration) { runWork(clock_.elapsed() + duration); }
     void runUntil(platform::Date date) { runWork(clock_.elapsedAt(date)); }
 
+    // Runs the next piece of work that is due by the date, after which the process may be killed. False when there is
+    // none.
+    bool runOne(platform::Date until) { return runNext(clock_.elapsedAt(until)); }
+
     // The label of the queue whose task is running: "main", "background", "userInitiated", a serial queue's own, and
     // nothing in the test's body.
     std::string currentLabel() const;
