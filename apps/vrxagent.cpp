@@ -56,8 +56,8 @@ int serve(const vrx::wire::Locations& places, Level logLevel, std::optional<Hand
     log(Level::Default, "ready: home %@, profile %@, socket %@", host.home(), places.profile.path, places.socket.path);
     sd_notify(0, "READY=1");
     host.mainLoop().run();
-    const bool isToBeExecuted = host.lifecycle().isEnding() && !host.mainLoop().wasStoppedBySignal() &&
-                                !vrx::host::isUnderServiceManager();
+    const bool isToBeExecuted =
+        host.lifecycle().isEnding() && !host.mainLoop().wasStoppedBySignal() && !vrx::host::isUnderServiceManager();
     if (isToBeExecuted)
         handOver = {factory.release(), host.releaseHomeLock()};
     else

@@ -1,0 +1,114 @@
+#include "agent_view.h"
+
+#include <filesystem>
+#include <utility>
+
+#include "home.h"
+#include "host/host_facts.h"
+#include "service/register_defaults.h"
+
+namespace vrx::apps {
+
+using platform::Dictionary;
+using platform::MaybeError;
+using platform::Value;
+
+Value UnwrittenDefaults::get(std::string_view key) const {
+    std::lock_guard lock(mutex_);
+    const auto kept = kept_.find(key);
+    return kept == kept_.end() ? store_.get(key) : kept->second;
+}
+
+void UnwrittenDefaults::set(std::string_view key, Value value) {
+    std::lock_guard lock(mutex_);
+    kept_[std::string(key)] = std::move(value);
+}
+
+void UnwrittenDefaults::update(std::string_view key, const std::function<Value(const Value&)>& change) {
+    set(key, change(get(key)));
+}
+
+Dictionary UnwrittenDefaults::dictionaryRepresentation() const {
+    Dictionary all = store_.dictionaryRepresentation();
+    std::lock_guard lock(mutex_);
+    for (const auto& [key, value] : kept_) all[key] = value;
+    std::erase_if(all, [](const auto& entry) { return entry.second.isNull(); });
+    return all;
+}
+
+void ErrorLog::write(const platform::LogEntry& entry) {
+    std::lock_guard lock(mutex_);
+    messages_.push_back(entry.message());
+}
+
+std::vector<std::string> ErrorLog::take() {
+    std::lock_guard lock(mutex_);
+    return std::exchange(messages_, {});
+}
+
+std::string AgentLocale::preferredLocaleIdentifier() const {
+    std::optional<std::string> found;
+    if (!profile_.facts()->language)
+        database_.read(
+            [&](host::Connection& connection) { found = host::hostFact(connection, host::facts::language); });
+    return found ? *found : profile_.preferredLocaleIdentifier();
+}
+
+AgentView::AgentView(const std::string& home, const std::string& profile)
+    : home_(home),
+      facilities_{.systemLog = &errors_},
+      platform_(facilities_),
+      current_(platform_),
+      files_(home),
+      database_(host::Database::toLookAt(Home::databasePath(home))),
+      stored_(database_),
+      defaults_(stored_),
+      followUps_(database_),
+      profile_(profile),
+      locale_(profile_, database_),
+      accounts_(profile_),
+      clock_(profile_),
+      telephony_(profile_) {
+    vrx_registerDefaults(defaults_);
+    facilities_ = {.accountStore = &accounts_,
+                   .clock = &clock_,
+                   .defaultsStore = &defaults_,
+                   .deviceProperties = &profile_,
+                   .digest = &digest_,
+                   .featureFlags = &profile_,
+                   .files = &files_,
+                   .followUpControllers = &followUps_,
+                   .json = &json_,
+                   .locale = &locale_,
+                   .pairedDeviceRegistry = &profile_,
+                   .propertyList = &propertyList_,
+                   .systemLog = &errors_,
+                   .telephonyNetworkInfo = &telephony_};
+    platform_ = platform::Platform(facilities_);
+}
+
+void AgentView::use(platform::Queues& queues, platform::HttpSessions& sessions) {
+    facilities_.queues = &queues;
+    facilities_.httpSessions = &sessions;
+    platform_ = platform::Platform(facilities_);
+}
+
+CommandLine::Verb looking(const wire::LocationOverrides& places, std::shared_ptr<std::optional<std::string>> profile,
+                          std::function<Outcome(AgentView&)> verb) {
+    return [&places, profile = std::move(profile), verb = std::move(verb)] {
+        const wire::Locations found = wire::findLocations({.home = places.home, .profile = *profile});
+        AgentView view(absolutePath(found.home.path), found.profile.path);
+        const std::string database = Home::databasePath(view.home());
+        std::error_code error;
+        if (!std::filesystem::exists(database, error)) return notReachable("there is no agent's database " + database);
+        if (MaybeError problem = view.open())
+            return failed(ExitCode::NotReachable, problem->text, "vrxhost doctor tells what is wrong, and what to do.");
+        return verb(view);
+    };
+}
+
+void addProfileOption(CLI::App* verb, std::optional<std::string>& profile) {
+    verb->add_option("--device", profile, "The agent's device profile")->type_name("PATH");
+}
+
+}  // namespace vrx::apps
