@@ -8,6 +8,7 @@
 
 #include "codec/iso_date.h"
 #include "codec/json.h"
+#include "followup/follow_up_content.h"
 #include "home.h"
 #include "home_watch.h"
 #include "host/clock.h"
@@ -15,7 +16,6 @@
 #include "host/follow_up_document.h"
 #include "platform/number_text.h"
 #include "platform/text.h"
-#include "platform/vendor.h"
 #include "verbs.h"
 
 namespace vrx::apps {
@@ -30,11 +30,6 @@ using platform::Result;
 using platform::Value;
 
 namespace {
-
-// The agent's.
-std::string clientIdentifier() {
-    return platform::vendorIdentifier(".Vireo");
-}
 
 Outcome failedWith(const char* kind, const platform::Error& error) {
     Outcome outcome = failed(ExitCode::NoAnswer, error.text, "");
@@ -62,10 +57,13 @@ public:
     // When there will be fewer days left, or it expires.
     std::optional<Date> nextChange() const { return nextChange_; }
     // The item of the layout that knew one device.
-    bool isLegacy() const { return item_.uniqueIdentifier == clientIdentifier(); }
+    bool isLegacy() const { return item_.uniqueIdentifier == followUpUniqueIdentifier(std::nullopt); }
     // An item is set up without a badge first, when the end of the offer is far, and keeps that bit when it gets one.
     bool hasBadge() const { return (item_.displayStyle & platform::follow_up_style::withRowBadge) != 0; }
-    std::optional<std::string> serialNumber() const { return text("FollowupSerialNumber"); }
+    std::optional<std::string> serialNumber() const {
+        const std::string* serialNumber = serialNumberOfItem(item_);
+        return serialNumber ? std::optional(*serialNumber) : std::nullopt;
+    }
 
     // The text that the settings app makes of the days left, if the user info says how.
     std::optional<std::string> relativeText(const platform::Locale& locale) const {
@@ -147,7 +145,7 @@ void append(Listing& listing, Array& documents, const FollowUpItem& item, const 
 }
 
 Listing list(Home& home, const host::DeviceProfile& profile) {
-    const auto items = home.followUps().makeController(clientIdentifier())->pendingFollowUpItems();
+    const auto items = home.followUps().makeController(followUpClientIdentifier())->pendingFollowUpItems();
     if (!items) return {failedWith("not-read", items.error())};
     Duration day(home.defaults().number("OneDayInterval"));
     if (!(day.count() > 0)) day = std::chrono::days(1);
@@ -231,7 +229,7 @@ Outcome post(Home& home, const std::string& file) {
     constexpr const char* advice = "vrxhost followups --json shows items in the form that is wanted.";
     const Result<FollowUpItem> item = readItem(file);
     if (!item) return failed(ExitCode::Usage, item.error().text, advice);
-    const auto controller = home.followUps().makeController(clientIdentifier());
+    const auto controller = home.followUps().makeController(followUpClientIdentifier());
     const auto before = controller->pendingFollowUpItems();
     if (!before) return failedWith("not-read", before.error());
     const bool isReplaced = isPending(*before, item->uniqueIdentifier);
@@ -244,7 +242,7 @@ Outcome post(Home& home, const std::string& file) {
 }
 
 Outcome clear(Home& home, const std::vector<std::string>& identifiers) {
-    const auto controller = home.followUps().makeController(clientIdentifier());
+    const auto controller = home.followUps().makeController(followUpClientIdentifier());
     const auto before = controller->pendingFollowUpItems();
     if (!before) return failedWith("not-read", before.error());
     if (const MaybeError error = controller->clearPendingFollowUpItems(identifiers))

@@ -3,6 +3,8 @@
 
 #include <gmock/gmock.h>
 
+#include "host/follow_up_controller.h"
+#include "host/support.h"
 #include "sim/host.h"
 
 namespace vrx {
@@ -23,6 +25,18 @@ public:
 
 private:
     sim::Host host_;
+};
+
+class RealService {
+public:
+    platform::FollowUpControllers& controllers() { return *service_; }
+    void restart() { service_.emplace(database_.emplace(folder_ / "host.db")); }
+
+private:
+    host::LogRecorder log_;
+    host::TemporaryFolder folder_;
+    std::optional<host::Database> database_{folder_ / "host.db"};
+    std::optional<host::FollowUpControllers> service_{*database_};
 };
 
 template <class Subject>
@@ -56,7 +70,7 @@ struct Names {
         return std::is_same_v<Subject, SimulatedService> ? "Simulated" : "Real";
     }
 };
-using Subjects = testing::Types<SimulatedService>;
+using Subjects = testing::Types<SimulatedService, RealService>;
 TYPED_TEST_SUITE(FollowUpControllerContract, Subjects, Names);
 
 TYPED_TEST(FollowUpControllerContract, KeepsItemsWholeAcrossProcesses) {

@@ -17,6 +17,14 @@ using platform::Dictionary;
 using platform::Value;
 
 const std::string legacyIdentifier = "com.orvane.Vireo";
+const std::string legacyCacheFile = "home/Library/Application Support/com.orvane.Vireo/Warranty.plist";
+
+std::string record(const std::string& label, bool isOffered = true) {
+    return "<plist version='1.0'><dict><key>qxLocalizedOfferLabel</key><string>" + label +
+           "</string><key>qxOfferEligibleUntil</key><integer>9999999999</integer><key>featureToggleParameters</key>"
+           "<dict><key>qxOfferDisplay</key><" +
+           (isOffered ? "true" : "false") + "/></dict></dict></plist>";
+}
 
 class FollowUps : public testing::Test {
 protected:
@@ -187,6 +195,94 @@ TEST_F(FollowUps, AreWatchedWithoutMissingAChange) {
     std::filesystem::remove(place_ / "home/host.db");
     EXPECT_EQ(others.nextDocument()["error"]["kind"], Value("not-reachable"));
     EXPECT_EQ(others.end(), 3);
+}
+
+TEST_F(FollowUps, OfTheOlderLayoutAreMovedOnce) {
+    const Value old = Dictionary{{"uniqueIdentifier", legacyIdentifier}, {"title", "old"}, {"displayStyle", 19}};
+    const auto startOlderLayout = [&](const std::string& cacheFile) {
+        ASSERT_EQ(post(old).code, 0);
+        ASSERT_EQ(place_.stop(), 0);
+        ASSERT_EQ(place_.vrxhost({"defaults", "delete", "VRXMigrationVersion"}).code, 0);
+        std::filesystem::create_directories(std::filesystem::path(place_ / legacyCacheFile).parent_path());
+        place_.write(legacyCacheFile, cacheFile);
+        place_.start();
+        ASSERT_TRUE(place_.isReady()) << place_.agent().errors();
+        EXPECT_EQ(place_.vrxhost({"defaults", "read", "VRXMigrationVersion", "--json"}).document["value"], Value(2));
+    };
+    // Without a record, the item is of no use.
+    startOlderLayout(record("new").substr(0, 100));
+    EXPECT_EQ(listed(), Array{});
+    EXPECT_TRUE(std::filesystem::exists(place_ / legacyCacheFile));
+
+    startOlderLayout(record("new"));
+    const Array moved = listed();
+    ASSERT_EQ(moved.size(), 1u);
+    EXPECT_EQ(moved[0]["item"]["title"], Value("new"));
+    EXPECT_EQ(moved[0]["item"]["displayStyle"], Value(19));
+    EXPECT_EQ(moved[0]["derived"]["serialNumber"], Value("VRXPHONE0001"));
+    EXPECT_EQ(moved[0]["derived"]["legacy"], Value(false));
+    EXPECT_FALSE(std::filesystem::exists(place_ / legacyCacheFile));
+
+    // Both, as an end within the move leaves them.
+    startOlderLayout(record("newer"));
+    const Array kept = listed();
+    ASSERT_EQ(kept.size(), 2u);
+    EXPECT_EQ(kept[0], moved[0]);
+    EXPECT_EQ(kept[1]["item"]["title"], Value("old"));
+    EXPECT_EQ(kept[1]["derived"]["legacy"], Value(true));
+    ASSERT_EQ(place_.vrxhost({"followups", "clear", legacyIdentifier}).code, 0);
+    EXPECT_EQ(listed(), moved);
+}
+
+TEST_F(FollowUps, FollowTheRecordUntilItsOfferIsWithdrawnOrTheUserDismissesThem) {
+    const std::string watchHash = "ab675094e90357f693f6d0901fae463934e153d61512668f608e06d0a9677e62";
+    const std::pair<const char*, std::string> devices[] = {
+        {"VRXPHONE0001", "40112c750de1c9f8fefda5fa32c7d6dd536a59a2eba76bf8f5d56685a6797bbd"},
+        {"VRXWATCH0001", watchHash}};
+    place_.useCoverageFiles();
+    for (const auto& [serialNumber, hash] : devices) {
+        const Value item = Dictionary{{"uniqueIdentifier", legacyIdentifier + "." + hash},
+                                      {"userInfo", Dictionary{{"FollowupSerialNumber", serialNumber}}}};
+        ASSERT_EQ(post(item).code, 0);
+        place_.write(std::string("coverage/Warranty.") + serialNumber + ".plist", record("first"));
+        EXPECT_EQ(place_.vrxctl({"info", serialNumber}).code, 0);
+    }
+    ASSERT_EQ(listed().size(), 2u);
+    for (const Value& item : listed()) EXPECT_EQ(item["item"]["title"], Value("first"));
+
+    place_.write("coverage/Warranty.VRXPHONE0001.plist", record("second"));
+    EXPECT_EQ(place_.vrxctl({"info", "--policy", "cached"}).code, 0);
+    EXPECT_EQ(listed()[0]["item"]["title"], Value("first"));
+    EXPECT_EQ(place_.vrxctl({"info", "--policy", "refresh"}).code, 0);
+    EXPECT_EQ(listed()[0]["item"]["title"], Value("second"));
+
+    place_.write("coverage/Warranty.VRXPHONE0001.plist", record("third", false));
+    EXPECT_EQ(place_.vrxctl({"all", "--policy", "refresh"}).code, 0);
+    EXPECT_EQ(listed().size(), 2u);
+    EXPECT_EQ(place_.vrxctl({"all", "--update-follow-ups"}).code, 0);
+    ASSERT_EQ(listed().size(), 1u);
+    EXPECT_EQ(listed()[0]["derived"]["serialNumber"], Value("VRXWATCH0001"));
+
+    EXPECT_EQ(place_.vrxctl({"dismiss", "VRXWATCH0001"}).code, 0);
+    EXPECT_EQ(place_.vrxctl({"all", "--update-follow-ups", "--policy", "refresh"}).code, 0);
+    EXPECT_EQ(listed(), Array{});
+    const Value dismissed =
+        place_.vrxhost({"defaults", "read", "FollowupDismissedSerialNumberHashes", "--json"}).document["value"];
+    EXPECT_EQ(dismissed, Value(Array{watchHash}));
+}
+
+TEST_F(FollowUps, AreThoseOfTheDatabaseThatIsThere) {
+    ASSERT_EQ(post(Dictionary{{"uniqueIdentifier", "a"}}).code, 0);
+    std::filesystem::create_directory(place_ / "other");
+    ASSERT_EQ(place_.stop(), 0);
+    std::filesystem::copy(place_ / "home/host.db", place_ / "other");
+    place_.start();
+    ASSERT_EQ(place_.vrxhost({"followups", "clear", "a"}).code, 0);
+    std::filesystem::rename(place_ / "other/host.db", place_ / "home/host.db");
+    EXPECT_EQ(place_.vrxctl({"all", "--policy", "cached", "--update-follow-ups"}).code, 0);
+    EXPECT_EQ(listed().size(), 1u);
+    EXPECT_EQ(place_.stop(), 0);
+    EXPECT_NE(place_.agent().errors().find("was replaced and is opened again"), std::string::npos);
 }
 
 }  // namespace
