@@ -22,10 +22,11 @@ struct FollowUpAction {
     bool operator==(const FollowUpAction&) const = default;
 };
 
-// How an item is shown: bits of its display style.
+// How an item is shown: bits of its display style, which is kept whole. An item that was filled at different times may
+// say both of its row; then it carries the badge.
 namespace follow_up_style {
 inline constexpr std::uint64_t withRowBadge = 1;
-inline constexpr std::uint64_t notification = 2;
+inline constexpr std::uint64_t notification = 2;  // every item of the agent's
 inline constexpr std::uint64_t withoutRowBadge = 16;
 }  // namespace follow_up_style
 

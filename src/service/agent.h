@@ -50,6 +50,9 @@ public:
     void getWarrantyUsingPolicy(VRXWarrantyLookupPolicy policy, WarrantyReply reply);
     void getWarrantyUsingPolicy(VRXWarrantyLookupPolicy policy, const SerialNumber& serialNumber, WarrantyReply reply);
 
+    // Moves what the older single-device layout left to this device, once: for start-up, before anything else uses it.
+    void performMigrationIfNeeded();
+
     // Read and replaced whole; a request keeps to what it has read.
     std::shared_ptr<VRXAgentWarrantyProvider> warrantyProvider() const;
     void setWarrantyProvider(std::shared_ptr<VRXAgentWarrantyProvider> provider);

@@ -5,6 +5,7 @@ namespace vrx::sim {
 Host::Host()
     : platform({.accountSession = &accountSession,
                 .accountStore = &accounts,
+                .backgroundActivities = &activities,
                 .bundleLookup = &bundles,
                 .clock = &clock,
                 .defaultsStore = &defaults,
@@ -12,14 +13,23 @@ Host::Host()
                 .digest = &digest,
                 .featureFlags = &flags,
                 .files = &files,
+                .followUpControllers = &followUps,
                 .httpSessions = &http,
                 .json = &json,
                 .locale = &locale,
+                .notificationCenter = &notifications,
                 .pairedDeviceRegistry = &watches,
+                .processLifecycle = &process,
                 .propertyList = &propertyList,
                 .queues = &queues,
                 .serviceListenerFactory = &listener,
-                .systemLog = &log}),
+                .systemLog = &log,
+                .telephonyNetworkInfo = &telephony}),
       scope_(platform) {}
+
+Host::~Host() {
+    queues.close();
+    process.kill();
+}
 
 }  // namespace vrx::sim

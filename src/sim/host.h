@@ -13,14 +13,18 @@
 #include "codec/codec.h"
 #include "platform/platform.h"
 #include "sim/account_store.h"
+#include "sim/background_activities.h"
 #include "sim/bundle_lookup.h"
 #include "sim/clock.h"
 #include "sim/defaults_store.h"
 #include "sim/device.h"
 #include "sim/failures.h"
 #include "sim/files.h"
+#include "sim/follow_up_controller.h"
 #include "sim/http.h"
 #include "sim/locale.h"
+#include "sim/notification_center.h"
+#include "sim/process.h"
 #include "sim/queues.h"
 #include "sim/service_listener.h"
 #include "sim/system_log.h"
@@ -30,7 +34,7 @@ namespace vrx::sim {
 class Host {
 public:
     Host();
-    ~Host() { queues.close(); }
+    ~Host();
     Host(const Host&) = delete;
     Host& operator=(const Host&) = delete;
 
@@ -43,9 +47,11 @@ public:
     SystemLog log;
     DefaultsStore defaults{failures};
     Files files;
+    FollowUpControllers followUps;
     DeviceProperties device;
     FeatureFlags flags;
     PairedDeviceRegistry watches;
+    TelephonyNetworkInfo telephony;
     Locale locale;
     BundleLookup bundles;
     Queues queues{clock, failures};
@@ -53,9 +59,12 @@ public:
     AccountSession accountSession;
     HttpSessions http{clock, queues, files};
     ServiceListenerFactory listener{queues, failures};
+    BackgroundActivities activities{clock, queues};
+    NotificationCenter notifications;
     codec::Json json;
     codec::PropertyList propertyList;
     codec::Digest digest;
+    Process process{queues, defaults, activities, notifications};
     platform::Platform platform;
 
 private:

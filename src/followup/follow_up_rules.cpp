@@ -1,0 +1,62 @@
+#include "followup/follow_up_rules.h"
+
+#include "devices/device_info.h"
+#include "platform/clock.h"
+
+namespace vrx {
+
+using platform::Clock;
+using platform::Date;
+using platform::Duration;
+
+namespace {
+
+bool isLaterThanNow(const std::optional<Date>& date, const Clock& clock) {
+    return date && *date - clock.now() > Duration::zero();
+}
+
+PostDate postDate(const VRXWarranty& record, Date eligibleUntil, const std::optional<Date>& activationDate,
+                  Duration outreachDelay) {
+    const Date named =
+        record.qxOfferFollowupDisplayDate().value_or(eligibleUntil - record.qxOfferDurationBeforeEndDate());
+    if (activationDate && *activationDate + outreachDelay > named) return {*activationDate + outreachDelay, true};
+    return {named};
+}
+
+}  // namespace
+
+PostDecision decidePost(const VRXDeviceInfo& info, const PostCircumstances& circumstances, const Clock& clock) {
+    const auto record = info.warranty();
+    if (!record) return {PostReason::NoRecord};
+    if (!record->qxOfferDisplay()) return {PostReason::NoOffer};
+    const std::optional<Date> eligibleUntil = record->qxOfferEligibleUntil();
+    if (!isLaterThanNow(eligibleUntil, clock)) return {PostReason::NoLongerEligible};
+    if (circumstances.isDismissed && !circumstances.isRepostAllowed) return {PostReason::Dismissed};
+    const auto device = info.device();
+    const PostDate date = postDate(*record, *eligibleUntil, device ? device->activationDate() : std::nullopt,
+                                   circumstances.outreachDelay);
+    return {isLaterThanNow(date.date, clock) ? PostReason::DueLater : PostReason::Due, date};
+}
+
+RefreshReason decideRefresh(const VRXDeviceInfo& info, const RefreshCircumstances& circumstances, const Clock& clock) {
+    const auto record = info.warranty();
+    if (!record) return RefreshReason::NoRecord;
+    if (!record->qxOfferDisplay()) return RefreshReason::NoOffer;
+    if (!isLaterThanNow(record->qxOfferEligibleUntil(), clock)) return RefreshReason::NoLongerEligible;
+    if (circumstances.isPending) return RefreshReason::Pending;
+    return circumstances.isForcePostAllowed ? RefreshReason::RepostAllowed : RefreshReason::NotPending;
+}
+
+RefreshAction actionFor(RefreshReason reason) {
+    switch (reason) {
+        case RefreshReason::NoRecord:
+        case RefreshReason::NoOffer:
+        case RefreshReason::NoLongerEligible: return RefreshAction::Remove;
+        case RefreshReason::Pending: return RefreshAction::Update;
+        case RefreshReason::RepostAllowed: return RefreshAction::Repost;
+        case RefreshReason::NotPending: return RefreshAction::LeaveAlone;
+    }
+    return RefreshAction::LeaveAlone;
+}
+
+}  // namespace vrx

@@ -1,0 +1,64 @@
+#include "sim/follow_up_controller.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <utility>
+
+#include "codec/property_list.h"
+
+namespace vrx::sim {
+
+using platform::Error;
+using platform::FollowUpItem;
+using platform::MaybeError;
+using platform::Result;
+
+class FollowUpControllers::Controller final : public platform::FollowUpController {
+public:
+    Controller(FollowUpControllers& service, std::string client) : service_(service), client_(std::move(client)) {}
+
+    MaybeError postFollowUpItem(const FollowUpItem& item) override {
+        if (MaybeError error = service_.begin(Request::Post, "post " + item.uniqueIdentifier)) return error;
+        auto stored = codec::serializePropertyList(item.userInfo, platform::PropertyListFormat::Binary);
+        if (!stored) return stored.error();
+        auto present = std::ranges::find(pending(), item.uniqueIdentifier, &FollowUpItem::uniqueIdentifier);
+        if (present == pending().end())
+            pending().push_back(item);
+        else
+            *present = item;
+        return std::nullopt;
+    }
+    MaybeError clearPendingFollowUpItems(const std::vector<std::string>& uniqueIdentifiers) override {
+        std::string request = "clear";
+        for (const std::string& identifier : uniqueIdentifiers) request += " " + identifier;
+        if (MaybeError error = service_.begin(Request::Clear, std::move(request))) return error;
+        std::erase_if(pending(), [&](const FollowUpItem& item) {
+            return std::ranges::find(uniqueIdentifiers, item.uniqueIdentifier) != uniqueIdentifiers.end();
+        });
+        return std::nullopt;
+    }
+    Result<std::vector<FollowUpItem>> pendingFollowUpItems() override {
+        if (MaybeError error = service_.begin(Request::List, "list")) return *error;
+        return pending();
+    }
+
+private:
+    std::vector<FollowUpItem>& pending() { return service_.pending(client_); }
+
+    FollowUpControllers& service_;
+    const std::string client_;
+};
+
+std::unique_ptr<platform::FollowUpController> FollowUpControllers::makeController(std::string clientIdentifier) {
+    return std::make_unique<Controller>(*this, std::move(clientIdentifier));
+}
+
+MaybeError FollowUpControllers::begin(Request request, std::string text) {
+    asked_.push_back(std::move(text));
+    int& failures = failures_[request];
+    if (failures == 0) return std::nullopt;
+    --failures;
+    return Error{"followup", EIO, "failed to " + asked_.back().substr(0, asked_.back().find(' '))};
+}
+
+}  // namespace vrx::sim
