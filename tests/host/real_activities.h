@@ -12,6 +12,9 @@ namespace vrx {
 
 class RealActivities {
 public:
+    RealActivities() : ownFolder_(std::in_place), path_(*ownFolder_ / "host.db") {}
+    explicit RealActivities(std::string databasePath) : path_(std::move(databasePath)) {}
+
     platform::BackgroundActivities& activities() { return *process_; }
     void pass(platform::Duration time) { host_.runFor(time); }
     double elapsed() const { return host_.clock.elapsed().count(); }
@@ -38,10 +41,12 @@ public:
         process_->reconsider();
     }
 
-    host::Database database() const { return host::Database(folder_ / "host.db"); }
-    const host::TemporaryFolder& folder() const { return folder_; }
     host::BackgroundActivities& registry() { return *process_; }
-    const sim::SystemLog& log() const { return host_.log; }
+    const std::string& databasePath() const { return path_; }
+    std::vector<host::ScheduledActivity> scheduled() { return host::listActivities(*database_)->scheduled; }
+    // Does the next piece of work; false when there is none within that time.
+    bool step(platform::Duration within) { return host_.queues.runOne(host_.clock.now() + within); }
+    std::vector<std::string> logged() const { return host_.log.messages(platform::Level::Default); }
     int wakeUps() const { return conditions_.wakeUps; }
 
 private:
@@ -72,30 +77,23 @@ private:
         int alarm = 0;  // the last one asked for
         int wakeUps = 0;
     };
-    struct Lifecycle final : platform::ProcessLifecycle {
-        void exitCleanWhenIdle() override {}
-        platform::WorkInFlight beginWork() override { return std::make_shared<int>(); }
-    };
-
     void start() {
-        database_.emplace(folder_ / "host.db");
+        database_.emplace(path_);
         process_.emplace(host::BackgroundActivities::Surroundings{*database_, host_.queues.mainQueue(),
                                                                   host_.queues.workers(platform::Priority::Background),
-                                                                  conditions_, lifecycle_});
+                                                                  conditions_, host_.process});
         process_->start("1");
     }
-    // What is posted refers to the registry.
     void end() {
-        host_.run();
-        ++conditions_.alarm;
+        host_.queues.discardWork();
         process_.reset();
         database_.reset();
     }
 
-    host::TemporaryFolder folder_;
+    std::optional<host::TemporaryFolder> ownFolder_;
+    const std::string path_;
     sim::Host host_;
     Conditions conditions_{host_};
-    Lifecycle lifecycle_;
     std::optional<host::Database> database_;
     std::optional<host::BackgroundActivities> process_;
 };
