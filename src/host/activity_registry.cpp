@@ -12,7 +12,7 @@ namespace {
 
 constexpr const char* allScheduled =
     "SELECT generation, identifier, delay, grace_period, requires_network, due_boot, due_since_boot, due_wall, wait, "
-    "is_carried_over, deferrals FROM activities ORDER BY due_since_boot, generation";
+    "is_carried_over, deferrals FROM activities ORDER BY due_since_boot, identifier";
 constexpr const char* oneScheduled =
     "SELECT generation, identifier, delay, grace_period, requires_network, due_boot, due_since_boot, due_wall, wait, "
     "is_carried_over, deferrals FROM activities WHERE identifier = ?";
@@ -50,17 +50,16 @@ std::optional<ScheduledActivity> ActivityRegistry::scheduled(std::string_view id
     return scheduledIn(query);
 }
 
-std::int64_t ActivityRegistry::schedule(std::string_view identifier, const ActivityCriteria& criteria,
-                                        const DueTime& due) {
+void ActivityRegistry::schedule(std::string_view identifier, const ActivityCriteria& criteria, const DueTime& due) {
     Statement& insertion = connection_.statement(
-        "REPLACE INTO activities (identifier, delay, grace_period, requires_network, due_boot, due_since_boot, "
-        "due_wall, wait, is_carried_over, deferrals) VALUES (?, ?, ?, ?, ?, ?, ?, ?, ?, 0)");
+        "REPLACE INTO activities (generation, identifier, delay, grace_period, requires_network, due_boot, "
+        "due_since_boot, due_wall, wait, is_carried_over, deferrals) "
+        "VALUES (random() & 0x7fffffffffffffff, ?, ?, ?, ?, ?, ?, ?, ?, ?, 0)");
     insertion.bind(0, identifier)
         .bind(1, criteria.delay)
         .bind(2, criteria.gracePeriod)
         .bind(3, std::int64_t{criteria.requiresNetwork});
     bindDue(insertion, 4, due).step();
-    return connection_.integer("SELECT last_insert_rowid()");
 }
 
 void ActivityRegistry::postpone(std::int64_t generation, const DueTime& due, int deferrals) {

@@ -14,7 +14,7 @@
 namespace vrx::host {
 
 struct ScheduledActivity {
-    std::int64_t generation = 0;  // of this registration: no other ever had it
+    std::int64_t generation = 0;  // of this registration: random, so that no other has it, in no other file either
     std::string identifier;
     platform::ActivityCriteria criteria;
     platform::DueTime due;
@@ -39,12 +39,12 @@ class ActivityRegistry {
 public:
     explicit ActivityRegistry(Connection& connection) : connection_(connection) {}
 
-    // In the order of their due times on the boot clock.
+    // In the order of their due times.
     std::vector<ScheduledActivity> scheduled();
     std::optional<ScheduledActivity> scheduled(std::string_view identifier);
-    // In place of an earlier one of that identifier; gives its generation.
-    std::int64_t schedule(std::string_view identifier, const platform::ActivityCriteria& criteria,
-                          const platform::DueTime& due);
+    // In place of an earlier one of that identifier, with a generation of its own.
+    void schedule(std::string_view identifier, const platform::ActivityCriteria& criteria,
+                  const platform::DueTime& due);
     void postpone(std::int64_t generation, const platform::DueTime& due, int deferrals);
     void remove(std::int64_t generation);
 

@@ -58,7 +58,7 @@ void scheduleOwn(Connection& connection, const std::string& agentVersion, const 
         if (hostFact(connection, fact) == value) continue;
         setHostFact(connection, fact, value);
         ActivityRegistry(connection)
-            .schedule(platform::vendorIdentifier(activity), {}, platform::dueTime({}, Duration(0), now));
+            .schedule(platform::vendorIdentifier(activity), {}, dueAfter(Duration(0), now));
     }
 }
 
@@ -113,6 +113,13 @@ void BackgroundActivities::reconsider() {
         around_.conditions.wakeAt(around_.conditions.now().sinceBoot + retryAfterFailure, false);
 }
 
+// Logs the first of several failures.
+bool BackgroundActivities::isDone(const MaybeError& error) {
+    if (isFailing_.exchange(error.has_value()) || !error) return !error;
+    log(Level::Error, "No background activity is fired until this works: %@", error->text);
+    return false;
+}
+
 // Stores the change after the earlier ones. False when it is kept for later.
 bool BackgroundActivities::store(Change change) {
     std::lock_guard lock(storing_);
@@ -121,17 +128,15 @@ bool BackgroundActivities::store(Change change) {
 }
 
 bool BackgroundActivities::storeUnsaved() {
-    const MaybeError error = around_.database.write([this](Connection& connection) {
+    const bool isStored = isDone(around_.database.write([this](Connection& connection) {
         for (const Change& change : unsaved_) change(connection);
-    });
-    if (error && !unsavedWork_) {
-        log(Level::Error, "Cannot store background activities, trying again: %@", error->text);
+    }));
+    if (isStored) unsaved_.clear();
+    if (isStored)
+        unsavedWork_.reset();
+    else if (!unsavedWork_)
         unsavedWork_ = around_.lifecycle.beginWork();
-    }
-    if (error) return false;
-    unsaved_.clear();
-    unsavedWork_.reset();
-    return true;
+    return isStored;
 }
 
 // The registry is taken up at the start, and again when it is another file's.
@@ -141,9 +146,8 @@ bool BackgroundActivities::takeUpIfReplaced() {
         if (!unsaved_.empty() && !storeUnsaved()) return false;
     }
     std::uint64_t opening = 0;
-    const MaybeError error =
-        around_.database.peek([&](Connection&, const Database::Stamp& stamp) { opening = stamp.opening; });
-    if (error) return false;
+    if (!isDone(around_.database.peek([&](Connection&, const Database::Stamp& stamp) { opening = stamp.opening; })))
+        return false;
     if (std::exchange(takenUp_, opening) == opening) return true;
     std::set<std::string, std::less<>> running;
     {
@@ -188,9 +192,8 @@ bool BackgroundActivities::fireDue() {
 
 bool BackgroundActivities::answerRequests() {
     std::vector<FiringRequest> requests;
-    const MaybeError error =
-        around_.database.read([&](Connection& connection) { requests = openRequests(connection); });
-    if (error) return false;
+    if (!isDone(around_.database.read([&](Connection& connection) { requests = openRequests(connection); })))
+        return false;
     for (const FiringRequest& request : requests) {
         const FiringAnswer answer = fireRequested(request.identifier);
         if (!store([number = request.number, answer](Connection& connection) {
@@ -207,26 +210,26 @@ FiringAnswer BackgroundActivities::fireRequested(const std::string& identifier) 
     const ActivityHandler handler = handlerFor(identifier);
     if (!handler) return FiringAnswer::Unknown;
     std::optional<ScheduledActivity> activity;
-    const MaybeError error = around_.database.write([&](Connection& connection) {
+    const bool isFound = isDone(around_.database.write([&](Connection& connection) {
         ActivityRegistry registry(connection);
         if (!registry.scheduled(identifier))
             registry.schedule(identifier, {}, dueAfter(Duration(0), around_.conditions.now()));
         activity = registry.scheduled(identifier);
-    });
-    return !error && fire(*activity, handler) ? FiringAnswer::Fired : FiringAnswer::NotStored;
+    }));
+    return isFound && fire(*activity, handler) ? FiringAnswer::Fired : FiringAnswer::NotStored;
 }
 
 // False when it could not be stored that the run begins.
 bool BackgroundActivities::fire(const ScheduledActivity& activity, const ActivityHandler& handler) {
     const Run run{activity.identifier, activity.generation};
     bool isPresent = false;
-    const MaybeError error = around_.database.write([&](Connection& connection) {
+    const bool isStored = isDone(around_.database.write([&](Connection& connection) {
         ActivityRegistry registry(connection);
         const std::optional<ScheduledActivity> present = registry.scheduled(run.identifier);
         isPresent = present && present->generation == run.generation;
         if (isPresent) registry.beginRun(run.identifier, run.generation, around_.conditions.now().wall);
-    });
-    if (error) return false;
+    }));
+    if (!isStored) return false;
     if (!isPresent) return true;  // it has just been registered anew, and will be looked at
     {
         std::lock_guard lock(mutex_);

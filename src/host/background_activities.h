@@ -7,6 +7,7 @@
 // its end could not be kept either; what was to be stored is stored later, in order.
 #pragma once
 
+#include <atomic>
 #include <map>
 #include <mutex>
 #include <set>
@@ -56,6 +57,7 @@ private:
         std::int64_t generation;
     };
 
+    bool isDone(const platform::MaybeError& error);
     bool store(Change change);
     bool storeUnsaved();
     bool takeUpIfReplaced();
@@ -79,7 +81,8 @@ private:
     std::function<platform::ActivityHandler(const std::string&)> factory_;
     std::set<std::string, std::less<>> running_;
 
-    std::mutex storing_;  // taken before the database
+    std::atomic<bool> isFailing_ = false;  // the database, since it was last logged
+    std::mutex storing_;                   // taken before the database
     std::vector<Change> unsaved_;
     platform::WorkInFlight unsavedWork_;  // while there are any
 };

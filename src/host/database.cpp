@@ -26,11 +26,11 @@ constexpr const char* steps[] = {
     // Follow-ups, in the order of their first posting: the item as a binary property list.
     "CREATE TABLE follow_ups (position INTEGER PRIMARY KEY, client TEXT NOT NULL, identifier TEXT NOT NULL, "
     "item NOT NULL, UNIQUE (client, identifier))",
-    // Facts that the host keeps from one process to the next; the background activities that are scheduled, each with a
-    // generation that no other ever had; the last run of each activity; what testers ask the agent to fire.
+    // Facts that the host keeps from one process to the next; the background activities that are scheduled; the last run
+    // of each activity; what testers ask the agent to fire.
     "CREATE TABLE host_facts (name TEXT PRIMARY KEY, value TEXT NOT NULL) WITHOUT ROWID;"
     "CREATE TABLE activities ("
-    "    generation INTEGER PRIMARY KEY AUTOINCREMENT, identifier TEXT NOT NULL UNIQUE,"
+    "    generation INTEGER PRIMARY KEY, identifier TEXT NOT NULL UNIQUE,"
     "    delay INTEGER NOT NULL, grace_period INTEGER NOT NULL, requires_network INTEGER NOT NULL,"
     "    due_boot TEXT NOT NULL, due_since_boot REAL NOT NULL, due_wall REAL NOT NULL, wait REAL NOT NULL,"
     "    is_carried_over INTEGER NOT NULL, deferrals INTEGER NOT NULL);"

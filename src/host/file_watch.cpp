@@ -6,6 +6,9 @@
 #include <array>
 #include <cerrno>
 #include <cstdlib>
+#include <cstring>
+
+#include "platform/log.h"
 
 namespace vrx::host {
 
@@ -29,10 +32,13 @@ FileWatch::FileWatch(sd_event* loop, std::string path, platform::Duration pause,
       pause_(pause),
       onChange_(std::move(onChange)),
       file_(inotify_init1(IN_NONBLOCK | IN_CLOEXEC)) {
-    if (!file_) throw std::system_error(errno, std::generic_category(), "watch of " + path_);
+    pauseSource_ = addBootTimer(loop, onPause, this);
+    if (!file_) {  // the user's programs have used up what there is of them
+        log(platform::Level::Error, "Changes of %@ go unnoticed: %@", path_, std::strerror(errno));
+        return;
+    }
     watchFolders();
     eventSource_ = addReadSource(loop, file_.number(), onEvents, this);
-    pauseSource_ = addBootTimer(loop, onPause, this);
 }
 
 void FileWatch::callIn(platform::Duration delay) {

@@ -2,6 +2,10 @@
 
 #include <unistd.h>
 
+#include <filesystem>
+
+#include "host/host_facts.h"
+
 namespace vrx::host {
 
 using platform::MaybeError;
@@ -71,6 +75,10 @@ void Host::start(const std::string& agentVersion) {
     const std::string path = home_ + "/host.db";
     databaseWatch_ = std::make_unique<FileWatch>(mainLoop_.event(), path, pause, [this, path] {
         if (access(path.c_str(), F_OK) == 0) activities_.reconsider();
+    });
+    database_.write([this](Connection& connection) {
+        setHostFact(connection, facts::profile,
+                    profile_.path().empty() ? "" : std::filesystem::absolute(profile_.path()).string());
     });
     activities_.start(agentVersion);
     profileNotifier_.start(mainLoop_.event(), [this] { activities_.reconsider(); });

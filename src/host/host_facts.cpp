@@ -2,6 +2,12 @@
 
 namespace vrx::host {
 
+std::optional<std::string> hostFact(Database& database, std::string_view name) {
+    std::optional<std::string> value;
+    database.read([&](Connection& connection) { value = hostFact(connection, name); });
+    return value;
+}
+
 std::optional<std::string> hostFact(Connection& connection, std::string_view name) {
     Statement& query = connection.statement("SELECT value FROM host_facts WHERE name = ?");
     if (!query.bind(0, name).step()) return std::nullopt;

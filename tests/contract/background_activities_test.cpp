@@ -5,6 +5,7 @@
 
 #include <chrono>
 
+#include "host/real_activities.h"
 #include "platform/activity_timing.h"
 #include "sim/host.h"
 
@@ -80,7 +81,7 @@ struct Names {
         return std::is_same_v<Subject, SimulatedActivities> ? "Simulated" : "Real";
     }
 };
-using Subjects = testing::Types<SimulatedActivities>;
+using Subjects = testing::Types<SimulatedActivities, RealActivities>;
 TYPED_TEST_SUITE(BackgroundActivitiesContract, Subjects, Names);
 
 TYPED_TEST(BackgroundActivitiesContract, FireOnceASecondAfterTheDelay) {
