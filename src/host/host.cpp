@@ -19,7 +19,7 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel)
       accounts_(profile_, home_),
       accountSession_(profile_),
       clock_(profile_),
-      http_(queues_.workers(platform::Priority::UserInitiated)) {
+      http_(queues_.workers(platform::Priority::UserInitiated), clock_, profile_) {
     facilities_.accountSession = &accountSession_;
     facilities_.accountStore = &accounts_;
     facilities_.clock = &clock_;
