@@ -23,15 +23,17 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel)
       defaults_(database_),
       followUps_(database_),
       profile_(locations.profile),
-      accounts_(profile_),
+      accounts_(profile_, home_),
+      accountSession_(profile_),
       clock_(profile_),
-      http_(queues_.workers(platform::Priority::UserInitiated)),
+      http_(queues_.workers(platform::Priority::UserInitiated), clock_, profile_),
       conditions_(mainLoop_.event(), profile_),
       activities_({.database = database_,
                    .mainQueue = mainLoop_,
                    .workers = queues_.workers(platform::Priority::Background),
                    .conditions = conditions_,
                    .lifecycle = lifecycle_}) {
+    facilities_.accountSession = &accountSession_;
     facilities_.accountStore = &accounts_;
     facilities_.backgroundActivities = &activities_;
     facilities_.clock = &clock_;
@@ -53,9 +55,11 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel)
     platform_ = Platform(facilities_);
 }
 
-// Tasks may use any facility to their end, and the current platform too: they end first.
+// Tasks may use any facility to their end, and the current platform too: they end first, and what one may wait for
+// before them.
 Host::~Host() {
     http_.stop();
+    accounts_.stop();
     queues_.stop();
 }
 

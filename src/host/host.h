@@ -12,6 +12,7 @@
 #include <string>
 
 #include "codec/codec.h"
+#include "host/account_session.h"
 #include "host/account_store.h"
 #include "host/background_activities.h"
 #include "host/clock.h"
@@ -48,7 +49,7 @@ enum class HomeUse { Agent, Tool };
 class Host {
 public:
     explicit Host(const HostLocations& locations, platform::Level lowestLevel = platform::Level::Default);
-    // Ends what is under way: requests go unanswered, running tasks are waited for.
+    // Ends what is under way: requests go unanswered, renewals of credentials fail, running tasks are waited for.
     ~Host();
     Host(const Host&) = delete;
     Host& operator=(const Host&) = delete;
@@ -93,6 +94,7 @@ private:
     FollowUpControllers followUps_;
     DeviceProfile profile_;
     AccountStore accounts_;
+    AccountSession accountSession_;
     Clock clock_;
     HttpSessions http_;
     TelephonyNetworkInfo telephony_{profile_};

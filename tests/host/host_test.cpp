@@ -1,9 +1,11 @@
 #include "host/host.h"
 
 #include <gmock/gmock.h>
+#include <sys/stat.h>
 
 #include <future>
 
+#include "host/credential_helper.h"
 #include "support.h"
 
 namespace vrx::host {
@@ -41,6 +43,31 @@ TEST(Host, IsTheCurrentPlatformAndHasItsHomeToItself) {
     Host next(locations);
     ASSERT_FALSE(next.open(HomeUse::Agent));
     EXPECT_EQ(Platform::current().defaultsStore().integer("key"), 19);
+}
+
+TEST(Host, EndsARenewalThatATaskWaitsFor) {
+    TemporaryFolder folder;
+    const HostLocations locations{folder / "home", folder / "device.toml"};
+    writeFile(locations.profile, "[account]\nidentifier = 'ada'\ncredential_helper = ['/bin/sleep', '100000']");
+    chmod(locations.profile.c_str(), 0600);
+    std::atomic<std::int64_t> code = 0;
+    {
+        Host host(locations, platform::Level::Error);
+        ASSERT_FALSE(host.open(HomeUse::Agent));
+        std::promise<void> begun;
+        Platform::current().queues().workers(platform::Priority::Background).post([&] {
+            auto renewed = Platform::current().queues().makeEvent();
+            Platform::current().accountStore().renewCredentials({"ada"}, {.services = {"S"}},
+                                                                [&](const platform::RenewalResult& result) {
+                                                                    code = result.code;
+                                                                    renewed->set();
+                                                                });
+            begun.set_value();
+            renewed->wait();
+        });
+        begun.get_future().wait();
+    }
+    EXPECT_EQ(code, static_cast<int>(CredentialFailure::Ended));
 }
 
 }  // namespace
