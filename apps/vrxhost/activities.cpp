@@ -57,9 +57,16 @@ std::string criteriaText(const host::ScheduledActivity& scheduled) {
            (scheduled.deferrals ? ", deferred " + std::to_string(scheduled.deferrals) + " times" : "");
 }
 
+std::string dueText(const AgentActivity& activity, bool isAgentRunning) {
+    if (!activity.scheduled) return "not scheduled";
+    const auto& run = activity.lastRun;
+    const bool isRunning = isAgentRunning && run && !run->outcome && run->generation == activity.scheduled->generation;
+    return isRunning ? "running" : textOf(activity.due);
+}
+
 std::vector<std::string> rowOf(const AgentActivity& activity, bool isAgentRunning) {
     const auto& run = activity.lastRun;
-    return {activity.identifier, activity.scheduled ? textOf(activity.due) : "not scheduled",
+    return {activity.identifier, dueText(activity, isAgentRunning),
             activity.scheduled ? criteriaText(*activity.scheduled) : "", textOf(activity.targetDate),
             run ? outcomeOf(*run, isAgentRunning) + (" " + textOf(run->ended.value_or(run->began))) : "never"};
 }

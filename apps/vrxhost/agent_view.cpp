@@ -15,8 +15,11 @@ using platform::Value;
 
 Value UnwrittenDefaults::get(std::string_view key) const {
     std::lock_guard lock(mutex_);
-    const auto kept = kept_.find(key);
-    return kept == kept_.end() ? store_.get(key) : kept->second;
+    if (const auto kept = kept_.find(key); kept != kept_.end()) return kept->second;
+    Value stored = isStoreUsed_ ? store_.get(key) : Value();
+    if (!stored.isNull()) return stored;
+    const auto registered = registered_.find(key);
+    return registered == registered_.end() ? Value() : registered->second;
 }
 
 void UnwrittenDefaults::set(std::string_view key, Value value) {
@@ -28,9 +31,15 @@ void UnwrittenDefaults::update(std::string_view key, const std::function<Value(c
     set(key, change(get(key)));
 }
 
-Dictionary UnwrittenDefaults::dictionaryRepresentation() const {
-    Dictionary all = store_.dictionaryRepresentation();
+void UnwrittenDefaults::registerDefaults(const Dictionary& values) {
     std::lock_guard lock(mutex_);
+    for (const auto& [key, value] : values) registered_[key] = value;
+}
+
+Dictionary UnwrittenDefaults::dictionaryRepresentation() const {
+    Dictionary all = isStoreUsed_ ? store_.dictionaryRepresentation() : Dictionary();
+    std::lock_guard lock(mutex_);
+    all.insert(registered_.begin(), registered_.end());
     for (const auto& [key, value] : kept_) all[key] = value;
     std::erase_if(all, [](const auto& entry) { return entry.second.isNull(); });
     return all;
@@ -66,7 +75,7 @@ AgentView::AgentView(const std::string& home, const std::string& profile)
       followUps_(database_),
       profile_(profile),
       locale_(profile_, database_),
-      accounts_(profile_),
+      accounts_(profile_, home),
       clock_(profile_),
       telephony_(profile_) {
     vrx_registerDefaults(defaults_);
@@ -87,9 +96,15 @@ AgentView::AgentView(const std::string& home, const std::string& profile)
     platform_ = platform::Platform(facilities_);
 }
 
-void AgentView::use(platform::Queues& queues, platform::HttpSessions& sessions) {
-    facilities_.queues = &queues;
-    facilities_.httpSessions = &sessions;
+MaybeError AgentView::open() {
+    MaybeError error = database_.open();
+    if (!error) defaults_.useStore();
+    return error;
+}
+
+void AgentView::use(platform::Queues* queues, platform::HttpSessions* sessions) {
+    facilities_.queues = queues;
+    facilities_.httpSessions = sessions;
     platform_ = platform::Platform(facilities_);
 }
 

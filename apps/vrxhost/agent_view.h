@@ -3,6 +3,7 @@
 // ends it.
 #pragma once
 
+#include <atomic>
 #include <functional>
 #include <memory>
 #include <mutex>
@@ -27,21 +28,26 @@
 
 namespace vrx::apps {
 
-// The settings of another store, over which those that are stored here are kept in memory.
+// The settings of a store, over which those that are stored here are kept in memory.
 class UnwrittenDefaults final : public platform::DefaultsStore {
 public:
-    explicit UnwrittenDefaults(platform::DefaultsStore& store) : store_(store) {}
+    explicit UnwrittenDefaults(const platform::DefaultsStore& store) : store_(store) {}
+
+    // Reads the store from now on; until then only registered values are there.
+    void useStore() { isStoreUsed_ = true; }
 
     platform::Value get(std::string_view key) const override;
     void set(std::string_view key, platform::Value value) override;
     void update(std::string_view key, const std::function<platform::Value(const platform::Value&)>& change) override;
-    void registerDefaults(const platform::Dictionary& values) override { store_.registerDefaults(values); }
+    void registerDefaults(const platform::Dictionary& values) override;
     platform::Dictionary dictionaryRepresentation() const override;
 
 private:
-    platform::DefaultsStore& store_;
+    const platform::DefaultsStore& store_;
+    std::atomic<bool> isStoreUsed_ = false;
     mutable std::mutex mutex_;
     platform::Dictionary kept_;  // null for what was removed
+    platform::Dictionary registered_;
 };
 
 // Keeps what is wrong, and drops the rest.
@@ -75,16 +81,16 @@ public:
     // The home may be missing, as may all in it.
     AgentView(const std::string& home, const std::string& profile);
 
-    // Whether the database can be read. Without it the registered settings hold.
-    platform::MaybeError open() { return database_.open(); }
+    // Reads the database from now on, if it can. Until then the registered settings hold, and nothing is pending.
+    platform::MaybeError open();
 
     const std::string& home() const { return home_; }
     host::Database& database() { return database_; }
     const host::DeviceProfile& profile() const { return profile_; }
     ErrorLog& errors() { return errors_; }
 
-    // What only some need, while the view has no other thread; not owned.
-    void use(platform::Queues& queues, platform::HttpSessions& sessions);
+    // What only some need, for as long as they do; while no other thread uses the platform. Not owned.
+    void use(platform::Queues* queues, platform::HttpSessions* sessions);
 
 private:
     const std::string home_;

@@ -13,5 +13,6 @@ int main(int argc, char** argv) {
     addActivitiesVerb(line, places);
     addFireVerb(line, places);
     addWhyVerb(line, places);
+    addDoctorVerb(line, places);
     return line.run(argc, argv);
 }

@@ -26,7 +26,8 @@ constexpr const char* steps[] = {
     // Follow-ups, in the order of their first posting: the item as a binary property list.
     "CREATE TABLE follow_ups (position INTEGER PRIMARY KEY, client TEXT NOT NULL, identifier TEXT NOT NULL, "
     "item NOT NULL, UNIQUE (client, identifier))",
-    // Facts that the host keeps from one process to the next; the background activities that are scheduled; the last run
+    // Facts that the host keeps from one process to the next; the background activities that are scheduled; the last
+    // run
     // of each activity; what testers ask the agent to fire.
     "CREATE TABLE host_facts (name TEXT PRIMARY KEY, value TEXT NOT NULL) WITHOUT ROWID;"
     "CREATE TABLE activities ("
@@ -348,7 +349,8 @@ std::shared_ptr<Database::Opening> Database::openToLook() const {
     Connection& reader = opening->reader.emplace(path_, busyLimit_, true);
     reader.checkSoundness();
     if (checkedVersion(reader) < static_cast<std::int64_t>(schema_.size()))
-        throw DatabaseError(SQLITE_ERROR, "it was made by an older version of the program");
+        throw DatabaseError(SQLITE_ERROR,
+                            "it was made by an older version of the program, and the agent has not taken it over yet");
     opening->file = FileIdentity::of(path_);
     return opening;
 }
