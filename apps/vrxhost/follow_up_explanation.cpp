@@ -81,31 +81,31 @@ Explanation explainPostDate(const Circumstances& device) {
 
 // There is an offer, and nobody has dismissed it.
 Explanation explainUnposted(const Circumstances& device) {
+    const Date end = *device.eligibleUntil;
+    const Date day = device.post.postDate->date;
+    if (day >= end) return {NotOffered, "ends-first", "the offer ends before the day on which it would be shown"};
     const NextStep next = nextConsideration(device);
-    if (next == NextStep::None) {
-        const bool isDue = device.post.reason == PostReason::Due;
+    const std::string posted = device.wasPosted ? ": it was posted before" : "";
+    if (next == NextStep::None)
         return {Waiting,
                 "nothing-scheduled",
-                (isDue ? "it is due" : "its day lies ahead") +
-                    std::string(", but nothing is scheduled that would have it posted") +
-                    (device.wasPosted ? ": it was posted before" : ""),
+                (device.post.reason == PostReason::Due ? "it is due" : "its day lies ahead") +
+                    (", but nothing is scheduled that would have it posted" + posted),
                 std::nullopt,
                 next,
                 askForOutreach};
-    }
     if (next == NextStep::Outreach && device.isCarrierOut)
         return {NotOffered, "carrier", "the record leaves out a carrier of this device", std::nullopt, next};
 
+    const Date run = std::max(device.now, next == NextStep::Post ? *device.postRun : *device.outreach);
+    if (run >= end) return {NotOffered, "ends-first", "the offer ends before the next run", std::nullopt, next};
     if (next == NextStep::Post && !device.posting)
         return {Waiting,
                 "posts-end",
-                "the next post comes too early for it, and by the agent's rule for dates none follows" +
-                    std::string(device.wasPosted ? ": it was posted before" : ""),
+                "the next post comes too early for it, and by the agent's rule for dates none follows" + posted,
                 std::nullopt,
                 next,
                 askForOutreach};
-    const Date run = std::max(device.now, next == NextStep::Post ? *device.postRun : *device.outreach);
-    const Date day = device.post.postDate->date;
     if (run < day) {
         Explanation explanation = explainPostDate(device);
         explanation.until = next == NextStep::Post ? *device.posting : day;
@@ -120,7 +120,9 @@ Explanation explainUnposted(const Circumstances& device) {
 
 Explanation explainFollowUp(const Circumstances& device) {
     if (device.isPending) return explainShown(device);
-    if (!device.isTracked) return {NotOffered, "unknown-device", "the agent knows no such device"};
+    if (!device.isTracked)
+        return {NotOffered,   "unknown-device", "the agent knows no such device",
+                std::nullopt, NextStep::None,   "vrxctl device and vrxctl paired list those it knows."};
     switch (device.post.reason) {
         case PostReason::NoRecord: return explainWithoutRecord(device);
         case PostReason::NoOffer: return {NotOffered, "no-offer", "the record asks for no offer"};
