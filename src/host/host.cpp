@@ -52,6 +52,7 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel)
     facilities_.propertyList = &propertyList_;
     facilities_.queues = &queues_;
     facilities_.telephonyNetworkInfo = &telephony_;
+    facilities_.uuidSource = &uuids_;
     platform_ = Platform(facilities_);
 }
 

@@ -32,6 +32,7 @@
 #include "host/queues.h"
 #include "host/system_log.h"
 #include "host/telephony_network_info.h"
+#include "host/uuid.h"
 #include "platform/bundle_lookup.h"
 #include "platform/platform.h"
 #include "platform/service_listener.h"
@@ -97,6 +98,7 @@ private:
     AccountSession accountSession_;
     Clock clock_;
     HttpSessions http_;
+    UuidSource uuids_;
     TelephonyNetworkInfo telephony_{profile_};
     NotificationCenter notifications_;
     ProfileNotifier profileNotifier_{profile_, database_, notifications_};
