@@ -6,6 +6,7 @@
 
 #include <cstdlib>
 
+#include "host/telephony_network_info.h"
 #include "support.h"
 
 namespace vrx::host {
@@ -45,6 +46,14 @@ identifier = "ada"
 [locale]
 language = "de_DE.UTF-8"
 time_zone = "Europe/Berlin"
+
+[[carriers]]
+mcc = "310"
+mnc = "410"
+
+[[carriers]]
+service = "roaming"
+mcc = "02"
 
 [[bundles]]
 executables = ["/usr/bin/busctl"]
@@ -87,6 +96,13 @@ TEST_F(DeviceProfileTest, GivesEveryFactOfTheFile) {
     EXPECT_EQ(watches[1].pairedDate, platform::dateFromEpoch(1769817600));
     EXPECT_TRUE(!watches[1].isPaired && watches[1].isArchived);
 
+    const TelephonyNetworkInfo telephony(profile);
+    const auto carriers = telephony.serviceSubscriberCellularProviders();
+    ASSERT_EQ(carriers.size(), 2u);
+    EXPECT_EQ(carriers.at("slot 1").mobileNetworkCode, "410");
+    EXPECT_EQ(carriers.at("roaming").mobileNetworkCode, std::nullopt);
+    EXPECT_EQ(telephony.description(), "telephony (roaming: carrier 02 (null), slot 1: carrier 310 410)");
+
     const auto facts = profile.facts();
     ASSERT_EQ(facts->bundles.size(), 1u);
     EXPECT_THAT(facts->bundles[0].executables, ElementsAre("/usr/bin/busctl"));
@@ -125,6 +141,7 @@ TEST_F(DeviceProfileTest, AFileThatIsWrongIsReportedOnceWithItsLineAndTheLastGoo
         {"[features.Domain]\nFlag = 1", ":2: features.Domain.Flag must be true or false; "},
         {"[[watches]]\npaired_date = 'yesterday'", ":2: watches.paired_date must be a date; "},
         {"[watches]\nname = 'X'", ":1: watches must be a list of tables, [[watches]]; "},
+        {"[activities]\nminimum_interval = -1", ":2: activities.minimum_interval must be a number of seconds; "},
         {"\n[[bundles]]\nexecutables = ['/bin/x']", ":2: bundles.identifier is missing; "},
         {"[[bundles]]\nidentifier = 'x'\nentitlements = { a = { b = 1 } }",
          ":3: bundles.entitlements.a must be a boolean, number, string or list of strings; "},
