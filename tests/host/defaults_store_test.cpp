@@ -235,17 +235,17 @@ TEST_F(DefaultsStoreTest, RefusesAFileOfANewerVersionAndLeavesItAlone) {
 
 TEST_F(DefaultsStoreTest, ChangesTheSchemaAsAWholeOrNotAtAll) {
     const char* const broken[] = {Database::currentSchema[0], "CREATE TABLE more (x)", "nonsense"};
-    const char* const sound[] = {Database::currentSchema[0], "CREATE TABLE more (x)"};
+    const Database::Schema older(broken, 1);
     {
-        Database first(path());
+        Database first(path(), older);
         DefaultsStore(first).set("key", 1);
     }
     EXPECT_TRUE(Database(path(), broken).open());
-    Database next(path(), sound);
+    Database next(path(), Database::Schema(broken, 2));
     EXPECT_FALSE(next.open()) << next.open()->text;
     EXPECT_EQ(DefaultsStore(next).integer("key"), 1);
     EXPECT_FALSE(execute(next, "INSERT INTO more VALUES (1)"));
-    EXPECT_TRUE(Database(path()).open());  // which is the older program now
+    EXPECT_TRUE(Database(path(), older).open());
 }
 
 TEST_F(DefaultsStoreTest, OpensAReplacedFileAgainAndKeepsItsOwnLogOutOfIt) {

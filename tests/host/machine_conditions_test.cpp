@@ -48,33 +48,21 @@ TEST(PowerSupply, IsLowWhereEveryBatteryIsAndNothingElseFeedsTheMachine) {
     }
 }
 
-// Adds a default route on the loopback interface, in a network of this process's own.
-bool addDefaultRoute() {
+// On the loopback interface.
+void addDefaultRoute() {
     const Descriptor file(socket(AF_NETLINK, SOCK_RAW | SOCK_CLOEXEC, NETLINK_ROUTE));
+    const Descriptor any(socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0));
     ifreq interface {};
     std::string("lo").copy(interface.ifr_name, 2);
-    const Descriptor any(socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0));
     interface.ifr_flags = IFF_UP;
-    if (ioctl(any.number(), SIOCSIFFLAGS, &interface) != 0) return false;
+    ioctl(any.number(), SIOCSIFFLAGS, &interface);
     struct {
-        nlmsghdr header{.nlmsg_len = sizeof(*this),
-                        .nlmsg_type = RTM_NEWROUTE,
-                        .nlmsg_flags = NLM_F_REQUEST | NLM_F_CREATE,
-                        .nlmsg_seq = 0,
-                        .nlmsg_pid = 0};
-        rtmsg route{.rtm_family = AF_INET,
-                    .rtm_dst_len = 0,
-                    .rtm_src_len = 0,
-                    .rtm_tos = 0,
-                    .rtm_table = RT_TABLE_MAIN,
-                    .rtm_protocol = RTPROT_STATIC,
-                    .rtm_scope = RT_SCOPE_LINK,
-                    .rtm_type = RTN_UNICAST,
-                    .rtm_flags = 0};
-        rtattr attribute{.rta_len = RTA_LENGTH(sizeof(std::uint32_t)), .rta_type = RTA_OIF};
+        nlmsghdr header{sizeof(*this), RTM_NEWROUTE, NLM_F_REQUEST | NLM_F_CREATE, 0, 0};
+        rtmsg route{AF_INET, 0, 0, 0, RT_TABLE_MAIN, RTPROT_STATIC, RT_SCOPE_LINK, RTN_UNICAST, 0};
+        rtattr attribute{RTA_LENGTH(sizeof(std::uint32_t)), RTA_OIF};
         std::uint32_t interface = if_nametoindex("lo");
     } request;
-    return send(file.number(), &request, sizeof request, 0) == static_cast<ssize_t>(sizeof request);
+    send(file.number(), &request, sizeof request, 0);
 }
 
 // In a child: 0 is good, 77 that it may not have a network of its own.
@@ -86,12 +74,7 @@ int followRoutes() {
     DeviceProfile profile(folder / "device.toml");
     MachineConditions conditions(loop.event(), profile);
     int wakeUps = 0;
-    conditions.start({.wake =
-                          [&] {
-                              ++wakeUps;
-                              loop.stop();
-                          },
-                      .wallClockSet = [] {}});
+    conditions.start({.wake = [&] { ++wakeUps, loop.stop(); }, .wallClockSet = [] {}});
     if (conditions.isNetworkAvailable()) return 1;
     conditions.wakeAt(std::nullopt, true);
     loop.post([] { addDefaultRoute(); });
@@ -118,12 +101,7 @@ TEST(MachineConditions, WakeAtTheTimeAskedForLast) {
     DeviceProfile profile(folder / "device.toml");
     MachineConditions conditions(loop.event(), profile);
     std::optional<platform::Duration> woken;
-    conditions.start({.wake =
-                          [&] {
-                              woken = conditions.now().sinceBoot;
-                              loop.stop();
-                          },
-                      .wallClockSet = [] {}});
+    conditions.start({.wake = [&] { woken = conditions.now().sinceBoot, loop.stop(); }, .wallClockSet = [] {}});
     const platform::Duration due = conditions.now().sinceBoot + 5ms;
     conditions.wakeAt(platform::Duration(0), false);
     conditions.wakeAt(platform::Duration(1e300), false);

@@ -13,50 +13,36 @@ using platform::WorkInFlight;
 
 TEST(ProcessLifecycle, EndsOnceItIsAskedToAndNothingIsUnderWayOrUnread) {
     LogRecorder log;
-    MainLoop loop;
-    ProcessLifecycle lifecycle(loop);
-    std::vector<std::string> order;
-    bool hasUnread = true;
-    lifecycle.setUnreadQuestion([&] { return hasUnread; });
-    WorkInFlight first = lifecycle.beginWork(), second = lifecycle.beginWorkUnlessEnding();
-    { WorkInFlight unasked = lifecycle.beginWork(); }
-    lifecycle.exitCleanWhenIdle();
-    lifecycle.exitCleanWhenIdle();
-    loop.post([&] {
-        order.push_back("first");
-        first.reset();
-        // Begun by work that is at its end.
-        loop.post([&, third = std::exchange(second, nullptr)] { order.push_back("third"); });
-    });
-    loop.post([&] {
-        loop.post([&] {
-            loop.post([&] {
-                order.push_back("unread");
-                EXPECT_FALSE(lifecycle.isEnding());
-                hasUnread = false;
-                std::thread([&] { lifecycle.beginWorkUnlessEnding().reset(); }).join();
-            });
-        });
-    });
-    loop.run();
-    EXPECT_THAT(order, ::testing::ElementsAre("first", "third", "unread"));
-    EXPECT_TRUE(lifecycle.isEnding());
-    EXPECT_FALSE(lifecycle.beginWorkUnlessEnding());
-    EXPECT_TRUE(lifecycle.beginWork());
-    EXPECT_FALSE(loop.wasStoppedBySignal());
-    EXPECT_EQ(log.lines().size(), 1u);
-}
-
-TEST(ProcessLifecycle, IsOutlivedByWork) {
-    LogRecorder log;
-    WorkInFlight work;
+    WorkInFlight late;
     {
         MainLoop loop;
         ProcessLifecycle lifecycle(loop);
-        work = lifecycle.beginWork();
+        bool hasUnread = true;
+        lifecycle.setUnreadQuestion([&] { return hasUnread; });
+        WorkInFlight first = lifecycle.beginWork(), second = lifecycle.beginWorkUnlessEnding();
+        { WorkInFlight unasked = lifecycle.beginWork(); }
         lifecycle.exitCleanWhenIdle();
+        lifecycle.exitCleanWhenIdle();
+        int rounds = 0;
+        std::function<void()> round = [&] {
+            EXPECT_FALSE(lifecycle.isEnding());
+            ++rounds;
+            if (rounds == 1) first.reset();
+            if (rounds == 3) second.reset();
+            if (rounds == 5) hasUnread = false;
+            if (rounds == 5) std::thread([&] { lifecycle.beginWorkUnlessEnding().reset(); }).join();
+            if (rounds < 5) loop.post(round);
+        };
+        loop.post(round);
+        loop.run();
+        EXPECT_EQ(rounds, 5);
+        EXPECT_TRUE(lifecycle.isEnding());
+        EXPECT_FALSE(lifecycle.beginWorkUnlessEnding());
+        EXPECT_FALSE(loop.wasStoppedBySignal());
+        EXPECT_EQ(log.lines().size(), 1u);
+        late = lifecycle.beginWork();
     }
-    work.reset();
+    late.reset();
 }
 
 }  // namespace

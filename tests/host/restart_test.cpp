@@ -10,6 +10,7 @@
 
 #include <csignal>
 #include <filesystem>
+#include <map>
 
 #include "host/home_lock.h"
 #include "support.h"
@@ -88,25 +89,17 @@ TEST(Restart, KeepsClientsWaitingAndTheHomeLocked) {
 }
 
 TEST(Restart, LeavesItToAServiceManagerThatStartedThisProcess) {
-    const std::string self = std::to_string(getpid());
-    const struct {
-        const char* notifySocket;
-        const char* invocation;
-        const char* process;
-        bool isUnder;
-    } cases[] = {{nullptr, nullptr, nullptr, false},
-                 {"/run/notify", nullptr, nullptr, true},
-                 {nullptr, "1", self.c_str(), true},
-                 {nullptr, "1", "1", false},  // inherited by a shell of that service
-                 {nullptr, "1", nullptr, false}};
-    for (const auto& [notifySocket, invocation, process, isUnder] : cases) {
-        for (const auto& [name, value] :
-             {std::pair{"NOTIFY_SOCKET", notifySocket}, std::pair{"INVOCATION_ID", invocation},
-              std::pair{"SYSTEMD_EXEC_PID", process}})
-            value ? setenv(name, value, 1) : unsetenv(name);
-        EXPECT_EQ(isUnderServiceManager(), isUnder);
-    }
-    for (const char* name : {"NOTIFY_SOCKET", "INVOCATION_ID", "SYSTEMD_EXEC_PID"}) unsetenv(name);
+    auto isUnder = [](std::map<const char*, std::string> variables) {
+        for (const auto& [name, value] : variables) setenv(name, value.c_str(), 1);
+        const bool result = isUnderServiceManager();
+        for (const auto& [name, value] : variables) unsetenv(name);
+        return result;
+    };
+    EXPECT_FALSE(isUnder({}));
+    EXPECT_TRUE(isUnder({{"NOTIFY_SOCKET", "/run/notify"}}));
+    EXPECT_TRUE(isUnder({{"INVOCATION_ID", "1"}, {"SYSTEMD_EXEC_PID", std::to_string(getpid())}}));
+    EXPECT_FALSE(isUnder({{"INVOCATION_ID", "1"}, {"SYSTEMD_EXEC_PID", "1"}})) << "a shell of that service's";
+    EXPECT_FALSE(isUnder({{"INVOCATION_ID", "1"}}));
 }
 
 }  // namespace
