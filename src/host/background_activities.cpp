@@ -57,8 +57,7 @@ void scheduleOwn(Connection& connection, const std::string& agentVersion, const 
     for (const auto& [fact, value, activity] : occasions) {
         if (hostFact(connection, fact) == value) continue;
         setHostFact(connection, fact, value);
-        ActivityRegistry(connection)
-            .schedule(platform::vendorIdentifier(activity), {}, dueAfter(Duration(0), now));
+        ActivityRegistry(connection).schedule(platform::vendorIdentifier(activity), {}, dueAfter(Duration(0), now));
     }
 }
 
@@ -103,8 +102,11 @@ bool BackgroundActivities::shouldDefer(std::string_view) const {
 }
 
 void BackgroundActivities::setHandlerFactory(std::function<ActivityHandler(const std::string&)> factory) {
-    std::lock_guard lock(mutex_);
-    factory_ = std::move(factory);
+    {
+        std::lock_guard lock(mutex_);
+        factory_.swap(factory);
+    }
+    around_.mainQueue.post([this] { reconsider(); });
 }
 
 void BackgroundActivities::reconsider() {

@@ -6,6 +6,7 @@
 
 #include <cstdlib>
 
+#include "host/telephony_network_info.h"
 #include "support.h"
 
 namespace vrx::host {
@@ -58,6 +59,14 @@ source_application_header = true
 language = "de_DE.UTF-8"
 time_zone = "Europe/Berlin"
 
+[[carriers]]
+mcc = "310"
+mnc = "410"
+
+[[carriers]]
+service = "roaming"
+mcc = "02"
+
 [[bundles]]
 executables = ["/usr/bin/busctl"]
 identifier = "com.example.tester"
@@ -97,6 +106,13 @@ TEST_F(DeviceProfileTest, GivesEveryFactOfTheFile) {
     EXPECT_EQ(watches[1].name, std::nullopt);
     EXPECT_EQ(watches[1].pairedDate, platform::dateFromEpoch(1769817600));
     EXPECT_TRUE(!watches[1].isPaired && watches[1].isArchived);
+
+    const TelephonyNetworkInfo telephony(profile);
+    const auto carriers = telephony.serviceSubscriberCellularProviders();
+    ASSERT_EQ(carriers.size(), 2u);
+    EXPECT_EQ(carriers.at("slot 1").mobileNetworkCode, "410");
+    EXPECT_EQ(carriers.at("roaming").mobileNetworkCode, std::nullopt);
+    EXPECT_EQ(telephony.description(), "telephony (roaming: carrier 02 (null), slot 1: carrier 310 410)");
 
     const auto facts = profile.facts();
     ASSERT_TRUE(facts->account);
@@ -154,6 +170,7 @@ TEST_F(DeviceProfileTest, AFileThatIsWrongIsReportedOnceWithItsLineAndTheLastGoo
         {"[features.Domain]\nFlag = 1", ":2: features.Domain.Flag must be true or false; "},
         {"[[watches]]\npaired_date = 'yesterday'", ":2: watches.paired_date must be a date; "},
         {"[watches]\nname = 'X'", ":1: watches must be a list of tables, [[watches]]; "},
+        {"[activities]\nminimum_interval = -1", ":2: activities.minimum_interval must be a number of seconds; "},
         {"\n[[bundles]]\nexecutables = ['/bin/x']", ":2: bundles.identifier is missing; "},
         {"[account]\nidentifier = \"a\\nb\"", ":2: account.identifier must be without control characters; "},
         {"[account]\nauthentication = true", ":2: account.authentication must be a table; "},
