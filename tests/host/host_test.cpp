@@ -1,7 +1,6 @@
 #include "host/host.h"
 
 #include <gmock/gmock.h>
-#include <sys/stat.h>
 
 #include <future>
 
@@ -25,16 +24,24 @@ TEST(Host, IsTheCurrentPlatformAndHasItsHomeToItself) {
         Platform& platform = Platform::current();
         EXPECT_EQ(platform.files().homeDirectory(), locations.home);
         EXPECT_EQ(platform.clock().timeZoneOffset(), 5h + 30min);
-        writeFile(locations.profile, "[locale]\ntime_zone = 'America/Lima'\n");
+        writeFile(locations.profile,
+                  "[account]\nidentifier = 'ada'\ncredential_helper = ['/bin/sleep', '100000']\n"
+                  "[locale]\ntime_zone = 'America/Lima'\n");
         EXPECT_EQ(platform.clock().timeZoneOffset(), -5h);
         EXPECT_THAT(Host(locations).open(HomeUse::Agent)->text, HasSubstr("another agent"));
         EXPECT_FALSE(Host(locations).open(HomeUse::Tool));
         EXPECT_EQ(&Platform::current(), &platform);
 
-        // Work that still runs at the end has the platform to the last.
+        // Work that still runs at the end has the platform to the last, and what it waits for ends.
         std::promise<void> begun;
         platform.queues().workers(platform::Priority::Background).post([&] {
+            auto renewed = platform.queues().makeEvent();
+            platform.accountStore().renewCredentials({"ada"}, {.services = {"S"}}, [&](const auto& result) {
+                EXPECT_EQ(result.code, static_cast<int>(CredentialFailure::Ended));
+                renewed->set();
+            });
             begun.set_value();
+            renewed->wait();
             for (int i = 0; i < 20; ++i) Platform::current().defaultsStore().set("key", i);
         });
         begun.get_future().wait();
@@ -43,31 +50,6 @@ TEST(Host, IsTheCurrentPlatformAndHasItsHomeToItself) {
     Host next(locations);
     ASSERT_FALSE(next.open(HomeUse::Agent));
     EXPECT_EQ(Platform::current().defaultsStore().integer("key"), 19);
-}
-
-TEST(Host, EndsARenewalThatATaskWaitsFor) {
-    TemporaryFolder folder;
-    const HostLocations locations{folder / "home", folder / "device.toml"};
-    writeFile(locations.profile, "[account]\nidentifier = 'ada'\ncredential_helper = ['/bin/sleep', '100000']");
-    chmod(locations.profile.c_str(), 0600);
-    std::atomic<std::int64_t> code = 0;
-    {
-        Host host(locations, platform::Level::Error);
-        ASSERT_FALSE(host.open(HomeUse::Agent));
-        std::promise<void> begun;
-        Platform::current().queues().workers(platform::Priority::Background).post([&] {
-            auto renewed = Platform::current().queues().makeEvent();
-            Platform::current().accountStore().renewCredentials({"ada"}, {.services = {"S"}},
-                                                                [&](const platform::RenewalResult& result) {
-                                                                    code = result.code;
-                                                                    renewed->set();
-                                                                });
-            begun.set_value();
-            renewed->wait();
-        });
-        begun.get_future().wait();
-    }
-    EXPECT_EQ(code, static_cast<int>(CredentialFailure::Ended));
 }
 
 }  // namespace
