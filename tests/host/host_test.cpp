@@ -1,7 +1,6 @@
 #include "host/host.h"
 
 #include <gmock/gmock.h>
-#include <sys/stat.h>
 
 #include <atomic>
 #include <future>
@@ -29,7 +28,9 @@ TEST(Host, IsTheCurrentPlatformAndHasItsHomeToItself) {
         Platform& platform = Platform::current();
         EXPECT_EQ(platform.files().homeDirectory(), locations.home);
         EXPECT_EQ(platform.clock().timeZoneOffset(), 5h + 30min);
-        writeFile(locations.profile, "[locale]\ntime_zone = 'America/Lima'\n");
+        writeFile(locations.profile,
+                  "[account]\nidentifier = 'ada'\ncredential_helper = ['/bin/sleep', '100000']\n"
+                  "[locale]\ntime_zone = 'America/Lima'\n");
         EXPECT_EQ(platform.clock().timeZoneOffset(), -5h);
         const std::string uuid = platform.uuidSource().makeUuid();
         EXPECT_THAT(uuid, MatchesRegex("[0-9a-f]{8}(-[0-9a-f]{4}){3}-[0-9a-f]{12}"));
@@ -38,10 +39,16 @@ TEST(Host, IsTheCurrentPlatformAndHasItsHomeToItself) {
         EXPECT_FALSE(Host(locations).open(HomeUse::Tool));
         EXPECT_EQ(&Platform::current(), &platform);
 
-        // Work that still runs at the end has the platform to the last.
+        // Work that still runs at the end has the platform to the last, and what it waits for ends.
         std::promise<void> begun;
         platform.queues().workers(platform::Priority::Background).post([&] {
+            auto renewed = platform.queues().makeEvent();
+            platform.accountStore().renewCredentials({"ada"}, {.services = {"S"}}, [&](const auto& result) {
+                EXPECT_EQ(result.code, static_cast<int>(CredentialFailure::Ended));
+                renewed->set();
+            });
             begun.set_value();
+            renewed->wait();
             for (int i = 0; i < 20; ++i) Platform::current().defaultsStore().set("key", i);
         });
         begun.get_future().wait();
@@ -50,31 +57,6 @@ TEST(Host, IsTheCurrentPlatformAndHasItsHomeToItself) {
     Host next(locations);
     ASSERT_FALSE(next.open(HomeUse::Agent));
     EXPECT_EQ(Platform::current().defaultsStore().integer("key"), 19);
-}
-
-TEST(Host, EndsARenewalThatATaskWaitsFor) {
-    TemporaryFolder folder;
-    const HostLocations locations{folder / "home", folder / "device.toml"};
-    writeFile(locations.profile, "[account]\nidentifier = 'ada'\ncredential_helper = ['/bin/sleep', '100000']");
-    chmod(locations.profile.c_str(), 0600);
-    std::atomic<std::int64_t> code = 0;
-    {
-        Host host(locations, platform::Level::Error);
-        ASSERT_FALSE(host.open(HomeUse::Agent));
-        std::promise<void> begun;
-        Platform::current().queues().workers(platform::Priority::Background).post([&] {
-            auto renewed = Platform::current().queues().makeEvent();
-            Platform::current().accountStore().renewCredentials({"ada"}, {.services = {"S"}},
-                                                                [&](const platform::RenewalResult& result) {
-                                                                    code = result.code;
-                                                                    renewed->set();
-                                                                });
-            begun.set_value();
-            renewed->wait();
-        });
-        begun.get_future().wait();
-    }
-    EXPECT_EQ(code, static_cast<int>(CredentialFailure::Ended));
 }
 
 // On the real queues, with tools beside the agent: what races would show here, under the thread sanitizer.

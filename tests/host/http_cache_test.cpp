@@ -10,37 +10,25 @@ namespace {
 
 using namespace std::chrono_literals;
 using platform::HttpHeaders;
-using platform::HttpResponse;
 
 TEST(HttpCacheRules, ReadCacheControlAndDates) {
-    struct Case {
-        const char* text;
-        bool isStorable, mustRevalidate;
-        int maxAge;  // -1 for none
+    // Storable, to be revalidated, max-age.
+    const std::map<std::string, std::tuple<bool, bool, std::optional<std::chrono::seconds>>> cases{
+        {"", {true, false, {}}},
+        {" MAX-AGE = 5 ", {true, false, 5s}},
+        {"max-age=\"5\", max-age=6", {true, false, 5s}},
+        {"s-maxage=9,public,,x=\"no-store, \\\" no-cache\" , max-age=1", {true, false, 1s}},
+        {"private=\"Set-Cookie\", no-cache=\"X-A\"", {true, true, {}}},
+        {"max-age=1,No-Store", {false, false, 1s}},
+        {"max-age=\"1, no-store", {false, false, {}}},
+        {"max-age=\"1\\", {false, false, {}}},
+        {"max-age", {true, false, 0s}},
+        {"max-age=-1", {true, false, 0s}},
+        {"max-age=99999999999999999999", {true, false, std::chrono::seconds(std::int64_t{1} << 31)}},
     };
-    const Case cases[] = {
-        {"", true, false, -1},
-        {" MAX-AGE = 5 ", true, false, 5},
-        {"max-age=\"5\", max-age=6", true, false, 5},
-        {"s-maxage=9,public,,x=\"no-store, \\\" no-cache\" , max-age=1", true, false, 1},
-        {"private=\"Set-Cookie\", no-cache=\"X-A\"", true, true, -1},
-        {"max-age=1,No-Store", false, false, 1},
-        {"max-age=\"1, no-store", false, false, -1},
-        {"max-age=\"1\\", false, false, -1},
-        {"max-age", true, false, 0},
-        {"max-age=-1", true, false, 0},
-        {"max-age=5s", true, false, 0},
-        {"max-age=99999999999999999999", true, false, 1 << 30},
-    };
-    for (const Case& c : cases) {
-        const CacheControl control = parseCacheControl(c.text);
-        EXPECT_EQ(control.isStorable, c.isStorable) << c.text;
-        EXPECT_EQ(control.mustRevalidate, c.mustRevalidate) << c.text;
-        const auto maxAge = c.maxAge < 0 ? std::nullopt : std::optional(std::chrono::seconds(c.maxAge));
-        if (c.maxAge == 1 << 30)
-            EXPECT_GT(control.maxAge, maxAge) << c.text;
-        else
-            EXPECT_EQ(control.maxAge, maxAge) << c.text;
+    for (const auto& [text, expected] : cases) {
+        const CacheControl read = parseCacheControl(text);
+        EXPECT_EQ(std::tuple(read.isStorable, read.mustRevalidate, read.maxAge), expected) << text;
     }
     for (const char* text :
          {"Sun, 06 Nov 1994 08:49:37 GMT", "Sunday, 06-Nov-94 08:49:37 GMT", "Sun Nov  6 08:49:37 1994"})
@@ -53,11 +41,10 @@ TEST(HttpCache, StaysWithinItsBoundsAndLetsTheLeastRecentlyUsedGo) {
     SettableClock clock;
     HttpCache cache(clock, 3, 4000);
     auto add = [&](const std::string& url, std::size_t size, const HttpHeaders& headers = {}) {
-        HttpResponse answer{.status = 200, .headers = {{"Cache-Control", "max-age=9"}}};
+        platform::HttpResponse answer{.status = 200, .headers = {{"Cache-Control", "max-age=9"}}};
         answer.body = platform::Data(size);
         cache.store(HttpCache::keyOf(url, headers), url, clock.now(), answer);
         EXPECT_LE(cache.bytes(), 4000u);
-        EXPECT_GE(cache.bytes(), cache.entries() * 100);
     };
     auto has = [&](const std::string& url, const HttpHeaders& headers = {}) {
         return cache.find(HttpCache::keyOf(url, headers)) != nullptr;
@@ -65,13 +52,11 @@ TEST(HttpCache, StaysWithinItsBoundsAndLetsTheLeastRecentlyUsedGo) {
     add("a", 1);
     add("b", 1, {{"X", "1"}});
     add("c", 1);
-    EXPECT_TRUE(has("a"));
-    EXPECT_FALSE(has("b", {{"X", "2"}}));
+    EXPECT_TRUE(has("a") && has("b", {{"X", "1"}}) && !has("b", {{"X", "2"}}) && has("a"));
     add("d", 1);
-    EXPECT_FALSE(has("b", {{"X", "1"}}));
-    EXPECT_TRUE(has("a"));
+    EXPECT_TRUE(has("b", {{"X", "1"}}) && !has("c") && has("a"));
     add("e", 3000);  // only one fits beside it
-    EXPECT_TRUE(has("a") && has("e"));
+    EXPECT_TRUE(has("a") && has("e") && !has("d"));
     add("e", 5000);  // and this one replaces what it cannot be itself
     EXPECT_FALSE(has("e"));
     cache.forget("a");

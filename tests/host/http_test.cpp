@@ -3,12 +3,12 @@
 #include <gmock/gmock.h>
 #include <sys/stat.h>
 
+#include <array>
 #include <csignal>
 #include <cstdio>
 #include <future>
 
 #include "host/queues.h"
-#include "host/text.h"
 #include "loopback_server.h"
 #include "support.h"
 
@@ -181,16 +181,12 @@ TEST_F(HttpTest, SpeaksPlainHttpWithThisMachineOnlyAndReadsFiles) {
     EXPECT_EQ(error(get("file://" + folder / "large")), "the file is too large");
 }
 
-struct Kept {
-    const char* headers;
-    double secondsLater;
-    const char* condition;  // in the second request, empty for none, null when there is no such request
-};
-
 TEST_F(HttpTest, KeepsAnswersAsTheirHeadersAllow) {
     constexpr const char* ifNoneMatch = "If-None-Match: \"a\"";
     constexpr const char* ifModifiedSince = "If-Modified-Since: Sun, 06 Nov 1994 08:00:00 GMT";
-    const Kept cases[] = {
+    // What the first answer says, how much later the second request comes, and how it asks whether that still holds:
+    // empty for not, null when it does not go out.
+    const std::tuple<std::string, double, const char*> cases[] = {
         {"Cache-Control: max-age=60", 59, nullptr},
         {"Cache-Control: max-age=60", 60, ""},
         {"Cache-Control: max-age=60\r\nAge: 10", 50, ""},
@@ -212,26 +208,25 @@ TEST_F(HttpTest, KeepsAnswersAsTheirHeadersAllow) {
         requests.push_back(request);
         const bool isAsked = request.find("\r\nIf-") != request.npos;
         return isAsked ? "HTTP/1.1 304 Not Modified\r\nX-New: 1\r\nCache-Control: max-age=60\r\n\r\n"
-                       : answer("200 OK", std::to_string(requests.size()), headers + "\r\n");
+                       : answer("200 OK", std::to_string(requests.size()), headers);
     });
-    for (const Kept& kept : cases) {
-        SCOPED_TRACE(kept.headers);
+    for (const auto& [said, secondsLater, condition] : cases) {
+        SCOPED_TRACE(said);
         requests.clear();
-        headers = kept.headers;
-        const std::string url = server.url("/" + std::to_string(&kept - cases));
+        headers = said + "\r\n";
+        const std::string url = server.url("/" + std::to_string(&said - &std::get<0>(cases[0])));
         EXPECT_EQ(body(get(url)), "1");
-        clock.seconds = clock.seconds + kept.secondsLater;
-        const HttpResponse second = get(url);
-        const bool isConfirmed = kept.condition && *kept.condition;
+        clock.seconds = clock.seconds + secondsLater;
+        const bool isConfirmed = condition && *condition;
+        HttpResponse second = get(url);
+        EXPECT_EQ(body(second), condition && !isConfirmed ? "2" : "1");
         EXPECT_EQ(second.status, 200);
-        EXPECT_EQ(body(second), kept.condition && !isConfirmed ? "2" : "1");
-        ASSERT_EQ(requests.size(), kept.condition ? 2u : 1u);
+        ASSERT_EQ(requests.size(), condition ? 2u : 1u);
         EXPECT_EQ(requests.back().find("\r\nIf-") != std::string::npos, isConfirmed);
         if (isConfirmed) {
-            EXPECT_THAT(requests[1], HasSubstr(kept.condition));
-            EXPECT_EQ(second.headers.at("X-New"), "1");
-            // It is fresh anew, unless it still says otherwise.
-            EXPECT_EQ(get(url).headers.at("Age"), "0");
+            EXPECT_THAT(requests[1], HasSubstr(condition));
+            EXPECT_EQ(second.headers["X-New"], "1");
+            EXPECT_EQ(get(url).headers["Age"], "0");  // it is fresh anew
             EXPECT_EQ(requests.size(), 2u);
         }
         clock.seconds = 784'111'777;
@@ -246,72 +241,60 @@ TEST_F(HttpTest, KeepsNothingThatIsDoubtful) {
         return next;
     });
     const std::string fresh = "Cache-Control: max-age=60\r\nETag: \"a\"\r\n";
-    const HttpRequest plain = requestTo(server.url());
-    HttpRequest ranged = plain, typed = plain, posted = requestTo(server.url(), "POST");
+    const HttpRequest plain = requestTo(server.url()), posted = requestTo(server.url(), "POST");
+    HttpRequest ranged = plain, typed = plain;
     ranged.headers["Range"] = "bytes=0-1";
     typed.headers["Accept"] = "text/plain";
-    const std::tuple<const char*, HttpRequest, std::string> cases[] = {
-        {"not 200", plain, answer("404 Not Found", "x", fresh)},
-        {"partial", plain, answer("206 Partial Content", "x", fresh)},
-        {"of unknown length", plain, "HTTP/1.0 200 OK\r\n" + fresh + "\r\nabc"},
-        {"cut short", plain, "HTTP/1.0 200 OK\r\nContent-Length: 9\r\n" + fresh + "\r\nabc"},
-        {"too large", plain, answer("200 OK", std::string(10'001, 'x'), fresh)},
-        {"a part", ranged, answer("200 OK", "x", fresh)},
-        {"another method's", posted, answer("200 OK", "x", fresh)},
-        {"for other headers", typed, answer("200 OK", "x", fresh)},
+    const std::pair<HttpRequest, std::string> cases[] = {
+        {plain, answer("404 Not Found", "x", fresh)},
+        {plain, answer("206 Partial Content", "x", fresh)},
+        {plain, "HTTP/1.0 200 OK\r\n" + fresh + "\r\nof unknown length"},
+        {plain, "HTTP/1.0 200 OK\r\nContent-Length: 99\r\n" + fresh + "\r\ncut short"},
+        {plain, answer("200 OK", std::string(10'001, 'x'), fresh)},
+        {ranged, answer("200 OK", "x", fresh)},
+        {posted, answer("200 OK", "x", fresh)},
+        {typed, answer("200 OK", "x", fresh)},
     };
-    for (const auto& [what, request, first] : cases) {
+    for (const auto& [request, first] : cases) {
         next = first;
         fetch(request);
         next = answer("200 OK", "new");
-        EXPECT_EQ(body(fetch(plain)), "new") << what;
-        EXPECT_THAT(requests.back(), Not(HasSubstr("If-None-Match"))) << what;
+        EXPECT_EQ(body(fetch(plain)), "new") << first;
+        EXPECT_THAT(requests.back(), Not(HasSubstr("If-None-Match"))) << first;
     }
     EXPECT_EQ(body(fetch(typed)), "x");  // these ones were kept
 
-    // A reload takes the place of what was kept, a change of the resource removes it, and a failure gives no old
-    // answer.
-    next = answer("200 OK", "1", fresh);
-    fetch(plain);
-    next = answer("200 OK", "2", fresh);
-    EXPECT_EQ(body(fetch(*http.makeUncached(), plain)), "2");
-    next = answer("200 OK", "3", fresh);
-    EXPECT_EQ(body(fetch(plain)), "2");
+    auto fetched = [&](platform::HttpSession& session, const std::string& answer) {
+        next = answer;
+        return body(fetch(session, plain));
+    };
+    fetched(http.shared(), answer("200 OK", "1", fresh));
+    EXPECT_EQ(fetched(*http.makeUncached(), answer("200 OK", "2", fresh)), "2");
+    EXPECT_EQ(fetched(http.shared(), answer("200 OK", "3", fresh)), "2");  // the reload has taken its place
     fetch(posted);
-    EXPECT_EQ(body(fetch(plain)), "3");
+    EXPECT_EQ(fetched(http.shared(), next), "3");  // it was changed
     clock.seconds = clock.seconds + 60;
-    next = answer("500 Broken", "");
-    EXPECT_EQ(fetch(plain).status, 500);
-    // One that says that another answer holds is asked again.
+    EXPECT_EQ(fetched(http.shared(), answer("500 Broken", "broken")), "broken");
     requests.clear();
-    next = "HTTP/1.1 304 Not Modified\r\nETag: \"b\"\r\n\r\n";
-    EXPECT_EQ(fetch(plain).status, 304);
+    fetched(http.shared(), "HTTP/1.1 304 Not Modified\r\nETag: \"b\"\r\n\r\n");  // of another answer
     EXPECT_THAT(requests, ElementsAre(HasSubstr("If-None-Match"), Not(HasSubstr("If-None-Match"))));
 }
 
 TEST_F(HttpTest, TrustsTheProfilesAuthorityWhileTheProfileIsTrusted) {
-    FILE* server = popen("exec 2>/dev/null; echo process $$; exec " VRX_PROGRAMS "/vrx-coverage-server --tls", "r");
-    auto printedAfter = [&](std::string_view name) {
-        std::array<char, 1000> line;
-        while (fgets(line.data(), line.size(), server))
-            if (std::string_view(line.data()).starts_with(name))
-                return std::string(trimmed(std::string_view(line.data()).substr(name.size())));
-        return std::string();
-    };
-    const std::string process = printedAfter("process ");
-    const std::string certificate = printedAfter("certificate ");
-    const std::string url = printedAfter("listening on ");
-    ASSERT_TRUE(url.starts_with("https://"));
+    const std::string program = VRX_PROGRAMS "/vrx-coverage-server --tls";
+    FILE* server = popen(("exec 2>/dev/null; echo process $$; exec " + program).c_str(), "r");
+    std::array<char, 1000> process, certificate, url;
+    ASSERT_EQ(fscanf(server, "process %999s control on %*s certificate %999s listening on %999s", process.data(),
+                     certificate.data(), url.data()),
+              3);
     setenv("https_proxy", "http://proxy.invalid:1", 1);  // not for this machine
-
-    EXPECT_THAT(error(get(url)), HasSubstr("certificate"));
-    writeFile(profile.path(), "[http]\nca_file = '" + certificate + "'");
+    EXPECT_THAT(error(get(url.data())), HasSubstr("certificate"));
+    writeFile(profile.path(), "[http]\nca_file = '" + std::string(certificate.data()) + "'");
     chmod(profile.path().c_str(), 0600);
-    EXPECT_EQ(get(url).status, 404);
+    EXPECT_EQ(get(url.data()).status, 404);
     chmod(profile.path().c_str(), 0666);
-    EXPECT_THAT(error(get(url)), HasSubstr("certificate"));
-    unsetenv("https_proxy");
-    kill(std::stoi(process), SIGTERM);
+    EXPECT_THAT(error(get(url.data())), HasSubstr("certificate"));
+    kill(std::stoi(process.data()), SIGTERM);
     pclose(server);
 }
 

@@ -31,10 +31,9 @@ public:
 
     const std::string& path() const { return path_; }
     std::string operator/(const std::string& name) const { return path_ + "/" + name; }
-    std::vector<std::string> names() const { return namesIn(path_); }
-    static std::vector<std::string> namesIn(const std::string& folder) {
+    std::vector<std::string> names() const {
         std::vector<std::string> names;
-        for (const auto& entry : std::filesystem::directory_iterator(folder)) names.push_back(entry.path().filename());
+        for (const auto& entry : std::filesystem::directory_iterator(path_)) names.push_back(entry.path().filename());
         std::sort(names.begin(), names.end());
         return names;
     }
