@@ -35,23 +35,12 @@ protected:
         {50, [this] { dismiss("DIVER"); }},
         {60.1, [this] { world.setLanguage("de_DE"); }},
         {70, [this] { world.unpair("RUNNER"); }},
-        {80,
-         [this] {
-             world.pair("NEWCOMER");
-             world.pair("RUNNER");
-         }},
-        {150.1, [this] { request([](VRXAgentProtocol& agent) { agent.scheduleOutreachWithReply([](bool) {}); }); }},
+        {80, [this] { world.pair("NEWCOMER", 80), world.pair("RUNNER", 80); }},
+        {150.1, [this] { world.request([](auto& agent) { agent.scheduleOutreachWithReply([](bool) {}); }); }},
     };
 
-    void request(void (*call)(VRXAgentProtocol&)) {
-        client = world.host.listener.connect(7, {{"com.orvane.private.vrxagent", true}});
-        client->request(call);
-    }
     void dismiss(const std::string& serialNumber) {
-        client = world.host.listener.connect(7, {{"com.orvane.private.vrxagent", true}});
-        client->request([serialNumber](VRXAgentProtocol& agent) {
-            agent.dismissFollowUpForSerialNumber(serialNumber, [](bool) {});
-        });
+        world.request([=](auto& agent) { agent.dismissFollowUpForSerialNumber(serialNumber, [](bool) {}); });
     }
     void runToDay(double day) {
         for (; nextEvent < events.size() && events[nextEvent].first <= day; ++nextEvent) {
@@ -90,12 +79,11 @@ protected:
     }
 
     AgentWorld world;
-    std::shared_ptr<sim::ServiceConnection> client;
     std::size_t nextEvent = 0;
 };
 
 TEST_F(FourHundredDays, ShowWhatRecordsAndClockCallFor) {
-    for (const char* watch : {"RUNNER", "DIVER"}) world.setPaired(watch, -500);
+    for (const char* watch : {"RUNNER", "DIVER"}) world.pair(watch, -500);
     for (const auto& [serialNumber, life] : lives) world.setRecord(serialNumber, {life.until, life.shownFrom});
     world.install();
     constexpr double aWhile = 0.02;  // within which what is due is done
@@ -122,7 +110,7 @@ TEST(AgentLife, LosesNothingWhenItIsKilledAtAnyMoment) {
         bool isOver = false;
         for (int pieces = 0; !isOver; ++pieces) {
             AgentWorld world;
-            world.setPaired("WATCH", -30);
+            world.pair("WATCH", -30);
             world.setRecord("PHONE", {20.5, 3});
             world.setRecord("WATCH", {20.5, 10});
             world.install();
@@ -161,7 +149,7 @@ TEST(AgentLife, TakesTheLastDayEasy) {
 // An offer that ended without ever being posted has its post tried for as long as the server asks for it.
 TEST(AgentLife, LooksSeldomForAnEndedOffer) {
     AgentWorld world;
-    world.setPaired("WATCH", -30);
+    world.pair("WATCH", -30);
     world.setRecord("PHONE", {1});
     world.install();
     world.runToDay(3);
@@ -170,7 +158,7 @@ TEST(AgentLife, LooksSeldomForAnEndedOffer) {
     EXPECT_LE(world.downloads() - before, 2u * 4 * 24);
     EXPECT_GE(world.downloads() - before, 2u * 4 * 23);
     EXPECT_THAT(world.shown(), IsEmpty());
-    world.removeRecord("PHONE");
+    world.host.files.remove("/data/W.PHONE.plist");
     world.runToDay(4.1);
     const int runs = world.runs("followuppost");
     world.runToDay(10);
