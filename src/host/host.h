@@ -22,6 +22,7 @@
 #include "host/main_loop.h"
 #include "host/queues.h"
 #include "host/system_log.h"
+#include "host/uuid.h"
 #include "platform/bundle_lookup.h"
 #include "platform/platform.h"
 #include "platform/service_listener.h"
@@ -77,6 +78,7 @@ private:
     AccountStore accounts_;
     Clock clock_;
     HttpSessions http_;
+    UuidSource uuids_;
 };
 
 }  // namespace vrx::host

@@ -24,7 +24,8 @@ Host::Host()
                 .queues = &queues,
                 .serviceListenerFactory = &listener,
                 .systemLog = &log,
-                .telephonyNetworkInfo = &telephony}),
+                .telephonyNetworkInfo = &telephony,
+                .uuidSource = &uuids}),
       scope_(platform) {}
 
 Host::~Host() {

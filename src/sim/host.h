@@ -28,6 +28,7 @@
 #include "sim/queues.h"
 #include "sim/service_listener.h"
 #include "sim/system_log.h"
+#include "sim/uuid.h"
 
 namespace vrx::sim {
 
@@ -64,6 +65,7 @@ public:
     codec::Json json;
     codec::PropertyList propertyList;
     codec::Digest digest;
+    UuidSource uuids;
     Process process{queues, defaults, activities, notifications};
     platform::Platform platform;
 
