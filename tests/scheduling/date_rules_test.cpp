@@ -77,7 +77,6 @@ TEST(PostDate, FollowsTheRule) {
         {"without a date, an end to come is none", {{-9, {}, 5}, {0, 10, 300}}, 10},
         {"no activation, the record's day to come", {{{}, 4, 300}}, 4},
         {"no activation, the record's day passed", {{{}, -4, 300}}, absent},
-        {"no activation and no day", {{{}, {}, 300}}, absent},
         {"no end", {{-1, 3, {}}}, absent},
         {"no end takes no date away", {{0, 10, 300}, {-1, 3, {}}}, 10},
     };
@@ -109,7 +108,7 @@ TEST(RefreshDate, FollowsTheRule) {
     for (const Case& c : cases) expectDate(c, nextRefreshDate(infos(c.devices), true, {days(1), days(2)}, now));
 }
 
-TEST(RefreshDate, BeginsADayFromNowWhenTheCallIsNotInitial) {
+TEST(RefreshDate, BeginsADayFromNowUnlessTheCallIsInitial) {
     sim::Host host;
     const Case cases[] = {
         {"no device", {}, 1},
@@ -118,10 +117,8 @@ TEST(RefreshDate, BeginsADayFromNowWhenTheCallIsNotInitial) {
         {"ended", {{-9, {}, -3}}, -3},
     };
     for (const Case& c : cases) expectDate(c, nextRefreshDate(infos(c.devices), false, {days(1), days(2)}, now));
-}
 
-TEST(RefreshDate, CountsInDaysOfTheirSetLength) {
-    sim::Host host;
+    // In days of their set length.
     expectDate({"hours", {}, 0.5 / 24}, nextRefreshDate(infos({{-3, {}, 10.5 / 24}}), true, {days(1.0 / 24), {}}, now));
     expectDate({"no length", {}, absent}, nextRefreshDate(infos({{-3, {}, 10.5}}), true, {Duration(0), {}}, now));
 }
