@@ -36,6 +36,8 @@ public:
                                                   bool allowForcePost);
 
     void _clearFollowUpWithDevices(const DeviceList& devices);
+    // A dismissal always names a device: without a serial number it would take away the older layout's item, and have
+    // nothing to remember.
     void dismissFollowUpForSerialNumber(const std::string& serialNumber) override;
     std::size_t pendingFollowUpCount() override;
     // Turns the one item of the older single-device layout into the device's own or, when its record was not found,

@@ -160,8 +160,10 @@ TEST_F(FollowUpTest, AnItemSaysWhatTheRecordOffers) {
         VRXFollowUp().postFollowUpWithDeviceInfo(info("B", offer(), type));
         EXPECT_EQ(pending()[1].targetBundleIdentifier.value_or("none"), target);
     }
-    const double centuries = 2e6;  // into the year 7501
-    for (const auto& [left, badge, style] : {std::tuple(centuries, 3e6, 1U), {centuries, 1e6, 16U}, {0, 14, 16U}}) {
+    for (const auto& [left, badge, style] : {std::tuple(2.9e6, 3e6, 1U),
+                                             {2.9e6, 2.9e6, 16U},
+                                             {10, 7, 16U},
+                                             {0, 14, 16U}}) {  // at first nearly the year 10000
         item = {};
         VRXFollowUp()._setupFollowUpItem(item, info("A", offer(left, badge)));
         EXPECT_EQ(item.displayStyle, style) << left;
@@ -194,12 +196,13 @@ TEST_F(FollowUpTest, PostsWhatIsDue) {
 TEST_F(FollowUpTest, RefreshesRemovalsFirstThenUpdatesThenReposts) {
     // Wrong user infos and the item of the older layout belong to no device.
     const FollowUpItem odd{.uniqueIdentifier = "odd", .userInfo = {{"FollowupSerialNumber", 5}}};
-    pending() = {odd, {.uniqueIdentifier = client}, itemOf("A"), itemOf("C"), itemOf("D"), itemOf("E")};
+    pending() = {odd, {.uniqueIdentifier = client}, itemOf("A"), itemOf("C"), itemOf("D"), itemOf("E"), itemOf("C")};
+    pending().back().uniqueIdentifier = "twin";
     host.defaults.set(dismissedSerialNumberHashesKey, Array{sha256Hash("B")});
     const auto ended = info("E", offer(0)), unknown = info({}, {}), c = info("C", offer());
     EXPECT_THAT(VRXFollowUp().refreshFollowupWithDeviceInfos({b, c, ended, unknown, a}, true, true),
                 ElementsAre(c, a, b));
-    EXPECT_EQ(outcome(), "list, clear E D, post C, post A, post B -> odd com.orvane.Vireo A C B");
+    EXPECT_EQ(outcome(), "list, clear E D, post C, post A, post B -> odd com.orvane.Vireo A C twin B");
     EXPECT_EQ(host.log.messages().back(), "Reposted follow-up: success");
 
     // A refresh of one device leaves the others alone, and posts nothing that is not there.
@@ -212,14 +215,14 @@ TEST_F(FollowUpTest, RefreshesRemovalsFirstThenUpdatesThenReposts) {
     host.followUps.fail(Request::List);
     EXPECT_THAT(VRXFollowUp().refreshFollowupWithDeviceInfos({a, ended}), IsEmpty());
     EXPECT_THAT(VRXFollowUp().refreshFollowupWithDeviceInfos({}), IsEmpty());
-    EXPECT_EQ(outcome(), "list, post A, list, list, list, clear E, list, clear A B C -> odd com.orvane.Vireo");
+    EXPECT_EQ(outcome(), "list, post A, list, list, list, clear E, list, clear A B C -> odd com.orvane.Vireo twin");
 
     DeviceInfoList thousand;
     for (int i = 0; i < 1000; ++i) thousand.push_back(info(std::to_string(i), offer()));
     for (const auto& one : thousand) pending().push_back(itemOf(*one->device()->serialNumber()));
     EXPECT_EQ(VRXFollowUp().refreshFollowupWithDeviceInfos(thousand), thousand);
-    EXPECT_EQ(host.followUps.asked().size(), 1001u) << "one listing";
-    EXPECT_EQ(VRXFollowUp().pendingFollowUpCount(), 1002u);
+    EXPECT_EQ(host.followUps.asked().size(), 1002u) << "one listing, and one clearing of the twin's device";
+    EXPECT_EQ(VRXFollowUp().pendingFollowUpCount(), 1003u);
 }
 
 TEST_F(FollowUpTest, RemembersWhatWasDismissed) {
