@@ -56,14 +56,22 @@ std::vector<std::string> ErrorLog::take() {
 }
 
 std::string AgentLocale::preferredLocaleIdentifier() const {
-    std::optional<std::string> found;
-    if (!profile_.facts()->language)
-        database_.read(
-            [&](host::Connection& connection) { found = host::hostFact(connection, host::facts::language); });
+    if (profile_.facts()->language) return profile_.preferredLocaleIdentifier();
+    const std::optional<std::string> found = host::hostFact(database_, host::facts::language);
     return found ? *found : profile_.preferredLocaleIdentifier();
 }
 
-AgentView::AgentView(const std::string& home, const std::string& profile)
+namespace {
+
+std::string agentProfile(const std::optional<std::string>& named, host::Database& database) {
+    if (named) return *named;
+    const std::optional<std::string> told = host::hostFact(database, host::facts::profile);
+    return told ? *told : wire::findLocations().profile.path;
+}
+
+}  // namespace
+
+AgentView::AgentView(const std::string& home, const std::optional<std::string>& profile)
     : home_(home),
       facilities_{.systemLog = &errors_},
       platform_(facilities_),
@@ -73,7 +81,7 @@ AgentView::AgentView(const std::string& home, const std::string& profile)
       stored_(database_),
       defaults_(stored_),
       followUps_(database_),
-      profile_(profile),
+      profile_(agentProfile(profile, database_)),
       locale_(profile_, database_),
       accounts_(profile_, home),
       clock_(profile_),
@@ -111,8 +119,7 @@ void AgentView::use(platform::Queues* queues, platform::HttpSessions* sessions) 
 CommandLine::Verb looking(const wire::LocationOverrides& places, std::shared_ptr<std::optional<std::string>> profile,
                           std::function<Outcome(AgentView&)> verb) {
     return [&places, profile = std::move(profile), verb = std::move(verb)] {
-        const wire::Locations found = wire::findLocations({.home = places.home, .profile = *profile});
-        AgentView view(absolutePath(found.home.path), found.profile.path);
+        AgentView view(absolutePath(wire::findLocations(places).home.path), *profile);
         const std::string database = Home::databasePath(view.home());
         std::error_code error;
         if (!std::filesystem::exists(database, error)) return notReachable("there is no agent's database " + database);

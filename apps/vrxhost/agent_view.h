@@ -78,8 +78,9 @@ private:
 
 class AgentView {
 public:
-    // The home may be missing, as may all in it.
-    AgentView(const std::string& home, const std::string& profile);
+    // The home may be missing, as may all in it. The profile is the one that the agent has told of in its database,
+    // unless another is named.
+    AgentView(const std::string& home, const std::optional<std::string>& profile);
 
     // Reads the database from now on, if it can. Until then the registered settings hold, and nothing is pending.
     platform::MaybeError open();

@@ -73,7 +73,9 @@ Check skipped(std::string finding) {
 class Examination {
 public:
     Examination(AgentView& view, wire::Locations places, platform::Duration limit)
-        : view_(view), places_(std::move(places)), limit_(limit) {}
+        : view_(view), places_(std::move(places)), limit_(limit) {
+        if (view_.profile().path() != places_.profile.path) places_.profile = {view_.profile().path(), "the agent"};
+    }
 
     std::vector<Check> run() {
         add("home", home());
@@ -112,7 +114,7 @@ private:
     Check activities();
 
     AgentView& view_;
-    const wire::Locations places_;
+    wire::Locations places_;
     const platform::Duration limit_;
     std::vector<Check> checks_;
     bool isDatabaseReadable_ = false;
@@ -337,7 +339,7 @@ void addDoctorVerb(CommandLine& line, const wire::LocationOverrides& places) {
     CLI::App* verb = line.add("doctor", "Checks what an agent needs, and tells what to do next", [&places, options] {
         const wire::Locations found =
             wire::findLocations({.home = places.home, .profile = options->profile, .socket = options->socket});
-        AgentView view(absolutePath(found.home.path), found.profile.path);
+        AgentView view(absolutePath(found.home.path), options->profile);
         return report(Examination(view, found, platform::Duration(options->limit)).run());
     });
     addProfileOption(verb, options->profile);

@@ -3,6 +3,7 @@
 #include <unicode/unum.h>
 
 #include <memory>
+#include <mutex>
 #include <string_view>
 
 #include "codec/unicode.h"
@@ -41,14 +42,14 @@ bool isOfEnvironment(const Format& format, const std::string& locale) {
     return language != languageOf(locale.c_str()) && language == languageOf(uloc_getDefault());
 }
 
-}  // namespace
-
-std::string decimalText(std::uint64_t number, const std::string& locale) {
-    std::string digits = std::to_string(number);
+Format formatFor(const std::string& locale) {
     Format format = openFormat(locale.empty() ? commonStyle : locale.c_str());
-    if (format && isOfEnvironment(format, locale)) format = openFormat(commonStyle);
-    if (!format) return digits;
+    return format && isOfEnvironment(format, locale) ? openFormat(commonStyle) : std::move(format);
+}
 
+std::string text(const Format& format, std::uint64_t number) {
+    std::string digits = std::to_string(number);
+    if (!format) return digits;
     char16_t units[128];  // 20 digits, in some scripts two units each, and separators
     UErrorCode status = U_ZERO_ERROR;
     const std::int32_t length =
@@ -56,6 +57,26 @@ std::string decimalText(std::uint64_t number, const std::string& locale) {
                            static_cast<std::int32_t>(digits.size()), units, 128, nullptr, &status);
     if (U_FAILURE(status)) return digits;
     return utf8FromUtf16({units, static_cast<std::size_t>(length)}).value_or(digits);
+}
+
+// The format that was used last: opening one takes ten times as long as using it, and it is nearly always the same
+// language again.
+struct LastFormat {
+    std::mutex mutex;
+    std::string locale;
+    Format format;
+};
+
+}  // namespace
+
+std::string decimalText(std::uint64_t number, const std::string& locale) {
+    static LastFormat& last = *new LastFormat;  // never taken down: threads may use it while the process ends
+    std::lock_guard lock(last.mutex);
+    if (!last.format || last.locale != locale) {
+        last.format = formatFor(locale);
+        last.locale = locale;
+    }
+    return text(last.format, number);
 }
 
 }  // namespace vrx::codec
