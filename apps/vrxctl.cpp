@@ -193,6 +193,17 @@ Outcome all(AgentConnection& agent, VRXWarrantyLookupPolicy policy, bool updateF
     });
 }
 
+Outcome outreach(AgentConnection& agent) {
+    return outcomeOf(agent, agent.scheduleOutreachWithReply(), [](bool isScheduled) {
+        if (!isScheduled)
+            return failed(ExitCode::NoAnswer, "the agent schedules no outreach",
+                          "Use a vrxctl of the agent's own release.");
+        return Outcome{
+            .document = {{"scheduled", true}},
+            .text = "An outreach begins in a second, once the network is there; vrxhost activities shows it.\n"};
+    });
+}
+
 // The agent says that it has done so, whatever became of it.
 Outcome dismiss(AgentConnection& agent, const std::string& serialNumber) {
     return outcomeOf(agent, agent.dismissFollowUpForSerialNumber(serialNumber), [&](bool isDone) {
@@ -286,6 +297,7 @@ int run(int argc, const char* const* argv) {
              asking([&](AgentConnection& agent) { return dismiss(agent, *options.serialNumber); }))
         ->add_option("SERIAL", options.serialNumber, "Serial number")
         ->required();
+    line.add("outreach", "Has the agent look for offers now", asking(outreach));
     line.add("web-url", "Shows the web-flow URL that a tester has set", asking(webUrl));
     return line.run(argc, argv);
 }

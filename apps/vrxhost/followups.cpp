@@ -37,63 +37,64 @@ Outcome failedWith(const char* kind, const platform::Error& error) {
     return outcome;
 }
 
-// How an item looks at a moment.
-class Shown {
-public:
-    Shown(const FollowUpItem& item, Date now, Duration day) : item_(item), userInfo_(item.userInfo) {
-        if (!item.expirationDate) return;
-        isExpired_ = *item.expirationDate <= now;
-        const double days = (*item.expirationDate - now) / day;
-        if (!std::isfinite(days)) return;
-        const bool roundsUp = userInfo_[platform::DaysLeftRoundsUpKey].asBool().value_or(false);
-        const double whole = std::max(0.0, roundsUp ? std::ceil(days) : std::floor(days));
-        daysLeft_ = platform::clampedInteger(whole);
-        if (!isExpired_) nextChange_ = *item.expirationDate - std::max(0.0, roundsUp ? whole - 1 : whole) * day;
-    }
-
-    bool isExpired() const { return isExpired_; }
-    // Of the days that the keys of the user info count; nothing without an expiration date.
-    std::optional<std::int64_t> daysLeft() const { return daysLeft_; }
-    // When there will be fewer days left, or it expires.
-    std::optional<Date> nextChange() const { return nextChange_; }
-    // The item of the layout that knew one device.
-    bool isLegacy() const { return item_.uniqueIdentifier == followUpUniqueIdentifier(std::nullopt); }
-    // An item is set up without a badge first, when the end of the offer is far, and keeps that bit when it gets one.
-    bool hasBadge() const { return (item_.displayStyle & platform::follow_up_style::withRowBadge) != 0; }
-    std::optional<std::string> serialNumber() const {
-        const std::string* serialNumber = serialNumberOfItem(item_);
-        return serialNumber ? std::optional(*serialNumber) : std::nullopt;
-    }
-
-    // The text that the settings app makes of the days left, if the user info says how.
-    std::optional<std::string> relativeText(const platform::Locale& locale) const {
-        if (!daysLeft_) return std::nullopt;
-        if (*daysLeft_ <= 1) return text(platform::OneDayLeftTextKey);
-        const auto format = text(platform::DaysLeftFormatKey);
-        if (!format) return std::nullopt;
-        return platform::filled(*format, {locale.decimalText(static_cast<std::uint64_t>(*daysLeft_))});
-    }
-
-private:
-    std::optional<std::string> text(std::string_view key) const {
-        const std::string* text = userInfo_[key].asString();
-        return text ? std::optional(*text) : std::nullopt;
-    }
-
-    const FollowUpItem& item_;
-    const Value userInfo_;
-    bool isExpired_ = false;
-    std::optional<std::int64_t> daysLeft_;
-    std::optional<Date> nextChange_;
-};
-
-std::optional<std::string> deviceName(const host::DeviceProfile& profile,
-                                      const std::optional<std::string>& serialNumber) {
-    if (!serialNumber) return std::nullopt;
+std::optional<std::string> deviceName(const host::DeviceProfile& profile, const std::string& serialNumber) {
     if (profile.string("SerialNumber") == serialNumber) return profile.string("UserAssignedDeviceName");
     for (const platform::PairedWatch& watch : profile.watches())
         if (watch.serialNumber == serialNumber) return watch.name ? watch.name : watch.localizedModelName;
     return std::nullopt;
+}
+
+// How an item looks at a moment.
+struct Shown {
+    std::optional<std::string> serialNumber{};
+    std::optional<std::string> deviceName{};
+    bool hasBadge = false;
+    bool isExpired = false;
+    bool isLegacy = false;                      // of the older layout, which knew one device
+    std::optional<std::int64_t> daysLeft{};     // nothing without an expiration date
+    std::optional<std::string> relativeText{};  // what the settings app makes of them, if the user info says how
+    std::optional<Date> nextChange{};           // when fewer days will be left, or it expires
+
+    bool differsFromFooter(const FollowUpItem& item) const {
+        return relativeText && relativeText != item.informativeFooterText;
+    }
+};
+
+std::optional<std::string> textIn(const Value& userInfo, std::string_view key) {
+    const std::string* text = userInfo[key].asString();
+    return text ? std::optional(*text) : std::nullopt;
+}
+
+std::optional<std::string> relativeText(const Value& userInfo, std::int64_t daysLeft, const platform::Locale& locale) {
+    if (daysLeft <= 1) return textIn(userInfo, platform::OneDayLeftTextKey);
+    const auto format = textIn(userInfo, platform::DaysLeftFormatKey);
+    if (!format) return std::nullopt;
+    return platform::filled(*format, {locale.decimalText(static_cast<std::uint64_t>(daysLeft))});
+}
+
+void countDays(Shown& shown, const FollowUpItem& item, Date now, Duration day, const platform::Locale& locale) {
+    if (!item.expirationDate) return;
+    shown.isExpired = *item.expirationDate <= now;
+    const double days = (*item.expirationDate - now) / day;
+    if (!std::isfinite(days)) return;
+    const Value userInfo(item.userInfo);
+    const bool roundsUp = userInfo[platform::DaysLeftRoundsUpKey].asBool().value_or(false);
+    const double whole = std::max(0.0, roundsUp ? std::ceil(days) : std::floor(days));
+    shown.daysLeft = platform::clampedInteger(whole);
+    shown.relativeText = relativeText(userInfo, *shown.daysLeft, locale);
+    if (!shown.isExpired) shown.nextChange = *item.expirationDate - std::max(0.0, roundsUp ? whole - 1 : whole) * day;
+}
+
+Shown shownAt(Date now, const FollowUpItem& item, Duration day, const host::DeviceProfile& profile) {
+    Shown shown;
+    if (const std::string* serialNumber = serialNumberOfItem(item)) {
+        shown.serialNumber = *serialNumber;
+        shown.deviceName = deviceName(profile, *serialNumber);
+    }
+    shown.hasBadge = (item.displayStyle & platform::follow_up_style::withRowBadge) != 0;
+    shown.isLegacy = item.uniqueIdentifier == followUpUniqueIdentifier(std::nullopt);
+    countDays(shown, item, now, day, profile);
+    return shown;
 }
 
 template <class T>
@@ -101,48 +102,46 @@ Value valueOf(const std::optional<T>& value) {
     return value ? Value(*value) : Value();
 }
 
-// The listing, and when it will look different by itself.
-struct Listing {
-    Outcome outcome;
-    std::optional<Date> nextChange{};
-};
-
-void append(Listing& listing, Array& documents, const FollowUpItem& item, const Shown& shown,
-            const host::DeviceProfile& profile) {
-    const auto serialNumber = shown.serialNumber();
-    const auto name = deviceName(profile, serialNumber);
-    const auto relativeText = shown.relativeText(profile);
+Value documentOf(const FollowUpItem& item, const Shown& shown) {
     const auto expires = item.expirationDate ? codec::isoTextFromDate(*item.expirationDate) : std::nullopt;
-    const bool differs = relativeText && relativeText != item.informativeFooterText;
-    documents.emplace_back(Dictionary{{"item", host::followUpDocument(item)},
-                                      {"derived", Dictionary{{"deviceName", valueOf(name)},
-                                                             {"serialNumber", valueOf(serialNumber)},
-                                                             {"badge", shown.hasBadge()},
-                                                             {"expired", shown.isExpired()},
-                                                             {"expires", valueOf(expires)},
-                                                             {"legacy", shown.isLegacy()},
-                                                             {"daysLeft", valueOf(shown.daysLeft())},
-                                                             {"relativeText", valueOf(relativeText)},
-                                                             {"differsFromFooter", differs}}}});
+    return Dictionary{{"item", host::followUpDocument(item)},
+                      {"derived", Dictionary{{"deviceName", valueOf(shown.deviceName)},
+                                             {"serialNumber", valueOf(shown.serialNumber)},
+                                             {"badge", shown.hasBadge},
+                                             {"expired", shown.isExpired},
+                                             {"expires", valueOf(expires)},
+                                             {"legacy", shown.isLegacy},
+                                             {"daysLeft", valueOf(shown.daysLeft)},
+                                             {"relativeText", valueOf(shown.relativeText)},
+                                             {"differsFromFooter", shown.differsFromFooter(item)}}}};
+}
 
-    std::string& text = listing.outcome.text;
-    text += printable(item.title.value_or("(no title)")) + (shown.isExpired() ? "  [expired]" : "") +
-            (shown.isLegacy() ? "  [legacy]" : "") + "\n";
+std::string textOf(const FollowUpItem& item, const Shown& shown) {
+    std::string text = printable(item.title.value_or("(no title)")) + (shown.isExpired ? "  [expired]" : "") +
+                       (shown.isLegacy ? "  [legacy]" : "") + "\n";
     auto line = [&](const std::string& field, const std::optional<std::string>& content, const char* remark = "") {
         text +=
             "  " + field + std::string(16 - field.size(), ' ') + printable(content.value_or("none")) + remark + "\n";
     };
-    line("Device", serialNumber ? name.value_or("(unknown)") + ", " + *serialNumber : "none is named");
+    line("Device",
+         shown.serialNumber ? shown.deviceName.value_or("(unknown)") + ", " + *shown.serialNumber : "none is named");
     line("Text", item.informativeFooterText);
-    line("Days left text", relativeText, differs ? "  (differs from the text)" : "");
-    line("Badge", shown.hasBadge() ? "yes" : "no");
+    line("Days left text", shown.relativeText, shown.differsFromFooter(item) ? "  (differs from the text)" : "");
+    line("Badge", shown.hasBadge ? "yes" : "no");
     line("Expires", item.expirationDate ? platform::describe(*item.expirationDate) : "never");
     line("Target", item.targetBundleIdentifier);
     line("Extension", item.extensionIdentifier);
     for (const platform::FollowUpAction& action : item.actions)
         line("Action", action.label.value_or("(no label)") + (action.url ? ", " + *action.url : ""));
     line("Identifier", item.uniqueIdentifier);
+    return text;
 }
+
+// The listing, and when it will look different by itself.
+struct Listing {
+    Outcome outcome;
+    std::optional<Date> nextChange{};
+};
 
 Listing list(Home& home, const host::DeviceProfile& profile) {
     const auto items = home.followUps().makeController(followUpClientIdentifier())->pendingFollowUpItems();
@@ -154,10 +153,11 @@ Listing list(Home& home, const host::DeviceProfile& profile) {
     Listing listing;
     Array documents;
     for (const FollowUpItem& item : *items) {
-        const Shown shown(item, now, day);
-        append(listing, documents, item, shown, profile);
-        if (const auto change = shown.nextChange(); change && change < listing.nextChange.value_or(Date::max()))
-            listing.nextChange = change;
+        const Shown shown = shownAt(now, item, day, profile);
+        documents.emplace_back(documentOf(item, shown));
+        listing.outcome.text += textOf(item, shown);
+        if (shown.nextChange && *shown.nextChange < listing.nextChange.value_or(Date::max()))
+            listing.nextChange = shown.nextChange;
     }
     listing.outcome.document = {{"followUps", documents}};
     if (items->empty()) listing.outcome.text = "No follow-up is pending.\n";

@@ -1,4 +1,5 @@
-// vrxhost: looks into the agent's home beside the agent, and changes its settings, for testers.
+// vrxhost: looks into the agent's home beside the agent, explains what it finds, changes settings and fires activities,
+// for testers.
 #include "verbs.h"
 
 int main(int argc, char** argv) {
@@ -9,5 +10,9 @@ int main(int argc, char** argv) {
     addDefaultsVerbs(line, places);
     addCacheVerb(line, places);
     addFollowUpVerbs(line, places);
+    addActivitiesVerb(line, places);
+    addFireVerb(line, places);
+    addWhyVerb(line, places);
+    addDoctorVerb(line, places);
     return line.run(argc, argv);
 }

@@ -10,5 +10,9 @@ namespace vrx::apps {
 void addDefaultsVerbs(CommandLine& line, const wire::LocationOverrides& places);
 void addCacheVerb(CommandLine& line, const wire::LocationOverrides& places);
 void addFollowUpVerbs(CommandLine& line, const wire::LocationOverrides& places);
+void addActivitiesVerb(CommandLine& line, const wire::LocationOverrides& places);
+void addFireVerb(CommandLine& line, const wire::LocationOverrides& places);
+void addWhyVerb(CommandLine& line, const wire::LocationOverrides& places);
+void addDoctorVerb(CommandLine& line, const wire::LocationOverrides& places);
 
 }  // namespace vrx::apps

@@ -209,11 +209,13 @@ std::optional<Date> VRXWarranty::_dateWithEpochNumber(const Value& number) {
 }
 
 std::uint32_t VRXWarranty::daysEligible() const {
-    double day = Platform::current().defaultsStore().number("OneDayInterval");
-    if (!(day > 0)) day = secondsOfDay;
-    std::optional<Date> until = qxOfferEligibleUntil();
-    double seconds = until ? (*until - Platform::current().clock().now()).count() : 0;
-    double wholeDays = std::ceil(seconds / day);
+    Duration day(Platform::current().defaultsStore().number("OneDayInterval"));
+    return daysEligible(qxOfferEligibleUntil(), day, Platform::current().clock().now());
+}
+
+std::uint32_t VRXWarranty::daysEligible(const std::optional<Date>& until, Duration day, Date now) {
+    if (!(day > Duration(0))) day = Duration(secondsOfDay);
+    double wholeDays = std::ceil(until ? (*until - now) / day : 0);
     constexpr double most = std::numeric_limits<std::uint32_t>::max();
     return wholeDays > 0 ? static_cast<std::uint32_t>(std::min(wholeDays, most)) : 0;
 }

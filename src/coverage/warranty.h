@@ -208,6 +208,8 @@ public:
 
     // Whole days until the offer ends, rounded up: 1 in its last 24 hours, 0 once it has ended or when it has no end.
     std::uint32_t daysEligible() const;
+    // The same of an offer that ends at a date, seen from now. A day that does not last longer than 0 lasts 86400 s.
+    static std::uint32_t daysEligible(const std::optional<Date>& until, Duration day, Date now);
     // The texts that count those days: the singular as the server sent it for one day or none, else the plural format
     // with the number in the user's locale; null when the format is no string.
     Value qxLocalizedOfferDesc() const;

@@ -13,6 +13,7 @@
 #include "platform/locale.h"
 #include "platform/log.h"
 #include "platform/platform.h"
+#include "platform/process_lifecycle.h"
 #include "platform/property_list.h"
 #include "platform/queue.h"
 #include "platform/text.h"
@@ -93,8 +94,12 @@ void VRXWarrantyDownloader::downloadWarrantyForSerialNumber(const std::optional<
     log(Level::Default, "%s: %{private}@",
         "-[VRXWarrantyDownloader downloadWarrantyForSerialNumber:completionHandler:]", serialNumber);
     Platform::current().defaultsStore().remove(serverVersionCacheKey);  // so that the versions are negotiated afresh
+    // The process doesn't exit before the completion has run.
+    Completion completeInFlight =
+        [work = Platform::current().processLifecycle().beginWork(), completion = std::move(completionHandler)](
+            bool success, std::shared_ptr<VRXWarranty> warranty) mutable { completion(success, std::move(warranty)); };
     auto continueIfSupported = [self = shared_from_this(), serialNumber,
-                                completion = std::move(completionHandler)](bool isSupported) mutable {
+                                completion = std::move(completeInFlight)](bool isSupported) mutable {
         if (!isSupported) {
             log(Level::Default, "Warranty download skipped server due to server version");
             completion(false, nullptr);

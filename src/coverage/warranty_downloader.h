@@ -1,5 +1,6 @@
-// Fetches one device's coverage record, caches it with its metadata and hands it over. Made for one download and kept
-// alive by it; any thread may start it.
+// Fetches devices' coverage records, caches them with their metadata and hands them over. Made for one piece of work
+// and kept alive by its downloads, which run side by side; any thread may start one. The process doesn't exit while one
+// runs.
 #pragma once
 
 #include <cstdint>

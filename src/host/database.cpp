@@ -26,6 +26,20 @@ constexpr const char* steps[] = {
     // Follow-ups, in the order of their first posting: the item as a binary property list.
     "CREATE TABLE follow_ups (position INTEGER PRIMARY KEY, client TEXT NOT NULL, identifier TEXT NOT NULL, "
     "item NOT NULL, UNIQUE (client, identifier))",
+    // Facts that the host keeps from one process to the next; the background activities that are scheduled; the last
+    // run
+    // of each activity; what testers ask the agent to fire.
+    "CREATE TABLE host_facts (name TEXT PRIMARY KEY, value TEXT NOT NULL) WITHOUT ROWID;"
+    "CREATE TABLE activities ("
+    "    generation INTEGER PRIMARY KEY, identifier TEXT NOT NULL UNIQUE,"
+    "    delay INTEGER NOT NULL, grace_period INTEGER NOT NULL, requires_network INTEGER NOT NULL,"
+    "    due_boot TEXT NOT NULL, due_since_boot REAL NOT NULL, due_wall REAL NOT NULL, wait REAL NOT NULL,"
+    "    is_carried_over INTEGER NOT NULL, deferrals INTEGER NOT NULL);"
+    "CREATE TABLE activity_runs ("
+    "    identifier TEXT PRIMARY KEY, generation INTEGER NOT NULL, began REAL NOT NULL, ended REAL, outcome INTEGER"
+    ") WITHOUT ROWID;"
+    "CREATE TABLE activity_requests ("
+    "    number INTEGER PRIMARY KEY AUTOINCREMENT, identifier TEXT NOT NULL, answer INTEGER)",
 };
 
 void check(int result, sqlite3* connection) {
@@ -87,6 +101,19 @@ void createPrivately(const std::string& path) {
         throw DatabaseError(SQLITE_CANTOPEN, systemError("create", path, errno).text);
 }
 
+// For looking: where a log lies beside the database, the index of the two is only read, or made in memory when nobody
+// keeps it; where none does, no index is needed.
+std::string lookingUri(const std::string& path) {
+    std::string uri = "file:";
+    for (const char character : path) {
+        if (character == '%' || character == '?' || character == '#')
+            uri.append(character == '%' ? "%25" : character == '?' ? "%3f" : "%23");
+        else
+            uri.push_back(character);
+    }
+    return uri + (FileIdentity::of(path + "-wal") ? "?readonly_shm=1" : "?immutable=1");
+}
+
 }  // namespace
 
 const Database::Schema Database::currentSchema = steps;
@@ -146,9 +173,10 @@ std::span<const std::uint8_t> Statement::bytes(int column) const {
     return {start, start ? static_cast<std::size_t>(sqlite3_column_bytes(statement_, column)) : 0};
 }
 
-Connection::Connection(const std::string& path, std::chrono::milliseconds busyLimit) {
-    const int result =
-        sqlite3_open_v2(path.c_str(), &connection_, SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX, nullptr);
+Connection::Connection(const std::string& path, std::chrono::milliseconds busyLimit, bool isLooking) {
+    const int flags = isLooking ? SQLITE_OPEN_READONLY | SQLITE_OPEN_URI : SQLITE_OPEN_READWRITE;
+    const int result = sqlite3_open_v2((isLooking ? lookingUri(path) : path).c_str(), &connection_,
+                                       flags | SQLITE_OPEN_NOMUTEX, nullptr);
     try {
         check(result, connection_);
         sqlite3_extended_result_codes(connection_, 1);
@@ -190,6 +218,11 @@ std::int64_t Connection::integer(const char* sql) {
     return result;
 }
 
+void Connection::checkSoundness() {
+    Statement check(connection_, "PRAGMA quick_check(1)");
+    if (!check.step() || check.text(0) != "ok") throw DatabaseError(SQLITE_CORRUPT, std::string(check.text(0)));
+}
+
 void Connection::endStatements() {
     for (sqlite3_stmt* used = sqlite3_next_stmt(connection_, nullptr); used;
          used = sqlite3_next_stmt(connection_, used))
@@ -221,22 +254,21 @@ Connection::CommitMark Connection::commitMark() {
 
 // The connections of one opening. Reading has one of its own, so that it does not wait while a write waits.
 struct Database::Opening {
-    Opening(const std::string& path, std::chrono::milliseconds busyLimit)
-        : path(path), busyLimit(busyLimit), writer(path, busyLimit) {}
+    Opening(const std::string& path, std::chrono::milliseconds busyLimit) : path(path), busyLimit(busyLimit) {}
 
     ~Opening() {
         // Closing the last connection takes the -wal file away by its name, which is not ours any more when another
         // database has come to stand there.
         if (FileIdentity::of(path) == file) return;
-        writer.keepLogAtClose(true);
-        if (reader) reader->keepLogAtClose(true);
+        for (auto* connection : {&writer, &reader})
+            if (*connection) (*connection)->keepLogAtClose(true);
     }
 
     // The database is sound: it is opened for reading, too, and is tidied up when it is closed.
     void passed() {
         reader.emplace(path, busyLimit);
         reader->findIndexHeader();
-        for (Connection* connection : {&writer, &*reader}) connection->keepLogAtClose(false);
+        for (auto* connection : {&writer, &reader}) (*connection)->keepLogAtClose(false);
         file = FileIdentity::of(path);
         wal = FileIdentity::of(path + "-wal");
         shm = FileIdentity::of(path + "-shm");
@@ -244,14 +276,14 @@ struct Database::Opening {
 
     const std::string path;
     const std::chrono::milliseconds busyLimit;
-    Connection writer;
+    std::optional<Connection> writer;  // none for looking
     std::optional<Connection> reader;
     FileIdentity file, wal, shm;
     std::uint64_t number = 0;
 };
 
-Database::Database(std::string path, Schema schema, std::chrono::milliseconds busyLimit)
-    : path_(std::move(path)), schema_(schema), busyLimit_(busyLimit) {}
+Database::Database(std::string path, Schema schema, std::chrono::milliseconds busyLimit, bool isLooking)
+    : path_(std::move(path)), schema_(schema), busyLimit_(busyLimit), isLooking_(isLooking) {}
 
 Database::~Database() = default;
 
@@ -288,6 +320,7 @@ void Database::leaveReplacedFile() {
 }
 
 std::shared_ptr<Database::Opening> Database::openChecked() {
+    if (isLooking_) return openToLook();
     try {
         return openOnce();
     } catch (const DatabaseError& error) {
@@ -303,25 +336,37 @@ std::shared_ptr<Database::Opening> Database::openChecked() {
 std::shared_ptr<Database::Opening> Database::openOnce() const {
     createPrivately(path_);
     auto opening = std::make_shared<Opening>(path_, busyLimit_);
-    Connection& writer = opening->writer;
+    Connection& writer = opening->writer.emplace(path_, busyLimit_);
     writer.execute("PRAGMA journal_mode = WAL");
-    {
-        Statement check(writer.connection_, "PRAGMA quick_check(1)");
-        if (!check.step() || check.text(0) != "ok") throw DatabaseError(SQLITE_CORRUPT, std::string(check.text(0)));
-    }
+    writer.checkSoundness();
     migrate(writer);
     opening->passed();
     return opening;
 }
 
+std::shared_ptr<Database::Opening> Database::openToLook() const {
+    auto opening = std::make_shared<Opening>(path_, busyLimit_);
+    Connection& reader = opening->reader.emplace(path_, busyLimit_, true);
+    reader.checkSoundness();
+    if (checkedVersion(reader) < static_cast<std::int64_t>(schema_.size()))
+        throw DatabaseError(SQLITE_ERROR,
+                            "it was made by an older version of the program, and the agent has not taken it over yet");
+    opening->file = FileIdentity::of(path_);
+    return opening;
+}
+
+std::int64_t Database::checkedVersion(Connection& connection) const {
+    const auto newest = static_cast<std::int64_t>(schema_.size());
+    const std::int64_t version = connection.integer("PRAGMA user_version");
+    if (version <= newest && version >= 0) return version;
+    throw DatabaseError(SQLITE_ERROR, "it was made by a newer version of the program (schema " +
+                                          std::to_string(version) + "; this one knows " + std::to_string(newest) + ")");
+}
+
 void Database::migrate(Connection& writer) const {
     writer.execute("BEGIN IMMEDIATE");
     const auto newest = static_cast<std::int64_t>(schema_.size());
-    const std::int64_t version = writer.integer("PRAGMA user_version");
-    if (version > newest || version < 0)
-        throw DatabaseError(SQLITE_ERROR, "it was made by a newer version of the program (schema " +
-                                              std::to_string(version) + "; this one knows " + std::to_string(newest) +
-                                              ")");
+    const std::int64_t version = checkedVersion(writer);
     for (std::int64_t step = version; step < newest; ++step) writer.execute(schema_[static_cast<std::size_t>(step)]);
     if (version < newest) writer.execute(("PRAGMA user_version = " + std::to_string(newest)).c_str());
     writer.execute("COMMIT");
@@ -382,7 +427,8 @@ MaybeError Database::write(const std::function<void(Connection&)>& body) {
     std::lock_guard lock(writing_);
     MaybeError error;
     std::shared_ptr<Opening> current = opening(error);
-    return current ? transaction(current->writer, current, "BEGIN IMMEDIATE", body) : error;
+    if (current && !current->writer) error = Error{"database", SQLITE_READONLY, path_ + ": is only looked at"};
+    return error ? error : transaction(*current->writer, current, "BEGIN IMMEDIATE", body);
 }
 
 MaybeError Database::peek(const std::function<void(Connection&, const Stamp&)>& body) {

@@ -65,7 +65,7 @@ private:
 // One connection to the database, used by one thread at a time.
 class Connection {
 public:
-    Connection(const std::string& path, std::chrono::milliseconds busyLimit);
+    Connection(const std::string& path, std::chrono::milliseconds busyLimit, bool isLooking = false);
     ~Connection();
     Connection(const Connection&) = delete;
     Connection& operator=(const Connection&) = delete;
@@ -87,6 +87,7 @@ private:
     // untouched.
     void keepLogAtClose(bool keep);
     void findIndexHeader();
+    void checkSoundness();
     // A statement left within its rows would keep the transaction open.
     void endStatements();
 
@@ -103,7 +104,12 @@ public:
 
     // Nothing is opened before the first use, or open(). A write waits for other writers up to the limit.
     explicit Database(std::string path, Schema schema = currentSchema,
-                      std::chrono::milliseconds busyLimit = std::chrono::seconds(5));
+                      std::chrono::milliseconds busyLimit = std::chrono::seconds(5))
+        : Database(std::move(path), schema, busyLimit, false) {}
+    // For reading only. It changes no file: where one would have to be made, mended or migrated, it cannot be opened.
+    static Database toLookAt(std::string path, Schema schema = currentSchema) {
+        return {std::move(path), schema, std::chrono::seconds(5), true};
+    }
     ~Database();
 
     // An error names the file and the reason: it cannot be written, or a newer version of the program has made it.
@@ -125,9 +131,12 @@ public:
 private:
     struct Opening;
 
+    Database(std::string path, Schema schema, std::chrono::milliseconds busyLimit, bool isLooking);
     std::shared_ptr<Opening> opening(platform::MaybeError& error);
     std::shared_ptr<Opening> openChecked();
     std::shared_ptr<Opening> openOnce() const;
+    std::shared_ptr<Opening> openToLook() const;
+    std::int64_t checkedVersion(Connection& connection) const;
     void migrate(Connection& writer) const;
     void leaveReplacedFile();
     std::string freeAsideName(const std::string& reason) const;
@@ -139,6 +148,7 @@ private:
     const std::string path_;
     const Schema schema_;
     const std::chrono::milliseconds busyLimit_;
+    const bool isLooking_;
 
     // One user each of the reading and the writing connection, over all openings; taken before mutex_.
     std::mutex reading_;

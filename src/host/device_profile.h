@@ -12,9 +12,11 @@
 
 #include "host/bare_machine.h"
 #include "host/current_copy.h"
+#include "platform/account_store.h"
 #include "platform/device_properties.h"
 #include "platform/locale.h"
 #include "platform/paired_device_registry.h"
+#include "platform/telephony_network_info.h"
 #include "platform/value.h"
 
 namespace vrx::host {
@@ -28,6 +30,26 @@ struct ProfileBundle {
     platform::Dictionary entitlements;  // booleans, numbers, texts and lists of texts
 };
 
+// The user's cloud account.
+struct ProfileAccount {
+    std::string identifier;
+    std::optional<std::string> altDSID;
+    // The account that signs requests: this one, unless the file names another or none.
+    std::optional<platform::AuthenticationAccount> authentication;
+    std::vector<std::string> credentialHelper;  // the program, an absolute path, and its arguments; empty for none
+    std::optional<std::string> storefront;
+    std::optional<std::int64_t> storeAccountIdentifier;
+    // What its requests carry; made of the device's facts where they are absent.
+    std::optional<std::string> clientInformation;
+    std::optional<std::string> deviceIdentifier;
+    std::optional<platform::HttpHeaders> headers;
+};
+
+struct ProfileHttp {
+    std::optional<std::string> caFile;  // an absolute path
+    bool namesApplications = false;     // to a server on this machine
+};
+
 // What the file says.
 struct ProfileFacts {
     std::optional<std::string> serialNumber;
@@ -38,7 +60,8 @@ struct ProfileFacts {
     std::optional<std::string> contentSizeCategory;
     std::map<std::string, std::map<std::string, bool>> featureFlags;  // by domain and flag
     std::vector<platform::PairedWatch> watches;
-    std::optional<std::string> account;  // of the user who is signed in
+    std::optional<ProfileAccount> account;  // of the user who is signed in
+    ProfileHttp http;
     std::optional<std::string> language;
     std::optional<std::string> timeZone;
     std::vector<ProfileBundle> bundles;
@@ -46,9 +69,15 @@ struct ProfileFacts {
     std::optional<std::string> purchaseHistoryURL;
     std::vector<std::string> applicationFolders;
     std::string companionFolder = "/usr/share/vrxagent/companion";
+    std::map<std::string, platform::Carrier> carriers;  // by cellular service
+    std::optional<bool> networkAvailable;               // else the machine's routes tell
+    std::optional<bool> shouldDefer;                    // else its power supply
+    std::optional<platform::Duration> minimumInterval;  // between the runs of an activity that schedules itself
 
+    // Whether these are not the file's, because nobody has understood it since the process began.
+    bool isSubstitute = false;
     // Whether root or the agent's own user owns the file and nobody else can write it: only then may what it says
-    // about bundles be believed.
+    // about bundles, authorities and helper programs be believed.
     bool isTrusted = false;
 };
 

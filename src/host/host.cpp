@@ -1,5 +1,11 @@
 #include "host/host.h"
 
+#include <unistd.h>
+
+#include <filesystem>
+
+#include "host/host_facts.h"
+
 namespace vrx::host {
 
 using platform::MaybeError;
@@ -17,14 +23,19 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel)
       defaults_(database_),
       followUps_(database_),
       profile_(locations.profile),
-      accounts_(profile_),
+      accounts_(profile_, home_),
+      accountSession_(profile_),
       clock_(profile_),
-      http_(queues_.workers(platform::Priority::UserInitiated)),
-      store_(profile_),
-      purchases_(profile_),
-      apps_(profile_),
-      strings_(profile_) {
+      http_(queues_.workers(platform::Priority::UserInitiated), clock_, profile_),
+      conditions_(mainLoop_.event(), profile_),
+      activities_({.database = database_,
+                   .mainQueue = mainLoop_,
+                   .workers = queues_.workers(platform::Priority::Background),
+                   .conditions = conditions_,
+                   .lifecycle = lifecycle_}) {
+    facilities_.accountSession = &accountSession_;
     facilities_.accountStore = &accounts_;
+    facilities_.backgroundActivities = &activities_;
     facilities_.clock = &clock_;
     facilities_.defaultsStore = &defaults_;
     facilities_.deviceProperties = &profile_;
@@ -37,18 +48,23 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel)
     facilities_.json = &json_;
     facilities_.locale = &profile_;
     facilities_.localizedStrings = &strings_;
+    facilities_.notificationCenter = &notifications_;
     facilities_.pairedDeviceRegistry = &profile_;
+    facilities_.processLifecycle = &lifecycle_;
     facilities_.propertyList = &propertyList_;
     facilities_.purchaseHistory = &purchases_;
     facilities_.queues = &queues_;
     facilities_.store = &store_;
+    facilities_.telephonyNetworkInfo = &telephony_;
     facilities_.uuidSource = &uuids_;
     platform_ = Platform(facilities_);
 }
 
-// Tasks may use any facility to their end, and the current platform too: they end first.
+// Tasks may use any facility to their end, and the current platform too: they end first, and what one may wait for
+// before them.
 Host::~Host() {
     http_.stop();
+    accounts_.stop();
     queues_.stop();
 }
 
@@ -58,6 +74,23 @@ MaybeError Host::open(HomeUse use) {
         if (MaybeError error = lock_.take(home_)) return error;
     profile_.facts();  // what is wrong with it is said now, and what is good is there to stay when an edit is not
     return database_.open();
+}
+
+// The database's folder is watched for the requests of tools, and for a database that takes the place of this one;
+// while there is none, someone may be about to put one there.
+void Host::start(const std::string& agentVersion) {
+    sd_event_set_watchdog(mainLoop_.event(), 1);  // if the service manager wants to hear
+    constexpr platform::Duration pause = std::chrono::milliseconds(5);
+    const std::string path = home_ + "/host.db";
+    databaseWatch_ = std::make_unique<FileWatch>(mainLoop_.event(), path, pause, [this, path] {
+        if (access(path.c_str(), F_OK) == 0) activities_.reconsider();
+    });
+    database_.write([this](Connection& connection) {
+        setHostFact(connection, facts::profile,
+                    profile_.path().empty() ? "" : std::filesystem::absolute(profile_.path()).string());
+    });
+    activities_.start(agentVersion);
+    profileNotifier_.start(mainLoop_.event(), [this] { activities_.reconsider(); });
 }
 
 void Host::setServiceListenerFactory(platform::ServiceListenerFactory* factory) {

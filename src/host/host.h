@@ -4,28 +4,37 @@
 //     Host host({.home = home, .profile = profile});
 //     if (MaybeError error = host.open(HomeUse::Agent)) …        // tell, and exit
 //     host.setServiceListenerFactory(…);                         // before anything asks for it
-//     …
+//     …                                                          // the agent's start-up
+//     host.start(version);
 //     host.mainLoop().run();
 #pragma once
 
 #include <string>
 
 #include "codec/codec.h"
+#include "host/account_session.h"
 #include "host/account_store.h"
+#include "host/background_activities.h"
 #include "host/clock.h"
 #include "host/database.h"
 #include "host/defaults_store.h"
 #include "host/device_profile.h"
+#include "host/file_watch.h"
 #include "host/files.h"
 #include "host/follow_up_controller.h"
 #include "host/home_lock.h"
 #include "host/http.h"
 #include "host/installed_apps.h"
 #include "host/localized_strings.h"
+#include "host/machine_conditions.h"
 #include "host/main_loop.h"
+#include "host/notification_center.h"
+#include "host/process_lifecycle.h"
+#include "host/profile_notifier.h"
 #include "host/queues.h"
 #include "host/store.h"
 #include "host/system_log.h"
+#include "host/telephony_network_info.h"
 #include "host/uuid.h"
 #include "platform/bundle_lookup.h"
 #include "platform/platform.h"
@@ -44,7 +53,7 @@ enum class HomeUse { Agent, Tool };
 class Host {
 public:
     explicit Host(const HostLocations& locations, platform::Level lowestLevel = platform::Level::Default);
-    // Ends what is under way: requests go unanswered, running tasks are waited for.
+    // Ends what is under way: requests go unanswered, renewals of credentials fail, running tasks are waited for.
     ~Host();
     Host(const Host&) = delete;
     Host& operator=(const Host&) = delete;
@@ -56,10 +65,17 @@ public:
     void setServiceListenerFactory(platform::ServiceListenerFactory* factory);
     void setBundleLookup(platform::BundleLookup* lookup);
 
+    // For an agent of that version, when its start-up is done: activities fire from now on, and what has changed while
+    // no agent ran is notified. Once.
+    void start(const std::string& agentVersion);
+
     MainLoop& mainLoop() { return mainLoop_; }
+    ProcessLifecycle& lifecycle() { return lifecycle_; }
     const DeviceProfile& profile() const { return profile_; }
     Database& database() { return database_; }
     const std::string& home() const { return home_; }
+    // For the program that this process executes next.
+    Descriptor releaseHomeLock() { return lock_.release(); }
 
 private:
     const std::string home_;
@@ -73,6 +89,7 @@ private:
     codec::PropertyList propertyList_;
     codec::Digest digest_;
     MainLoop mainLoop_;  // takes over signals before the first thread
+    ProcessLifecycle lifecycle_{mainLoop_};
     Queues queues_;
     HomeLock lock_;
     Files files_;
@@ -81,9 +98,16 @@ private:
     FollowUpControllers followUps_;
     DeviceProfile profile_;
     AccountStore accounts_;
+    AccountSession accountSession_;
     Clock clock_;
     HttpSessions http_;
     UuidSource uuids_;
+    TelephonyNetworkInfo telephony_{profile_};
+    NotificationCenter notifications_;
+    ProfileNotifier profileNotifier_{profile_, database_, notifications_};
+    MachineConditions conditions_;
+    BackgroundActivities activities_;
+    std::unique_ptr<FileWatch> databaseWatch_;
     Store store_;
     PurchaseHistory purchases_;
     InstalledApps apps_;

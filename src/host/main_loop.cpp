@@ -44,6 +44,7 @@ MainLoop::MainLoop() {
 
     check(sd_event_new(&event_), "event loop");
     auto onSignal = [](sd_event_source*, const signalfd_siginfo*, void* self) {
+        static_cast<MainLoop*>(self)->wasStoppedBySignal_ = true;
         static_cast<MainLoop*>(self)->stop();
         return 0;
     };

@@ -26,6 +26,8 @@ public:
     // Runs until stopped: by stop(), also before the call, or by a signal. It can be run again.
     void run();
     void stop();
+    // Whether a signal has ever stopped it.
+    bool wasStoppedBySignal() const { return wasStoppedBySignal_; }
 
     void post(platform::Task task) override;
     void postAfter(platform::Duration delay, platform::Task task) override;
@@ -53,6 +55,7 @@ private:
     sd_event_source* timerSource_ = nullptr;
     int wakeFile_ = -1;
     sigset_t previousSignals_;
+    bool wasStoppedBySignal_ = false;
 
     std::mutex mutex_;
     std::deque<platform::Task> posted_;

@@ -13,6 +13,11 @@
 
 namespace vrx::platform {
 
+// Activities that the system fires on its own, after the vendor prefix: at the first start of each version of the
+// agent, and once a boot.
+inline constexpr std::string_view upgradeActivityRemainder = ".vrxagent.upgrade";
+inline constexpr std::string_view bootActivityRemainder = ".vrxagent.boot";
+
 enum class BackgroundActivityResult {
     Finished = 1,  // the system forgets the activity
     Deferred = 2,  // the system runs it again later

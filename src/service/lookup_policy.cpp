@@ -9,6 +9,7 @@
 #include "platform/log.h"
 #include "platform/platform.h"
 #include "service/agent.h"
+#include "service/cached_record.h"
 
 namespace vrx {
 
@@ -18,33 +19,33 @@ using platform::Level;
 using platform::Platform;
 using platform::Value;
 
-namespace {
-
-using SerialNumber = VRXAgent::SerialNumber;
-
-// Whether the cached record matches the running system and the user may see it.
-bool isValid(VRXAgentWarrantyProvider& provider, const SerialNumber& serialNumber) {
+std::optional<CachedRecordFlaw> flawOfCachedRecord(VRXAgentWarrantyProvider& provider,
+                                                   const std::optional<std::string>& serialNumber) {
     Value version = provider.cachedWarrantyVersionForSerialNumber(serialNumber);
     if (version != Value(currentCacheVersion)) {
         log(Level::Default, "cached warranty is of outdated version '%@', current version is '%@', consider it invalid",
             version, currentCacheVersion);
-        return false;
+        return CachedRecordFlaw::OutdatedVersion;
     }
     Value locale = provider.cachedWarrantyLocaleForSerialNumber(serialNumber);
     std::string currentLocale = Platform::current().locale().preferredLocaleIdentifier();
     if (locale != Value(currentLocale)) {
         log(Level::Default, "cached warranty is for locale '%@', system is now in '%@', consider it invalid", locale,
             currentLocale);
-        return false;
+        return CachedRecordFlaw::OtherLocale;
     }
     if (!provider.isSignedInToNimbus()) {
         log(Level::Default, "user is signed out of Nimbus, cached warranty not allowed");
-        return false;
+        return CachedRecordFlaw::SignedOut;
     }
     log(Level::Default, "cached warranty is for locale ('%@') and version ('%@') match system, consider it valid",
         locale, version);
-    return true;
+    return std::nullopt;
 }
+
+namespace {
+
+using SerialNumber = VRXAgent::SerialNumber;
 
 // Whether a valid cached record is still fresh. One that was stored in the future, by a clock that has been set back,
 // is.
@@ -88,7 +89,7 @@ void VRXAgent::getWarrantyUsingPolicy(VRXWarrantyLookupPolicy policy, const Seri
         log(Level::Default, "no cached warranty : %@", serialNumber);
     } else {
         log(Level::Default, "Has cached warranty : %@", serialNumber);
-        if (!isValid(*provider, serialNumber)) cached = nullptr;
+        if (flawOfCachedRecord(*provider, serialNumber)) cached = nullptr;
     }
 
     const bool isDownloading = shouldDownload(policy, cached != nullptr, *provider, serialNumber);

@@ -2,24 +2,44 @@
 // keeps them until its end. Main thread.
 #pragma once
 
+#include <array>
 #include <memory>
 
 #include "platform/service_listener.h"
+#include "protocols/agent_collaborators.h"
+#include "scheduling/activity_collaborators.h"
 #include "service/service_delegate.h"
 
 namespace vrx {
 
 class VRXAgent;
+class VRXLocaleMonitor;
+class VRXPairedDevicesMonitor;
+class VRXScheduler;
 
 class StartUp {
 public:
     // Does all of start-up up to the open listener; the program then runs its main loop. The current platform must be
     // set.
     StartUp();
+    ~StartUp();
+    StartUp(const StartUp&) = delete;
+    StartUp& operator=(const StartUp&) = delete;
 
 private:
+    void monitorActivities();
+    void startMonitors();
+    void openListener();
+
+    // While it lives, activities are given agents.
+    const std::shared_ptr<void> lifetime_ = std::make_shared<int>();
+    const ActivityCollaborators activityCollaborators_;
+    const AgentCollaborators agentCollaborators_;
+    std::array<std::shared_ptr<VRXScheduler>, 4> schedulers_;
+    std::shared_ptr<VRXAgent> agent_;
+    std::shared_ptr<VRXLocaleMonitor> localeMonitor_;
+    std::shared_ptr<VRXPairedDevicesMonitor> pairedDevicesMonitor_;
     ServiceDelegate delegate_;
-    std::shared_ptr<VRXAgent> agent_;  // of the settings app
     std::unique_ptr<platform::ServiceListener> listener_;
 };
 

@@ -10,6 +10,7 @@
 
 #include "platform/device_properties.h"
 #include "platform/paired_device_registry.h"
+#include "platform/telephony_network_info.h"
 
 namespace vrx::sim {
 
@@ -44,6 +45,14 @@ public:
     std::vector<platform::PairedWatch> watches() const override { return all; }
 
     std::vector<platform::PairedWatch> all;
+};
+
+class TelephonyNetworkInfo final : public platform::TelephonyNetworkInfo {
+public:
+    std::map<std::string, platform::Carrier> serviceSubscriberCellularProviders() const override { return carriers; }
+    std::string description() const override { return "simulated telephony"; }
+
+    std::map<std::string, platform::Carrier> carriers;  // by service; none without a SIM
 };
 
 }  // namespace vrx::sim

@@ -5,6 +5,7 @@ namespace vrx::sim {
 Host::Host()
     : platform({.accountSession = &accountSession,
                 .accountStore = &accounts,
+                .backgroundActivities = &activities,
                 .bundleLookup = &bundles,
                 .clock = &clock,
                 .defaultsStore = &defaults,
@@ -18,14 +19,22 @@ Host::Host()
                 .json = &json,
                 .locale = &locale,
                 .localizedStrings = &localizedStrings,
+                .notificationCenter = &notifications,
                 .pairedDeviceRegistry = &watches,
+                .processLifecycle = &process,
                 .propertyList = &propertyList,
                 .purchaseHistory = &purchaseHistory,
                 .queues = &queues,
                 .serviceListenerFactory = &listener,
                 .store = &store,
                 .systemLog = &log,
+                .telephonyNetworkInfo = &telephony,
                 .uuidSource = &uuids}),
       scope_(platform) {}
+
+Host::~Host() {
+    queues.close();
+    process.kill();
+}
 
 }  // namespace vrx::sim

@@ -13,6 +13,7 @@
 #include "codec/codec.h"
 #include "platform/platform.h"
 #include "sim/account_store.h"
+#include "sim/background_activities.h"
 #include "sim/bundle_lookup.h"
 #include "sim/clock.h"
 #include "sim/defaults_store.h"
@@ -22,6 +23,8 @@
 #include "sim/follow_up_controller.h"
 #include "sim/http.h"
 #include "sim/locale.h"
+#include "sim/notification_center.h"
+#include "sim/process.h"
 #include "sim/queues.h"
 #include "sim/service_listener.h"
 #include "sim/store.h"
@@ -33,7 +36,7 @@ namespace vrx::sim {
 class Host {
 public:
     Host();
-    ~Host() { queues.close(); }
+    ~Host();
     Host(const Host&) = delete;
     Host& operator=(const Host&) = delete;
 
@@ -50,6 +53,7 @@ public:
     DeviceProperties device;
     FeatureFlags flags;
     PairedDeviceRegistry watches;
+    TelephonyNetworkInfo telephony;
     Locale locale;
     BundleLookup bundles;
     Queues queues{clock, failures};
@@ -61,10 +65,13 @@ public:
     PurchaseHistory purchaseHistory{queues};
     InstalledApps installedApps;
     LocalizedStrings localizedStrings;
+    BackgroundActivities activities{clock, queues};
+    NotificationCenter notifications;
     codec::Json json;
     codec::PropertyList propertyList;
     codec::Digest digest;
     UuidSource uuids;
+    Process process{queues, defaults, activities, notifications};
     platform::Platform platform;
 
 private:

@@ -119,8 +119,11 @@ Queues::Key Queues::add(Duration delay, Work work) {
 
 void Queues::runWork(Duration until) {
     if (!isInBody("ran the queues")) return;
-    while (runNext(until)) {
-    }
+    do {
+        while (runNext(clock_.elapsed())) {
+        }
+        if (idleHandler_) idleHandler_();
+    } while (runNext(until));
     clock_.advanceTo(until);
 }
 
@@ -221,18 +224,25 @@ std::string Queues::waitingTasks() const {
 
 void Queues::close() {
     if (isClosed_ || !isInBody("ended the simulation")) return;
-    isClosed_ = true;
     if (waitingCount() > 0 && !areWaitingTasksLetGo_)
         failures_.report("the simulation ended while tasks were waiting" + waitingTasks());
+    discardWork();
+    isClosed_ = true;
+}
 
+void Queues::discardWork() {
+    if (!isInBody("discarded the work")) return;
+    const bool wasClosed = std::exchange(isClosed_, true);
     platform::ShutdownScope shutdown;
     for (const auto& strand : strands_) {
         if (strand->fiber.isIdle()) continue;
         strand->isAbandoned = true;
         if (strand->wakeUp) pending_.erase(*strand->wakeUp);
         execute({strand->lane, nullptr, strand.get()});
+        strand->isAbandoned = false;
     }
     while (!pending_.empty()) pending_.extract(pending_.begin());
+    isClosed_ = wasClosed;
 }
 
 }  // namespace vrx::sim

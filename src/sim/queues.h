@@ -10,6 +10,7 @@
 
 #include <cstdint>
 #include <exception>
+#include <functional>
 #include <map>
 #include <memory>
 #include <optional>
@@ -39,6 +40,10 @@ public:
     void runFor(platform::Duration duration) { runWork(clock_.elapsed() + duration); }
     void runUntil(platform::Date date) { runWork(clock_.elapsedAt(date)); }
 
+    // Runs the next piece of work that is due by the date, after which the process may be killed. False when there is
+    // none.
+    bool runOne(platform::Date until) { return runNext(clock_.elapsedAt(until)); }
+
     // The label of the queue whose task is running: "main", "background", "userInitiated", a serial queue's own, and
     // nothing in the test's body.
     std::string currentLabel() const;
@@ -46,6 +51,12 @@ public:
     std::size_t pendingCount() const;
     // Tasks that wait for an event.
     std::size_t waitingCount() const;
+
+    // Called between two tasks when nothing is due at present, before time passes, while the queues are run.
+    void setIdleHandler(std::function<void()> handler) { idleHandler_ = std::move(handler); }
+    // What the end of a process does to its work: the stacks of tasks that wait are unwound, what has not begun is
+    // discarded, and so is what is posted meanwhile.
+    void discardWork();
 
     // Ends the simulation's work: a task that still waits is a failure, unless it was let go. Its wait never returns;
     // the stack is unwound. What has not begun is discarded, and so is what is posted from now on.
@@ -89,6 +100,7 @@ private:
     int workAtThisTime_ = 0;
     bool isClosed_ = false;
     bool areWaitingTasksLetGo_ = false;
+    std::function<void()> idleHandler_;
 
     std::shared_ptr<Lane> main_;
     std::shared_ptr<Lane> background_;

@@ -2,6 +2,7 @@
 // agent's main thread, and entitles callers as the test says.
 #pragma once
 
+#include <atomic>
 #include <condition_variable>
 #include <functional>
 #include <mutex>
@@ -142,7 +143,8 @@ public:
         Signal isReady;
         thread_ = std::thread([this, &isReady, limits] {
             host::MainLoop loop;
-            host::ServiceListenerFactory factory(loop.event(), bundles_, limits);
+            lifecycle_.emplace(loop);
+            host::ServiceListenerFactory factory(loop.event(), bundles_, *lifecycle_, limits);
             auto error = factory.open(socketPath());
             if (error) throw std::runtime_error(error->text);
             listen(factory);
@@ -150,6 +152,14 @@ public:
             loop_ = &loop;
             isReady.set();
             loop.run();
+            while (lifecycle_->isEnding()) {  // and the next process takes over the socket
+                listener_.reset();
+                lifecycle_.emplace(loop);
+                listen(factory);
+                ++ends_;
+                ends_.notify_all();
+                loop.run();
+            }
             mayEnd_.wait();
             listener_.reset();
         });
@@ -174,6 +184,15 @@ public:
             isBack.set();
         });
         isBack.wait();
+    }
+
+    // The agent ends by itself once nothing is under way, and comes back.
+    void exitCleanWhenIdle() {
+        loop_->post([this] { lifecycle_->exitCleanWhenIdle(); });
+    }
+    int ends() const { return ends_; }
+    void waitForEnd(int number) const {
+        for (int ends; (ends = ends_) < number;) ends_.wait(ends);
     }
 
 private:
@@ -202,6 +221,8 @@ private:
     std::thread thread_;
     host::MainLoop* loop_ = nullptr;
     Signal mayEnd_;
+    std::optional<host::ProcessLifecycle> lifecycle_;
+    std::atomic<int> ends_ = 0;
     host::ServiceListenerFactory* factory_ = nullptr;
     std::unique_ptr<platform::ServiceListener> listener_;
 };

@@ -34,8 +34,8 @@ Value expectCode(int code, const Arguments& arguments, Run run) {
 }
 
 const std::vector<Arguments> verbs{
-    {"device"},       {"paired"}, {"info", "--policy", "cached"}, {"info", "X"}, {"all", "--policy", "1"},
-    {"dismiss", "X"}, {"web-url"}};
+    {"device"},   {"paired"}, {"info", "--policy", "cached"}, {"info", "X"}, {"all", "--policy", "1"}, {"dismiss", "X"},
+    {"outreach"}, {"web-url"}};
 
 class CommandLine : public testing::Test {
 protected:
@@ -62,6 +62,9 @@ TEST_F(CommandLine, VerbsAnswer) {
     EXPECT_EQ(info["derived"]["coverageEndDate"], Value("2031-03-14T00:00:00Z"));
     EXPECT_EQ(expect(0, {"all", "--update-follow-ups"})["devices"].asArray()->size(), 3u);
     EXPECT_TRUE(expect(0, {"web-url"})["webURL"].isNull());
+    EXPECT_EQ(expect(0, {"dismiss", "VRXWATCH0001"})["serialNumber"], Value("VRXWATCH0001"));
+    const Value dismissed = expectHost(0, {"defaults", "read", "FollowupDismissedSerialNumberHashes"})["value"];
+    EXPECT_EQ(dismissed.asArray()->size(), 2u);  // asked for twice, with and without --json
 
     EXPECT_EQ(expectHost(0, {"defaults", "read", "WarrantyURL"})["registered"], Value(false));
     EXPECT_EQ(expectHost(0, {"defaults", "read", "OneDayInterval"})["registered"], Value(true));

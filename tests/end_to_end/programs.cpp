@@ -31,31 +31,6 @@ std::vector<char*> pointers(const Arguments& texts) {
     return result;
 }
 
-// Where the agent sends its service manager's notices.
-class NoticeSocket {
-public:
-    explicit NoticeSocket(const std::string& path) : file_(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0)) {
-        sockaddr_un address{};
-        address.sun_family = AF_UNIX;
-        path.copy(address.sun_path, sizeof address.sun_path - 1);
-        unlink(path.c_str());
-        EXPECT_EQ(bind(file_, reinterpret_cast<sockaddr*>(&address), sizeof address), 0);
-    }
-    ~NoticeSocket() { close(file_); }
-    NoticeSocket(const NoticeSocket&) = delete;
-    NoticeSocket& operator=(const NoticeSocket&) = delete;
-
-    // Whether a notice came before the process ended.
-    bool isNotified(const Process& process) const {
-        std::array<pollfd, 2> files{{{file_, POLLIN, 0}, {process.endedFile(), POLLIN, 0}}};
-        poll(files.data(), files.size(), -1);
-        return (files[0].revents & POLLIN) != 0;
-    }
-
-private:
-    const int file_;
-};
-
 }  // namespace
 
 std::string fileText(const std::string& path) {
@@ -64,7 +39,7 @@ std::string fileText(const std::string& path) {
 }
 
 Process::Process(const std::string& folder, const std::string& program, const Arguments& arguments,
-                 const Arguments& environment) {
+                 const Arguments& environment, int listeningSocket) {
     static std::atomic<int> count = 0;
     files_ = folder + "/process-" + std::to_string(++count);
     posix_spawn_file_actions_t actions;
@@ -73,11 +48,17 @@ Process::Process(const std::string& folder, const std::string& program, const Ar
     posix_spawn_file_actions_addopen(&actions, 1, (files_ + ".out").c_str(), O_WRONLY | O_CREAT, 0600);
     posix_spawn_file_actions_addopen(&actions, 2, (files_ + ".err").c_str(), O_WRONLY | O_CREAT, 0600);
     Arguments words{program};
-    words.insert(words.end(), arguments.begin(), arguments.end());
     Arguments variables = environment;
+    if (listeningSocket >= 0) {
+        posix_spawn_file_actions_adddup2(&actions, listeningSocket, 3);
+        variables.emplace_back("LISTEN_FDS=1");
+        words = {"/bin/sh", "-c", "LISTEN_PID=$$ exec \"$0\" \"$@\"", program};  // the process must be named
+    }
+    words.insert(words.end(), arguments.begin(), arguments.end());
     for (char** variable = environ; *variable; ++variable) variables.emplace_back(*variable);
-    EXPECT_EQ(
-        posix_spawn(&pid_, program.c_str(), &actions, nullptr, pointers(words).data(), pointers(variables).data()), 0)
+    EXPECT_EQ(posix_spawn(&pid_, words.front().c_str(), &actions, nullptr, pointers(words).data(),
+                          pointers(variables).data()),
+              0)
         << program;
     posix_spawn_file_actions_destroy(&actions);
     pidFile_ = static_cast<int>(syscall(SYS_pidfd_open, pid_, 0));
@@ -111,6 +92,27 @@ std::string Process::errors() const {
     return fileText(files_ + ".err");
 }
 
+NoticeSocket::NoticeSocket(const std::string& path)
+    : path_(path), file_(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0)) {
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    path.copy(address.sun_path, sizeof address.sun_path - 1);
+    unlink(path.c_str());
+    EXPECT_EQ(bind(file_, reinterpret_cast<sockaddr*>(&address), sizeof address), 0);
+}
+
+NoticeSocket::~NoticeSocket() {
+    close(file_);
+}
+
+std::string NoticeSocket::next(const Process& process) const {
+    std::array<pollfd, 2> files{{{file_, POLLIN, 0}, {process.endedFile(), POLLIN, 0}}};
+    poll(files.data(), files.size(), -1);
+    std::array<char, 4096> text;
+    const ssize_t size = recv(file_, text.data(), text.size(), MSG_DONTWAIT);
+    return {text.data(), size > 0 ? static_cast<std::size_t>(size) : 0};
+}
+
 Place::Place() {
     umask(022);  // a bundle that others can write is none
     std::string pattern = std::filesystem::canonical(std::filesystem::temp_directory_path()) / "vrx-XXXXXX";
@@ -136,8 +138,8 @@ void Place::start() {
     agent_ = std::make_unique<Process>(
         folder_, VRX_PROGRAMS "/vrxagent",
         Arguments{"--home", *this / "home", "--device", *this / "device.toml", "--socket", *this / "socket"},
-        Arguments{"NOTIFY_SOCKET=" + *this / "notices"});
-    isReady_ = notices.isNotified(*agent_);
+        Arguments{notices.variable()});
+    isReady_ = notices.next(*agent_) == "READY=1";
 }
 
 int Place::stop() {

@@ -20,13 +20,15 @@ std::string fileText(const std::string& path);
 // A child process with its standard output and error in files.
 class Process {
 public:
-    // The environment is this process's, with the given variables in front.
+    // The environment is this process's, with the given variables in front. A listening socket is handed over as a
+    // service manager does it.
     Process(const std::string& folder, const std::string& program, const Arguments& arguments,
-            const Arguments& environment = {});
+            const Arguments& environment = {}, int listeningSocket = -1);
     ~Process();  // kills it, if it has not been waited for
     Process(const Process&) = delete;
     Process& operator=(const Process&) = delete;
 
+    int identifier() const { return pid_; }
     void signal(int number) const;
     // Its exit code, or the negative signal that ended it.
     int wait();
@@ -41,6 +43,24 @@ private:
     int pid_ = 0;
     int pidFile_ = -1;
     std::optional<int> result_;
+};
+
+// Where a process sends its service manager's notices.
+class NoticeSocket {
+public:
+    explicit NoticeSocket(const std::string& path);
+    ~NoticeSocket();
+    NoticeSocket(const NoticeSocket&) = delete;
+    NoticeSocket& operator=(const NoticeSocket&) = delete;
+
+    // For the environment of the process.
+    std::string variable() const { return "NOTIFY_SOCKET=" + path_; }
+    // The next notice, as soon as it comes; empty once the process has ended without one.
+    std::string next(const Process& process) const;
+
+private:
+    const std::string path_;
+    const int file_;
 };
 
 // A folder with an agent's home, profile, socket and coverage files, and an entitled copy of vrxctl.

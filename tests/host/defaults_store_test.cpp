@@ -1,5 +1,6 @@
 #include "host/defaults_store.h"
 
+#include <fcntl.h>
 #include <gmock/gmock.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
@@ -231,6 +232,55 @@ TEST_F(DefaultsStoreTest, RefusesAFileOfANewerVersionAndLeavesItAlone) {
     EXPECT_TRUE(database.open());
     EXPECT_EQ(fileText(path()), content);
     EXPECT_EQ(log.lines().size(), 1u);  // said once
+}
+
+// Beside an agent that runs, after one that was killed, and after one that ended.
+TEST_F(DefaultsStoreTest, LookingReadsWhatIsThereAndChangesNothing) {
+    auto contents = [&] {
+        Dictionary files;
+        for (const std::string& name : folder.names())
+            if (!name.ends_with("-shm")) files[name] = fileText(folder / name);
+        return files;
+    };
+    auto expectLook = [&](const char* when) {
+        const Dictionary before = contents();
+        Database database = Database::toLookAt(path());
+        DefaultsStore store(database);
+        EXPECT_EQ(store.get("key"), Value(when));
+        store.set("key", "looked");
+        EXPECT_EQ(store.get("key"), Value(when));
+        EXPECT_EQ(contents(), before) << when;
+    };
+    std::array<int, 2> ends{};
+    ASSERT_EQ(pipe2(ends.data(), O_CLOEXEC), 0);
+    const pid_t agent = inChild([&] {
+        Database database(path());
+        DefaultsStore(database).set("key", "running");
+        if (::write(ends[1], "!", 1) == 1) pause();
+    });
+    ::close(ends[1]);
+    char written = 0;
+    ASSERT_EQ(::read(ends[0], &written, 1), 1);
+    ::close(ends[0]);
+    expectLook("running");
+    kill(agent, SIGKILL);
+    waitpid(agent, nullptr, 0);
+    expectLook("running");
+    {
+        Database database(path());
+        DefaultsStore(database).set("key", "ended");
+    }
+    EXPECT_THAT(folder.names(), ElementsAre("host.db"));
+    expectLook("ended");
+    EXPECT_THAT(folder.names(), ElementsAre("host.db"));
+
+    std::vector<const char*> next(Database::currentSchema.begin(), Database::currentSchema.end());
+    next.push_back("CREATE TABLE more (x)");
+    EXPECT_THAT(Database::toLookAt(path(), next).open()->text, HasSubstr("older version"));
+    writeFile(folder / "damaged 1%?#.db", std::string(8192, 'x'));
+    for (const char* name : {"absent.db", "damaged 1%?#.db"})
+        EXPECT_TRUE(Database::toLookAt(folder / name).open()) << name;
+    EXPECT_THAT(folder.names(), ElementsAre("damaged 1%?#.db", "host.db"));
 }
 
 TEST_F(DefaultsStoreTest, ChangesTheSchemaAsAWholeOrNotAtAll) {

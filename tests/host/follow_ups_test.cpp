@@ -1,109 +1,78 @@
-// The follow-up manager on the real host: processes that work at once, and processes that are killed at work.
+// Follow-ups on the real host: a service that fails, processes that work at once, and processes that are killed at
+// work.
 #include <gmock/gmock.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <csignal>
 
-#include "codec/property_list.h"
 #include "coverage/warranty.h"
 #include "devices/device_info.h"
 #include "followup/default_follow_up_provider.h"
 #include "followup/follow_up.h"
 #include "followup/follow_up_content.h"
 #include "followup/serial_number_hashes.h"
-#include "host/follow_up_document.h"
 #include "host/host.h"
 #include "platform/sha256_hash.h"
 #include "service/agent.h"
-#include "service/register_defaults.h"
 #include "support.h"
 
 namespace vrx::host {
 namespace {
 
+using platform::Array;
 using platform::Dictionary;
 using platform::FollowUpItem;
 using platform::MaybeError;
-using platform::Platform;
-using platform::sha256Hash;
 using platform::Value;
 using ::testing::ElementsAre;
 using ::testing::IsEmpty;
 using ::testing::SizeIs;
-using ::testing::UnorderedElementsAreArray;
 
-// A process of the agent's in the home, up to the point where clients would come.
-struct Process {
-    explicit Process(const TemporaryFolder& folder)
-        : host({folder / "home", folder / "device.toml"}, platform::Level::Error) {
-        EXPECT_FALSE(host.open(HomeUse::Tool));
-        vrx_registerDefaults(Platform::current().defaultsStore());
-    }
-
-    Host host;
-};
-
-std::shared_ptr<VRXDeviceInfo> offered(const std::string& serialNumber, const std::string& label = "offer") {
+std::shared_ptr<VRXDeviceInfo> offered(const std::string& serialNumber) {
     const Dictionary record{{"qxOfferEligibleUntil", 9'999'999'999},
-                            {"qxLocalizedOfferLabel", label},
-                            {"qxLocalizedOfferSingularDesc", "Last day"},
-                            {"qxLocalizedOfferPluralDescFormat", "%@ days left"},
+                            {"qxLocalizedOfferSingularDesc", "1 day"},
+                            {"qxLocalizedOfferPluralDescFormat", "%@ days"},
                             {"featureToggleParameters", Dictionary{{"qxOfferDisplay", true}}}};
     return VRXDeviceInfo::deviceInfoWithDevice(
         VRXDevice::deviceWithName("name", serialNumber, std::nullopt, VRXDeviceTypeDefault),
         VRXWarranty::warrantyWithDictionary(record));
 }
 
-std::vector<std::string> pendingIdentifiers() {
-    std::vector<std::string> identifiers;
-    for (const FollowUpItem& item : VRXDefaultFolllowUpProvider().pendingFollowUpItems(nullptr))
-        identifiers.push_back(item.uniqueIdentifier);
-    return identifiers;
+Value stored(std::string_view key) {
+    return platform::Platform::current().defaultsStore().get(key);
 }
 
-std::vector<std::string> storedHashes(std::string_view key) {
-    std::vector<std::string> hashes;
-    const Value list = Platform::current().defaultsStore().get(key);
-    if (list.asArray())
-        for (const Value& hash : *list.asArray()) hashes.push_back(*hash.asString());
-    return hashes;
-}
-
-// The platform's service, in a process that is killed right behind a post or right before a clear.
+// The platform's service, in a process that is killed behind a post.
 class KilledProvider final : public VRXFollowUpProvider {
 public:
     bool postFollowUpItem(const FollowUpItem& item, MaybeError* error) override {
-        const bool isPosted = service_.postFollowUpItem(item, error);
-        if (killsBehindPost) raise(SIGKILL);
-        return isPosted;
+        return service_.postFollowUpItem(item, error) && raise(SIGKILL) == 0;
     }
     bool clearPendingFollowUpItemsWithUniqueIdentifiers(const std::vector<std::string>&, MaybeError*) override {
-        raise(SIGKILL);
         return false;
     }
     std::vector<FollowUpItem> pendingFollowUpItems(MaybeError* error) override {
         return service_.pendingFollowUpItems(error);
     }
 
-    bool killsBehindPost = false;
-
 private:
     VRXDefaultFolllowUpProvider service_;
 };
 
-class FollowUpsTest : public ::testing::Test {
+class FollowUps : public ::testing::Test {
 protected:
-    // Does the work in a process of its own, which must be made before this one has threads.
-    template <class Work>
-    pid_t inChild(Work work) const {
+    void openHost() {
+        host.emplace(HostLocations{folder / "home", folder / "device.toml"}, platform::Level::Error);
+        ASSERT_FALSE(host->open(HomeUse::Tool));
+    }
+    // Does the work in a process with a host of its own, which must be made before this one has threads.
+    pid_t inChild(const std::function<void()>& work) {
         const pid_t child = fork();
         if (child != 0) return child;
-        {
-            const Process process(folder);
-            work();
-        }
-        _exit(HasFailure() ? 1 : 0);
+        openHost();
+        work();
+        _exit(0);
     }
     // 0, or the signal that ended it.
     static int end(pid_t child) {
@@ -111,114 +80,121 @@ protected:
         waitpid(child, &status, 0);
         return status;
     }
+    std::vector<std::string> pending() {
+        std::vector<std::string> identifiers;
+        for (const FollowUpItem& item : provider->pendingFollowUpItems(nullptr))
+            identifiers.push_back(item.uniqueIdentifier);
+        return identifiers;
+    }
 
     TemporaryFolder folder;
+    std::optional<Host> host;
+    const std::shared_ptr<VRXFollowUpProvider> provider = std::make_shared<VRXDefaultFolllowUpProvider>();
 };
 
-TEST_F(FollowUpsTest, ProcessesAtOnceLoseNoHash) {
+TEST_F(FollowUps, AreNotChangedByARequestThatFails) {
+    const LogRecorder log;
+    Database database(folder / "host.db", Database::currentSchema, std::chrono::milliseconds(10));
+    Database other(folder / "host.db");
+    FollowUpControllers service(database);
+    const auto controller = service.makeController("client");
+    const FollowUpItem a{.uniqueIdentifier = "a"}, large{.uniqueIdentifier = "a", .title = std::string(100'000, 'x')};
+    ASSERT_FALSE(controller->postFollowUpItem(a));
+    ASSERT_FALSE(other.open());
+    const auto expectFailure = [&](int code) {
+        const MaybeError error = controller->postFollowUpItem(large);
+        ASSERT_TRUE(error);
+        EXPECT_EQ(error->domain, "database");
+        EXPECT_EQ(error->code & 0xff, code) << error->text;
+        // What changes nothing needs no writing.
+        EXPECT_FALSE(controller->postFollowUpItem(a));
+        EXPECT_FALSE(controller->clearPendingFollowUpItems({"b"}));
+        EXPECT_THAT(*controller->pendingFollowUpItems(), ElementsAre(a));
+    };
+    EXPECT_FALSE(other.write([&](Connection&) { expectFailure(SQLITE_BUSY); }));
+    for (auto [fault, code] :
+         {std::pair("PRAGMA max_page_count = 1", SQLITE_FULL), {"PRAGMA query_only = 1", SQLITE_READONLY}}) {
+        EXPECT_FALSE(database.write([sql = fault](Connection& connection) { connection.execute(sql); }));
+        expectFailure(code);
+    }
+    EXPECT_TRUE(controller->clearPendingFollowUpItems({"a"}));
+    // Another database in this one's place is the one that counts.
+    EXPECT_FALSE(Database(folder / "new.db").open());
+    std::filesystem::rename(folder / "new.db", folder / "host.db");
+    EXPECT_THAT(*controller->pendingFollowUpItems(), IsEmpty());
+    EXPECT_FALSE(controller->postFollowUpItem(a));
+    EXPECT_THAT(*controller->pendingFollowUpItems(), ElementsAre(a));
+}
+
+TEST_F(FollowUps, AreNotHiddenByOneThatCannotBeRead) {
+    openHost();
+    const auto damage = [&] {
+        for (const char* one : {"a", "b", "c"})
+            EXPECT_TRUE(provider->postFollowUpItem({.uniqueIdentifier = one}, nullptr));
+        EXPECT_FALSE(host->database().write([](Connection& connection) {
+            connection.execute("UPDATE follow_ups SET item = substr(item, 2) WHERE identifier = 'b'");
+        }));
+        EXPECT_THAT(pending(), ElementsAre("a", "c"));
+    };
+    damage();
+    EXPECT_TRUE(provider->clearPendingFollowUpItemsWithUniqueIdentifiers({"b"}, nullptr));
+    damage();
+    EXPECT_TRUE(provider->postFollowUpItem({.uniqueIdentifier = "b"}, nullptr));
+    EXPECT_THAT(pending(), ElementsAre("a", "c", "b"));
+}
+
+TEST_F(FollowUps, OfProcessesAtOnceAreAllThereAndSoAreTheirHashes) {
     constexpr int each = 20;
     const auto work = [](const std::string& name) {
         for (int i = 0; i < each; ++i) {
-            VRXFollowUp followUp;
-            followUp.postFollowUpWithDeviceInfo(offered(name + std::to_string(i)));
-            followUp.postFollowUpWithDeviceInfo(offered("shared" + std::to_string(i)));
-            followUp.dismissFollowUpForSerialNumber(name + std::to_string(i));
+            for (const std::string& owner : {name, std::string("shared")})
+                VRXFollowUp().postFollowUpWithDeviceInfo(offered(owner + std::to_string(i)));
+            VRXFollowUp().dismissFollowUpForSerialNumber(name + std::to_string(i));
         }
     };
     const pid_t child = inChild([&] { work("child"); });
-    const Process process(folder);
+    openHost();
     work("parent");
     EXPECT_EQ(end(child), 0);
-
-    std::vector<std::string> dismissed, shared;
-    for (int i = 0; i < each; ++i) {
-        for (const char* name : {"child", "parent"}) dismissed.push_back(sha256Hash(name + std::to_string(i)));
-        shared.push_back(sha256Hash("shared" + std::to_string(i)));
+    for (auto [key, count] :
+         {std::pair(postedSerialNumberHashesKey, 3 * each), {dismissedSerialNumberHashesKey, 2 * each}}) {
+        EXPECT_THAT(*stored(key).asArray(), SizeIs(count));
+        EXPECT_THAT(serialNumberHashes(key), SizeIs(count));
     }
-    EXPECT_THAT(storedHashes(dismissedSerialNumberHashesKey), UnorderedElementsAreArray(dismissed));
-    std::vector<std::string> posted = dismissed;
-    posted.insert(posted.end(), shared.begin(), shared.end());
-    EXPECT_THAT(storedHashes(postedSerialNumberHashesKey), UnorderedElementsAreArray(posted));
-    EXPECT_THAT(pendingIdentifiers(), SizeIs(each));
+    EXPECT_THAT(pending(), SizeIs(each));
 }
 
-TEST_F(FollowUpsTest, AProcessKilledBehindItsPostLeavesOneItem) {
-    EXPECT_EQ(end(inChild([] {
-                  auto provider = std::make_shared<KilledProvider>();
-                  provider->killsBehindPost = true;
-                  VRXFollowUp(provider).postFollowUpWithDeviceInfo(offered("PHONE"));
-              })),
-              SIGKILL);
-    const Process process(folder);
-    EXPECT_THAT(pendingIdentifiers(), ElementsAre(followUpUniqueIdentifier("PHONE")));
-    EXPECT_THAT(storedHashes(postedSerialNumberHashesKey), IsEmpty());
-    VRXFollowUp().postFollowUpWithDeviceInfo(offered("PHONE"));
-    EXPECT_THAT(pendingIdentifiers(), ElementsAre(followUpUniqueIdentifier("PHONE")));
-    EXPECT_THAT(storedHashes(postedSerialNumberHashesKey), ElementsAre(sha256Hash("PHONE")));
+TEST_F(FollowUps, AreThereOnceWhenTheProcessWasKilledBehindThePost) {
+    const auto post = [](const std::shared_ptr<VRXFollowUpProvider>& by) {
+        VRXFollowUp(by).postFollowUpWithDeviceInfo(offered("PHONE"));
+    };
+    EXPECT_EQ(end(inChild([&] { post(std::make_shared<KilledProvider>()); })), SIGKILL);
+    openHost();
+    EXPECT_THAT(pending(), SizeIs(1));
+    EXPECT_TRUE(stored(postedSerialNumberHashesKey).isNull());
+    post(provider);
+    EXPECT_THAT(pending(), ElementsAre(followUpUniqueIdentifier("PHONE")));
+    EXPECT_EQ(stored(postedSerialNumberHashesKey), Value(Array{platform::sha256Hash("PHONE")}));
 }
 
-TEST_F(FollowUpsTest, AProcessKilledWithinTheMigrationLeavesBothItems) {
+TEST_F(FollowUps, AreBothThereWhenTheProcessWasKilledWithinTheMigration) {
     writeFile(folder / "device.toml", "[device]\nserial_number = 'PHONE'\n");
-    const auto migrate = [](const std::shared_ptr<VRXFollowUpProvider>& provider) {
+    const auto migrate = [](const std::shared_ptr<VRXFollowUpProvider>& by) {
         AgentCollaborators collaborators;
-        collaborators.makeFollowUp = [=] { return std::make_shared<VRXFollowUp>(provider); };
+        collaborators.makeFollowUp = [=] { return std::make_shared<VRXFollowUp>(by); };
         VRXAgent::initWithCallingProcessBundleID("id", collaborators)->performMigrationIfNeeded();
     };
-    const auto version = [] { return Platform::current().defaultsStore().integer("VRXMigrationVersion"); };
-    EXPECT_EQ(end(inChild([&] {
-                  VRXDefaultFolllowUpProvider().postFollowUpItem(
-                      {.uniqueIdentifier = followUpUniqueIdentifier(std::nullopt)}, nullptr);
-                  offered("")->warranty()->cache();
-                  migrate(std::make_shared<KilledProvider>());
-              })),
-              SIGKILL);
-    const Process process(folder);
-    const auto both = ElementsAre(followUpUniqueIdentifier(std::nullopt), followUpUniqueIdentifier("PHONE"));
-    EXPECT_THAT(pendingIdentifiers(), both);
-    EXPECT_EQ(version(), 0);
-    migrate(std::make_shared<VRXDefaultFolllowUpProvider>());
-    EXPECT_THAT(pendingIdentifiers(), both);
-    EXPECT_EQ(version(), 2);
-}
-
-TEST_F(FollowUpsTest, RefreshesAThousandItemsAndWritesWhatHasChanged) {
-    Process process(folder);
-    const auto writes = [&] {
-        std::uint32_t count = 0;  // which every transaction that wrote anything raises
-        EXPECT_FALSE(
-            process.host.database().peek([&](Connection&, const Database::Stamp& stamp) { count = stamp.mark[2]; }));
-        return count;
-    };
-    DeviceInfoList infos;
-    for (int i = 0; i < 1000; ++i) infos.push_back(offered(std::to_string(i)));
-    VRXFollowUp followUp;
-    VRXDefaultFolllowUpProvider provider;
-    provider.postFollowUpItem({.uniqueIdentifier = "odd", .userInfo = {{"FollowupSerialNumber", 1}}}, nullptr);
-    EXPECT_FALSE(process.host.database().write([&](Connection& connection) {
-        for (const auto& info : infos) {
-            FollowUpItem item = newFollowUpItem(*info->device(), "settings");
-            item = filledFollowUpItem(item, *info, Platform::current().clock()).item;
-            connection.statement("INSERT INTO follow_ups (client, identifier, item) VALUES (?, ?, ?)")
-                .bind(0, followUpClientIdentifier())
-                .bind(1, item.uniqueIdentifier)
-                .bind(2, *codec::serializePropertyList(followUpDocument(item), platform::PropertyListFormat::Binary))
-                .step();
-        }
-    }));
-
-    std::uint32_t before = writes();
-    EXPECT_THAT(followUp.refreshFollowupWithDeviceInfos(infos), SizeIs(1000));
-    EXPECT_EQ(writes(), before);
-    for (int i : {0, 500, 999}) infos[static_cast<std::size_t>(i)] = offered(std::to_string(i), "other");
-    EXPECT_THAT(followUp.refreshFollowupWithDeviceInfos(infos), SizeIs(1000));
-    EXPECT_EQ(writes(), before + 3);
-    EXPECT_THAT(pendingIdentifiers(), SizeIs(1001));
-    EXPECT_EQ(provider.pendingFollowUpItems(nullptr)[501].title, "other");
-
-    before = writes();
-    EXPECT_THAT(followUp.refreshFollowupWithDeviceInfos({}), IsEmpty());
-    EXPECT_EQ(writes(), before + 1);
-    EXPECT_THAT(pendingIdentifiers(), ElementsAre("odd"));
+    const pid_t child = inChild([&] {
+        provider->postFollowUpItem({.uniqueIdentifier = followUpClientIdentifier()}, nullptr);
+        offered("")->warranty()->cache();
+        migrate(std::make_shared<KilledProvider>());
+    });
+    EXPECT_EQ(end(child), SIGKILL);
+    openHost();
+    EXPECT_TRUE(stored("VRXMigrationVersion").isNull());
+    migrate(provider);
+    EXPECT_THAT(pending(), ElementsAre(followUpClientIdentifier(), followUpUniqueIdentifier("PHONE")));
+    EXPECT_EQ(stored("VRXMigrationVersion"), Value(2));
 }
 
 }  // namespace

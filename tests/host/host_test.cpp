@@ -2,8 +2,12 @@
 
 #include <gmock/gmock.h>
 
+#include <atomic>
 #include <future>
+#include <thread>
 
+#include "host/credential_helper.h"
+#include "host/host_facts.h"
 #include "support.h"
 
 namespace vrx::host {
@@ -24,7 +28,9 @@ TEST(Host, IsTheCurrentPlatformAndHasItsHomeToItself) {
         Platform& platform = Platform::current();
         EXPECT_EQ(platform.files().homeDirectory(), locations.home);
         EXPECT_EQ(platform.clock().timeZoneOffset(), 5h + 30min);
-        writeFile(locations.profile, "[locale]\ntime_zone = 'America/Lima'\n");
+        writeFile(locations.profile,
+                  "[account]\nidentifier = 'ada'\ncredential_helper = ['/bin/sleep', '100000']\n"
+                  "[locale]\ntime_zone = 'America/Lima'\n");
         EXPECT_EQ(platform.clock().timeZoneOffset(), -5h);
         const std::string uuid = platform.uuidSource().makeUuid();
         EXPECT_THAT(uuid, MatchesRegex("[0-9a-f]{8}(-[0-9a-f]{4}){3}-[0-9a-f]{12}"));
@@ -33,10 +39,16 @@ TEST(Host, IsTheCurrentPlatformAndHasItsHomeToItself) {
         EXPECT_FALSE(Host(locations).open(HomeUse::Tool));
         EXPECT_EQ(&Platform::current(), &platform);
 
-        // Work that still runs at the end has the platform to the last.
+        // Work that still runs at the end has the platform to the last, and what it waits for ends.
         std::promise<void> begun;
         platform.queues().workers(platform::Priority::Background).post([&] {
+            auto renewed = platform.queues().makeEvent();
+            platform.accountStore().renewCredentials({"ada"}, {.services = {"S"}}, [&](const auto& result) {
+                EXPECT_EQ(result.code, static_cast<int>(CredentialFailure::Ended));
+                renewed->set();
+            });
             begun.set_value();
+            renewed->wait();
             for (int i = 0; i < 20; ++i) Platform::current().defaultsStore().set("key", i);
         });
         begun.get_future().wait();
@@ -45,6 +57,55 @@ TEST(Host, IsTheCurrentPlatformAndHasItsHomeToItself) {
     Host next(locations);
     ASSERT_FALSE(next.open(HomeUse::Agent));
     EXPECT_EQ(Platform::current().defaultsStore().integer("key"), 19);
+}
+
+// On the real queues, with tools beside the agent: what races would show here, under the thread sanitizer.
+TEST(Host, FiresActivitiesThatItsToolsAskFor) {
+    TemporaryFolder folder;
+    const HostLocations locations{folder / "home", folder / "device.toml"};
+    Database unused(folder / "host.db");
+    EXPECT_EQ(requestFiring(folder.path(), unused, "a", 10s), std::nullopt) << "no agent has it";
+    EXPECT_EQ(unused.read([](Connection& connection) {
+        if (connection.integer("SELECT count(*) FROM activity_requests") != 0) throw DatabaseError(0, "left behind");
+    }),
+              std::nullopt);
+
+    Host agent(locations, platform::Level::Error);
+    ASSERT_FALSE(agent.open(HomeUse::Agent));
+    platform::BackgroundActivities& activities = Platform::current().backgroundActivities();
+    std::atomic<int> runs = 0;
+    auto handler = [&](platform::OnceCallback<platform::BackgroundActivityResult> completion) {
+        ++runs;
+        activities.schedule({.identifier = "other", .criteria{{.delay = 86400}}}, nullptr);
+        Platform::current().queues().mainQueue().post([completion = std::move(completion)]() mutable {
+            completion(platform::BackgroundActivityResult::Finished);
+        });
+    };
+    for (const char* identifier : {"a", "b", "com.orvane.vrxagent.upgrade", "com.orvane.vrxagent.boot"})
+        activities.schedule({.identifier = identifier, .isPreregistered = true}, handler);
+    agent.start("1");
+
+    std::atomic<int> fired = 0;
+    std::vector<std::jthread> tools;
+    for (const std::string identifier : {"a", "b", "a"})
+        tools.emplace_back([&, identifier] {
+            Database database(agent.home() + "/host.db");
+            for (int i = 0; i < 10; ++i) {
+                const std::optional<FiringAnswer> answer = requestFiring(agent.home(), database, identifier, 60s);
+                ASSERT_TRUE(answer == FiringAnswer::Fired || answer == FiringAnswer::AlreadyRunning);
+                if (answer == FiringAnswer::Fired) ++fired;
+            }
+            EXPECT_EQ(requestFiring(agent.home(), database, "unknown", 60s), FiringAnswer::Unknown);
+            EXPECT_EQ(hostFact(database, facts::profile), locations.profile);
+        });
+    std::jthread last([&] {
+        for (auto& tool : tools) tool.join();
+        while (runs < fired + 2) std::this_thread::yield();
+        agent.mainLoop().stop();
+    });
+    agent.mainLoop().run();
+    EXPECT_GT(fired, 0);
+    EXPECT_EQ(runs, fired + 2) << "the upgrade and the boot activity come by themselves";
 }
 
 }  // namespace

@@ -29,6 +29,8 @@ public:
 
     // Null when the peer's bundle does not hold it, or asks for a group that is not the peer's.
     platform::Value entitlement(const PeerIdentity& peer, std::string_view name) const;
+    // Of a program, whoever runs it. For tools.
+    std::optional<BundleFile> bundleOf(const std::string& executable) const;
 
     // While one is alive on a thread, executablePath() answers there for the peer out of its identity.
     class Acceptance {
@@ -40,7 +42,6 @@ public:
     };
 
 private:
-    std::optional<BundleFile> bundleOf(const std::string& executable) const;
     std::optional<BundleFile> profileBundle(const std::string& executable) const;
 
     const Profile profile_;

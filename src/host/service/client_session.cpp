@@ -14,11 +14,14 @@ using platform::Level;
 using platform::log;
 
 ClientSession::ClientSession(Descriptor socket, const PeerIdentity& peer, std::shared_ptr<VRXAgentProtocol> agent,
-                             std::shared_ptr<ReplyBox> box, const ServiceLimits& limits)
+                             std::shared_ptr<ReplyBox> box, const ServiceLimits& limits, ProcessLifecycle& lifecycle)
     : peer_(peer),
       agent_(std::move(agent)),
       box_(std::move(box)),
       limits_(limits),
+      lifecycle_(lifecycle),
+      authenticationEnd_(std::chrono::steady_clock::now() + limits.authentication),
+      work_(lifecycle.beginWorkUnlessEnding()),
       bus_(std::move(socket), peer.processIdentifier()) {
     for (std::size_t i = 0; i < methods_.size(); ++i) methods_[i] = {this, static_cast<wire::OperationIndex>(i)};
     if (bus_.bus())
@@ -53,23 +56,29 @@ const std::vector<sd_bus_vtable>& ClientSession::methodTable() {
 }
 
 void ClientSession::serve(const std::atomic<bool>& isStopping) {
-    const auto authenticationEnd = std::chrono::steady_clock::now() + limits_.authentication;
-    while (!isStopping && !isCutOff_) {
+    while (!isStopping && !isCutOff_ && !isAuthenticationOverdue()) {
+        if (!work_) work_ = lifecycle_.beginWorkUnlessEnding();
+        if (!work_) return;
         box_->sendPending();
         const ServerBus::Step step = bus_.step();
         if (step == ServerBus::Step::Ended) return;
-        if (step == ServerBus::Step::Idle && !waitUntilReady(authenticationEnd)) return;
+        if (step == ServerBus::Step::Progress) continue;
+        if (bus_.unsentMessages() == 0) work_.reset();
+        if (!waitUntilReady()) break;
     }
+    if (!work_) work_ = lifecycle_.beginWorkUnlessEnding();
 }
 
-// False when the client has not authenticated itself in time.
-bool ClientSession::waitUntilReady(std::chrono::steady_clock::time_point authenticationEnd) const {
+bool ClientSession::isAuthenticationOverdue() const {
+    return !bus_.isAuthenticated() && std::chrono::steady_clock::now() >= authenticationEnd_;
+}
+
+bool ClientSession::waitUntilReady() const {
     using namespace std::chrono;
     int timeout = -1;
     if (!bus_.isAuthenticated()) {
-        const auto left = ceil<milliseconds>(authenticationEnd - steady_clock::now()).count();
-        if (left <= 0) return false;
-        timeout = static_cast<int>(left);
+        const auto left = ceil<milliseconds>(authenticationEnd_ - steady_clock::now());
+        timeout = static_cast<int>(std::max(left, milliseconds(0)).count());
     }
     std::array<pollfd, 2> files{{{bus_.socket(), bus_.events(), 0}, {box_->wakeFile(), POLLIN, 0}}};
     return poll(files.data(), files.size(), timeout) >= 0 || errno == EINTR;
@@ -99,7 +108,7 @@ int ClientSession::handle(sd_bus_message* call, wire::OperationIndex operation, 
                                  platform::limits::argumentBytes);
     const RequestNumber request = ++lastRequest_;
     openCalls_.emplace(request, MessagePointer(sd_bus_message_ref(call)));
-    performRequest(*agent_, operation, std::move(*arguments), PendingReply(box_, request, agent_));
+    performRequest(*agent_, operation, std::move(*arguments), PendingReply(box_, request, agent_, work_));
     return 1;
 }
 

@@ -7,6 +7,7 @@
 #include <systemd/sd-daemon.h>
 
 #include <cerrno>
+#include <cstdlib>
 #include <cstring>
 #include <optional>
 
@@ -32,14 +33,6 @@ const sockaddr* generic(const sockaddr_un& address) {
     return reinterpret_cast<const sockaddr*>(&address);
 }
 
-// The stream socket that the service manager passed, if any.
-Descriptor passedSocket() {
-    const int count = sd_listen_fds(1);
-    for (int number = SD_LISTEN_FDS_START; number < SD_LISTEN_FDS_START + count; ++number)
-        if (sd_is_socket_unix(number, SOCK_STREAM, 1, nullptr, 0) > 0) return Descriptor(number);
-    return Descriptor();
-}
-
 // Removes what a dead agent left; the error tells why it has to stay.
 MaybeError makeRoom(const std::string& path, const sockaddr_un& address) {
     struct stat status;
@@ -63,7 +56,7 @@ ListeningSocket::~ListeningSocket() {
 }
 
 MaybeError ListeningSocket::open(const std::string& path) {
-    file_ = passedSocket();
+    takePassed(path);
     if (!file_)
         if (MaybeError error = bind(path)) return error;
     // Each read then tells who wrote.
@@ -72,6 +65,35 @@ MaybeError ListeningSocket::open(const std::string& path) {
         fcntl(file_.number(), F_SETFL, O_NONBLOCK) != 0)
         return systemError("set up", path, errno);
     return std::nullopt;
+}
+
+// The stream socket that was passed, if any. One that this process has bound was bound at the same path.
+void ListeningSocket::takePassed(const std::string& path) {
+    char** names = nullptr;
+    const int count = sd_listen_fds_with_names(1, &names);
+    for (int i = 0; i < count; ++i) {
+        const int number = SD_LISTEN_FDS_START + i;
+        if (!file_ && sd_is_socket_unix(number, SOCK_STREAM, 1, nullptr, 0) > 0) {
+            file_ = Descriptor(number);
+            if (names[i] == std::string_view(PassedSocket::boundByUsName)) own(path);
+        }
+        std::free(names[i]);
+    }
+    std::free(names);
+}
+
+// The file at the path goes with this process.
+void ListeningSocket::own(const std::string& path) {
+    struct stat status;
+    if (lstat(path.c_str(), &status) != 0) return;
+    boundPath_ = path;
+    device_ = status.st_dev;
+    inode_ = status.st_ino;
+}
+
+PassedSocket ListeningSocket::release() {
+    const bool isBoundByUs = !std::exchange(boundPath_, "").empty();
+    return {std::move(file_), isBoundByUs};
 }
 
 // The socket is made ready under a second name and then takes the path in one step: who finds it there can connect, and
@@ -87,15 +109,14 @@ MaybeError ListeningSocket::bind(const std::string& path) {
     if (!file) return systemError("make", path, errno);
     unlink(newPath.c_str());
     const mode_t mode = path.starts_with(systemFolder) ? 0666 : 0600;
-    struct stat status;
-    if (::bind(file.number(), generic(*newAddress), sizeof *newAddress) != 0 || chmod(newPath.c_str(), mode) != 0 ||
-        listen(file.number(), SOMAXCONN) != 0 || lstat(newPath.c_str(), &status) != 0 ||
+    if (::bind(file.number(), generic(*newAddress), sizeof *newAddress) != 0)
+        return systemError("listen at", path, errno);
+    own(newPath);
+    if (chmod(newPath.c_str(), mode) != 0 || listen(file.number(), SOMAXCONN) != 0 ||
         rename(newPath.c_str(), path.c_str()) != 0)
         return systemError("listen at", path, errno);
     file_ = std::move(file);
     boundPath_ = path;
-    device_ = status.st_dev;
-    inode_ = status.st_ino;
     return std::nullopt;
 }
 

@@ -1,5 +1,6 @@
-// The socket at which clients connect: the one that the service manager passed, else one bound at a path, which takes
-// the place of a file that a dead agent left there and goes with its owner. Main thread.
+// The socket at which clients connect: the one that the service manager passed, or an earlier program of this process,
+// else one bound at a path, which takes the place of a file that a dead agent left there. A socket that this process
+// has bound goes with it. Main thread.
 #pragma once
 
 #include <sys/types.h>
@@ -10,6 +11,14 @@
 #include "platform/error.h"
 
 namespace vrx::host {
+
+// A socket for the program that this process executes next.
+struct PassedSocket {
+    Descriptor file;
+    bool isBoundByUs = false;  // else the service manager keeps it
+    // The name under which such a socket is passed.
+    static constexpr const char* boundByUsName = "vrxagent-bound";
+};
 
 class ListeningSocket {
 public:
@@ -24,12 +33,15 @@ public:
 
     bool isOpen() const { return static_cast<bool>(file_); }
     int number() const { return file_.number(); }
+    PassedSocket release();
 
 private:
+    void takePassed(const std::string& path);
+    void own(const std::string& path);
     platform::MaybeError bind(const std::string& path);
 
     Descriptor file_;
-    std::string boundPath_;  // empty for one that was passed: the service manager keeps it
+    std::string boundPath_;  // empty for one that the service manager keeps
     dev_t device_ = 0;
     ino_t inode_ = 0;
 };

@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "host/service/descriptor.h"
+#include "platform/process_lifecycle.h"
 #include "platform/value.h"
 
 namespace vrx {
@@ -26,6 +27,7 @@ using RequestNumber = std::uint64_t;
 struct RequestReply {
     RequestNumber request;
     std::optional<platform::Value> root;
+    platform::WorkInFlight work;  // until it is sent
 };
 
 class ReplySender {
@@ -59,24 +61,26 @@ private:
     std::atomic<bool> hasPending_ = false;
 };
 
-// The obligation to answer one request. It keeps the object that serves the request alive; when it is dropped, the
-// caller is told that there will be no reply.
+// The obligation to answer one request. It keeps the object that serves the request alive, and the process; when it is
+// dropped, the caller is told that there will be no reply.
 class PendingReply {
 public:
-    PendingReply(std::shared_ptr<ReplyBox> box, RequestNumber request, std::shared_ptr<VRXAgentProtocol> server)
-        : box_(std::move(box)), request_(request), server_(std::move(server)) {}
+    PendingReply(std::shared_ptr<ReplyBox> box, RequestNumber request, std::shared_ptr<VRXAgentProtocol> server,
+                 platform::WorkInFlight work)
+        : box_(std::move(box)), request_(request), server_(std::move(server)), work_(std::move(work)) {}
     PendingReply(PendingReply&&) = default;
     PendingReply& operator=(PendingReply&&) = delete;
     ~PendingReply() {
-        if (box_) box_->put({request_, std::nullopt});
+        if (box_) box_->put({request_, std::nullopt, work_});
     }
 
-    void send(platform::Value root) { std::exchange(box_, nullptr)->put({request_, std::move(root)}); }
+    void send(platform::Value root) { std::exchange(box_, nullptr)->put({request_, std::move(root), work_}); }
 
 private:
     std::shared_ptr<ReplyBox> box_;
     RequestNumber request_;
     std::shared_ptr<VRXAgentProtocol> server_;
+    platform::WorkInFlight work_;
 };
 
 }  // namespace vrx::host

@@ -1,5 +1,6 @@
 #include "host/service/service_connection.h"
 
+#include <poll.h>
 #include <pthread.h>
 
 #include "host/service/client_session.h"
@@ -10,11 +11,13 @@ namespace vrx::host {
 using platform::Value;
 
 ServiceConnection::ServiceConnection(Descriptor socket, PeerIdentity peer, const BundleLookup& bundles,
-                                     const ServiceLimits& limits, std::function<void()> onEnd)
+                                     const ServiceLimits& limits, ProcessLifecycle& lifecycle,
+                                     std::function<void()> onEnd)
     : socket_(std::move(socket)),
       peer_(std::move(peer)),
       bundles_(bundles),
       limits_(limits),
+      lifecycle_(lifecycle),
       onEnd_(std::move(onEnd)) {}
 
 ServiceConnection::~ServiceConnection() {
@@ -40,14 +43,24 @@ void ServiceConnection::setExportedInterface(std::string_view protocolName) {
 }
 
 void ServiceConnection::resume() {
+    servedSocket_ = socket_.number();
     thread_ = std::thread([this] { serve(); });
 }
 
 void ServiceConnection::serve() {
     pthread_setname_np(pthread_self(), "connection");
-    ClientSession(std::move(socket_), peer_, std::move(object_), box_, limits_).serve(isStopping_);
+    {
+        ClientSession session(std::move(socket_), peer_, std::move(object_), box_, limits_, lifecycle_);
+        session.serve(isStopping_);
+        servedSocket_ = -1;  // before the session closes it
+    }
     hasEnded_ = true;
     onEnd_();
+}
+
+bool ServiceConnection::hasUnread() const {
+    pollfd file{servedSocket_, POLLIN, 0};
+    return file.fd >= 0 && poll(&file, 1, 0) > 0;
 }
 
 std::string ServiceConnection::refusal() const {

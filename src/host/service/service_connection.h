@@ -8,6 +8,7 @@
 #include <string>
 #include <thread>
 
+#include "host/process_lifecycle.h"
 #include "host/service/bundle_lookup.h"
 #include "host/service/descriptor.h"
 #include "host/service/peer_identity.h"
@@ -21,7 +22,7 @@ class ServiceConnection final : public platform::ServiceConnection {
 public:
     // onEnd is called on the connection's thread when it has nothing more to do.
     ServiceConnection(Descriptor socket, PeerIdentity peer, const BundleLookup& bundles, const ServiceLimits& limits,
-                      std::function<void()> onEnd);
+                      ProcessLifecycle& lifecycle, std::function<void()> onEnd);
     // Ends the connection. Waits for the operation under way, if any, to return; its reply goes nowhere.
     ~ServiceConnection() override;
 
@@ -34,6 +35,8 @@ public:
     const PeerIdentity& peer() const { return peer_; }
     bool isResumed() const { return thread_.joinable(); }
     bool hasEnded() const { return hasEnded_; }
+    // Whether the client has sent what its thread has not begun to read. Only while no work is in flight nor begins.
+    bool hasUnread() const;
     // Begins to end it, without waiting.
     void stop();
 
@@ -48,12 +51,14 @@ private:
     const PeerIdentity peer_;
     const BundleLookup& bundles_;
     const ServiceLimits& limits_;
+    ProcessLifecycle& lifecycle_;
     const std::function<void()> onEnd_;
     mutable std::string missingEntitlement_;
     std::shared_ptr<VRXAgentProtocol> object_;
     const std::shared_ptr<ReplyBox> box_ = std::make_shared<ReplyBox>();
     std::atomic<bool> isStopping_ = false;
     std::atomic<bool> hasEnded_ = false;
+    std::atomic<int> servedSocket_ = -1;
     std::thread thread_;
 };
 

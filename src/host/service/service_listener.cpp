@@ -4,10 +4,12 @@
 #include <sys/eventfd.h>
 #include <sys/socket.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <list>
 #include <system_error>
 
+#include "host/event_source.h"
 #include "host/service/refusals.h"
 #include "host/service/service_connection.h"
 #include "platform/log.h"
@@ -21,18 +23,6 @@ using platform::Result;
 
 namespace {
 
-struct EventSourceRelease {
-    void operator()(sd_event_source* source) const { sd_event_source_disable_unref(source); }
-};
-using EventSource = std::unique_ptr<sd_event_source, EventSourceRelease>;
-
-EventSource addSource(sd_event* loop, int file, sd_event_io_handler_t handler, void* userdata) {
-    sd_event_source* source = nullptr;
-    const int r = sd_event_add_io(loop, &source, file, EPOLLIN, handler, userdata);
-    if (r < 0) throw std::system_error(-r, std::generic_category(), "service listener");
-    return EventSource(source);
-}
-
 Descriptor openSpare() {
     return Descriptor(open("/dev/null", O_RDONLY | O_CLOEXEC));
 }
@@ -41,18 +31,22 @@ Descriptor openSpare() {
 
 class ServiceListenerFactory::Listener final : public platform::ServiceListener {
 public:
-    Listener(sd_event* loop, int socket, const BundleLookup& bundles, const ServiceLimits& limits)
+    Listener(sd_event* loop, int socket, const BundleLookup& bundles, ProcessLifecycle& lifecycle,
+             const ServiceLimits& limits)
         : loop_(loop),
           socket_(socket),
           bundles_(bundles),
+          lifecycle_(lifecycle),
           limits_(limits),
           refusals_(limits),
           endedFile_(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)),
           spare_(openSpare()) {
-        endedSource_ = addSource(loop_, endedFile_.number(), onEnded, this);
+        endedSource_ = addReadSource(loop_, endedFile_.number(), onEnded, this);
+        lifecycle_.setUnreadQuestion([this] { return hasUnread(); });
     }
 
     ~Listener() override {
+        lifecycle_.setUnreadQuestion(nullptr);
         acceptSource_.reset();
         endedSource_.reset();
         for (auto& connection : connections_) connection->stop();
@@ -60,7 +54,7 @@ public:
     }
 
     void setDelegate(platform::ServiceListenerDelegate* delegate) override { delegate_ = delegate; }
-    void resume() override { acceptSource_ = addSource(loop_, socket_, onIncoming, this); }
+    void resume() override { acceptSource_ = addReadSource(loop_, socket_, onIncoming, this); }
 
 private:
     static int onIncoming(sd_event_source*, int, std::uint32_t, void* self) {
@@ -77,6 +71,11 @@ private:
 
     void removeEnded() {
         std::erase_if(connections_, [](auto& connection) { return connection->hasEnded(); });
+    }
+
+    bool hasUnread() const {
+        return std::any_of(connections_.begin(), connections_.end(),
+                           [](const auto& connection) { return connection->hasUnread(); });
     }
 
     void acceptAll() {
@@ -110,7 +109,7 @@ private:
                                     "too many connections: " + std::to_string(connections_.size()));
         auto connection =
             std::make_unique<ServiceConnection>(std::move(client), std::move(peer).value(), bundles_, limits_,
-                                                [this] { eventfd_write(endedFile_.number(), 1); });
+                                                lifecycle_, [this] { eventfd_write(endedFile_.number(), 1); });
         try {
             const BundleLookup::Acceptance acceptance(connection->peer());
             if (delegate_->shouldAcceptNewConnection(*this, *connection) && connection->isResumed())
@@ -131,6 +130,7 @@ private:
     sd_event* const loop_;
     const int socket_;
     const BundleLookup& bundles_;
+    ProcessLifecycle& lifecycle_;
     const ServiceLimits& limits_;
     platform::ServiceListenerDelegate* delegate_ = nullptr;
     Refusals refusals_;
@@ -142,7 +142,7 @@ private:
 };
 
 std::unique_ptr<platform::ServiceListener> ServiceListenerFactory::makeListener(std::string /*serviceName*/) {
-    return std::make_unique<Listener>(loop_, socket_.number(), bundles_, limits_);
+    return std::make_unique<Listener>(loop_, socket_.number(), bundles_, lifecycle_, limits_);
 }
 
 }  // namespace vrx::host

@@ -2,7 +2,7 @@
 // accepted one on a thread of its own.
 //
 //     BundleLookup bundles([&] { return host.profile().facts(); });
-//     ServiceListenerFactory factory(host.mainLoop().event(), bundles);
+//     ServiceListenerFactory factory(host.mainLoop().event(), bundles, host.lifecycle());
 //     if (MaybeError error = factory.open(socketPath)) …         // tell, and exit
 //     host.setServiceListenerFactory(&factory);
 //
@@ -14,6 +14,7 @@
 #include <memory>
 #include <string>
 
+#include "host/process_lifecycle.h"
 #include "host/service/bundle_lookup.h"
 #include "host/service/listening_socket.h"
 #include "host/service/service_limits.h"
@@ -24,9 +25,11 @@ namespace vrx::host {
 
 class ServiceListenerFactory final : public platform::ServiceListenerFactory {
 public:
-    // The event loop and the lookup are not owned and must outlive the factory; it must outlive its listeners.
-    ServiceListenerFactory(sd_event* loop, const BundleLookup& bundles, const ServiceLimits& limits = {})
-        : loop_(loop), bundles_(bundles), limits_(limits) {}
+    // The event loop, the lookup and the lifecycle are not owned and must outlive the factory; it must outlive its
+    // listeners.
+    ServiceListenerFactory(sd_event* loop, const BundleLookup& bundles, ProcessLifecycle& lifecycle,
+                           const ServiceLimits& limits = {})
+        : loop_(loop), bundles_(bundles), lifecycle_(lifecycle), limits_(limits) {}
 
     // Takes the socket that the service manager passed, else binds one at the path. Clients can connect from now on,
     // and wait until the listener is resumed. An error's text is for people.
@@ -35,11 +38,15 @@ public:
     // One at a time, of the open socket, whatever the service's name.
     std::unique_ptr<platform::ServiceListener> makeListener(std::string serviceName) override;
 
+    // The open socket, for the program that this process executes next: clients that connect meanwhile wait in it.
+    PassedSocket release() { return socket_.release(); }
+
 private:
     class Listener;
 
     sd_event* const loop_;
     const BundleLookup& bundles_;
+    ProcessLifecycle& lifecycle_;
     const ServiceLimits limits_;
     ListeningSocket socket_;
 };

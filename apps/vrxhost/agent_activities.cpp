@@ -1,0 +1,59 @@
+#include "agent_activities.h"
+
+#include <algorithm>
+#include <array>
+#include <memory>
+
+#include "host/machine_conditions.h"
+#include "platform/vendor.h"
+#include "scheduling/follow_up_post.h"
+#include "scheduling/follow_up_refresh.h"
+#include "scheduling/outreach_activity.h"
+#include "scheduling/scheduler.h"
+#include "scheduling/start_up_activities.h"
+
+namespace vrx::apps {
+
+using platform::Date;
+
+namespace {
+
+template <class Activity>
+AgentActivity own() {
+    const auto scheduler =
+        VRXScheduler::newSchedulerWithActivityDelegate(std::make_shared<Activity>(ActivityCollaborators{}));
+    return {.identifier = scheduler->identifier(), .targetDate = scheduler->scheduledActivityDate()};
+}
+
+AgentActivity& entryFor(std::vector<AgentActivity>& activities, const std::string& identifier) {
+    const auto found = std::ranges::find(activities, identifier, &AgentActivity::identifier);
+    return found == activities.end() ? activities.emplace_back(AgentActivity{identifier}) : *found;
+}
+
+}  // namespace
+
+platform::Result<std::vector<AgentActivity>> agentActivities(AgentView& view) {
+    const platform::Result<host::ActivityList> list = host::listActivities(view.database());
+    if (!list) return list.error();
+    const platform::Moment now = host::presentMoment();
+    std::vector<AgentActivity> activities{own<VRXPostUpgradeActivity>(), own<VRXPostBootActivity>(),
+                                          own<VRXOutreachActivity>(), own<VRXFollowUpPost>(),
+                                          own<VRXFollowUpRefresh>()};
+    for (const host::ScheduledActivity& scheduled : list->scheduled) {
+        AgentActivity& activity = entryFor(activities, scheduled.identifier);
+        activity.scheduled = scheduled;
+        activity.due = now.wall + timeLeft(carriedOver(scheduled.due, now), now);
+    }
+    for (const host::ActivityRun& run : list->runs) entryFor(activities, run.identifier).lastRun = run;
+    return activities;
+}
+
+const AgentActivity& activityNamed(const std::vector<AgentActivity>& activities, std::string_view name) {
+    return *std::ranges::find(activities, activityIdentifier(name), &AgentActivity::identifier);
+}
+
+std::string activityIdentifier(std::string_view name) {
+    return platform::vendorIdentifier(platform::serviceNameRemainder).append(".").append(name);
+}
+
+}  // namespace vrx::apps

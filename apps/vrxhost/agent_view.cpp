@@ -1,0 +1,136 @@
+#include "agent_view.h"
+
+#include <filesystem>
+#include <utility>
+
+#include "home.h"
+#include "host/host_facts.h"
+#include "service/register_defaults.h"
+
+namespace vrx::apps {
+
+using platform::Dictionary;
+using platform::MaybeError;
+using platform::Value;
+
+Value UnwrittenDefaults::get(std::string_view key) const {
+    std::lock_guard lock(mutex_);
+    if (const auto kept = kept_.find(key); kept != kept_.end()) return kept->second;
+    Value stored = isStoreUsed_ ? store_.get(key) : Value();
+    if (!stored.isNull()) return stored;
+    const auto registered = registered_.find(key);
+    return registered == registered_.end() ? Value() : registered->second;
+}
+
+void UnwrittenDefaults::set(std::string_view key, Value value) {
+    std::lock_guard lock(mutex_);
+    kept_[std::string(key)] = std::move(value);
+}
+
+void UnwrittenDefaults::update(std::string_view key, const std::function<Value(const Value&)>& change) {
+    set(key, change(get(key)));
+}
+
+void UnwrittenDefaults::registerDefaults(const Dictionary& values) {
+    std::lock_guard lock(mutex_);
+    for (const auto& [key, value] : values) registered_[key] = value;
+}
+
+Dictionary UnwrittenDefaults::dictionaryRepresentation() const {
+    Dictionary all = isStoreUsed_ ? store_.dictionaryRepresentation() : Dictionary();
+    std::lock_guard lock(mutex_);
+    all.insert(registered_.begin(), registered_.end());
+    for (const auto& [key, value] : kept_) all[key] = value;
+    std::erase_if(all, [](const auto& entry) { return entry.second.isNull(); });
+    return all;
+}
+
+void ErrorLog::write(const platform::LogEntry& entry) {
+    std::lock_guard lock(mutex_);
+    messages_.push_back(entry.message());
+}
+
+std::vector<std::string> ErrorLog::take() {
+    std::lock_guard lock(mutex_);
+    return std::exchange(messages_, {});
+}
+
+std::string AgentLocale::preferredLocaleIdentifier() const {
+    if (profile_.facts()->language) return profile_.preferredLocaleIdentifier();
+    const std::optional<std::string> found = host::hostFact(database_, host::facts::language);
+    return found ? *found : profile_.preferredLocaleIdentifier();
+}
+
+namespace {
+
+std::string agentProfile(const std::optional<std::string>& named, host::Database& database) {
+    if (named) return *named;
+    const std::optional<std::string> told = host::hostFact(database, host::facts::profile);
+    return told ? *told : wire::findLocations().profile.path;
+}
+
+}  // namespace
+
+AgentView::AgentView(const std::string& home, const std::optional<std::string>& profile)
+    : home_(home),
+      facilities_{.systemLog = &errors_},
+      platform_(facilities_),
+      current_(platform_),
+      files_(home),
+      database_(host::Database::toLookAt(Home::databasePath(home))),
+      stored_(database_),
+      defaults_(stored_),
+      followUps_(database_),
+      profile_(agentProfile(profile, database_)),
+      locale_(profile_, database_),
+      accounts_(profile_, home),
+      clock_(profile_),
+      telephony_(profile_) {
+    vrx_registerDefaults(defaults_);
+    facilities_ = {.accountStore = &accounts_,
+                   .clock = &clock_,
+                   .defaultsStore = &defaults_,
+                   .deviceProperties = &profile_,
+                   .digest = &digest_,
+                   .featureFlags = &profile_,
+                   .files = &files_,
+                   .followUpControllers = &followUps_,
+                   .json = &json_,
+                   .locale = &locale_,
+                   .pairedDeviceRegistry = &profile_,
+                   .propertyList = &propertyList_,
+                   .systemLog = &errors_,
+                   .telephonyNetworkInfo = &telephony_};
+    platform_ = platform::Platform(facilities_);
+}
+
+MaybeError AgentView::open() {
+    MaybeError error = database_.open();
+    if (!error) defaults_.useStore();
+    return error;
+}
+
+void AgentView::use(platform::Queues* queues, platform::HttpSessions* sessions) {
+    facilities_.queues = queues;
+    facilities_.httpSessions = sessions;
+    platform_ = platform::Platform(facilities_);
+}
+
+CommandLine::Verb looking(const wire::LocationOverrides& places, std::shared_ptr<std::optional<std::string>> profile,
+                          std::function<Outcome(AgentView&)> verb) {
+    return [&places, profile = std::move(profile), verb = std::move(verb)] {
+        AgentView view(absolutePath(wire::findLocations(places).home.path), *profile);
+        const std::string database = Home::databasePath(view.home());
+        std::error_code error;
+        if (!std::filesystem::exists(database, error)) return notReachable("there is no agent's database " + database);
+        if (MaybeError problem = view.open())
+            return failed(ExitCode::NotReachable, problem->text, "vrxhost doctor tells what is wrong, and what to do.");
+        return verb(view);
+    };
+}
+
+void addProfileOption(CLI::App* verb, std::optional<std::string>& profile) {
+    verb->add_option("--device", profile, "The agent's device profile")->type_name("PATH");
+}
+
+}  // namespace vrx::apps

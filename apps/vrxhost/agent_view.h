@@ -1,0 +1,123 @@
+// What an agent of a home finds, without the agent: the agent's own classes read here what they would read there.
+// Nothing is written: what they store is kept in memory, and the home's files stay as they are. One thread makes and
+// ends it.
+#pragma once
+
+#include <atomic>
+#include <functional>
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "codec/codec.h"
+#include "command_line.h"
+#include "host/account_store.h"
+#include "host/clock.h"
+#include "host/database.h"
+#include "host/defaults_store.h"
+#include "host/device_profile.h"
+#include "host/files.h"
+#include "host/follow_up_controller.h"
+#include "host/telephony_network_info.h"
+#include "platform/locale.h"
+#include "platform/log.h"
+#include "platform/platform.h"
+#include "wire/locations.h"
+
+namespace vrx::apps {
+
+// The settings of a store, over which those that are stored here are kept in memory.
+class UnwrittenDefaults final : public platform::DefaultsStore {
+public:
+    explicit UnwrittenDefaults(const platform::DefaultsStore& store) : store_(store) {}
+
+    // Reads the store from now on; until then only registered values are there.
+    void useStore() { isStoreUsed_ = true; }
+
+    platform::Value get(std::string_view key) const override;
+    void set(std::string_view key, platform::Value value) override;
+    void update(std::string_view key, const std::function<platform::Value(const platform::Value&)>& change) override;
+    void registerDefaults(const platform::Dictionary& values) override;
+    platform::Dictionary dictionaryRepresentation() const override;
+
+private:
+    const platform::DefaultsStore& store_;
+    std::atomic<bool> isStoreUsed_ = false;
+    mutable std::mutex mutex_;
+    platform::Dictionary kept_;  // null for what was removed
+    platform::Dictionary registered_;
+};
+
+// Keeps what is wrong, and drops the rest.
+class ErrorLog final : public platform::SystemLog {
+public:
+    bool isOn(platform::Level level) const override { return level == platform::Level::Error; }
+    void write(const platform::LogEntry& entry) override;
+    // Those since the last call.
+    std::vector<std::string> take();
+
+private:
+    std::mutex mutex_;
+    std::vector<std::string> messages_;
+};
+
+// The language that the agent has last found, which may be another than this process's; else the profile's.
+class AgentLocale final : public platform::Locale {
+public:
+    AgentLocale(const host::DeviceProfile& profile, host::Database& database)
+        : profile_(profile), database_(database) {}
+    std::string preferredLocaleIdentifier() const override;
+    std::string decimalText(std::uint64_t number) const override { return profile_.decimalText(number); }
+
+private:
+    const host::DeviceProfile& profile_;
+    host::Database& database_;
+};
+
+class AgentView {
+public:
+    // The home may be missing, as may all in it. The profile is the one that the agent has told of in its database,
+    // unless another is named.
+    AgentView(const std::string& home, const std::optional<std::string>& profile);
+
+    // Reads the database from now on, if it can. Until then the registered settings hold, and nothing is pending.
+    platform::MaybeError open();
+
+    const std::string& home() const { return home_; }
+    host::Database& database() { return database_; }
+    const host::DeviceProfile& profile() const { return profile_; }
+    ErrorLog& errors() { return errors_; }
+
+    // What only some need, for as long as they do; while no other thread uses the platform. Not owned.
+    void use(platform::Queues* queues, platform::HttpSessions* sessions);
+
+private:
+    const std::string home_;
+    ErrorLog errors_;
+    platform::Platform::Facilities facilities_;
+    platform::Platform platform_;
+    platform::ScopedPlatform current_;
+    codec::Digest digest_;
+    codec::Json json_;
+    codec::PropertyList propertyList_;
+    host::Files files_;
+    host::Database database_;
+    host::DefaultsStore stored_;
+    UnwrittenDefaults defaults_;
+    host::FollowUpControllers followUps_;
+    host::DeviceProfile profile_;
+    AgentLocale locale_;
+    host::AccountStore accounts_;
+    host::Clock clock_;
+    host::TelephonyNetworkInfo telephony_;
+};
+
+// A verb that looks at the home of an agent, which must be there, and writes nothing. The places are read when it runs.
+CommandLine::Verb looking(const wire::LocationOverrides& places, std::shared_ptr<std::optional<std::string>> profile,
+                          std::function<Outcome(AgentView&)> verb);
+// --device, which names the profile.
+void addProfileOption(CLI::App* verb, std::optional<std::string>& profile);
+
+}  // namespace vrx::apps

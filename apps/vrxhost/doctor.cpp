@@ -1,0 +1,353 @@
+// vrxhost doctor: whether an agent's surroundings are as it needs them, and what to do next.
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/un.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cmath>
+#include <cstring>
+#include <filesystem>
+#include <fstream>
+
+#include "agent_activities.h"
+#include "agent_view.h"
+#include "host/home_lock.h"
+#include "host/network_routes.h"
+#include "host/service/bundle_lookup.h"
+#include "host/service/descriptor.h"
+#include "platform/defaults_store.h"
+#include "platform/text.h"
+#include "platform/vendor.h"
+#include "reachability.h"
+#include "verbs.h"
+
+namespace vrx::apps {
+
+using platform::Array;
+using platform::Dictionary;
+using platform::MaybeError;
+using platform::Platform;
+using platform::Result;
+using platform::Value;
+
+namespace {
+
+enum class Health : std::uint8_t { Good, Note, Problem, Skipped };
+
+const char* nameOf(Health health) {
+    switch (health) {
+        case Health::Good: return "good";
+        case Health::Note: return "note";
+        case Health::Problem: return "problem";
+        case Health::Skipped: return "skipped";
+    }
+    return "";
+}
+
+struct Check {
+    std::string name;
+    Health health;
+    std::string finding;
+    std::string advice{};
+    ExitCode code = ExitCode::NoAnswer;  // when it is the first problem
+};
+
+Check good(std::string finding) {
+    return {"", Health::Good, std::move(finding)};
+}
+
+Check note(std::string finding, std::string advice = "") {
+    return {"", Health::Note, std::move(finding), std::move(advice)};
+}
+
+Check problem(std::string finding, std::string advice, ExitCode code = ExitCode::NoAnswer) {
+    return {"", Health::Problem, std::move(finding), std::move(advice), code};
+}
+
+Check skipped(std::string finding) {
+    return {"", Health::Skipped, std::move(finding)};
+}
+
+class Examination {
+public:
+    Examination(AgentView& view, wire::Locations places, platform::Duration limit)
+        : view_(view), places_(std::move(places)), limit_(limit) {
+        if (view_.profile().path() != places_.profile.path) places_.profile = {view_.profile().path(), "the agent"};
+    }
+
+    std::vector<Check> run() {
+        add("home", home());
+        add("database", database());
+        add("profile", profile());
+        add("agent", agent());
+        add("socket", socket());
+        add("entitlement", entitlement());
+        add("account", account());
+        add("credential helper", credentialHelper());
+        add("network", network());
+        const Reachability servers = askServers(view_, limit_);
+        add("server version", serverVersion(servers));
+        add("coverage server", coverageServer(servers));
+        add("activities", activities());
+        return std::move(checks_);
+    }
+
+private:
+    void add(const char* name, Check check) {
+        check.name = name;
+        checks_.push_back(std::move(check));
+    }
+
+    Check home() const;
+    Check database();
+    Check profile() const;
+    Check agent();
+    Check socket() const;
+    Check entitlement() const;
+    Check account() const;
+    Check credentialHelper() const;
+    Check network() const;
+    Check serverVersion(const Reachability& servers) const;
+    Check coverageServer(const Reachability& servers) const;
+    Check activities();
+
+    AgentView& view_;
+    wire::Locations places_;
+    const platform::Duration limit_;
+    std::vector<Check> checks_;
+    bool isDatabaseReadable_ = false;
+    bool isAgentRunning_ = false;
+};
+
+std::string chosen(const wire::Location& place) {
+    return place.path + ", by " + place.chosenBy;
+}
+
+Check Examination::home() const {
+    struct stat status;
+    if (stat(view_.home().c_str(), &status) != 0 || !S_ISDIR(status.st_mode))
+        return problem("there is none at " + chosen(places_.home),
+                       "Start an agent, which makes it; or name the home of the one that runs with --home.",
+                       ExitCode::NotReachable);
+    if (access(view_.home().c_str(), R_OK | W_OK | X_OK) != 0)
+        return problem(chosen(places_.home) + ": this user may not use it",
+                       "Run vrxhost as the agent's user, number " + std::to_string(status.st_uid) + ".",
+                       ExitCode::NotReachable);
+    if (status.st_mode & 0077) return note(chosen(places_.home) + ": others may look in", "chmod 700 " + view_.home());
+    return good(chosen(places_.home));
+}
+
+Check Examination::database() {
+    const MaybeError error = view_.open();
+    isDatabaseReadable_ = !error;
+    if (isDatabaseReadable_) return good("readable, and of this release");
+    std::error_code ignored;
+    if (!std::filesystem::exists(view_.home() + "/host.db", ignored))
+        return problem("there is none", "Start an agent, which makes it.", ExitCode::NotReachable);
+    return problem(
+        error->text,
+        "An agent takes over one of an older release, and sets a damaged one aside and begins afresh; one of "
+        "a newer release it leaves alone: use that release.",
+        ExitCode::NotReachable);
+}
+
+Check Examination::profile() const {
+    const std::string& path = places_.profile.path;
+    if (path.empty()) return good("none: the machine's own facts hold");
+    const Result<host::FileContent> file = host::readFile(path);
+    if (!file && file.error().code == ENOENT)
+        return note("there is none at " + chosen(places_.profile) + ": the machine's own facts hold");
+    if (!file) return problem(file.error().text, "Let the agent's user read it.");
+    const Result<host::ProfileReading> reading =
+        host::parseProfile({reinterpret_cast<const char*>(file->bytes.data()), file->bytes.size()}, path);
+    if (!reading)
+        return problem(reading.error().text, "Correct the line; until then the agent goes by what it read before.");
+    if (!reading->warnings.empty())
+        return note(reading->warnings.front(), "Correct or remove what means nothing to the agent.");
+    if (!view_.profile().facts()->isTrusted)
+        return note(chosen(places_.profile) +
+                        ": others can write it, so what it says of bundles, authorities and helpers does not count",
+                    "chown it to root or the agent's user, and chmod go-w " + path);
+    return good(chosen(places_.profile));
+}
+
+Check Examination::agent() {
+    isAgentRunning_ = host::HomeLock::isInUse(view_.home());
+    if (isAgentRunning_) return good("one has this home");
+    return problem("none has this home",
+                   "Start it: systemctl --user start vrxagent, or vrxagent with the same --home and --device.",
+                   ExitCode::NotReachable);
+}
+
+// Whether somebody listens at the path, without a connection, which would have a service manager start an agent.
+bool isListenedAt(const std::string& path) {
+    std::ifstream sockets("/proc/net/unix");
+    constexpr const char* accepting = " 00010000 ";
+    for (std::string line; std::getline(sockets, line);)
+        if (line.ends_with(" " + path) && line.find(accepting) != std::string::npos) return true;
+    return false;
+}
+
+Check Examination::socket() const {
+    const std::string& path = places_.socket.path;
+    const std::string advice = "Name the agent's socket with --socket, or start an agent.";
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    if (path.size() >= sizeof address.sun_path)
+        return problem(chosen(places_.socket) + ": the path is too long", "Name a shorter one with --socket.",
+                       ExitCode::NotReachable);
+    if (!isAgentRunning_)
+        return isListenedAt(path)
+                   ? good(chosen(places_.socket) + ": the service manager starts an agent for a client")
+                   : problem(chosen(places_.socket) + ": nobody listens", advice, ExitCode::NotReachable);
+    path.copy(address.sun_path, sizeof address.sun_path - 1);
+    const host::Descriptor client(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
+    if (connect(client.number(), reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0 || errno == EAGAIN)
+        return good(chosen(places_.socket));
+    return problem(chosen(places_.socket) + ": " + std::strerror(errno), advice, ExitCode::NotReachable);
+}
+
+// Of the vrxctl that was installed with this program.
+Check Examination::entitlement() const {
+    std::error_code error;
+    const std::string program = std::filesystem::read_symlink("/proc/self/exe", error).replace_filename("vrxctl");
+    if (!std::filesystem::exists(program, error)) return note("there is no " + program);
+    const std::string entitlement = platform::vendorIdentifier(platform::entitlementRemainder);
+    const std::string grant = "A bundle.toml in its folder, or above, grants it: \"" + entitlement + "\" = true.";
+    if (const MaybeError open = host::isKeptFromOthers(program))
+        return problem(open->text, "Install the programs where only root and the agent's user can write.",
+                       ExitCode::Refused);
+    const auto bundle = host::BundleLookup([this] { return view_.profile().facts(); }).bundleOf(program);
+    if (!bundle) return problem(program + " is in no bundle", grant, ExitCode::Refused);
+    const auto granted = bundle->entitlements.find(entitlement);
+    if (granted == bundle->entitlements.end() || granted->second != Value(true))
+        return problem("the bundle of " + program + " does not hold " + entitlement, grant, ExitCode::Refused);
+    if (bundle->group) return note(program + " is entitled where its group is " + *bundle->group);
+    return good(program + " is entitled");
+}
+
+Check Examination::account() const {
+    const auto& store = Platform::current().accountStore();
+    const auto account = store.primaryCloudAccount();
+    const std::string advice = "Name the account in the profile: [account] identifier = \"…\".";
+    if (!account) return note("nobody is signed in: no cached record counts", advice);
+    if (!store.authenticationAccount(*account))
+        return note(account->identifier + " is signed in, without an account that signs requests", advice);
+    return good(account->identifier + " is signed in");
+}
+
+Check Examination::credentialHelper() const {
+    const auto facts = view_.profile().facts();
+    if (!facts->account) return skipped("needs an account");
+    if (facts->account->credentialHelper.empty())
+        return note("none: tokens are not renewed",
+                    "Name a program in the profile: [account] credential_helper = [\"/…\"].");
+    const std::string& program = facts->account->credentialHelper.front();
+    if (access(program.c_str(), X_OK) != 0)
+        return problem(program + " cannot be run: " + std::strerror(errno), "Correct the profile's credential_helper.");
+    if (!facts->isTrusted)
+        return problem(program + " is not run: others can write the profile", "chmod go-w " + places_.profile.path);
+    return good(program);
+}
+
+Check Examination::network() const {
+    const auto overridden = view_.profile().facts()->networkAvailable;
+    const bool isAvailable = overridden ? *overridden : host::NetworkRoutes(nullptr, {}).hasDefaultRoute();
+    const std::string by = overridden ? "by the profile" : "by the machine's routes";
+    if (isAvailable) return good("there is one, " + by);
+    return note("there is none, " + by + ": activities that need it wait",
+                overridden ? "Set [network] available = true in the profile." : "");
+}
+
+Check Examination::serverVersion(const Reachability& servers) const {
+    const std::string url = Platform::current().defaultsStore().string("ServerVersionURL").value_or("");
+    const std::string advice = "Is ServerVersionURL right? vrxhost defaults read ServerVersionURL.";
+    if (!servers.isServerVersionSupported) return problem(url + " did not answer in time", advice, ExitCode::TimedOut);
+    if (!servers.serverVersionErrors.empty()) return problem(servers.serverVersionErrors.front(), advice);
+    const std::string versions = printableValue(servers.serverVersions);
+    if (*servers.isServerVersionSupported) return good("shared with " + url);
+    return problem("none is shared with the server: " + versions,
+                   "Nothing is downloaded until the server offers one of LowServerVersion and HighServerVersion.");
+}
+
+Check Examination::coverageServer(const Reachability& servers) const {
+    const std::string advice = "Is WarrantyURL right? vrxhost defaults read WarrantyURL.";
+    if (!servers.coverage) return problem(servers.coverageUrl + " did not answer in time", advice, ExitCode::TimedOut);
+    const platform::HttpResponse& response = *servers.coverage;
+    if (response.error)
+        return problem(servers.coverageUrl + ": " + response.error->text, advice, ExitCode::NotReachable);
+    if (response.status >= 500)
+        return problem(servers.coverageUrl + " answers with " + std::to_string(response.status),
+                       "Try again later, or look at the server.");
+    return good(servers.coverageUrl + " answers");
+}
+
+Check Examination::activities() {
+    if (!isDatabaseReadable_) return skipped("needs the database");
+    const Result<std::vector<AgentActivity>> all = agentActivities(view_);
+    if (!all) return problem(all.error().text, "");
+    std::string text;
+    for (const AgentActivity& activity : *all)
+        if (const auto next = activity.nextRun())
+            text += (text.empty() ? "" : "; ") + activity.identifier + ", " + platform::describe(*next);
+    if (!text.empty()) return good(text);
+    return note("nothing is scheduled", "vrxctl outreach has the agent look for offers now.");
+}
+
+Outcome report(const std::vector<Check>& checks) {
+    const auto first = [&](Health health) {
+        return std::ranges::find_if(
+            checks, [health](const Check& check) { return check.health == health && !check.advice.empty(); });
+    };
+    const auto worst = first(Health::Problem);
+    const auto noted = worst == checks.end() ? first(Health::Note) : worst;
+    const std::string next = noted == checks.end()
+                                 ? "Nothing is wrong; vrxhost why SERIAL tells about a device's follow-up."
+                                 : noted->advice;
+    Outcome outcome;
+    if (worst != checks.end()) outcome = failed(worst->code, worst->name + ": " + worst->finding, worst->advice);
+    Array documents;
+    std::vector<std::vector<std::string>> rows;
+    for (const Check& check : checks) {
+        documents.push_back(Dictionary{{"name", check.name},
+                                       {"health", nameOf(check.health)},
+                                       {"finding", check.finding},
+                                       {"advice", check.advice}});
+        rows.push_back({check.name, nameOf(check.health), check.finding});
+    }
+    outcome.document = {{"checks", documents}, {"next", next}};
+    outcome.text = table(rows) + "Next: " + printable(next) + "\n";
+    return outcome;
+}
+
+std::string checkSeconds(const std::string& text) {
+    double seconds = 0;
+    const bool isNumber = CLI::detail::lexical_cast(text, seconds);
+    return isNumber && std::isfinite(seconds) && seconds > 0 ? "" : "'" + text + "' is no number of seconds above 0";
+}
+
+}  // namespace
+
+void addDoctorVerb(CommandLine& line, const wire::LocationOverrides& places) {
+    struct Options {
+        std::optional<std::string> profile, socket;
+        double limit = 10;
+    };
+    auto options = std::make_shared<Options>();
+    CLI::App* verb = line.add("doctor", "Checks what an agent needs, and tells what to do next", [&places, options] {
+        const wire::Locations found =
+            wire::findLocations({.home = places.home, .profile = options->profile, .socket = options->socket});
+        AgentView view(absolutePath(found.home.path), options->profile);
+        return report(Examination(view, found, platform::Duration(options->limit)).run());
+    });
+    addProfileOption(verb, options->profile);
+    verb->add_option("--socket", options->socket, "The agent's socket")->type_name("PATH");
+    verb->add_option("--timeout", options->limit, "How long to wait for the servers")
+        ->type_name("SECONDS")
+        ->check(checkSeconds, "")
+        ->capture_default_str();
+}
+
+}  // namespace vrx::apps

@@ -1,0 +1,47 @@
+// Why a device's follow-up is where it is: the first rule that decides, of those that the agent goes by. A pure
+// function of what the agent's own rules say.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+
+#include "followup/follow_up_rules.h"
+#include "platform/date.h"
+#include "service/cached_record.h"
+
+namespace vrx::apps {
+
+struct FollowUpCircumstances {
+    platform::Date now;
+    bool isTracked = false;     // the agent knows the device
+    bool isPending = false;     // its item is shown
+    bool wasPosted = false;     // before, so that no date is set for it again
+    bool isCarrierOut = false;  // the record leaves out a carrier of this device
+    bool hasRecord = false;
+    std::optional<CachedRecordFlaw> recordFlaw{};
+    PostDecision post{};
+    RefreshReason refresh{};
+    std::optional<platform::Date> eligibleUntil{};
+    std::optional<platform::Date> displayDate{};  // that the record names
+    // When the activities do their work next.
+    std::optional<platform::Date> outreach{};
+    std::optional<platform::Date> postRun{};
+    std::optional<platform::Date> posting{};  // by the next post run, or one that follows it by the agent's date rule
+};
+
+enum class FollowUpState : std::uint8_t { Shown, Dismissed, Waiting, NotOffered };
+enum class NextStep : std::uint8_t { None, Outreach, Post, Refresh };
+
+struct FollowUpExplanation {
+    FollowUpState state;
+    std::string rule;  // a name for programs
+    std::string text;
+    std::optional<platform::Date> until{};  // of one that waits, or is shown
+    NextStep next = NextStep::None;
+    std::string advice{};
+};
+
+FollowUpExplanation explainFollowUp(const FollowUpCircumstances& circumstances);
+
+}  // namespace vrx::apps

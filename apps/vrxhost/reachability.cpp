@@ -1,0 +1,50 @@
+#include "reachability.h"
+
+#include "host/http.h"
+#include "host/main_loop.h"
+#include "host/queues.h"
+#include "platform/clock.h"
+#include "serverversion/server_version_utilities.h"
+
+namespace vrx::apps {
+
+using platform::HttpResponse;
+using platform::Platform;
+
+Reachability askServers(AgentView& view, platform::Duration limit) {
+    platform::Platform& platform = Platform::current();
+    host::MainLoop loop;
+    host::Queues queues(loop);
+    host::HttpSessions sessions(queues.workers(platform::Priority::UserInitiated), platform.clock(), view.profile(),
+                                {.timeout = limit});
+    view.use(&queues, &sessions);
+    view.errors().take();
+
+    Reachability found;
+    int open = 2;
+    auto answered = [&](platform::Task note) {
+        loop.post([&, note = std::move(note)]() mutable {
+            note();
+            if (--open == 0) loop.stop();
+        });
+    };
+    VRXServerVersionUtilities::serverVersionSupported(
+        [&](bool isSupported) { answered([&found, isSupported] { found.isServerVersionSupported = isSupported; }); });
+    found.coverageUrl = platform.defaultsStore().string("WarrantyURL").value_or("");
+    platform::HttpRequest request;
+    request.url = found.coverageUrl;
+    sessions.makeUncached()->send(std::move(request), [&](HttpResponse response) {
+        answered([&found, response = std::move(response)]() mutable { found.coverage = std::move(response); });
+    });
+    loop.postAfter(limit, [&loop] { loop.stop(); });
+    loop.run();
+
+    sessions.stop();
+    queues.stop();
+    view.use(nullptr, nullptr);
+    found.serverVersionErrors = view.errors().take();
+    found.serverVersions = platform.defaultsStore().get(serverVersionCacheKey);
+    return found;
+}
+
+}  // namespace vrx::apps

@@ -1,0 +1,290 @@
+// vrxhost why: one device's follow-up, and the rule that decides about it now.
+#include <algorithm>
+#include <memory>
+#include <set>
+
+#include "agent_activities.h"
+#include "agent_view.h"
+#include "coverage/cache_metadata.h"
+#include "devices/device_info.h"
+#include "devices/devices_manager.h"
+#include "follow_up_explanation.h"
+#include "followup/follow_up_content.h"
+#include "followup/serial_number_hashes.h"
+#include "host/home_lock.h"
+#include "platform/defaults_store.h"
+#include "platform/sha256_hash.h"
+#include "platform/text.h"
+#include "platform/vendor.h"
+#include "scheduling/outreach_activity.h"
+#include "scheduling/post_date.h"
+#include "scheduling/refresh_date.h"
+#include "service/default_warranty_provider.h"
+#include "verbs.h"
+
+namespace vrx::apps {
+
+using platform::Array;
+using platform::Date;
+using platform::Dictionary;
+using platform::Duration;
+using platform::Platform;
+using platform::Result;
+using platform::Value;
+
+namespace {
+
+using DevicePtr = std::shared_ptr<VRXDevice>;
+using InfoPtr = std::shared_ptr<VRXDeviceInfo>;
+
+// A moment that rules are asked about.
+class FixedClock final : public platform::Clock {
+public:
+    explicit FixedClock(Date now) : now_(now) {}
+    Date now() const override { return now_; }
+    std::chrono::seconds timeZoneOffset() const override { return Platform::current().clock().timeZoneOffset(); }
+
+private:
+    const Date now_;
+};
+
+struct CachedRecord {
+    std::shared_ptr<VRXWarranty> record;  // also one that does not count
+    std::optional<CachedRecordFlaw> flaw;
+};
+
+CachedRecord cachedRecord(const std::optional<std::string>& serialNumber) {
+    VRXAgentDefaultWarrantyProvider provider(platform::vendorIdentifier(platform::settingsAppRemainder), {});
+    const auto record = provider.cachedWarrantyForSerialNumber(serialNumber);
+    return {record, record ? flawOfCachedRecord(provider, serialNumber) : std::nullopt};
+}
+
+InfoPtr infoOf(const DevicePtr& device) {
+    const CachedRecord cached = cachedRecord(device->serialNumber());
+    return VRXDeviceInfo::deviceInfoWithDevice(device, cached.flaw ? nullptr : cached.record);
+}
+
+// The settings that the rules for posts go by.
+struct PostSettings {
+    std::set<std::string> dismissed = serialNumberHashes(dismissedSerialNumberHashesKey);
+    PostDateSettings dates = PostDateSettings::read();
+};
+
+PostDecision decide(const VRXDeviceInfo& info, const PostSettings& settings, const platform::Clock& clock) {
+    const std::string hash = platform::sha256Hash(info.device()->serialNumber().value_or(""));
+    return decidePost(
+        info, {.isDismissed = settings.dismissed.contains(hash), .outreachDelay = settings.dates.outreachDelay}, clock);
+}
+
+// When the device's follow-up is posted, by the run at that date or by those that each sets for the next: as long as
+// the records stay as they are.
+std::optional<Date> predictedPosting(const std::string& serialNumber, const DeviceInfoList& infos,
+                                     PostSettings settings, Date run, Duration interval) {
+    constexpr int mostRuns = 1000;
+    for (int count = 0; count < mostRuns; ++count) {
+        for (const InfoPtr& info : infos) {
+            if (decide(*info, settings, FixedClock(run)).reason != PostReason::Due) continue;
+            if (info->device()->serialNumber() == serialNumber) return run;
+            settings.dates.postedSerialNumberHashes.insert(
+                platform::sha256Hash(info->device()->serialNumber().value_or("")));
+        }
+        const std::optional<Date> next = nextPostDate(infos, settings.dates, run);
+        if (!next) return std::nullopt;
+        run = std::max(*next, run + interval);
+    }
+    return std::nullopt;
+}
+
+Value valueOf(const std::optional<Date>& date) {
+    return date ? Value(*date) : Value();
+}
+
+const char* nameOf(FollowUpState state) {
+    switch (state) {
+        case FollowUpState::Shown: return "shown";
+        case FollowUpState::Dismissed: return "dismissed";
+        case FollowUpState::Waiting: return "waiting";
+        case FollowUpState::NotOffered: return "not-offered";
+    }
+    return "";
+}
+
+// Everything about one device that decides, and what is told of it.
+struct Findings {
+    FollowUpCircumstances circumstances;
+    std::optional<std::string> name{};
+    std::vector<std::pair<const char*, Value>> inputs{};
+    std::optional<Date> nextPost{}, nextRefresh{};
+};
+
+struct Activities {
+    const AgentActivity& outreach;
+    const AgentActivity& post;
+    const AgentActivity& refresh;
+};
+
+Result<std::set<std::string>> pendingSerialNumbers() {
+    const auto items =
+        Platform::current().followUpControllers().makeController(followUpClientIdentifier())->pendingFollowUpItems();
+    if (!items) return items.error();
+    std::set<std::string> serialNumbers;
+    for (const platform::FollowUpItem& item : *items)
+        if (const std::string* serialNumber = serialNumberOfItem(item)) serialNumbers.insert(*serialNumber);
+    return serialNumbers;
+}
+
+void addRecord(Findings& findings, const CachedRecord& cached, const std::string& serialNumber) {
+    auto metadata = [&](std::string_view key) {
+        return Platform::current().defaultsStore().get(cacheMetadataKey(serialNumber, key));
+    };
+    auto add = [&](const char* name, Value value) { findings.inputs.emplace_back(name, std::move(value)); };
+    add("recordStored", metadata(cachedWarrantyLastUpdatedDateKey));
+    add("recordLanguage", metadata(cachedWarrantyLocaleKey));
+    add("language", Platform::current().locale().preferredLocaleIdentifier());
+    add("signedIn", Platform::current().accountStore().primaryCloudAccount().has_value());
+    if (!cached.record) return;
+    const VRXWarranty& record = *cached.record;
+    add("qxOfferDisplay", record.qxOfferDisplay());
+    add("qxOfferEligibleUntil", valueOf(record.qxOfferEligibleUntil()));
+    add("qxOfferFollowupDisplayDate", valueOf(record.qxOfferFollowupDisplayDate()));
+    add("qxOfferDurationBeforeEndDate", record.qxOfferDurationBeforeEndDate().count());
+    add("qxOfferToggle", record.qxOfferToggle());
+    findings.circumstances.eligibleUntil = record.qxOfferEligibleUntil();
+    findings.circumstances.displayDate = record.qxOfferFollowupDisplayDate();
+    findings.circumstances.isCarrierOut = !VRXOutreachActivity::currentDeviceShouldReceiveOutreachForWarranty(record);
+}
+
+Findings examine(AgentView& view, const std::string& serialNumber, const std::set<std::string>& pending,
+                 const Activities& activities) {
+    const platform::Clock& clock = Platform::current().clock();
+    const DevicesBySerialNumber devices = VRXDevicesManager::sharedManager()->allDevices();
+    const auto found = devices.find(serialNumber);
+    const DevicePtr device = found != devices.end() ? found->second
+                                                    : VRXDevice::deviceWithName(std::nullopt, serialNumber,
+                                                                                std::nullopt, VRXDeviceTypeOther);
+    DeviceInfoList infos, shown;
+    for (const auto& [number, each] : devices) {
+        infos.push_back(infoOf(each));
+        if (pending.contains(number)) shown.push_back(infos.back());
+    }
+    const CachedRecord cached = cachedRecord(serialNumber);
+    const InfoPtr info = infoOf(device);
+    const PostSettings settings;
+
+    Findings findings{.circumstances = {.now = clock.now()}, .name = device->name()};
+    FollowUpCircumstances& facts = findings.circumstances;
+    facts.isTracked = found != devices.end();
+    facts.isPending = pending.contains(serialNumber);
+    facts.wasPosted = settings.dates.postedSerialNumberHashes.contains(platform::sha256Hash(serialNumber));
+    facts.hasRecord = cached.record != nullptr;
+    facts.recordFlaw = cached.flaw;
+    facts.post = decide(*info, settings, clock);
+    facts.refresh = decideRefresh(*info, {.isPending = facts.isPending}, clock);
+    facts.outreach = activities.outreach.nextRun();
+    facts.postRun = activities.post.nextRun();
+    if (facts.postRun)
+        facts.posting = predictedPosting(serialNumber, infos, settings, std::max(facts.now, *facts.postRun),
+                                         view.profile().facts()->minimumInterval.value_or(platform::minimumInterval));
+
+    findings.nextPost = nextPostDate(infos, settings.dates, facts.now);
+    findings.nextRefresh = nextRefreshDate(shown, true, RefreshDateSettings::read(), facts.now);
+    findings.inputs = {{"now", facts.now},
+                       {"activationDate", valueOf(device->activationDate())},
+                       {"PostUpgradeOutreachDelay", settings.dates.outreachDelay.count()},
+                       {"postDate", facts.post.postDate ? Value(facts.post.postDate->date) : Value()},
+                       {"pending", facts.isPending},
+                       {"posted", facts.wasPosted},
+                       {"dismissed", settings.dismissed.contains(platform::sha256Hash(serialNumber))}};
+    addRecord(findings, cached, serialNumber);
+    findings.inputs.emplace_back("carrierLeftOut", facts.isCarrierOut);
+    return findings;
+}
+
+const AgentActivity* activityOf(NextStep step, const Activities& activities) {
+    switch (step) {
+        case NextStep::Outreach: return &activities.outreach;
+        case NextStep::Post: return &activities.post;
+        case NextStep::Refresh: return &activities.refresh;
+        case NextStep::None: break;
+    }
+    return nullptr;
+}
+
+std::string headline(const FollowUpExplanation& explanation) {
+    const std::string until = explanation.until ? " until " + platform::describe(*explanation.until) : "";
+    switch (explanation.state) {
+        case FollowUpState::Shown: return "shown" + until;
+        case FollowUpState::Dismissed: return "dismissed";
+        case FollowUpState::Waiting: return "waits" + until;
+        case FollowUpState::NotOffered: return "not offered";
+    }
+    return "";
+}
+
+Outcome report(const std::string& serialNumber, const Findings& findings, const Activities& activities,
+               bool isAgentRunning) {
+    FollowUpExplanation explanation = explainFollowUp(findings.circumstances);
+    const AgentActivity* next = activityOf(explanation.next, activities);
+    if (next && !next->due) next = nullptr;
+    if (next && !isAgentRunning) explanation.advice = "Start an agent on this home: without one nothing runs.";
+
+    Outcome outcome;
+    outcome.text = printable(serialNumber) + (findings.name ? ", " + printable(*findings.name) : "") + ": " +
+                   headline(explanation) + "\n";
+    auto line = [&](const std::string& name, const std::string& content) {
+        outcome.text += "  " + name + std::string(name.size() < 30 ? 30 - name.size() : 1, ' ') + content + "\n";
+    };
+    line("because", explanation.text + "  (" + explanation.rule + ")");
+    line("next", next ? next->identifier + ", " + platform::describe(*next->nextRun()) +
+                            (next->scheduled->criteria.requiresNetwork ? ", once the network is there" : "")
+                      : "nothing is scheduled for it");
+    Dictionary inputs;
+    for (const auto& [name, value] : findings.inputs) {
+        inputs[name] = value;
+        line(name, value.isNull() ? "none" : printableValue(value));
+    }
+    if (!explanation.advice.empty()) outcome.text += explanation.advice + "\n";
+    outcome.document = {
+        {"serialNumber", serialNumber},
+        {"name", findings.name ? Value(*findings.name) : Value()},
+        {"state", nameOf(explanation.state)},
+        {"rule", explanation.rule},
+        {"reason", explanation.text},
+        {"until", valueOf(explanation.until)},
+        {"next", next ? Value(Dictionary{{"identifier", next->identifier},
+                                         {"date", *next->nextRun()},
+                                         {"requiresNetwork", next->scheduled->criteria.requiresNetwork}})
+                      : Value()},
+        {"inputs", inputs},
+        {"nextPostDate", valueOf(findings.nextPost)},
+        {"nextRefreshDate", valueOf(findings.nextRefresh)},
+        {"agentRunning", isAgentRunning},
+        {"advice", explanation.advice}};
+    return outcome;
+}
+
+Outcome why(AgentView& view, const std::string& serialNumber) {
+    const Result<std::vector<AgentActivity>> all = agentActivities(view);
+    const Result<std::set<std::string>> pending = pendingSerialNumbers();
+    if (!all || !pending)
+        return failed(ExitCode::NotReachable, (all ? pending.error() : all.error()).text,
+                      "vrxhost doctor tells what is wrong, and what to do.");
+    const Activities activities{activityNamed(*all, "outreach"), activityNamed(*all, "followuppost"),
+                                activityNamed(*all, "followuprefresh")};
+    return report(serialNumber, examine(view, serialNumber, *pending, activities), activities,
+                  host::HomeLock::isInUse(view.home()));
+}
+
+}  // namespace
+
+void addWhyVerb(CommandLine& line, const wire::LocationOverrides& places) {
+    auto serialNumber = std::make_shared<std::string>();
+    auto profile = std::make_shared<std::optional<std::string>>();
+    CLI::App* verb =
+        line.add("why", "Tells why a device's follow-up is shown, or is not",
+                 looking(places, profile, [serialNumber](AgentView& view) { return why(view, *serialNumber); }));
+    verb->add_option("SERIAL", *serialNumber, "The device's serial number")->required();
+    addProfileOption(verb, *profile);
+}
+
+}  // namespace vrx::apps

@@ -1,0 +1,39 @@
+// Reacts to a change of the system language: when follow-ups are shown, in the old language, it has records looked up,
+// which downloads them anew, and the follow-ups refreshed. Afterwards the process may end, so that its successor begins
+// in the new language. Started once; it listens until its end. Main thread; replies may come on any other.
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <memory>
+
+#include "protocols/agent_collaborators.h"
+#include "protocols/agent_protocol.h"
+
+namespace vrx {
+
+class VRXLocaleMonitor final : public std::enable_shared_from_this<VRXLocaleMonitor> {
+public:
+    using MakeFollowUp = std::function<std::shared_ptr<VRXFollowUpManaging>()>;
+
+    static std::shared_ptr<VRXLocaleMonitor> initWithAgent(std::shared_ptr<VRXAgentProtocol> agent,
+                                                           MakeFollowUp makeFollowUp);
+    ~VRXLocaleMonitor();
+    VRXLocaleMonitor(const VRXLocaleMonitor&) = delete;
+    VRXLocaleMonitor& operator=(const VRXLocaleMonitor&) = delete;
+
+    void start();
+
+    // Five seconds after each notification.
+    void localeDidChange();
+
+private:
+    VRXLocaleMonitor(std::shared_ptr<VRXAgentProtocol> agent, MakeFollowUp makeFollowUp);
+    static void callLater(std::weak_ptr<VRXLocaleMonitor> monitor);
+
+    std::int32_t _languageNotifyToken = 0;  // 0 while it does not listen
+    const std::shared_ptr<VRXAgentProtocol> agent;
+    const MakeFollowUp makeFollowUp_;
+};
+
+}  // namespace vrx

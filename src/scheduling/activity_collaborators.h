@@ -1,0 +1,19 @@
+// What activities need of parts that make activities in turn. Start-up, which knows them all, hands the factories in.
+#pragma once
+
+#include <functional>
+#include <memory>
+
+#include "protocols/agent_collaborators.h"
+#include "protocols/agent_protocol.h"
+
+namespace vrx {
+
+struct ActivityCollaborators {
+    // A new agent for the settings app. Null when none is to be had any more, because the process is ending: device
+    // infos can't be loaded then, and what needs them is deferred to the next process.
+    std::function<std::shared_ptr<VRXAgentProtocol>()> makeAgent;
+    std::function<std::shared_ptr<VRXFollowUpManaging>()> makeFollowUp;
+};
+
+}  // namespace vrx

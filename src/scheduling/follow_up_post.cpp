@@ -1,0 +1,107 @@
+#include "scheduling/follow_up_post.h"
+
+#include <utility>
+
+#include "devices/device_info.h"
+#include "platform/clock.h"
+#include "platform/log.h"
+#include "platform/platform.h"
+#include "platform/queue.h"
+#include "platform/vendor.h"
+#include "scheduling/follow_up_refresh.h"
+#include "scheduling/post_date.h"
+#include "scheduling/scheduler.h"
+
+namespace vrx {
+
+using platform::BackgroundActivityResult;
+using platform::Date;
+using platform::Level;
+using platform::Platform;
+
+namespace {
+
+constexpr std::string_view performName = "-[VRXFollowUpPost performActivityForScheduler:withCompletionHandler:]";
+
+}  // namespace
+
+std::string VRXFollowUpPost::identifier() const {
+    return platform::vendorIdentifier(".vrxagent.followuppost");
+}
+
+void VRXFollowUpPost::performActivityForScheduler(const std::shared_ptr<VRXScheduler>& scheduler,
+                                                  CompletionHandler completionHandler) {
+    setFollowUpPostInProgress(true);
+    auto run = std::make_shared<ActivityRun>(std::move(completionHandler));
+    setFollowUpPostTimer(makeDeferralWatch(scheduler, run));
+    auto agent = collaborators_.makeAgent();
+    if (!agent) return finish(*run, std::nullopt);
+    constexpr bool updateFollowUps = false;
+    agent->getAllDeviceInfosUsingPolicy(
+        VRXWarrantyLookupPolicyRefresh, updateFollowUps,
+        [self = shared_from_this(), run](DeviceInfoList deviceInfos) { self->finish(*run, deviceInfos); });
+}
+
+// It holds activity and scheduler weakly: the activity itself holds it.
+std::shared_ptr<platform::RepeatingTimer> VRXFollowUpPost::makeDeferralWatch(
+    const std::shared_ptr<VRXScheduler>& scheduler, const std::shared_ptr<ActivityRun>& run) {
+    auto fire = [activity = weak_from_this(), watched = std::weak_ptr(scheduler), run] {
+        auto self = activity.lock();
+        auto asked = watched.lock();
+        if (!self || !self->followUpPostInProgress() || !asked || !asked->shouldDefer()) return;
+        log(Level::Default, "FollowUp Post activity deferred.");
+        self->end(*run, BackgroundActivityResult::Deferred);
+    };
+    return platform::RepeatingTimer::schedule(Platform::current().queues().mainQueue(), deferralWatchInterval,
+                                              std::move(fire));
+}
+
+void VRXFollowUpPost::finish(ActivityRun& run, const std::optional<DeviceInfoList>& deviceInfos) {
+    log(Level::Default, "%s -> %@", performName, deviceInfos);
+    if (deviceInfos) {
+        post(*deviceInfos);
+        end(run, BackgroundActivityResult::Finished);
+    } else {
+        log(Level::Default, "Unable to load devices info, defer");
+        end(run, BackgroundActivityResult::Deferred);
+    }
+}
+
+void VRXFollowUpPost::post(const DeviceInfoList& deviceInfos) {
+    const bool wasAnyDue = collaborators_.makeFollowUp()->postFollowUpWithDevicesInfo(deviceInfos);
+    if (std::optional<Date> date = nextFollowUpPostDateWithDevicesInfo(deviceInfos)) {
+        log(Level::Default, "%s: Re-schedule followUp post for: %@", performName, *date);
+        VRXScheduler::newSchedulerWithActivityDelegate(shared_from_this())->scheduleActivityForDate(date);
+    }
+    if (!wasAnyDue) return;
+    constexpr bool isInitialCall = true;
+    std::optional<Date> date = VRXFollowUpRefresh::nextFollowUpRefreshDateWithDevicesInfo(deviceInfos, isInitialCall);
+    log(Level::Default, "%s: Schedule refresh for: %@", performName, date);
+    VRXScheduler::newSchedulerWithActivityDelegate(std::make_shared<VRXFollowUpRefresh>(collaborators_))
+        ->scheduleActivityForDate(date);
+}
+
+void VRXFollowUpPost::end(ActivityRun& run, BackgroundActivityResult result) {
+    CompletionHandler completionHandler = run.end();
+    if (!completionHandler) return;
+    setFollowUpPostInProgress(false);
+    if (auto timer = followUpPostTimer()) timer->invalidate();
+    setFollowUpPostTimer(nullptr);
+    completionHandler(result);
+}
+
+std::optional<Date> VRXFollowUpPost::nextFollowUpPostDateWithDevicesInfo(const DeviceInfoList& deviceInfos) {
+    return nextPostDate(deviceInfos, PostDateSettings::read(), Platform::current().clock().now());
+}
+
+std::shared_ptr<platform::RepeatingTimer> VRXFollowUpPost::followUpPostTimer() const {
+    std::lock_guard lock(mutex_);
+    return followUpPostTimer_;
+}
+
+void VRXFollowUpPost::setFollowUpPostTimer(std::shared_ptr<platform::RepeatingTimer> timer) {
+    std::lock_guard lock(mutex_);
+    followUpPostTimer_.swap(timer);
+}
+
+}  // namespace vrx

@@ -1,0 +1,52 @@
+// Has the follow-ups that are due posted, and works out when it is to run again and, if any was due, when the shown
+// ones are first to be refreshed. Any thread may use it.
+#pragma once
+
+#include <atomic>
+#include <memory>
+#include <mutex>
+#include <optional>
+
+#include "platform/date.h"
+#include "platform/timer.h"
+#include "scheduling/activity_collaborators.h"
+#include "scheduling/activity_run.h"
+#include "scheduling/scheduler_activity_delegate.h"
+
+namespace vrx {
+
+class VRXFollowUpPost final : public VRXSchedulerActivityDelegate,
+                              public std::enable_shared_from_this<VRXFollowUpPost> {
+public:
+    explicit VRXFollowUpPost(ActivityCollaborators collaborators) : collaborators_(std::move(collaborators)) {}
+
+    std::string identifier() const override;
+    bool requiresNetwork() const override { return true; }
+    // Deferred when no device infos can be loaded, else finished.
+    void performActivityForScheduler(const std::shared_ptr<VRXScheduler>& scheduler,
+                                     CompletionHandler completionHandler) override;
+
+    // The rule of post_date.h, with the present settings and now.
+    static std::optional<platform::Date> nextFollowUpPostDateWithDevicesInfo(const DeviceInfoList& deviceInfos);
+
+    // From a run's start to its end.
+    bool followUpPostInProgress() const { return followUpPostInProgress_; }
+    void setFollowUpPostInProgress(bool followUpPostInProgress) { followUpPostInProgress_ = followUpPostInProgress; }
+    // The deferral watch of the run under way, else null.
+    std::shared_ptr<platform::RepeatingTimer> followUpPostTimer() const;
+    void setFollowUpPostTimer(std::shared_ptr<platform::RepeatingTimer> timer);
+
+private:
+    std::shared_ptr<platform::RepeatingTimer> makeDeferralWatch(const std::shared_ptr<VRXScheduler>& scheduler,
+                                                                const std::shared_ptr<ActivityRun>& run);
+    void finish(ActivityRun& run, const std::optional<DeviceInfoList>& deviceInfos);
+    void post(const DeviceInfoList& deviceInfos);
+    void end(ActivityRun& run, platform::BackgroundActivityResult result);
+
+    const ActivityCollaborators collaborators_;
+    std::atomic<bool> followUpPostInProgress_ = false;
+    mutable std::mutex mutex_;
+    std::shared_ptr<platform::RepeatingTimer> followUpPostTimer_;
+};
+
+}  // namespace vrx

@@ -1,0 +1,35 @@
+// Has the shown follow-ups brought up to date, from cached records only, and schedules itself for the next moment at
+// which a text or the eligibility changes, until none is shown. No state; any thread may use it.
+#pragma once
+
+#include <memory>
+#include <optional>
+
+#include "platform/date.h"
+#include "scheduling/activity_collaborators.h"
+#include "scheduling/scheduler_activity_delegate.h"
+
+namespace vrx {
+
+class VRXFollowUpRefresh final : public VRXSchedulerActivityDelegate,
+                                 public std::enable_shared_from_this<VRXFollowUpRefresh> {
+public:
+    explicit VRXFollowUpRefresh(ActivityCollaborators collaborators) : collaborators_(std::move(collaborators)) {}
+
+    std::string identifier() const override;
+    bool requiresNetwork() const override { return false; }
+    // Deferred when no device infos can be loaded, else finished.
+    void performActivityForScheduler(const std::shared_ptr<VRXScheduler>& scheduler,
+                                     CompletionHandler completionHandler) override;
+
+    // The rule of refresh_date.h, with the present settings and now.
+    static std::optional<platform::Date> nextFollowUpRefreshDateWithDevicesInfo(const DeviceInfoList& deviceInfos,
+                                                                                bool isInitialCall);
+
+private:
+    void refresh(const DeviceInfoList& deviceInfos);
+
+    const ActivityCollaborators collaborators_;
+};
+
+}  // namespace vrx

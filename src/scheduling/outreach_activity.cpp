@@ -1,0 +1,185 @@
+#include "scheduling/outreach_activity.h"
+
+#include <algorithm>
+#include <optional>
+#include <utility>
+
+#include "coverage/warranty.h"
+#include "coverage/warranty_downloader.h"
+#include "devices/device.h"
+#include "devices/devices_manager.h"
+#include "platform/completion_group.h"
+#include "platform/log.h"
+#include "platform/platform.h"
+#include "platform/queue.h"
+#include "platform/telephony_network_info.h"
+#include "platform/vendor.h"
+#include "scheduling/activity_run.h"
+#include "scheduling/follow_up_post.h"
+#include "scheduling/scheduler.h"
+
+namespace vrx {
+
+using platform::BackgroundActivityResult;
+using platform::Date;
+using platform::Level;
+using platform::Platform;
+
+// A run, with the earliest due date that its downloads have found. They may end at the same time.
+class VRXOutreachActivity::Run : public ActivityRun {
+public:
+    using ActivityRun::ActivityRun;
+
+    // Of equal dates, the one that was first stays.
+    void addDueDate(Date date) {
+        std::lock_guard lock(mutex_);
+        if (!earliestDueDate_ || date < *earliestDueDate_) earliestDueDate_ = date;
+    }
+    std::optional<Date> earliestDueDate() const {
+        std::lock_guard lock(mutex_);
+        return earliestDueDate_;
+    }
+
+private:
+    mutable std::mutex mutex_;
+    std::optional<Date> earliestDueDate_;
+};
+
+namespace {
+
+DeviceList allDevices() {
+    DeviceList devices;
+    for (auto& [serialNumber, device] : VRXDevicesManager::sharedManager()->allDevices()) devices.push_back(device);
+    return devices;
+}
+
+// When the follow-up of a record that asks for the offer is due. Nothing when it tells neither a date nor its end: no
+// follow-up is ever posted for it, so it must not take the place of another device's date.
+std::optional<Date> dueDate(const VRXWarranty& warranty) {
+    if (auto date = warranty.qxOfferFollowupDisplayDate()) return date;
+    std::optional<Date> until = warranty.qxOfferEligibleUntil();
+    return until ? std::optional(*until - warranty.qxOfferDurationBeforeEndDate()) : std::nullopt;
+}
+
+// The due date that a device's download gives, if any.
+std::optional<Date> dueDateFromDownload(const std::optional<std::string>& serialNumber, bool success,
+                                        const std::shared_ptr<VRXWarranty>& warranty) {
+    log(Level::Default, "serialNumber: %@ success: %d", serialNumber, success);
+    if (!success) {
+        log(Level::Error, "Warranty failed to download");
+        return std::nullopt;
+    }
+    log(Level::Default, "Warranty downloaded successfully");
+    if (!warranty->qxOfferDisplay()) {
+        log(Level::Default, "Warranty shows device is ineligible, complete activity without scheduling followup");
+        return std::nullopt;
+    }
+    log(Level::Default, "Coverage check shows device should display QX offer, check on-device state");
+    if (!VRXOutreachActivity::currentDeviceShouldReceiveOutreachForWarranty(*warranty)) {
+        log(Level::Default,
+            "Configuration does not support current device. Complete activity without scheduling followup");
+        return std::nullopt;
+    }
+    return dueDate(*warranty);
+}
+
+// The workers as a group's queue; they belong to the platform.
+std::shared_ptr<platform::Queue> backgroundQueue() {
+    return {std::shared_ptr<void>(), &Platform::current().queues().workers(platform::Priority::Background)};
+}
+
+}  // namespace
+
+std::string VRXOutreachActivity::identifier() const {
+    return platform::vendorIdentifier(".vrxagent.outreach");
+}
+
+void VRXOutreachActivity::performActivityForScheduler(const std::shared_ptr<VRXScheduler>& scheduler,
+                                                      CompletionHandler completionHandler) {
+    setOutreachInProgress(true);
+    auto run = std::make_shared<Run>(std::move(completionHandler));
+    setOutReachTimer(makeDeferralWatch(scheduler, run));
+    DeviceList devices = allDevices();
+    log(Level::Default, "%s: devices: %@", "-[VRXOutreachActivity performActivityForScheduler:withCompletionHandler:]",
+        devices);
+    auto downloader = VRXWarrantyDownloader::initWithCallingProcessBundleID(
+        platform::vendorIdentifier(platform::settingsAppRemainder));
+    auto group = std::make_shared<platform::CompletionGroup>();
+    for (const auto& device : devices) {
+        group->enter();
+        auto serialNumber = device->serialNumber();
+        auto completion = [run, group, serialNumber](bool success, std::shared_ptr<VRXWarranty> warranty) {
+            if (auto date = dueDateFromDownload(serialNumber, success, warranty)) run->addDueDate(*date);
+            group->leave();
+        };
+        downloader->downloadWarrantyForSerialNumber(serialNumber, std::move(completion));
+    }
+    group->notify(backgroundQueue(), [activity = weak_from_this(), run, collaborators = collaborators_] {
+        if (std::optional<Date> date = run->earliestDueDate()) {
+            log(Level::Default, "Complete activity and schedule followUp post for: %@", *date);
+            VRXScheduler::newSchedulerWithActivityDelegate(std::make_shared<VRXFollowUpPost>(collaborators))
+                ->scheduleActivityForDate(date);
+        } else {
+            log(Level::Default, "No devices eligible for followUp posts");
+        }
+        end(*run, activity, BackgroundActivityResult::Finished);
+    });
+}
+
+// It holds activity and scheduler weakly: the activity itself holds it.
+std::shared_ptr<platform::RepeatingTimer> VRXOutreachActivity::makeDeferralWatch(
+    const std::shared_ptr<VRXScheduler>& scheduler, const std::shared_ptr<Run>& run) {
+    auto fire = [activity = weak_from_this(), watched = std::weak_ptr(scheduler), run] {
+        auto self = activity.lock();
+        auto asked = watched.lock();
+        if (!self || !self->outreachInProgress() || !asked || !asked->shouldDefer()) return;
+        log(Level::Default, "Warranty download activity deferred.");
+        end(*run, activity, BackgroundActivityResult::Deferred);
+    };
+    return platform::RepeatingTimer::schedule(Platform::current().queues().mainQueue(), deferralWatchInterval,
+                                              std::move(fire));
+}
+
+// The activity may be gone; its system waits for the result all the same.
+void VRXOutreachActivity::end(Run& run, const std::weak_ptr<VRXOutreachActivity>& activity,
+                              BackgroundActivityResult result) {
+    CompletionHandler completionHandler = run.end();
+    if (!completionHandler) return;
+    if (auto self = activity.lock()) {
+        self->setOutreachInProgress(false);
+        if (auto timer = self->outReachTimer()) timer->invalidate();
+        self->setOutReachTimer(nullptr);
+    }
+    completionHandler(result);
+}
+
+bool VRXOutreachActivity::currentDeviceShouldReceiveOutreachForWarranty(const VRXWarranty& warranty) {
+    const platform::TelephonyNetworkInfo& networkInfo = Platform::current().telephonyNetworkInfo();
+    const platform::Value toggle = warranty.qxOfferToggle();
+    const platform::Array* excluded = toggle.asArray();
+    for (const auto& [service, carrier] : networkInfo.serviceSubscriberCellularProviders()) {
+        if (!carrier.mobileCountryCode)
+            log(Level::Error, "No mobileCountryCode for networkInfo: %@, carrier: %@", networkInfo, carrier);
+        std::optional<std::string> carrierID;
+        if (carrier.mobileCountryCode && carrier.mobileNetworkCode)
+            carrierID = *carrier.mobileCountryCode + *carrier.mobileNetworkCode;
+        log(Level::Default, "carrierID: %@", carrierID);
+        if (!carrierID || !excluded || std::ranges::find(*excluded, platform::Value(*carrierID)) == excluded->end())
+            continue;
+        log(Level::Default, "carrier matched");
+        return false;
+    }
+    return true;
+}
+
+std::shared_ptr<platform::RepeatingTimer> VRXOutreachActivity::outReachTimer() const {
+    std::lock_guard lock(mutex_);
+    return outReachTimer_;
+}
+
+void VRXOutreachActivity::setOutReachTimer(std::shared_ptr<platform::RepeatingTimer> timer) {
+    std::lock_guard lock(mutex_);
+    outReachTimer_.swap(timer);
+}
+
+}  // namespace vrx

@@ -1,0 +1,52 @@
+// Decides whether, and from when, the user is offered the plan: downloads the record of every device, keeps those that
+// ask for the offer on a carrier that allows it, and schedules the follow-up post for the earliest due date. It posts
+// nothing itself. Any thread may use it.
+#pragma once
+
+#include <atomic>
+#include <memory>
+#include <mutex>
+
+#include "platform/timer.h"
+#include "scheduling/activity_collaborators.h"
+#include "scheduling/scheduler_activity_delegate.h"
+
+namespace vrx {
+
+class VRXOutreachActivity final : public VRXSchedulerActivityDelegate,
+                                  public std::enable_shared_from_this<VRXOutreachActivity> {
+public:
+    explicit VRXOutreachActivity(ActivityCollaborators collaborators) : collaborators_(std::move(collaborators)) {}
+
+    std::string identifier() const override;
+    bool requiresNetwork() const override { return true; }
+    // Finished in the end, whatever the downloads gave.
+    void performActivityForScheduler(const std::shared_ptr<VRXScheduler>& scheduler,
+                                     CompletionHandler completionHandler) override;
+
+    // Whether none of this device's carriers is one for which the record suppresses the offer. The record may be a
+    // watch's: the carriers are this device's all the same.
+    static bool currentDeviceShouldReceiveOutreachForWarranty(const VRXWarranty& warranty);
+
+    // From a run's start to its end.
+    bool outreachInProgress() const { return outreachInProgress_; }
+    void setOutreachInProgress(bool outreachInProgress) { outreachInProgress_ = outreachInProgress; }
+    // The deferral watch of the run under way, else null.
+    std::shared_ptr<platform::RepeatingTimer> outReachTimer() const;
+    void setOutReachTimer(std::shared_ptr<platform::RepeatingTimer> timer);
+
+private:
+    class Run;
+
+    std::shared_ptr<platform::RepeatingTimer> makeDeferralWatch(const std::shared_ptr<VRXScheduler>& scheduler,
+                                                                const std::shared_ptr<Run>& run);
+    static void end(Run& run, const std::weak_ptr<VRXOutreachActivity>& activity,
+                    platform::BackgroundActivityResult result);
+
+    const ActivityCollaborators collaborators_;
+    std::atomic<bool> outreachInProgress_ = false;
+    mutable std::mutex mutex_;
+    std::shared_ptr<platform::RepeatingTimer> outReachTimer_;
+};
+
+}  // namespace vrx

@@ -1,0 +1,82 @@
+#include "scheduling/start_up_activities.h"
+
+#include <utility>
+
+#include "platform/clock.h"
+#include "platform/defaults_store.h"
+#include "platform/log.h"
+#include "platform/platform.h"
+#include "platform/vendor.h"
+#include "scheduling/follow_up_refresh.h"
+#include "scheduling/outreach_activity.h"
+#include "scheduling/scheduler.h"
+
+namespace vrx {
+
+using platform::BackgroundActivityResult;
+using platform::DefaultsStore;
+using platform::Duration;
+using platform::Level;
+using platform::Platform;
+
+namespace {
+
+constexpr std::string_view upgradeCompletedKey = "PostUpgradeActivityCompleted";
+constexpr std::string_view activationDateKey = "DefaultDeviceActivationDate";
+constexpr std::string_view outreachDelayKey = "PostUpgradeOutreachDelay";
+
+bool isUpgradeCompleted() {
+    return Platform::current().defaultsStore().integer(upgradeCompletedKey) != 0;
+}
+
+void rescheduleIfNotComplete(std::shared_ptr<VRXSchedulerActivityDelegate> activity) {
+    auto scheduler = VRXScheduler::newSchedulerWithActivityDelegate(std::move(activity));
+    std::optional<platform::Date> date = scheduler->scheduledActivityDate();
+    if (!date) return;
+    log(Level::Default, "'%@' not complete, rescheduling", scheduler->identifier());
+    scheduler->scheduleActivityForDate(date);
+}
+
+}  // namespace
+
+std::string VRXPostUpgradeActivity::identifier() const {
+    return platform::vendorIdentifier(platform::upgradeActivityRemainder);
+}
+
+void VRXPostUpgradeActivity::performActivityForScheduler(const std::shared_ptr<VRXScheduler>& /*scheduler*/,
+                                                         CompletionHandler completionHandler) {
+    if (isUpgradeCompleted()) {
+        log(Level::Default, "post upgrade activity already performed");
+    } else {
+        log(Level::Default, "post upgrade activity hasn't yet been performed, perform upgrade activity");
+        performUpgrade();
+    }
+    completionHandler(BackgroundActivityResult::Finished);
+}
+
+// The flag comes last: work that a crash cut short is done again from the beginning.
+void VRXPostUpgradeActivity::performUpgrade() const {
+    DefaultsStore& defaults = Platform::current().defaultsStore();
+    VRXScheduler::clearScheduledActivities();
+    defaults.set(activationDateKey, Platform::current().clock().now());
+    VRXScheduler::newSchedulerWithActivityDelegate(std::make_shared<VRXOutreachActivity>(collaborators_))
+        ->scheduleActivityWithDelay(Duration(defaults.number(outreachDelayKey)));
+    defaults.set(upgradeCompletedKey, true);
+}
+
+std::string VRXPostBootActivity::identifier() const {
+    return platform::vendorIdentifier(platform::bootActivityRemainder);
+}
+
+void VRXPostBootActivity::performActivityForScheduler(const std::shared_ptr<VRXScheduler>& /*scheduler*/,
+                                                      CompletionHandler completionHandler) {
+    if (isUpgradeCompleted()) {
+        rescheduleIfNotComplete(std::make_shared<VRXOutreachActivity>(collaborators_));
+        rescheduleIfNotComplete(std::make_shared<VRXFollowUpRefresh>(collaborators_));
+    } else {
+        log(Level::Default, "post upgrade activity hasn't yet been performed, skip boot activity");
+    }
+    completionHandler(BackgroundActivityResult::Finished);
+}
+
+}  // namespace vrx

@@ -1,0 +1,40 @@
+// The two activities that the system fires by itself: one starts the agent's work when it first runs, the other takes
+// up after each boot what was scheduled before it. No state; both always finish. Any thread may use them.
+#pragma once
+
+#include "scheduling/activity_collaborators.h"
+#include "scheduling/scheduler_activity_delegate.h"
+
+namespace vrx {
+
+// Its work is done once in the life of the settings; later firings do nothing.
+class VRXPostUpgradeActivity final : public VRXSchedulerActivityDelegate {
+public:
+    explicit VRXPostUpgradeActivity(ActivityCollaborators collaborators) : collaborators_(std::move(collaborators)) {}
+
+    std::string identifier() const override;
+    bool requiresNetwork() const override { return false; }
+    void performActivityForScheduler(const std::shared_ptr<VRXScheduler>& scheduler,
+                                     CompletionHandler completionHandler) override;
+
+private:
+    void performUpgrade() const;
+
+    const ActivityCollaborators collaborators_;
+};
+
+// Registers outreach and refresh anew when their target dates are still stored. The follow-up post stays as it is.
+class VRXPostBootActivity final : public VRXSchedulerActivityDelegate {
+public:
+    explicit VRXPostBootActivity(ActivityCollaborators collaborators) : collaborators_(std::move(collaborators)) {}
+
+    std::string identifier() const override;
+    bool requiresNetwork() const override { return false; }
+    void performActivityForScheduler(const std::shared_ptr<VRXScheduler>& scheduler,
+                                     CompletionHandler completionHandler) override;
+
+private:
+    const ActivityCollaborators collaborators_;
+};
+
+}  // namespace vrx

@@ -1,0 +1,137 @@
+#include "sim/background_activities.h"
+
+#include <algorithm>
+#include <utility>
+
+#include "platform/task.h"
+#include "platform/vendor.h"
+
+namespace vrx::sim {
+
+using platform::ActivityCriteria;
+using platform::ActivityHandler;
+using platform::BackgroundActivityResult;
+using platform::Duration;
+
+namespace {
+
+constexpr Duration atOnce{0.0};
+
+}  // namespace
+
+// Boots are told apart by their number; the clock that counts through them all serves as each one's.
+platform::Moment BackgroundActivities::now() const {
+    return {std::to_string(boot_), clock_.elapsed(), clock_.now()};
+}
+
+void BackgroundActivities::schedule(const platform::ActivityRegistration& registration, ActivityHandler handler) {
+    Attachment& attachment = attachments_[registration.identifier];
+    attachment.handler.swap(handler);  // the old one is let go at the end
+    if (!registration.isPreregistered) {
+        ActivityCriteria criteria = registration.criteria.value_or(ActivityCriteria());
+        Duration interval = attachment.runningGeneration ? platform::minimumInterval : atOnce;
+        addRow(registration.identifier, criteria, platform::dueTime(criteria, interval, now()));
+    }
+    considerLater(registration.identifier, atOnce);
+}
+
+void BackgroundActivities::addRow(const std::string& identifier, const ActivityCriteria& criteria,
+                                  platform::DueTime due) {
+    rows_[identifier] = {criteria, std::move(due), ++lastGeneration_};
+}
+
+void BackgroundActivities::setNetworkAvailable(bool isNetworkAvailable) {
+    isNetworkAvailable_ = isNetworkAvailable;
+    considerAll();
+}
+
+void BackgroundActivities::setShouldDefer(bool shouldDefer) {
+    shouldDefer_ = shouldDefer;
+    considerAll();
+}
+
+void BackgroundActivities::processStarted(const std::string& agentVersion) {
+    const auto due = platform::dueAfter(atOnce, now());
+    if (std::exchange(lastVersion_, agentVersion) != agentVersion)
+        addRow(platform::vendorIdentifier(platform::upgradeActivityRemainder), {}, due);
+    if (std::exchange(isBootActivityOwed_, false))
+        addRow(platform::vendorIdentifier(platform::bootActivityRemainder), {}, due);
+    considerAll();
+}
+
+void BackgroundActivities::processEnded() {
+    platform::ShutdownScope shutdown;
+    factory_ = nullptr;
+    attachments_.clear();
+}
+
+void BackgroundActivities::booted() {
+    ++boot_;
+    isBootActivityOwed_ = true;
+}
+
+std::optional<ActivityCriteria> BackgroundActivities::criteria(const std::string& identifier) const {
+    auto row = rows_.find(identifier);
+    return row == rows_.end() ? std::nullopt : std::optional(row->second.criteria);
+}
+
+std::optional<Duration> BackgroundActivities::timeLeft(const std::string& identifier) const {
+    auto row = rows_.find(identifier);
+    return row == rows_.end() ? std::nullopt : std::optional(platform::timeLeft(row->second.due, now()));
+}
+
+bool BackgroundActivities::isRunning() const {
+    return std::ranges::any_of(attachments_,
+                               [](const auto& entry) { return entry.second.runningGeneration.has_value(); });
+}
+
+int BackgroundActivities::firingCount(std::string_view identifier) const {
+    return static_cast<int>(std::ranges::count(firings_, identifier, &Firing::identifier));
+}
+
+void BackgroundActivities::considerAll() {
+    for (const auto& [identifier, row] : rows_) considerLater(identifier, atOnce);
+}
+
+void BackgroundActivities::considerLater(const std::string& identifier, Duration delay) {
+    lane_->postAfter(delay, [this, identifier] { consider(identifier); });
+}
+
+// Asked whenever something has changed and when time has come, and also when neither is so any more.
+void BackgroundActivities::consider(const std::string& identifier) {
+    auto row = rows_.find(identifier);
+    if (row == rows_.end() || attachments_[identifier].runningGeneration) return;
+    row->second.due = platform::carriedOver(row->second.due, now());  // the wall clock may have been set
+    auto decision =
+        platform::decideFiring(row->second.due, row->second.criteria, now(), isNetworkAvailable_, shouldDefer_);
+    if (decision.isFired)
+        fire(identifier, row->second.generation);
+    else if (decision.askAgainIn)
+        considerLater(identifier, *decision.askAgainIn);
+}
+
+void BackgroundActivities::fire(const std::string& identifier, int generation) {
+    Attachment& attachment = attachments_[identifier];
+    if (!attachment.handler && factory_) attachment.handler = factory_(identifier);
+    if (!attachment.handler) return;  // until a process checks in for it
+    attachment.runningGeneration = generation;
+    firings_.push_back({identifier, clock_.now()});
+    ActivityHandler handler = attachment.handler;  // another one may take its place during the run
+    handler([this, identifier](BackgroundActivityResult result) { takeResult(identifier, result); });
+}
+
+void BackgroundActivities::takeResult(const std::string& identifier, BackgroundActivityResult result) {
+    const int ranGeneration = *std::exchange(attachments_[identifier].runningGeneration, std::nullopt);
+    auto entry = rows_.find(identifier);
+    if (entry == rows_.end()) return;
+    Row& row = entry->second;
+    if (row.generation != ranGeneration)  // its own run registered it anew
+        row.due = platform::noSoonerThan(row.due, platform::minimumInterval, now());
+    else if (result == BackgroundActivityResult::Finished)
+        return void(rows_.erase(entry));
+    else
+        row.due = platform::dueAfter(platform::retryDelay(++row.deferrals), now());
+    considerLater(identifier, atOnce);
+}
+
+}  // namespace vrx::sim

@@ -1,0 +1,37 @@
+#include "sim/notification_center.h"
+
+#include <utility>
+
+#include "platform/queue.h"
+#include "platform/vendor.h"
+
+namespace vrx::sim {
+
+std::int32_t NotificationCenter::registerForNotification(std::string name, platform::Queue& queue,
+                                                         std::function<void()> handler) {
+    bool wasMissed = missed_.erase(name) > 0;
+    auto registration = std::make_shared<Registration>(Registration{std::move(name), queue, std::move(handler)});
+    if (wasMissed) deliver(registration);
+    registrations_.emplace(++lastToken_, std::move(registration));
+    return lastToken_;
+}
+
+void NotificationCenter::raise(std::string_view nameRemainder) {
+    const std::string name = platform::vendorIdentifier(nameRemainder);
+    bool isHeard = false;
+    for (const auto& [token, registration] : registrations_) {
+        if (registration->name != name) continue;
+        isHeard = true;
+        deliver(registration);
+    }
+    if (!isHeard) missed_.insert(name);
+}
+
+// One that is cancelled before its turn comes is not called any more.
+void NotificationCenter::deliver(const std::shared_ptr<Registration>& registration) {
+    registration->queue.post([weak = std::weak_ptr(registration)] {
+        if (auto registered = weak.lock()) registered->handler();
+    });
+}
+
+}  // namespace vrx::sim

@@ -1,0 +1,38 @@
+// Notifications that the test raises. One that no process listens for is kept, and raised when the next one does.
+#pragma once
+
+#include <map>
+#include <memory>
+#include <set>
+#include <string>
+
+#include "platform/notification_center.h"
+
+namespace vrx::sim {
+
+class NotificationCenter final : public platform::NotificationCenter {
+public:
+    std::int32_t registerForNotification(std::string name, platform::Queue& queue,
+                                         std::function<void()> handler) override;
+    void cancel(std::int32_t token) override { registrations_.erase(token); }
+
+    // By what follows the vendor prefix in its name.
+    void raise(std::string_view nameRemainder);
+    std::size_t registrationCount() const { return registrations_.size(); }
+    void processEnded() { registrations_.clear(); }
+
+private:
+    struct Registration {
+        std::string name;
+        platform::Queue& queue;
+        std::function<void()> handler;
+    };
+
+    static void deliver(const std::shared_ptr<Registration>& registration);
+
+    std::map<std::int32_t, std::shared_ptr<Registration>> registrations_;
+    std::int32_t lastToken_ = 0;
+    std::set<std::string> missed_;
+};
+
+}  // namespace vrx::sim

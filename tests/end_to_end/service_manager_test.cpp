@@ -1,0 +1,105 @@
+// The agent under a service manager, which the test stands in for: notices, the socket handed over, its capability.
+#include <gtest/gtest.h>
+
+#include <poll.h>
+#include <sys/inotify.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/un.h>
+#include <unistd.h>
+
+#include <array>
+#include <csignal>
+#include <filesystem>
+
+#include "programs.h"
+
+namespace vrx::end_to_end {
+namespace {
+
+sockaddr_un addressOf(const std::string& path) {
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    path.copy(address.sun_path, sizeof address.sun_path - 1);
+    return address;
+}
+
+class ServiceManager : public testing::Test {
+protected:
+    std::unique_ptr<Process> startAgent(int listeningSocket = -1) const {
+        return std::make_unique<Process>(place_ / "", VRX_PROGRAMS "/vrxagent",
+                                         Arguments{"--home", place_ / "home", "--socket", place_ / "socket"},
+                                         Arguments{notices_.variable()}, listeningSocket);
+    }
+
+    Place place_;
+    const NoticeSocket notices_{place_ / "notices"};
+};
+
+// Clients connect to a socket that is the service manager's; who answers them there may change.
+TEST_F(ServiceManager, HandsItsSocketToOneAgentAfterTheOther) {
+    const sockaddr_un address = addressOf(place_ / "socket");
+    const int listening = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    ASSERT_EQ(bind(listening, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+    ASSERT_EQ(listen(listening, 10), 0);
+    for (int round = 1; round <= 2; ++round) {
+        Process early(place_ / "", place_ / "app/vrxctl", {"--socket", place_ / "socket", "device"});
+        const std::unique_ptr<Process> agent = startAgent(listening);
+        EXPECT_EQ(notices_.next(*agent), "READY=1") << agent->errors();
+        EXPECT_EQ(early.wait(), 0) << early.errors();
+        EXPECT_EQ(place_.vrxctl({"device"}).code, 0);
+        agent->signal(SIGTERM);
+        EXPECT_EQ(notices_.next(*agent), "STOPPING=1");
+        EXPECT_EQ(agent->wait(), 0) << agent->errors();
+    }
+    close(listening);
+}
+
+// The notice is held up in a full queue: the socket must be there by then.
+TEST_F(ServiceManager, HearsThatTheAgentIsReadyWhenClientsCanConnect) {
+    const sockaddr_un notices = addressOf(place_ / "notices");
+    const int filler = socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0);
+    std::size_t fillings = 0;
+    while (sendto(filler, "x", 1, 0, reinterpret_cast<const sockaddr*>(&notices), sizeof notices) == 1) ++fillings;
+    close(filler);
+    const int folder = inotify_init1(IN_CLOEXEC);
+    inotify_add_watch(folder, (place_ / "").c_str(), IN_MOVED_TO);
+
+    const std::unique_ptr<Process> agent = startAgent();
+    std::array<pollfd, 2> files{{{folder, POLLIN, 0}, {agent->endedFile(), POLLIN, 0}}};
+    poll(files.data(), files.size(), 10'000);  // it comes in no time, or never
+    close(folder);
+    const sockaddr_un address = addressOf(place_ / "socket");
+    const int client = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    EXPECT_EQ(connect(client, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0) << agent->errors();
+    close(client);
+    while (fillings-- > 0) EXPECT_EQ(notices_.next(*agent), "x");
+    EXPECT_EQ(notices_.next(*agent), "READY=1");
+}
+
+// Which program another user's process runs, the agent may read with one capability alone. Nothing that it starts gets
+// it.
+TEST_F(ServiceManager, GivesTheCapabilityThatTellsOtherUsersPrograms) {
+    if (getuid() != 0) GTEST_SKIP() << "takes two users: run it as root";
+    constexpr const char* otherUser = "65534";
+    std::filesystem::permissions(place_ / "", std::filesystem::perms(0755));
+    std::filesystem::copy(VRX_PROGRAMS "/vrxagent", place_ / "app");
+    std::filesystem::create_directory(place_ / "home");
+    ASSERT_EQ(chown((place_ / "home").c_str(), 65534, 65534), 0);
+    ASSERT_EQ(chmod((place_ / "notices").c_str(), 0666), 0);
+    for (const bool isCapable : {false, true}) {
+        Arguments words{"--reuid", otherUser, "--regid", otherUser, "--clear-groups"};
+        if (isCapable) words.insert(words.end(), {"--inh-caps", "+sys_ptrace", "--ambient-caps", "+sys_ptrace"});
+        words.insert(words.end(),
+                     {place_ / "app/vrxagent", "--home", place_ / "home", "--socket", place_ / "home/socket"});
+        const Process agent(place_ / "", "/usr/bin/setpriv", words, {notices_.variable()});
+        ASSERT_EQ(notices_.next(agent), "READY=1") << agent.errors();
+        const Place::Outcome outcome = place_.vrxctl({"device"}, "home/socket");
+        EXPECT_EQ(outcome.code, isCapable ? 0 : 4) << outcome.errors;
+        const std::string status = fileText("/proc/" + std::to_string(agent.identifier()) + "/status");
+        EXPECT_NE(status.find("CapAmb:\t0000000000000000"), std::string::npos) << status;
+    }
+}
+
+}  // namespace
+}  // namespace vrx::end_to_end

@@ -1,0 +1,161 @@
+#include "host/profile_notifier.h"
+
+#include <gmock/gmock.h>
+
+#include <filesystem>
+#include <thread>
+
+#include "codec/codec.h"
+#include "host/host_facts.h"
+#include "host/main_loop.h"
+#include "platform/vendor.h"
+#include "support.h"
+
+namespace vrx::host {
+namespace {
+
+using namespace std::chrono_literals;
+using ::testing::ElementsAre;
+using ::testing::Lt;
+
+std::string watch(const std::string& serialNumber, const std::string& more = "") {
+    return "[[watches]]\nserial_number = '" + serialNumber + "'\n" + more + "\n";
+}
+
+std::string language(const std::string& identifier) {
+    return "[locale]\nlanguage = '" + identifier + "'\n";
+}
+
+class ProfileNotifierTest : public ::testing::Test {
+protected:
+    ProfileNotifierTest() {
+        std::filesystem::create_directories(folder / "place");
+        std::filesystem::create_directories(folder / "machine/etc");
+        writeFile(folder / "machine/etc/locale.conf", "LANG=nl_NL.UTF-8\n");
+    }
+
+    // Begins anew, as a process does.
+    void start(platform::Duration pause = 20ms) {
+        notifier.reset();
+        profile.emplace(path, folder / "machine");
+        notifier.emplace(*profile, database, center);
+        notifier->start(
+            loop.event(), [] {}, pause);
+    }
+    void listen(std::string_view name, const std::string& mark) {
+        center.registerForNotification(platform::vendorIdentifier(name), loop, [this, mark] {
+            raised.push_back(mark);
+            if (mark == expectedLast) loop.post([this] { loop.stop(); });
+        });
+    }
+    // What is raised until that one has been.
+    std::vector<std::string> raisedUntil(const std::string& last) {
+        expectedLast = last;
+        loop.run();
+        return std::exchange(raised, {});
+    }
+
+    TemporaryFolder folder;
+    LogRecorder log;
+    codec::Digest digest;
+    platform::Platform platform{{.digest = &digest, .systemLog = &log}};
+    platform::ScopedPlatform current{platform};
+    MainLoop loop;
+    Database database{folder / "host.db"};
+    NotificationCenter center;
+    const std::string path = folder / "place/device.toml";
+    std::optional<DeviceProfile> profile;
+    std::optional<ProfileNotifier> notifier;
+    std::vector<std::string> raised;
+    std::string expectedLast;
+};
+
+TEST_F(ProfileNotifierTest, TellsWhatEachEditHasChanged) {
+    listen(platform::languageChangedNotification, "language");
+    listen(platform::devicePairedNotification, "paired");
+    listen(platform::deviceUnpairedNotification, "unpaired");
+    writeFile(path, language("de") + watch("A"));
+    start();
+    writeFile(path, language("de") + watch("A") + watch("B"));
+    EXPECT_THAT(raisedUntil("paired"), ElementsAre("paired")) << "and nothing at the first start";
+
+    writeFile(folder / "place/.device.toml.swp", language("fr") + watch("B") + watch("A", "archived = true"));
+    std::filesystem::rename(folder / "place/.device.toml.swp", path);
+    EXPECT_THAT(raisedUntil("unpaired"), ElementsAre("language", "unpaired"));
+    EXPECT_EQ(hostFact(database, facts::language), "fr");
+
+    writeFile(path, "[[watches]");
+    notifier->compare();
+    writeFile(path, language("fr") + watch("B", "paired_date = 2026-01-31"));
+    EXPECT_THAT(raisedUntil("unpaired"), ElementsAre("paired", "unpaired")) << "it was paired anew";
+
+    std::filesystem::rename(folder / "place", folder / "old");
+    std::filesystem::create_directory(folder / "place");
+    std::filesystem::create_symlink(folder / "old/device.toml", path);
+    writeFile(folder / "old/device.toml", language("es") + watch("B", "paired_date = 2026-01-31"));
+    EXPECT_THAT(raisedUntil("language"), ElementsAre("language"));
+    writeFile(folder / "old/device.toml", language("it") + watch("B", "paired_date = 2026-01-31"));
+    EXPECT_THAT(raisedUntil("language"), ElementsAre("language")) << "edited where the link leads to";
+
+    std::filesystem::remove(path);
+    EXPECT_THAT(raisedUntil("unpaired"), ElementsAre("language", "unpaired"));
+    EXPECT_EQ(hostFact(database, facts::language), "nl_NL") << "the machine's";
+}
+
+TEST_F(ProfileNotifierTest, TellsTheNextProcessWhatChangedMeanwhile) {
+    writeFile(path, language("de") + watch("A"));
+    start();
+    notifier.reset();
+    writeFile(path, language("de") + watch("B"));
+    listen(platform::languageChangedNotification, "language");
+    listen(platform::devicePairedNotification, "paired");
+    listen(platform::deviceUnpairedNotification, "unpaired");
+    start();
+    EXPECT_THAT(raisedUntil("unpaired"), ElementsAre("paired", "unpaired"));
+
+    // A file that a new process can't understand says nothing of watches.
+    writeFile(path, "[[watches]");
+    start();
+    writeFile(path, language("de") + watch("B"));
+    start();
+    writeFile(path, language("fr") + watch("B"));
+    EXPECT_THAT(raisedUntil("language"), ElementsAre("language"));
+}
+
+TEST_F(ProfileNotifierTest, GathersAStormOfEdits) {
+    writeFile(path, language("de") + watch("A", "paired = true "));
+    start(100ms);
+    listen(platform::languageChangedNotification, "language");
+    listen(platform::devicePairedNotification, "paired");
+    listen(platform::deviceUnpairedNotification, "unpaired");
+    std::thread editor([this] {
+        const std::string unpaired = language("de") + watch("A", "paired = false"),
+                          paired = language("de") + watch("A", "paired = true ");
+        for (int i = 0; i < 10'000; ++i)  // in place, without the disk
+            std::fstream(path, std::ios::in | std::ios::out) << (i % 2 ? paired : unpaired);
+        writeFile(path, language("fr") + watch("A"));
+    });
+    EXPECT_THAT(raisedUntil("language").size(), Lt(1000u));
+    editor.join();
+    writeFile(path, language("es") + watch("A"));
+    EXPECT_THAT(raisedUntil("language"), ElementsAre("language")) << "the last edit was not missed";
+}
+
+TEST_F(ProfileNotifierTest, CancelsWhatWasRaisedButHasNotRunYet) {
+    std::int32_t second = 0;
+    center.registerForNotification("name", loop, [&] {
+        raised.push_back("first");
+        center.cancel(second);
+    });
+    second = center.registerForNotification("name", loop, [&] { raised.push_back("second"); });
+    center.registerForNotification("other", loop, [&] { loop.stop(); });
+    EXPECT_NE(second, 0);
+    center.cancel(0);
+    center.raise("name");
+    center.raise("other");
+    loop.run();
+    EXPECT_THAT(raised, ElementsAre("first"));
+}
+
+}  // namespace
+}  // namespace vrx::host

@@ -1,0 +1,141 @@
+// The activities one by one: what a run decides, and how it ends.
+#include <gmock/gmock.h>
+
+#include "devices/device.h"
+#include "followup/follow_up.h"
+#include "scheduling/agent_world.h"
+#include "scheduling/follow_up_post.h"
+#include "scheduling/follow_up_refresh.h"
+#include "scheduling/scheduler.h"
+#include "service/agent.h"
+
+namespace vrx {
+namespace {
+
+using platform::BackgroundActivityResult;
+using platform::Duration;
+using testing::ElementsAre;
+using testing::IsEmpty;
+using enum BackgroundActivityResult;
+
+TEST(Outreach, SchedulesThePostForTheEarliestDueDate) {
+    struct Case {
+        const char* name;
+        std::map<std::string, AgentWorld::Record> records;  // of PHONE, and of watches
+        std::optional<double> expected;
+    };
+    const Case cases[] = {
+        {"no record", {}, {}},
+        {"the earliest of three", {{"PHONE", {300, 10}}, {"V", {300, 3}}, {"W", {300, 20}}}, 3},
+        {"the record's day wins over an earlier one", {{"PHONE", {60, 50, 30}}}, 50},
+        {"before the end", {{"PHONE", {60, {}, 30}}}, 30},
+        {"a date in the past", {{"PHONE", {60, 1}}}, 1},
+        {"records without a date", {{"PHONE", {}}, {"V", {300, 10}}, {"W", {}}}, 10},
+        {"an excluded carrier", {{"PHONE", {300, 10, 0, "310410"}}, {"W", {300, 20, 0, "31041"}}}, 20},
+        {"all on excluded carriers", {{"PHONE", {300, 10, 0, "310410"}}}, {}},
+    };
+    for (const Case& c : cases) {
+        AgentWorld world;
+        world.host.telephony.carriers = {{"one", {"310", "410"}}, {"two", {{}, "31041"}}};
+        for (const auto& [serialNumber, record] : c.records) {
+            world.setRecord(serialNumber, record);
+            if (serialNumber != "PHONE") world.pair(serialNumber, -30);
+        }
+        world.install();
+        world.runToDay(1.999);
+        EXPECT_EQ(world.runs("outreach"), 0);
+        world.runToDay(2.001);
+        EXPECT_EQ(world.runs("outreach"), 1) << c.name;
+        EXPECT_EQ(world.target("outreach"), std::nullopt) << c.name;
+        EXPECT_EQ(world.host.log.count("No devices eligible for followUp posts"), c.expected ? 0 : 1) << c.name;
+        const std::string planned = "Complete activity and schedule followUp post for: ";
+        EXPECT_EQ(world.host.log.lastMessage("Complete activity and schedule followUp post for: %@"),
+                  c.expected ? planned + platform::describe(AgentWorld::day(*c.expected)) : "")
+            << c.name;
+    }
+}
+
+// A client asks for another run while one is under way: the first one's activity goes, and its result comes all the
+// same, or there would be no second run.
+TEST(Outreach, EndsWhenItsActivityIsReplacedMeanwhile) {
+    AgentWorld world;
+    world.setRecord("PHONE", {300, 10});
+    world.install();
+    world.runToDay(1);
+    auto ask = [](VRXAgentProtocol& agent) { agent.scheduleOutreachWithReply([](bool) {}); };
+    world.request(ask);
+    world.host.runFor(Duration(2.05));
+    EXPECT_EQ(world.target("followuppost"), std::nullopt);
+    world.request(ask);
+    world.host.runFor(Duration(20));
+    EXPECT_EQ(world.target("followuppost"), 10);
+    EXPECT_EQ(world.runs("outreach"), 1);
+    world.host.runFor(Duration(15 * 60));
+    EXPECT_EQ(world.runs("outreach"), 2);
+}
+
+// No devices, as soon as it is told so.
+class SlowInventory final : public VRXAgentDeviceProvider {
+public:
+    std::shared_ptr<VRXDevice> defaultDevice() override { return nullptr; }
+    DevicesBySerialNumber pairedDevices() override { return {}; }
+    DevicesBySerialNumber allDevices() override {
+        isReady->wait();
+        return {};
+    }
+    std::shared_ptr<platform::Event> isReady = platform::Platform::current().queues().makeEvent();
+};
+
+class ActivityTest : public testing::Test {
+protected:
+    template <class Activity>
+    std::shared_ptr<Activity> run(std::shared_ptr<VRXAgentProtocol> agent) {
+        auto activity = std::make_shared<Activity>(
+            ActivityCollaborators{[agent] { return agent; }, [] { return std::make_shared<VRXFollowUp>(); }});
+        scheduler = VRXScheduler::newSchedulerWithActivityDelegate(activity);
+        host.queues.workers(platform::Priority::Background).post([this] {
+            scheduler->performScheduledOutreachWithBlock(
+                [this](BackgroundActivityResult result) { results.push_back(result); });
+        });
+        host.runFor(Duration(2));
+        return activity;
+    }
+
+    sim::Host host;
+    std::shared_ptr<VRXScheduler> scheduler;
+    std::vector<BackgroundActivityResult> results;
+};
+
+TEST_F(ActivityTest, IsDeferredWhenNoDeviceInfosCanBeLoaded) {
+    run<VRXFollowUpPost>(nullptr);
+    run<VRXFollowUpRefresh>(nullptr);
+    EXPECT_THAT(results, ElementsAre(Deferred, Deferred));
+    EXPECT_EQ(host.log.count("Unable to load devices info, defer"), 1);
+    EXPECT_EQ(host.log.count("Unable to load device info for followup refresh, defer"), 1);
+}
+
+TEST_F(ActivityTest, EndsOnceWhetherItsWorkOrItsWatchComesFirst) {
+    constexpr Duration watchInterval{2e9};
+    auto inventory = std::make_shared<SlowInventory>();
+    auto agent = VRXAgent::initWithWarrantyProvider(nullptr, inventory);
+    auto post = run<VRXFollowUpPost>(agent);
+    host.runFor(watchInterval);
+    EXPECT_THAT(results, IsEmpty()) << "nobody asked it to defer";
+    EXPECT_TRUE(post->followUpPostInProgress() && post->followUpPostTimer());
+    host.activities.setShouldDefer(true);
+    host.runFor(watchInterval);
+    EXPECT_THAT(results, ElementsAre(Deferred));
+    EXPECT_FALSE(post->followUpPostInProgress() || post->followUpPostTimer());
+    inventory->isReady->set();
+    host.runFor(watchInterval * 2.0);
+    EXPECT_EQ(host.log.count("%s -> %@"), 1) << "the reply came";
+    EXPECT_THAT(results, ElementsAre(Deferred));
+
+    run<VRXFollowUpPost>(agent);
+    run<VRXFollowUpRefresh>(agent);
+    host.runFor(watchInterval * 2.0);
+    EXPECT_THAT(results, ElementsAre(Deferred, Finished, Finished));
+}
+
+}  // namespace
+}  // namespace vrx
