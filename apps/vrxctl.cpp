@@ -212,6 +212,39 @@ Outcome dismiss(AgentConnection& agent, const std::string& serialNumber) {
     });
 }
 
+// What the agent tells of an application. Entries that it doesn't give are left out.
+Outcome availability(const Value& answer, const std::string& problem) {
+    Outcome outcome;
+    if (!answer["AppAvailabilityType"].isNumber()) outcome = failed(ExitCode::NoAnswer, problem, "");
+    outcome.document = {{"availability", answer}};
+    constexpr std::array<std::pair<const char*, const char*>, 6> lines{{{"Application", "AppBundleID"},
+                                                                        {"Title", "AppTitleKey"},
+                                                                        {"Vendor", "AppVendorName"},
+                                                                        {"Link", "AppLinkURL"},
+                                                                        {"Icon", "AppIconURL"},
+                                                                        {"Availability", "AppAvailablityText"}}};
+    std::vector<std::vector<std::string>> rows;
+    for (const auto& [label, key] : lines)
+        if (const std::string* text = answer[key].asString()) rows.push_back({label, *text});
+    if (answer["AppAvailabilityType"] == Value(0)) rows.push_back({"Availability", "none"});
+    outcome.text = table(rows);
+    return outcome;
+}
+
+Outcome store(AgentConnection& agent, const std::string& bundleIdentifier) {
+    return outcomeOf(agent, agent.checkIsAvailableInStore(bundleIdentifier), [](const Value& answer) {
+        return availability(answer, "the Marketplace could not be asked; the agent's log says why");
+    });
+}
+
+Outcome support(AgentConnection& agent, const std::string& bundleIdentifier) {
+    return outcomeOf(agent, agent.appSupportAvailability(bundleIdentifier), [](const Value& answer) {
+        return availability(answer,
+                            "the application is neither installed nor purchased, and the Marketplace could not be "
+                            "asked; the agent's log says why");
+    });
+}
+
 Outcome webUrl(AgentConnection& agent) {
     return outcomeOf(agent, agent.readWebURLOverride(), [](const std::optional<std::string>& url) {
         return Outcome{.document = {{"webURL", valueOf(url)}},
@@ -226,6 +259,7 @@ struct Options {
     double timeout = client::ConnectionOptions{}.timeLimit.count();
     VRXWarrantyLookupPolicy policy = VRXWarrantyLookupPolicyDefault;
     std::optional<std::string> serialNumber;
+    std::string bundleIdentifier;
     bool updateFollowUps = false;
 
     client::ConnectionOptions connection() const {
@@ -298,6 +332,13 @@ int run(int argc, const char* const* argv) {
         ->add_option("SERIAL", options.serialNumber, "Serial number")
         ->required();
     line.add("outreach", "Has the agent look for offers now", asking(outreach));
+    auto addBundle = [&options](CLI::App* verb) {
+        verb->add_option("BUNDLE", options.bundleIdentifier, "The application's bundle identifier")->required();
+    };
+    addBundle(line.add("store", "Tells whether the Marketplace offers an application",
+                       asking([&](AgentConnection& agent) { return store(agent, options.bundleIdentifier); })));
+    addBundle(line.add("support", "Tells whether an application is installed, purchased or offered",
+                       asking([&](AgentConnection& agent) { return support(agent, options.bundleIdentifier); })));
     line.add("web-url", "Shows the web-flow URL that a tester has set", asking(webUrl));
     return line.run(argc, argv);
 }

@@ -32,7 +32,11 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel)
                    .mainQueue = mainLoop_,
                    .workers = queues_.workers(platform::Priority::Background),
                    .conditions = conditions_,
-                   .lifecycle = lifecycle_}) {
+                   .lifecycle = lifecycle_}),
+      store_(profile_),
+      purchases_(profile_),
+      apps_(profile_),
+      strings_(profile_) {
     facilities_.accountSession = &accountSession_;
     facilities_.accountStore = &accounts_;
     facilities_.backgroundActivities = &activities_;

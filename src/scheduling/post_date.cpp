@@ -23,15 +23,14 @@ bool isPosted(const VRXDeviceInfo& info, const PostDateSettings& settings) {
 std::optional<Date> withOffer(const std::optional<Date>& next, const VRXDeviceInfo& info, const VRXWarranty& warranty,
                               const PostDateSettings& settings, Date now) {
     std::optional<Date> until = warranty.qxOfferEligibleUntil();
-    // An offer whose end nobody knows is never posted, so it sets no date, and it takes none from other devices.
-    if (!until) return next;
     std::optional<Date> result = next;
     if (isFuture(until, now)) {
         std::optional<Date> candidate = firstDisplayDate(info, warranty, settings.outreachDelay, now);
         bool isFirst = !result || isEarlier(candidate, result, now);
         if (candidate && isFuture(candidate, now) && isFirst) result = candidate;
     }
-    // As long as there is no date yet, only an end in the past is earlier.
+    // As long as there is no date yet, only an end in the past is earlier. An end that nobody knows counts as now, and
+    // so takes away a date to come.
     if (isEarlier(until, result, now)) result = until;
     return result;
 }

@@ -78,7 +78,8 @@ TEST(PostDate, FollowsTheRule) {
         {"no activation, the record's day to come", {{{}, 4, 300}}, 4},
         {"no activation, the record's day passed", {{{}, -4, 300}}, absent},
         {"no end", {{-1, 3, {}}}, absent},
-        {"no end takes no date away", {{0, 10, 300}, {-1, 3, {}}}, 10},
+        {"an unknown end counts as now", {{0, 10, 300}, {-1, 3, {}}}, absent},
+        {"and what follows it sets the date", {{0, 10, 300}, {-1, 3, {}}, {0, 20, 300}}, 20},
     };
     for (const Case& c : cases) expectDate(c, nextPostDate(infos(c.devices), settings, now));
 }
