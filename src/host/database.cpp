@@ -25,9 +25,8 @@ constexpr int busyMilliseconds = 5000;
 constexpr const char* steps[] = {
     // The agent's settings: a number or a text as itself, anything else as a binary property list.
     "CREATE TABLE defaults (key TEXT PRIMARY KEY, value NOT NULL) WITHOUT ROWID",
-    // Facts that the host keeps from one process to the next; the background activities that are scheduled; the last
-    // run
-    // of each activity; what testers ask the agent to fire.
+    // Facts that the host keeps from one process to the next. The background activities that are scheduled, the last
+    // run of each, and what testers ask the agent to fire.
     "CREATE TABLE host_facts (name TEXT PRIMARY KEY, value TEXT NOT NULL) WITHOUT ROWID;"
     "CREATE TABLE activities ("
     "    generation INTEGER PRIMARY KEY, identifier TEXT NOT NULL UNIQUE,"

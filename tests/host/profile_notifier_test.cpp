@@ -100,6 +100,8 @@ TEST_F(ProfileNotifierTest, TellsWhatEachEditHasChanged) {
     std::filesystem::remove(path);
     EXPECT_THAT(raisedUntil("unpaired"), ElementsAre("language", "unpaired"));
     EXPECT_EQ(hostFact(database, facts::language), "nl_NL") << "the machine's";
+    writeFile(folder / "machine/etc/locale.conf", "LANG=sv_SE.UTF-8\n");
+    EXPECT_THAT(raisedUntil("language"), ElementsAre("language"));
 }
 
 TEST_F(ProfileNotifierTest, TellsTheNextProcessWhatChangedMeanwhile) {
