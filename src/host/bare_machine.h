@@ -6,6 +6,7 @@
 #include <optional>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "host/current_copy.h"
 
@@ -24,6 +25,7 @@ public:
     std::string productVersion() const;  // the version in os-release, else the kernel's
     // From the system's locale files, else from the environment, else "en_US".
     std::string localeIdentifier() const;
+    std::vector<std::string> localeFiles() const { return {localeConf_.path(), defaultLocale_.path()}; }
 
 private:
     using Text = CurrentCopy<std::optional<std::string>>;

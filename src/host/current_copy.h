@@ -25,6 +25,8 @@ public:
 
     CurrentCopy(std::string path, Parse parse) : path_(std::move(path)), parse_(std::move(parse)) {}
 
+    const std::string& path() const { return path_; }
+
     std::shared_ptr<const T> get() const {
         std::lock_guard lock(mutex_);
         Stamp stamp = Stamp::of(path_);

@@ -26,9 +26,8 @@ constexpr const char* steps[] = {
     // Follow-ups, in the order of their first posting: the item as a binary property list.
     "CREATE TABLE follow_ups (position INTEGER PRIMARY KEY, client TEXT NOT NULL, identifier TEXT NOT NULL, "
     "item NOT NULL, UNIQUE (client, identifier))",
-    // Facts that the host keeps from one process to the next; the background activities that are scheduled; the last
-    // run
-    // of each activity; what testers ask the agent to fire.
+    // Facts that the host keeps from one process to the next. The background activities that are scheduled, the last
+    // run of each, and what testers ask the agent to fire.
     "CREATE TABLE host_facts (name TEXT PRIMARY KEY, value TEXT NOT NULL) WITHOUT ROWID;"
     "CREATE TABLE activities ("
     "    generation INTEGER PRIMARY KEY, identifier TEXT NOT NULL UNIQUE,"

@@ -370,6 +370,12 @@ Result<ProfileReading> parseProfile(std::string_view document, const std::string
 DeviceProfile::DeviceProfile(std::string path, std::string machineRoot)
     : path_(std::move(path)), machine_(machineRoot), facts_(path_, ProfileReader(path_)) {}
 
+std::vector<std::string> DeviceProfile::sources() const {
+    std::vector<std::string> files = machine_.localeFiles();
+    if (!path_.empty()) files.push_back(path_);
+    return files;
+}
+
 std::optional<std::string> DeviceProfile::string(std::string_view key) const {
     const std::shared_ptr<const ProfileFacts> facts = this->facts();
     if (key == "SerialNumber") return facts->serialNumber ? facts->serialNumber : machine_.serialNumber();

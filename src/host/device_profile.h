@@ -88,6 +88,8 @@ public:
     // The present facts of the file, never null.
     std::shared_ptr<const ProfileFacts> facts() const { return facts_.get(); }
     const std::string& path() const { return path_; }
+    // The files that say which watches are paired and which language holds.
+    std::vector<std::string> sources() const;
 
     std::optional<std::string> string(std::string_view key) const override;
     bool isInternalInstall() const override;

@@ -7,6 +7,7 @@
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
+#include <filesystem>
 
 #include "platform/log.h"
 
@@ -27,14 +28,15 @@ std::string resolved(const std::string& path) {
 
 }  // namespace
 
-FileWatch::FileWatch(sd_event* loop, std::string path, platform::Duration pause, std::function<void()> onChange)
-    : path_(std::move(path)),
+FileWatch::FileWatch(sd_event* loop, std::vector<std::string> paths, platform::Duration pause,
+                     std::function<void()> onChange)
+    : paths_(std::move(paths)),
       pause_(pause),
       onChange_(std::move(onChange)),
       file_(inotify_init1(IN_NONBLOCK | IN_CLOEXEC)) {
     pauseSource_ = addBootTimer(loop, onPause, this);
     if (!file_) {  // the user's programs have used up what there is of them
-        log(platform::Level::Error, "Changes of %@ go unnoticed: %@", path_, std::strerror(errno));
+        log(platform::Level::Error, "Changes of %@ go unnoticed: %@", paths_.front(), std::strerror(errno));
         return;
     }
     watchFolders();
@@ -46,25 +48,33 @@ void FileWatch::callIn(platform::Duration delay) {
     armTimer(pauseSource_, bootTime() + delay);
 }
 
-// Which folders these are changes with what happens in them: the file's own may be replaced, which shows in the one
-// above, or a link may lead elsewhere.
+// Which folders these are changes with what happens in them.
 void FileWatch::watchFolders() {
+    std::set<int> watches;
+    for (const std::string& path : paths_) addFolders(path, watches);
+    for (const int number : watches_)
+        if (!watches.contains(number)) inotify_rm_watch(file_.number(), number);
+    watches_ = std::move(watches);
+}
+
+// A folder that goes away tells so itself; that one comes, or that a link leads to another, is told by the one above,
+// which may be a busy place: it is watched only for that.
+void FileWatch::addFolders(const std::string& path, std::set<int>& watches) const {
     constexpr std::uint32_t coming = IN_CREATE | IN_MOVED_TO;
     constexpr std::uint32_t anything =
         coming | IN_CLOSE_WRITE | IN_ATTRIB | IN_DELETE | IN_MOVED_FROM | IN_DELETE_SELF | IN_MOVE_SELF;
-    const std::string folder = folderOf(path_);
-    const struct {
-        std::string path;
-        std::uint32_t events;
-    } places[] = {{folder, anything}, {folderOf(resolved(path_)), anything}, {folderOf(folder), coming}};
-    std::set<int> watches;
-    for (const auto& [path, events] : places) {
-        const int watch = inotify_add_watch(file_.number(), path.c_str(), events | IN_ONLYDIR | IN_MASK_ADD);
-        if (watch >= 0) watches.insert(watch);
+    auto add = [&](const std::string& place, std::uint32_t events) {
+        const int number = inotify_add_watch(file_.number(), place.c_str(), events | IN_ONLYDIR | IN_MASK_ADD);
+        if (number >= 0) watches.insert(number);
+        return number >= 0;
+    };
+    const std::string folder = folderOf(path);
+    std::error_code none;
+    if (!add(folder, anything) || std::filesystem::is_symlink(folder, none)) {
+        add(folderOf(folder), coming);
+        add(folder, anything);  // it may have come meanwhile
     }
-    for (const int watch : watches_)
-        if (!watches.contains(watch)) inotify_rm_watch(file_.number(), watch);
-    watches_ = std::move(watches);
+    add(folderOf(resolved(path)), anything);
 }
 
 // What exactly happened doesn't matter: there may have been too much of it to be told.

@@ -78,7 +78,7 @@ void Host::start(const std::string& agentVersion) {
     sd_event_set_watchdog(mainLoop_.event(), 1);  // if the service manager wants to hear
     constexpr platform::Duration pause = std::chrono::milliseconds(5);
     const std::string path = home_ + "/host.db";
-    databaseWatch_ = std::make_unique<FileWatch>(mainLoop_.event(), path, pause, [this, path] {
+    databaseWatch_ = std::make_unique<FileWatch>(mainLoop_.event(), std::vector{path}, pause, [this, path] {
         if (access(path.c_str(), F_OK) == 0) activities_.reconsider();
     });
     database_.write([this](Connection& connection) {

@@ -50,11 +50,10 @@ bool includes(const std::set<std::string>& all, const std::set<std::string>& som
 }  // namespace
 
 void ProfileNotifier::start(sd_event* loop, std::function<void()> onEdit, platform::Duration pause) {
-    if (!profile_.path().empty())
-        watch_ = std::make_unique<FileWatch>(loop, profile_.path(), pause, [this, onEdit = std::move(onEdit)] {
-            compare();
-            onEdit();
-        });
+    watch_ = std::make_unique<FileWatch>(loop, profile_.sources(), pause, [this, onEdit = std::move(onEdit)] {
+        compare();
+        onEdit();
+    });
     compare();
 }
 

@@ -207,33 +207,6 @@ TEST(AgentConnection, KeepsTheAgentFromEndingWithARequestAndNotWithSilence) {
     EXPECT_EQ(service.ends(), 1);
 }
 
-TEST(AgentConnection, LosesNoRequestAndHasNoneServedTwiceWhenTheAgentEndsOverAndOver) {
-    auto agent = std::make_shared<FakeAgent>();
-    FakeService service(agent);
-    constexpr int clients = 4, calls = 100;
-    std::atomic<int> answers = 0, running = clients;
-    std::vector<std::jthread> threads;
-    for (int i = 0; i < clients; ++i)
-        threads.emplace_back([&, later = i % 2 == 0] {
-            AgentConnection connection({.socketPath = service.socketPath()});
-            for (int call = 0; call < calls; ++call) {
-                const bool isAnswered = later ? static_cast<bool>(connection.getAllDeviceInfosUsingPolicy(0, false))
-                                              : static_cast<bool>(connection.defaultDevice());
-                answers += isAnswered;  // none when the agent ended twice before it had read
-            }
-            --running;
-        });
-    while (running > 0) {
-        const int ends = service.ends();
-        service.exitCleanWhenIdle();
-        while (running > 0 && service.ends() == ends) std::this_thread::yield();
-    }
-    threads.clear();
-    EXPECT_EQ(static_cast<int>(agent->requests().size()), answers);
-    EXPECT_GT(answers, clients * calls / 2);
-    EXPECT_GT(service.ends(), 1);
-}
-
 TEST(AgentConnection, IsServedAtTheSameTimeAsOthers) {
     auto agent = std::make_shared<FakeAgent>();
     FakeService service(agent);

@@ -63,39 +63,30 @@ TEST(Host, IsTheCurrentPlatformAndHasItsHomeToItself) {
 TEST(Host, FiresActivitiesThatItsToolsAskFor) {
     TemporaryFolder folder;
     const HostLocations locations{folder / "home", folder / "device.toml"};
-    Database unused(folder / "host.db");
-    EXPECT_EQ(requestFiring(folder.path(), unused, "a", 10s), std::nullopt) << "no agent has it";
-    EXPECT_EQ(unused.read([](Connection& connection) {
-        if (connection.integer("SELECT count(*) FROM activity_requests") != 0) throw DatabaseError(0, "left behind");
-    }),
-              std::nullopt);
-
     Host agent(locations, platform::Level::Error);
+    ASSERT_FALSE(Host(locations).open(HomeUse::Tool));
+    EXPECT_EQ(requestFiring(agent.home(), agent.database(), "a", 60s), std::nullopt) << "no agent has it";
     ASSERT_FALSE(agent.open(HomeUse::Agent));
     platform::BackgroundActivities& activities = Platform::current().backgroundActivities();
-    std::atomic<int> runs = 0;
+    std::atomic<int> runs = 0, fired = 0;
     auto handler = [&](platform::OnceCallback<platform::BackgroundActivityResult> completion) {
         ++runs;
         activities.schedule({.identifier = "other", .criteria{{.delay = 86400}}}, nullptr);
-        Platform::current().queues().mainQueue().post([completion = std::move(completion)]() mutable {
-            completion(platform::BackgroundActivityResult::Finished);
-        });
+        completion(platform::BackgroundActivityResult::Finished);
     };
     for (const char* identifier : {"a", "b", "com.orvane.vrxagent.upgrade", "com.orvane.vrxagent.boot"})
         activities.schedule({.identifier = identifier, .isPreregistered = true}, handler);
     agent.start("1");
 
-    std::atomic<int> fired = 0;
     std::vector<std::jthread> tools;
     for (const std::string identifier : {"a", "b", "a"})
         tools.emplace_back([&, identifier] {
             Database database(agent.home() + "/host.db");
             for (int i = 0; i < 10; ++i) {
                 const std::optional<FiringAnswer> answer = requestFiring(agent.home(), database, identifier, 60s);
-                ASSERT_TRUE(answer == FiringAnswer::Fired || answer == FiringAnswer::AlreadyRunning);
-                if (answer == FiringAnswer::Fired) ++fired;
+                fired += answer == FiringAnswer::Fired;
+                EXPECT_TRUE(answer == FiringAnswer::Fired || answer == FiringAnswer::AlreadyRunning);
             }
-            EXPECT_EQ(requestFiring(agent.home(), database, "unknown", 60s), FiringAnswer::Unknown);
             EXPECT_EQ(hostFact(database, facts::profile), locations.profile);
         });
     std::jthread last([&] {
@@ -104,8 +95,8 @@ TEST(Host, FiresActivitiesThatItsToolsAskFor) {
         agent.mainLoop().stop();
     });
     agent.mainLoop().run();
-    EXPECT_GT(fired, 0);
     EXPECT_EQ(runs, fired + 2) << "the upgrade and the boot activity come by themselves";
+    EXPECT_GT(fired, 0);
 }
 
 }  // namespace

@@ -9,6 +9,7 @@
 #include <sys/wait.h>
 
 #include <filesystem>
+#include <map>
 
 #include "host/main_loop.h"
 #include "host/power_supply.h"
@@ -17,35 +18,23 @@
 namespace vrx::host {
 namespace {
 
-using namespace std::chrono_literals;
-
 TEST(PowerSupply, IsLowWhereEveryBatteryIsAndNothingElseFeedsTheMachine) {
-    const std::string low = "type=Battery status=Discharging capacity=20", mouse = " scope=Device";
-    const struct {
-        std::vector<std::string> supplies;
-        bool isLow;
-    } cases[] = {{{}, false},
-                 {{low}, true},
-                 {{"type=Battery status=Discharging capacity=21"}, false},
-                 {{"type=Battery status=Discharging capacity=50 capacity_level=Critical"}, true},
-                 {{"type=Battery status=Charging capacity=5"}, false},
-                 {{low, "type=Mains online=0"}, true},
-                 {{low, "type=USB online=2"}, false},
-                 {{low, "type=Battery status=Discharging capacity=80"}, false},
-                 {{low, "type=Battery status=Discharging capacity=80" + mouse}, true},
-                 {{low + mouse}, false},
-                 {{"type=Battery"}, false}};
-    for (const auto& [supplies, isLow] : cases) {
-        TemporaryFolder root;
-        for (std::size_t i = 0; i < supplies.size(); ++i) {
-            const std::string folder = root / ("sys/class/power_supply/" + std::to_string(i));
-            std::filesystem::create_directories(folder);
-            std::istringstream words(supplies[i]);
-            for (std::string word; words >> word;)
-                writeFile(folder + "/" + word.substr(0, word.find('=')), word.substr(word.find('=') + 1) + "\n");
-        }
-        EXPECT_EQ(isOnLowBattery(root.path()), isLow) << ::testing::PrintToString(supplies);
-    }
+    TemporaryFolder root;
+    auto isLowWith = [&](const std::string& supply, std::map<const char*, const char*> attributes) {
+        const std::string folder = root / ("sys/class/power_supply/" + supply);
+        std::filesystem::create_directories(folder);
+        for (const auto& [name, value] : attributes) writeFile(folder + "/" + name, std::string(value) + "\n");
+        return isOnLowBattery(root.path());
+    };
+    EXPECT_FALSE(isOnLowBattery(root.path()));
+    EXPECT_FALSE(isLowWith("mouse", {{"type", "Battery"}, {"scope", "Device"}, {"status", "Discharging"}}));
+    EXPECT_TRUE(isLowWith("first", {{"type", "Battery"}, {"status", "Discharging"}, {"capacity", "20"}}));
+    EXPECT_FALSE(isLowWith("second", {{"type", "Battery"}, {"status", "Discharging"}, {"capacity", "21"}}));
+    EXPECT_TRUE(isLowWith("second", {{"capacity_level", "Critical"}}));
+    EXPECT_FALSE(isLowWith("second", {{"status", "Charging"}}));
+    EXPECT_TRUE(isLowWith("second", {{"status", "Discharging"}}));
+    EXPECT_TRUE(isLowWith("adapter", {{"type", "Mains"}, {"online", "0"}}));
+    EXPECT_FALSE(isLowWith("adapter", {{"online", "1"}}));
 }
 
 // On the loopback interface.
@@ -92,30 +81,6 @@ TEST(MachineConditions, FollowTheDefaultRoutesAndTheProfile) {
     ASSERT_TRUE(WIFEXITED(status));
     if (WEXITSTATUS(status) == 77) GTEST_SKIP() << "no network of its own here";
     EXPECT_EQ(WEXITSTATUS(status), 0);
-}
-
-TEST(MachineConditions, WakeAtTheTimeAskedForLast) {
-    LogRecorder log;
-    TemporaryFolder folder;
-    MainLoop loop;
-    DeviceProfile profile(folder / "device.toml");
-    MachineConditions conditions(loop.event(), profile);
-    std::optional<platform::Duration> woken;
-    conditions.start({.wake = [&] { woken = conditions.now().sinceBoot, loop.stop(); }, .wallClockSet = [] {}});
-    const platform::Duration due = conditions.now().sinceBoot + 5ms;
-    conditions.wakeAt(platform::Duration(0), false);
-    conditions.wakeAt(platform::Duration(1e300), false);
-    conditions.wakeAt(due, false);
-    loop.run();
-    ASSERT_TRUE(woken);
-    EXPECT_GE(*woken, due);
-
-    EXPECT_EQ(conditions.minimumInterval(), 15min);
-    writeFile(profile.path(), "[activities]\nminimum_interval = 2.5\nshould_defer = true\n");
-    EXPECT_EQ(conditions.minimumInterval(), 2.5s);
-    EXPECT_TRUE(conditions.shouldDefer());
-    writeFile(profile.path(), "[activities]\nminimum_interval = 86400\n");
-    EXPECT_EQ(conditions.minimumInterval(), 15min);
 }
 
 }  // namespace

@@ -5,13 +5,11 @@
 #include <poll.h>
 #include <sched.h>
 #include <sys/socket.h>
-#include <sys/un.h>
 #include <sys/wait.h>
 
-#include <csignal>
 #include <filesystem>
-#include <map>
 
+#include "client/raw_client.h"
 #include "host/home_lock.h"
 #include "support.h"
 
@@ -19,15 +17,6 @@ namespace vrx::host {
 namespace {
 
 constexpr const char* folderVariable = "VRX_TEST_FOLDER";
-
-Descriptor connectTo(const std::string& path) {
-    Descriptor file(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
-    sockaddr_un address{};
-    address.sun_family = AF_UNIX;
-    path.copy(address.sun_path, sizeof address.sun_path - 1);
-    EXPECT_EQ(connect(file.number(), reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
-    return file;
-}
 
 // What a process does in its first program, and in the second.
 void runFirstProgram(const std::string& folder) {
@@ -66,40 +55,20 @@ TEST(Restart, KeepsClientsWaitingAndTheHomeLocked) {
     const pid_t child = fork();
     if (child == 0) runFirstProgram(folder.path());
     while (!std::filesystem::exists(folder / "first")) std::this_thread::yield();
-    Descriptor client = connectTo(folder / "socket");
-    EXPECT_TRUE(HomeLock::isInUse(folder.path()));
+    test::RawClient client(folder / "socket");
+    ASSERT_TRUE(client.isConnected());
     writeFile(folder / "connected", "");
 
     // The home is never free while one program takes the other's place.
-    std::string answer;
-    for (pollfd file{client.number(), POLLIN, 0}; poll(&file, 1, 0) == 0;) {
-        ASSERT_TRUE(HomeLock::isInUse(folder.path()));
-        ASSERT_TRUE(HomeLock().take(folder.path()));
-    }
-    char text[32];
-    const ssize_t size = read(client.number(), text, sizeof text);
-    ASSERT_GT(size, 0);
-    EXPECT_EQ(std::string(text, static_cast<std::size_t>(size)), std::to_string(child)) << "the same process";
-    client = Descriptor();
+    for (pollfd file{client.file(), POLLIN, 0}; poll(&file, 1, 0) == 0;)
+        ASSERT_TRUE(HomeLock::isInUse(folder.path()) && HomeLock().take(folder.path()));
+    EXPECT_TRUE(client.readUntil(std::to_string(child))) << "the same process";
+    client.close();
     int status = 0;
     waitpid(child, &status, 0);
     EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0);
     EXPECT_FALSE(HomeLock::isInUse(folder.path()));
     EXPECT_FALSE(std::filesystem::exists(folder / "socket")) << "it goes with the process that bound it";
-}
-
-TEST(Restart, LeavesItToAServiceManagerThatStartedThisProcess) {
-    auto isUnder = [](std::map<const char*, std::string> variables) {
-        for (const auto& [name, value] : variables) setenv(name, value.c_str(), 1);
-        const bool result = isUnderServiceManager();
-        for (const auto& [name, value] : variables) unsetenv(name);
-        return result;
-    };
-    EXPECT_FALSE(isUnder({}));
-    EXPECT_TRUE(isUnder({{"NOTIFY_SOCKET", "/run/notify"}}));
-    EXPECT_TRUE(isUnder({{"INVOCATION_ID", "1"}, {"SYSTEMD_EXEC_PID", std::to_string(getpid())}}));
-    EXPECT_FALSE(isUnder({{"INVOCATION_ID", "1"}, {"SYSTEMD_EXEC_PID", "1"}})) << "a shell of that service's";
-    EXPECT_FALSE(isUnder({{"INVOCATION_ID", "1"}}));
 }
 
 }  // namespace
