@@ -1,12 +1,13 @@
 #include "platform/timer.h"
 
+#include <algorithm>
 #include <utility>
 
 namespace vrx::platform {
 
 std::shared_ptr<RepeatingTimer> RepeatingTimer::schedule(Queue& queue, Duration interval, std::function<void()> fire) {
     std::shared_ptr<RepeatingTimer> timer(new RepeatingTimer(queue, interval, std::move(fire)));
-    timer->arm();
+    timer->wait(interval);
     return timer;
 }
 
@@ -16,10 +17,15 @@ void RepeatingTimer::invalidate() {
     released.swap(fire_);
 }
 
-// A queue can't take a delayed task back: what stays there once nobody holds the timer is an empty hull.
-void RepeatingTimer::arm() {
-    queue_.postAfter(interval_, [timer = weak_from_this()] {
-        if (auto self = timer.lock()) self->fire();
+// A queue can't take a delayed task back: what stays there once nobody holds the timer is an empty hull. It stays a day
+// at most, however long the interval is, so that hulls don't pile up.
+void RepeatingTimer::wait(Duration left) {
+    constexpr Duration longestStep{86400.0};
+    const Duration step = std::min(left, longestStep);
+    queue_.postAfter(step, [timer = weak_from_this(), left = left - step] {
+        auto self = timer.lock();
+        if (!self) return;
+        left > Duration(0) ? self->wait(left) : self->fire();
     });
 }
 
@@ -30,7 +36,7 @@ void RepeatingTimer::fire() {
         fire = fire_;
     }
     if (!fire) return;
-    arm();
+    wait(interval_);
     fire();
 }
 

@@ -21,7 +21,7 @@ public:
 private:
     RepeatingTimer(Queue& queue, Duration interval, std::function<void()> fire)
         : queue_(queue), interval_(interval), fire_(std::move(fire)) {}
-    void arm();
+    void wait(Duration left);
     void fire();
 
     Queue& queue_;

@@ -166,11 +166,13 @@ void VRXAgent::getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicy policy, bool
     auto collected = std::make_shared<CollectedInfos>();
     for (auto& [key, device] : deviceProvider()->allDevices()) {
         _group.enter();
-        getWarrantyUsingPolicy(policy, device->serialNumber(),
-                               [self, collected, device = device](std::shared_ptr<VRXWarranty> warranty) {
-                                   collected->append(VRXDeviceInfo::deviceInfoWithDevice(device, std::move(warranty)));
-                                   self->_group.leave();
-                               });
+        // Left when the reply has run, or is let go at the end of the process: the group's task holds the agent.
+        std::shared_ptr<void> membership(nullptr, [self](void*) { self->_group.leave(); });
+        getWarrantyUsingPolicy(
+            policy, device->serialNumber(),
+            [collected, device = device, membership = std::move(membership)](std::shared_ptr<VRXWarranty> warranty) {
+                collected->append(VRXDeviceInfo::deviceInfoWithDevice(device, std::move(warranty)));
+            });
     }
     _group.notify(_policyLookupQueue, [self, collected, updateFollowUps, reply = std::move(reply)]() mutable {
         DeviceInfoList infos = collected->take();

@@ -69,8 +69,7 @@ ActivityCollaborators activityCollaborators(const std::shared_ptr<void>& lifetim
 
 StartUp::StartUp()
     : activityCollaborators_(activityCollaborators(lifetime_)),
-      agentCollaborators_(agentCollaborators(activityCollaborators_)),
-      delegate_(agentCollaborators_) {
+      agentCollaborators_(agentCollaborators(activityCollaborators_)) {
     log(platform::Level::Default, "launched");
     vrx_registerDefaults(Platform::current().defaultsStore());
     monitorActivities();
@@ -108,9 +107,10 @@ void StartUp::startMonitors() {
 }
 
 void StartUp::openListener() {
+    delegate_.emplace(agentCollaborators_);
     listener_ = Platform::current().serviceListenerFactory().makeListener(
         platform::vendorIdentifier(platform::serviceNameRemainder));
-    listener_->setDelegate(&delegate_);
+    listener_->setDelegate(&*delegate_);
     listener_->resume();
 }
 

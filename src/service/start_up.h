@@ -4,6 +4,7 @@
 
 #include <array>
 #include <memory>
+#include <optional>
 
 #include "platform/service_listener.h"
 #include "protocols/agent_collaborators.h"
@@ -39,7 +40,7 @@ private:
     std::shared_ptr<VRXAgent> agent_;
     std::shared_ptr<VRXLocaleMonitor> localeMonitor_;
     std::shared_ptr<VRXPairedDevicesMonitor> pairedDevicesMonitor_;
-    ServiceDelegate delegate_;
+    std::optional<ServiceDelegate> delegate_;
     std::unique_ptr<platform::ServiceListener> listener_;
 };
 
