@@ -88,7 +88,11 @@ TEST_F(CommandLine, NoAgentIsNotReachable) {
                                   {"defaults", "write", "K", "1"},
                                   {"cache", "X"},
                                   {"followups", "--watch"},
-                                  {"followups", "clear", "X"}})
+                                  {"followups", "clear", "X"},
+                                  {"activities"},
+                                  {"fire", "outreach"},
+                                  {"why", "X"},
+                                  {"doctor", "--timeout", "0.1"}})
         expectHost(3, verb);
     EXPECT_FALSE(std::filesystem::exists(place_ / "home"));
 }
@@ -155,7 +159,11 @@ TEST_F(CommandLine, UsageErrors) {
                                        {"followups", "clear"},
                                        {"followups", "post", "x", "--watch"},
                                        {"followups", "--device", "x", "clear", "y"},
-                                       {"cache"}})
+                                       {"cache"},
+                                       {"why"},
+                                       {"fire"},
+                                       {"activities", "x"},
+                                       {"doctor", "--timeout", "0"}})
         EXPECT_EQ(expectHost(2, arguments)["error"]["kind"], Value("usage"));
     expect(0, {"--help"});
     expect(0, {"info", "--help"});

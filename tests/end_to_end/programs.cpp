@@ -72,6 +72,11 @@ Process::~Process() {
     close(pidFile_);
 }
 
+bool Process::isRunning() const {
+    pollfd ended{pidFile_, POLLIN, 0};
+    return poll(&ended, 1, 0) == 0;
+}
+
 void Process::signal(int number) const {
     kill(pid_, number);
 }

@@ -29,6 +29,7 @@ public:
     Process& operator=(const Process&) = delete;
 
     int identifier() const { return pid_; }
+    bool isRunning() const;
     void signal(int number) const;
     // Its exit code, or the negative signal that ended it.
     int wait();
@@ -77,6 +78,7 @@ public:
     // An agent of this place: comes back once it is ready or has ended.
     void start();
     bool isReady() const { return isReady_; }
+    bool isRunning() const { return agent_->isRunning(); }
     Process& agent() { return *agent_; }
     // SIGTERM, and what wait() gives.
     int stop();

@@ -92,13 +92,5 @@ TEST_F(SchedulerTest, RunsTheActivityFromItsTargetDateOn) {
     EXPECT_THAT(results, ElementsAre(Deferred, Finished, Finished, Deferred));
 }
 
-TEST_F(SchedulerTest, ClearsTargetDatesOnly) {
-    for (const char* name : {key, "other.TargetDate", "x.TargetDate.y", "TargetDate"})
-        host.defaults.set(name, "no date");
-    host.defaults.registerDefaults({{"registered", 1}});
-    VRXScheduler::clearScheduledActivities();
-    EXPECT_EQ(host.defaults.stored(), (platform::Dictionary{{"TargetDate", "no date"}, {"x.TargetDate.y", "no date"}}));
-}
-
 }  // namespace
 }  // namespace vrx

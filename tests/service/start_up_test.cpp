@@ -28,10 +28,11 @@ TEST(StartUp, MakesItsPartsInAFixedOrder) {
 TEST(StartUp, BeginsTheAgentsWorkOnceAndTakesItUpAtEachBoot) {
     sim::Host host;
     const std::string outreach = "com.orvane.vrxagent.outreach";
-    host.defaults.set("left over.TargetDate", host.clock.now());
+    for (const char* key : {"left over.TargetDate", "no.TargetDate.at all"}) host.defaults.set(key, "value");
     host.process.launch([] { return std::make_shared<StartUp>(); });
     host.runFor(platform::Duration(1));
     EXPECT_TRUE(host.defaults.get("left over.TargetDate").isNull());
+    EXPECT_FALSE(host.defaults.get("no.TargetDate.at all").isNull());
     EXPECT_EQ(host.defaults.date("DefaultDeviceActivationDate"), sim::Clock::start);
     EXPECT_EQ(host.activities.criteria(outreach), (platform::ActivityCriteria{172800, 17280, true}));
 
