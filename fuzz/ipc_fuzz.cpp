@@ -11,6 +11,8 @@
 
 #include "codec/keyed_archive.h"
 #include "devices/device_info.h"
+#include "host/main_loop.h"
+#include "host/process_lifecycle.h"
 #include "host/service/client_session.h"
 #include "host/system_log.h"
 #include "platform/platform.h"
@@ -140,8 +142,10 @@ void fuzzRequests(const std::string& bytes) {
     auto peer = host::PeerIdentity::ofPeer(ends[0]);
     require(static_cast<bool>(peer));
     host::ServiceLimits limits;
+    static host::MainLoop mainLoop;
+    host::ProcessLifecycle lifecycle(mainLoop);
     host::ClientSession session(std::move(agentEnd), *peer, std::make_shared<Agent>(),
-                                std::make_shared<host::ReplyBox>(), limits);
+                                std::make_shared<host::ReplyBox>(), limits, lifecycle);
     std::string hex;
     for (char digit : std::to_string(getuid())) hex += std::string("3") + digit;
     const std::string sent = std::string(1, '\0') + "AUTH EXTERNAL " + hex + "\r\nBEGIN\r\n" + bytes;
