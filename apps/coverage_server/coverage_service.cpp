@@ -145,10 +145,6 @@ void CoverageService::answered(const httplib::Request& request, const httplib::R
                                const Connection& connection) {
     const Connection::Exchange& exchange = connection.exchange;
     const int status = connection.isTakenOver() ? connection.status() : response.status;
-    if (!exchange.isServed) log_.countMalformed(status);
-    const SeenRequest seen =
-        exchange.isServed ? log_.finish(exchange.request, status, exchange.fault, exchange.reason) : SeenRequest{};
-
     const auto taken = std::chrono::steady_clock::now() - exchange.begun;
     std::string line = "#" + std::to_string(connection.id()) + "." + std::to_string(connection.requests()) + " ";
     line += exchange.isServed ? request.method + " " + printable(request.target) : "malformed request";
@@ -156,7 +152,10 @@ void CoverageService::answered(const httplib::Request& request, const httplib::R
     line += " " + std::to_string(std::chrono::duration_cast<Milliseconds>(taken).count()) + "ms";
     if (!exchange.fault.empty()) line += " fault=" + printable(exchange.fault);
     if (!exchange.reason.empty()) line += " (" + printable(exchange.reason) + ")";
-    print(line);
+    print(line);  // before whoever waits for the request to be answered goes on
+
+    if (!exchange.isServed) return log_.countMalformed(status);
+    const SeenRequest seen = log_.finish(exchange.request, status, exchange.fault, exchange.reason);
     if (printsRequests_ && seen.id) {
         const std::string text = dumped(seen.json()) + "\n";
         std::fwrite(text.data(), 1, text.size(), stdout);
