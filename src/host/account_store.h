@@ -1,6 +1,9 @@
-// The user's cloud account, as the device profile names it. Any thread may ask.
+// The user's cloud account, as the device profile names it, its tokens, and their renewal by the profile's credential
+// helper. Any thread may ask.
 #pragma once
 
+#include "host/credential_renewals.h"
+#include "host/credentials.h"
 #include "host/device_profile.h"
 #include "platform/account_store.h"
 
@@ -8,7 +11,11 @@ namespace vrx::host {
 
 class AccountStore final : public platform::AccountStore {
 public:
-    explicit AccountStore(const DeviceProfile& profile) : profile_(profile) {}
+    // The profile must outlive the store. A helper that has not answered within the limit is ended.
+    AccountStore(const DeviceProfile& profile, const std::string& home,
+                 platform::Duration helperLimit = std::chrono::seconds(60));
+    // Ends renewals under way, and those that are asked for from now on: they fail.
+    void stop() { renewals_.stop(); }
 
     std::optional<platform::CloudAccount> primaryCloudAccount() const override;
     std::optional<platform::AuthenticationAccount> authenticationAccount(
@@ -21,7 +28,12 @@ public:
     std::optional<std::int64_t> storeAccountIdentifier(const platform::CloudAccount& account) const override;
 
 private:
+    platform::RenewalResult renew(const CredentialRenewals::Question& question, int stopFile);
+
     const DeviceProfile& profile_;
+    const platform::Duration helperLimit_;
+    Credentials credentials_;
+    CredentialRenewals renewals_;  // ends before what it uses
 };
 
 }  // namespace vrx::host

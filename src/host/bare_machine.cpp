@@ -7,6 +7,7 @@
 #include <cstdlib>
 #include <initializer_list>
 
+#include "host/text.h"
 #include "platform/sha256_hash.h"
 #include "platform/vendor.h"
 
@@ -17,21 +18,11 @@ namespace {
 using OptionalText = std::optional<std::string>;
 using File = platform::Result<FileContent>;
 
-std::string_view trimmed(std::string_view text) {
-    const std::size_t begin = text.find_first_not_of(" \t\r\n");
-    if (begin == text.npos) return {};
-    return text.substr(begin, text.find_last_not_of(" \t\r\n") + 1 - begin);
-}
-
-std::string_view textOf(const FileContent& content) {
-    return {reinterpret_cast<const char*>(content.bytes.data()), content.bytes.size()};
-}
-
 // What firmware says when its maker filled in nothing counts as nothing.
 std::shared_ptr<const OptionalText> firmwareText(const File& file, std::shared_ptr<const OptionalText>) {
     OptionalText result;
     if (file) {
-        const std::string_view text = trimmed(textOf(*file));
+        const std::string_view text = trimmed(file->text());
         constexpr std::string_view fillers[] = {"",
                                                 "0",
                                                 "None",
@@ -70,7 +61,7 @@ auto assignedText(std::initializer_list<const char*> names) {
                                                                           std::shared_ptr<const OptionalText>) {
         OptionalText result;
         for (const std::string& name : names)
-            if (file && !result) result = assignment(textOf(*file), name);
+            if (file && !result) result = assignment(file->text(), name);
         return std::make_shared<const OptionalText>(std::move(result));
     };
 }

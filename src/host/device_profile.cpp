@@ -7,6 +7,7 @@
 #include <set>
 
 #include "codec/number_format.h"
+#include "host/text.h"
 #include "platform/log.h"
 
 namespace vrx::host {
@@ -35,12 +36,39 @@ public:
         : table_(table), prefix_(std::move(prefix)), unknown_(unknown) {}
 
     std::optional<std::string> string(const char* key) { return scalar<std::string>(key, "a string"); }
+    std::optional<std::int64_t> integer(const char* key) { return scalar<std::int64_t>(key, "an integer"); }
     std::optional<bool> boolean(const char* key) { return scalar<bool>(key, "true or false"); }
 
     std::string requiredString(const char* key) {
         std::optional<std::string> text = string(key);
         if (!text || text->empty()) throw ProfileError{table_.source().begin.line, prefix_ + key + " is missing"};
         return *text;
+    }
+
+    // A string that may be sent in a header or in a line of its own; an empty one counts as none.
+    std::optional<std::string> line(const char* key) {
+        std::optional<std::string> text = string(key);
+        if (text && !isOneLine(*text)) reject(key, *find(key), "without control characters");
+        return text && text->empty() ? std::nullopt : text;
+    }
+
+    std::optional<std::string> absolutePath(const char* key) {
+        std::optional<std::string> path = line(key);
+        if (path && !path->starts_with('/')) reject(key, *find(key), "an absolute path");
+        return path;
+    }
+
+    // A program and its arguments.
+    std::vector<std::string> command(const char* key) {
+        std::vector<std::string> words = strings(key);
+        if (!words.empty() && !words[0].starts_with('/'))
+            reject(key, *find(key), "a list that begins with an absolute path");
+        return words;
+    }
+
+    bool isFalse(const char* key) {
+        const toml::node* node = find(key);
+        return node && node->is_boolean() && !**node->as_boolean();
     }
 
     // A date, with or without a time; one without an offset is in UTC.
@@ -183,13 +211,45 @@ ProfileBundle readBundle(Table& table) {
     return bundle;
 }
 
+platform::HttpHeaders readHeaders(Table& table) {
+    platform::HttpHeaders headers;
+    table.each([&](const std::string& name, const toml::node& node) {
+        const auto* value = node.as_string();
+        if (!isHeaderName(name) || !value || !isOneLine(value->get()))
+            table.reject(name, node, "a header's name, and its value a string without control characters");
+        headers[name] = value->get();
+    });
+    return headers;
+}
+
+// Nothing when it has no identifier: nobody is signed in then.
+std::optional<ProfileAccount> readAccount(Table& table) {
+    ProfileAccount account;
+    account.identifier = table.line("identifier").value_or("");
+    account.altDSID = table.line("alt_dsid");
+    if (!table.isFalse("authentication")) {
+        account.authentication = {account.identifier, account.altDSID};
+        table.table("authentication", [&](Table& authentication) {
+            if (auto identifier = authentication.line("identifier")) account.authentication->identifier = *identifier;
+            if (auto altDSID = authentication.line("alt_dsid")) account.authentication->altDSID = *altDSID;
+        });
+    }
+    account.credentialHelper = table.command("credential_helper");
+    account.storefront = table.line("storefront");
+    account.storeAccountIdentifier = table.integer("store_account_identifier");
+    account.clientInformation = table.line("client_information");
+    account.deviceIdentifier = table.line("device_identifier");
+    table.table("headers", [&](Table& headers) { account.headers = readHeaders(headers); });
+    return account.identifier.empty() ? std::nullopt : std::optional(std::move(account));
+}
+
 ProfileFacts readFacts(Table& root) {
     ProfileFacts facts;
     root.table("device", [&](Table& device) {
         facts.serialNumber = device.string("serial_number");
         facts.name = device.string("name");
-        facts.productType = device.string("product_type");
-        facts.productVersion = device.string("product_version");
+        facts.productType = device.line("product_type");
+        facts.productVersion = device.line("product_version");
         facts.isInternal = device.boolean("internal").value_or(false);
         facts.contentSizeCategory = device.string("content_size");
     });
@@ -203,7 +263,11 @@ ProfileFacts readFacts(Table& root) {
         });
     });
     root.tables("watches", [&](Table& watch) { facts.watches.push_back(readWatch(watch)); });
-    root.table("account", [&](Table& account) { facts.account = account.string("identifier"); });
+    root.table("account", [&](Table& account) { facts.account = readAccount(account); });
+    root.table("http", [&](Table& http) {
+        facts.http.caFile = http.absolutePath("ca_file");
+        facts.http.namesApplications = http.boolean("source_application_header").value_or(false);
+    });
     root.table("locale", [&](Table& locale) {
         if (std::optional<std::string> language = locale.string("language"))
             facts.language = localeIdentifierFromPosix(*language);
@@ -217,8 +281,8 @@ bool isWrittenByTrusted(const struct stat& status) {
     return (status.st_uid == 0 || status.st_uid == geteuid()) && (status.st_mode & 0022) == 0;
 }
 
-std::string_view textOf(const FileContent& file) {
-    return {reinterpret_cast<const char*>(file.bytes.data()), file.bytes.size()};
+bool needsTrust(const ProfileFacts& facts) {
+    return !facts.bundles.empty() || facts.http.caFile || (facts.account && !facts.account->credentialHelper.empty());
 }
 
 // Reads the file afresh, and says each thing about it once: while the file is new, it is read more than once.
@@ -230,16 +294,20 @@ public:
                                                    std::shared_ptr<const ProfileFacts> last) {
         if (!last) last = std::make_shared<const ProfileFacts>();
         if (!file && file.error().code == ENOENT) return std::make_shared<const ProfileFacts>();
-        Result<ProfileReading> reading = file ? parseProfile(textOf(*file), path_) : file.error();
+        Result<ProfileReading> reading = file ? parseProfile(file->text(), path_) : file.error();
         if (!reading) {
             report(Level::Error, reading.error().text + "; the device profile is not taken over");
             return last;
         }
         std::string warnings;
         for (const std::string& warning : reading->warnings) warnings += (warnings.empty() ? "" : "; ") + warning;
-        report(Level::Default, warnings);
         ProfileFacts facts = std::move(reading).value().facts;
         facts.isTrusted = isWrittenByTrusted(file->status);
+        if (!facts.isTrusted && needsTrust(facts))
+            warnings +=
+                (warnings.empty() ? "" : "; ") + path_ +
+                ": others can write it; its bundles, http.ca_file and account.credential_helper are not believed";
+        report(Level::Default, warnings);
         return std::make_shared<const ProfileFacts>(std::move(facts));
     }
 

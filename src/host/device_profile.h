@@ -12,6 +12,7 @@
 
 #include "host/bare_machine.h"
 #include "host/current_copy.h"
+#include "platform/account_store.h"
 #include "platform/device_properties.h"
 #include "platform/locale.h"
 #include "platform/paired_device_registry.h"
@@ -28,6 +29,26 @@ struct ProfileBundle {
     platform::Dictionary entitlements;  // booleans, numbers, texts and lists of texts
 };
 
+// The user's cloud account.
+struct ProfileAccount {
+    std::string identifier;
+    std::optional<std::string> altDSID;
+    // The account that signs requests: this one, unless the file names another or none.
+    std::optional<platform::AuthenticationAccount> authentication;
+    std::vector<std::string> credentialHelper;  // the program, an absolute path, and its arguments; empty for none
+    std::optional<std::string> storefront;
+    std::optional<std::int64_t> storeAccountIdentifier;
+    // What its requests carry; made of the device's facts where they are absent.
+    std::optional<std::string> clientInformation;
+    std::optional<std::string> deviceIdentifier;
+    std::optional<platform::HttpHeaders> headers;
+};
+
+struct ProfileHttp {
+    std::optional<std::string> caFile;  // an absolute path
+    bool namesApplications = false;     // to a server on this machine
+};
+
 // What the file says.
 struct ProfileFacts {
     std::optional<std::string> serialNumber;
@@ -38,13 +59,14 @@ struct ProfileFacts {
     std::optional<std::string> contentSizeCategory;
     std::map<std::string, std::map<std::string, bool>> featureFlags;  // by domain and flag
     std::vector<platform::PairedWatch> watches;
-    std::optional<std::string> account;  // of the user who is signed in
+    std::optional<ProfileAccount> account;  // of the user who is signed in
+    ProfileHttp http;
     std::optional<std::string> language;
     std::optional<std::string> timeZone;
     std::vector<ProfileBundle> bundles;
 
     // Whether root or the agent's own user owns the file and nobody else can write it: only then may what it says
-    // about bundles be believed.
+    // about bundles, authorities and helper programs be believed.
     bool isTrusted = false;
 };
 

@@ -7,6 +7,7 @@
 
 #include <span>
 #include <string>
+#include <string_view>
 
 #include "platform/files.h"
 
@@ -36,6 +37,7 @@ public:
 struct FileContent {
     platform::Data bytes;
     struct stat status;
+    std::string_view text() const { return {reinterpret_cast<const char*>(bytes.data()), bytes.size()}; }
 };
 
 // The whole of a regular file of at most limits::fileBytes; anything else, a FIFO too, is an error and never waits.

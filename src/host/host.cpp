@@ -16,9 +16,11 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel)
       database_(home_ + "/host.db"),
       defaults_(database_),
       profile_(locations.profile),
-      accounts_(profile_),
+      accounts_(profile_, home_),
+      accountSession_(profile_),
       clock_(profile_),
-      http_(queues_.workers(platform::Priority::UserInitiated)) {
+      http_(queues_.workers(platform::Priority::UserInitiated), clock_, profile_) {
+    facilities_.accountSession = &accountSession_;
     facilities_.accountStore = &accounts_;
     facilities_.clock = &clock_;
     facilities_.defaultsStore = &defaults_;
@@ -35,9 +37,11 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel)
     platform_ = Platform(facilities_);
 }
 
-// Tasks may use any facility to their end, and the current platform too: they end first.
+// Tasks may use any facility to their end, and the current platform too: they end first, and what one may wait for
+// before them.
 Host::~Host() {
     http_.stop();
+    accounts_.stop();
     queues_.stop();
 }
 

@@ -11,6 +11,7 @@
 #include <string>
 
 #include "codec/codec.h"
+#include "host/account_session.h"
 #include "host/account_store.h"
 #include "host/clock.h"
 #include "host/database.h"
@@ -39,7 +40,7 @@ enum class HomeUse { Agent, Tool };
 class Host {
 public:
     explicit Host(const HostLocations& locations, platform::Level lowestLevel = platform::Level::Default);
-    // Ends what is under way: requests go unanswered, running tasks are waited for.
+    // Ends what is under way: requests go unanswered, renewals of credentials fail, running tasks are waited for.
     ~Host();
     Host(const Host&) = delete;
     Host& operator=(const Host&) = delete;
@@ -75,6 +76,7 @@ private:
     DefaultsStore defaults_;
     DeviceProfile profile_;
     AccountStore accounts_;
+    AccountSession accountSession_;
     Clock clock_;
     HttpSessions http_;
 };

@@ -1,12 +1,18 @@
 // HTTP on libcurl: one thread, begun with the first request, moves the bytes of every session; answers are delivered on
 // the worker queue. Sessions may be used from any thread. Nothing wakes up while nothing is under way.
 //
-// TLS is verified; plain http reaches this machine only. A GET follows redirects, which carry none of the request's own
-// headers and never leave https; any other method is answered with the redirect itself.
+// TLS is verified, against the system's authorities and those that the profile adds; plain http reaches this machine
+// only. A GET follows redirects, which carry none of the request's own headers and never leave https; any other method
+// is answered with the redirect itself. Neither headers nor bodies are ever logged here.
+//
+// The shared session keeps answers as their headers allow (http_cache.h). An uncached one neither uses what is kept nor
+// asks whether it still holds; what it brings takes its place, so that nobody is given the older answer afterwards.
 #pragma once
 
 #include <memory>
 
+#include "host/device_profile.h"
+#include "platform/clock.h"
 #include "platform/http_request.h"
 #include "platform/limits.h"
 #include "platform/queue.h"
@@ -17,14 +23,17 @@ struct HttpLimits {
     platform::Duration timeout = std::chrono::seconds(60);    // of a request that sets none
     std::size_t answerBytes = platform::limits::answerBytes;  // after decompression; headers count apart
     int redirects = 5;
+    std::size_t storedAnswers = 32;
+    std::size_t storedBytes = 1024 * 1024;  // of all stored answers together
 };
 
 class HttpTransfers;
 
 class HttpSessions final : public platform::HttpSessions {
 public:
-    // The queue must outlive the sessions.
-    explicit HttpSessions(platform::Queue& answers, const HttpLimits& limits = {});
+    // Queue, clock and profile must outlive the sessions.
+    HttpSessions(platform::Queue& answers, const platform::Clock& clock, const DeviceProfile& profile,
+                 const HttpLimits& limits = {});
     ~HttpSessions() override;
     // Discards what is under way, and what is sent from now on, unanswered.
     void stop();

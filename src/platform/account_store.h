@@ -23,11 +23,13 @@ struct CloudAccount {
 struct AuthenticationAccount {
     std::string identifier;
     std::optional<std::string> altDSID{};
+    bool operator==(const AuthenticationAccount&) const = default;
 };
 
 struct RenewalOptions {
     bool avoidUI = true;
     std::vector<std::string> services;
+    bool operator==(const RenewalOptions&) const = default;
 };
 
 struct RenewalResult {

@@ -3,6 +3,7 @@
 
 #include <map>
 
+#include "host/clock.h"
 #include "host/http.h"
 #include "host/loopback_server.h"
 #include "host/queues.h"
@@ -71,7 +72,9 @@ private:
     host::LoopbackServer server_{served};
     host::MainLoop loop_;
     host::Queues queues_{loop_, 2};
-    host::HttpSessions sessions_{queues_.workers(Priority::UserInitiated)};
+    host::DeviceProfile profile_{""};
+    host::Clock clock_{profile_};
+    host::HttpSessions sessions_{queues_.workers(Priority::UserInitiated), clock_, profile_};
 };
 
 template <class Subject>

@@ -17,6 +17,8 @@ using ::testing::HasSubstr;
 using ::testing::StartsWith;
 
 constexpr const char* everything = R"(
+http = { ca_file = "/etc/ca.pem", source_application_header = true }
+
 [device]
 serial_number = "SN1"
 name = "Ada's device"
@@ -41,6 +43,12 @@ archived = true
 
 [account]
 identifier = "ada"
+alt_dsid = "A1"
+authentication = { alt_dsid = "A2" }
+credential_helper = ["/bin/helper", "--now"]
+storefront = ""
+store_account_identifier = 12345678901
+headers = { X-Account = "1" }
 
 [locale]
 language = "de_DE.UTF-8"
@@ -73,7 +81,6 @@ TEST_F(DeviceProfileTest, GivesEveryFactOfTheFile) {
     EXPECT_TRUE(profile.isEnabled("Coverage", "Watches"));
     EXPECT_FALSE(profile.isEnabled("Coverage", "Other"));
     EXPECT_FALSE(profile.isEnabled("Other", "Watches"));
-    EXPECT_EQ(profile.facts()->account, "ada");
     EXPECT_EQ(profile.preferredLocaleIdentifier(), "de_DE");
     EXPECT_EQ(profile.decimalText(1234567), "1.234.567");
 
@@ -88,13 +95,24 @@ TEST_F(DeviceProfileTest, GivesEveryFactOfTheFile) {
     EXPECT_TRUE(!watches[1].isPaired && watches[1].isArchived);
 
     const auto facts = profile.facts();
+    const ProfileAccount account = facts->account.value();
+    EXPECT_EQ(account.identifier + *account.altDSID, "adaA1");
+    EXPECT_EQ(account.authentication, (platform::AuthenticationAccount{"ada", "A2"}));
+    EXPECT_THAT(account.credentialHelper, ElementsAre("/bin/helper", "--now"));
+    EXPECT_TRUE(account.storeAccountIdentifier == 12345678901 && !account.storefront && !account.clientInformation);
+    EXPECT_EQ(account.headers, (platform::HttpHeaders{{"X-Account", "1"}}));
+    EXPECT_TRUE(facts->http.caFile == "/etc/ca.pem" && facts->http.namesApplications);
     ASSERT_EQ(facts->bundles.size(), 1u);
     EXPECT_THAT(facts->bundles[0].executables, ElementsAre("/usr/bin/busctl"));
     EXPECT_EQ(facts->bundles[0].entitlements.at("com.example.flag"), Value(true));
     EXPECT_TRUE(facts->isTrusted);
+    EXPECT_THAT(log.lines(), ElementsAre());
     chmod(path().c_str(), 0664);  // somebody else may write it now
     EXPECT_FALSE(profile.facts()->isTrusted);
-    EXPECT_THAT(log.lines(), ElementsAre());
+    EXPECT_THAT(log.lines(), ElementsAre(HasSubstr("others can write it")));
+
+    writeFile(path(), "account = { identifier = 'ada', authentication = false }");
+    EXPECT_FALSE(profile.facts()->account->authentication);
 }
 
 TEST_F(DeviceProfileTest, EachReadSeesTheFileAsItIsEvenWithinOneTickOfTheClock) {
@@ -126,6 +144,12 @@ TEST_F(DeviceProfileTest, AFileThatIsWrongIsReportedOnceWithItsLineAndTheLastGoo
         {"[[watches]]\npaired_date = 'yesterday'", ":2: watches.paired_date must be a date; "},
         {"[watches]\nname = 'X'", ":1: watches must be a list of tables, [[watches]]; "},
         {"\n[[bundles]]\nexecutables = ['/bin/x']", ":2: bundles.identifier is missing; "},
+        {"[account]\nidentifier = \"a\\nb\"", ":2: account.identifier must be without control characters; "},
+        {"[account]\ncredential_helper = ['helper']",
+         ":2: account.credential_helper must be a list that begins with an absolute path; "},
+        {"[account.headers]\nX-A = \"1\\r\\nX-B: 2\"",
+         ":2: account.headers.X-A must be a header's name, and its value "},
+        {"[http]\nca_file = 'ca.pem'", ":2: http.ca_file must be an absolute path; "},
         {"[[bundles]]\nidentifier = 'x'\nentitlements = { a = { b = 1 } }",
          ":3: bundles.entitlements.a must be a boolean, number, string or list of strings; "},
     };

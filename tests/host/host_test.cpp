@@ -4,6 +4,7 @@
 
 #include <future>
 
+#include "host/credential_helper.h"
 #include "support.h"
 
 namespace vrx::host {
@@ -23,16 +24,24 @@ TEST(Host, IsTheCurrentPlatformAndHasItsHomeToItself) {
         Platform& platform = Platform::current();
         EXPECT_EQ(platform.files().homeDirectory(), locations.home);
         EXPECT_EQ(platform.clock().timeZoneOffset(), 5h + 30min);
-        writeFile(locations.profile, "[locale]\ntime_zone = 'America/Lima'\n");
+        writeFile(locations.profile,
+                  "[account]\nidentifier = 'ada'\ncredential_helper = ['/bin/sleep', '100000']\n"
+                  "[locale]\ntime_zone = 'America/Lima'\n");
         EXPECT_EQ(platform.clock().timeZoneOffset(), -5h);
         EXPECT_THAT(Host(locations).open(HomeUse::Agent)->text, HasSubstr("another agent"));
         EXPECT_FALSE(Host(locations).open(HomeUse::Tool));
         EXPECT_EQ(&Platform::current(), &platform);
 
-        // Work that still runs at the end has the platform to the last.
+        // Work that still runs at the end has the platform to the last, and what it waits for ends.
         std::promise<void> begun;
         platform.queues().workers(platform::Priority::Background).post([&] {
+            auto renewed = platform.queues().makeEvent();
+            platform.accountStore().renewCredentials({"ada"}, {.services = {"S"}}, [&](const auto& result) {
+                EXPECT_EQ(result.code, static_cast<int>(CredentialFailure::Ended));
+                renewed->set();
+            });
             begun.set_value();
+            renewed->wait();
             for (int i = 0; i < 20; ++i) Platform::current().defaultsStore().set("key", i);
         });
         begun.get_future().wait();

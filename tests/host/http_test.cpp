@@ -1,7 +1,11 @@
 #include "host/http.h"
 
 #include <gmock/gmock.h>
+#include <sys/stat.h>
 
+#include <array>
+#include <csignal>
+#include <cstdio>
 #include <future>
 
 #include "host/queues.h"
@@ -58,7 +62,11 @@ protected:
     LogRecorder log;
     MainLoop loop;
     Queues queues{loop, 2};
-    HttpSessions http{queues.workers(platform::Priority::UserInitiated), {.timeout = 10s, .answerBytes = 10'000}};
+    SettableClock clock;
+    TemporaryFolder folder;
+    DeviceProfile profile{folder / "device.toml"};
+    platform::Queue& workers = queues.workers(platform::Priority::UserInitiated);
+    HttpSessions http{workers, clock, profile, {.timeout = 10s, .answerBytes = 10'000}};
 };
 
 TEST_F(HttpTest, CarriesRequestAndAnswerAndReusesTheConnection) {
@@ -85,10 +93,16 @@ TEST_F(HttpTest, CarriesRequestAndAnswerAndReusesTheConnection) {
     EXPECT_THAT(requests[0], ::testing::EndsWith("\r\n\r\n{}"));
     EXPECT_THAT(requests[0], Not(HasSubstr("Cache-Control")));
     EXPECT_THAT(requests[1], HasSubstr("Cache-Control: no-cache"));
+    EXPECT_THAT(requests[1], Not(HasSubstr("Source-Application")));
+    writeFile(profile.path(), "[http]\nsource_application_header = true");
+    HttpRequest named = requestTo(server.url());
+    named.sourceApplication = "com.example.app";
+    fetch(named);
+    EXPECT_THAT(requests[2], HasSubstr("\r\nX-Orvane-Source-Application: com.example.app\r\n"));
 
     request.headers = {{"X-A", "1\r\nX-Forged: 2"}};
     EXPECT_THAT(error(fetch(request)), HasSubstr("header"));
-    EXPECT_EQ(requests.size(), 2u);
+    EXPECT_EQ(requests.size(), 3u);
 }
 
 TEST_F(HttpTest, BoundsTheAnswerAlsoAfterDecompressionAndItsHeaders) {
@@ -112,7 +126,7 @@ TEST_F(HttpTest, EndsWhatTakesTooLongIsRefusedOrBreaksOff) {
                                                : std::string();
     });
     EXPECT_THAT(error(fetch(requestTo(server.url(), "GET", 100ms))), HasSubstr("timed out"));
-    HttpSessions impatient(queues.workers(platform::Priority::Background), {.timeout = 100ms});
+    HttpSessions impatient(workers, clock, profile, {.timeout = 100ms});
     EXPECT_THAT(error(fetch(impatient.shared(), requestTo(server.url("/cut")))), HasSubstr("timed out"));
 
     const int unused = socket(AF_INET, SOCK_STREAM, 0);
@@ -160,12 +174,128 @@ TEST_F(HttpTest, SpeaksPlainHttpWithThisMachineOnlyAndReadsFiles) {
     EXPECT_EQ(error(get("ftp://localhost/")), "the scheme ftp is not supported");
     EXPECT_NE(error(get("")), "(none)");
 
-    TemporaryFolder folder;
     writeFile(folder / "a b", "content");
     EXPECT_EQ(body(get("file://" + folder / "a%20b")), "content");
     EXPECT_NE(error(get("file://" + folder / "absent")), "(none)");
     writeFile(folder / "large", std::string(10'001, 'x'));
     EXPECT_EQ(error(get("file://" + folder / "large")), "the file is too large");
+}
+
+TEST_F(HttpTest, KeepsAnswersAsTheirHeadersAllow) {
+    constexpr const char* ifNoneMatch = "If-None-Match: \"a\"";
+    constexpr const char* ifModifiedSince = "If-Modified-Since: Sun, 06 Nov 1994 08:00:00 GMT";
+    // What the first answer says, how much later the second request comes, and how it asks whether that still holds:
+    // empty for not, null when it does not go out.
+    const std::tuple<std::string, double, const char*> cases[] = {
+        {"Cache-Control: max-age=60", 59, nullptr},
+        {"Cache-Control: max-age=60", 60, ""},
+        {"Cache-Control: max-age=60\r\nAge: 10", 50, ""},
+        {"Cache-Control: max-age=60", -1, ""},  // the clock was set back
+        {"Cache-Control: max-age=60\r\nETag: \"a\"", 60, ifNoneMatch},
+        {"Cache-Control: no-cache, max-age=60\r\nETag: \"a\"", 0, ifNoneMatch},
+        {"Cache-Control: max-age=60\r\ncache-control: no-store\r\nETag: \"a\"", 0, ""},
+        {"ETag: \"a\", \"b\"", 0, ""},
+        {"Last-Modified: Sun, 06 Nov 1994 08:00:00 GMT", 0, ifModifiedSince},
+        {"Expires: Sun, 06 Nov 1994 08:50:37 GMT\r\nDate: Sun, 06 Nov 1994 08:49:37 GMT", 59, nullptr},
+        {"Expires: 0\r\nLast-Modified: Sun, 06 Nov 1994 08:00:00 GMT", 0, ifModifiedSince},
+        {"Cache-Control: max-age=60\r\nVary: Accept-Encoding, X-Other", 1, nullptr},
+        {"Cache-Control: max-age=60\r\nVary: Accept, *", 1, ""},
+        {"X-None: 1", 0, ""},
+    };
+    std::vector<std::string> requests;
+    std::string headers;
+    LoopbackServer server([&](const std::string& request) {
+        requests.push_back(request);
+        const bool isAsked = request.find("\r\nIf-") != request.npos;
+        return isAsked ? "HTTP/1.1 304 Not Modified\r\nX-New: 1\r\nCache-Control: max-age=60\r\n\r\n"
+                       : answer("200 OK", std::to_string(requests.size()), headers);
+    });
+    for (const auto& [said, secondsLater, condition] : cases) {
+        SCOPED_TRACE(said);
+        requests.clear();
+        headers = said + "\r\n";
+        const std::string url = server.url("/" + std::to_string(&said - &std::get<0>(cases[0])));
+        EXPECT_EQ(body(get(url)), "1");
+        clock.seconds = clock.seconds + secondsLater;
+        const bool isConfirmed = condition && *condition;
+        HttpResponse second = get(url);
+        EXPECT_EQ(body(second), condition && !isConfirmed ? "2" : "1");
+        EXPECT_EQ(second.status, 200);
+        ASSERT_EQ(requests.size(), condition ? 2u : 1u);
+        EXPECT_EQ(requests.back().find("\r\nIf-") != std::string::npos, isConfirmed);
+        if (isConfirmed) {
+            EXPECT_THAT(requests[1], HasSubstr(condition));
+            EXPECT_EQ(second.headers["X-New"], "1");
+            EXPECT_EQ(get(url).headers["Age"], "0");  // it is fresh anew
+            EXPECT_EQ(requests.size(), 2u);
+        }
+        clock.seconds = 784'111'777;
+    }
+}
+
+TEST_F(HttpTest, KeepsNothingThatIsDoubtful) {
+    std::vector<std::string> requests;
+    std::string next;
+    LoopbackServer server([&](const std::string& request) {
+        requests.push_back(request);
+        return next;
+    });
+    const std::string fresh = "Cache-Control: max-age=60\r\nETag: \"a\"\r\n";
+    const HttpRequest plain = requestTo(server.url()), posted = requestTo(server.url(), "POST");
+    HttpRequest ranged = plain, typed = plain;
+    ranged.headers["Range"] = "bytes=0-1";
+    typed.headers["Accept"] = "text/plain";
+    const std::pair<HttpRequest, std::string> cases[] = {
+        {plain, answer("404 Not Found", "x", fresh)},
+        {plain, answer("206 Partial Content", "x", fresh)},
+        {plain, "HTTP/1.0 200 OK\r\n" + fresh + "\r\nof unknown length"},
+        {plain, "HTTP/1.0 200 OK\r\nContent-Length: 99\r\n" + fresh + "\r\ncut short"},
+        {plain, answer("200 OK", std::string(10'001, 'x'), fresh)},
+        {ranged, answer("200 OK", "x", fresh)},
+        {posted, answer("200 OK", "x", fresh)},
+        {typed, answer("200 OK", "x", fresh)},
+    };
+    for (const auto& [request, first] : cases) {
+        next = first;
+        fetch(request);
+        next = answer("200 OK", "new");
+        EXPECT_EQ(body(fetch(plain)), "new") << first;
+        EXPECT_THAT(requests.back(), Not(HasSubstr("If-None-Match"))) << first;
+    }
+    EXPECT_EQ(body(fetch(typed)), "x");  // these ones were kept
+
+    auto fetched = [&](platform::HttpSession& session, const std::string& answer) {
+        next = answer;
+        return body(fetch(session, plain));
+    };
+    fetched(http.shared(), answer("200 OK", "1", fresh));
+    EXPECT_EQ(fetched(*http.makeUncached(), answer("200 OK", "2", fresh)), "2");
+    EXPECT_EQ(fetched(http.shared(), answer("200 OK", "3", fresh)), "2");  // the reload has taken its place
+    fetch(posted);
+    EXPECT_EQ(fetched(http.shared(), next), "3");  // it was changed
+    clock.seconds = clock.seconds + 60;
+    EXPECT_EQ(fetched(http.shared(), answer("500 Broken", "broken")), "broken");
+    requests.clear();
+    fetched(http.shared(), "HTTP/1.1 304 Not Modified\r\nETag: \"b\"\r\n\r\n");  // of another answer
+    EXPECT_THAT(requests, ElementsAre(HasSubstr("If-None-Match"), Not(HasSubstr("If-None-Match"))));
+}
+
+TEST_F(HttpTest, TrustsTheProfilesAuthorityWhileTheProfileIsTrusted) {
+    const std::string program = VRX_PROGRAMS "/vrx-coverage-server --tls";
+    FILE* server = popen(("exec 2>/dev/null; echo process $$; exec " + program).c_str(), "r");
+    std::array<char, 1000> process, certificate, url;
+    ASSERT_EQ(fscanf(server, "process %999s control on %*s certificate %999s listening on %999s", process.data(),
+                     certificate.data(), url.data()),
+              3);
+    setenv("https_proxy", "http://proxy.invalid:1", 1);  // not for this machine
+    EXPECT_THAT(error(get(url.data())), HasSubstr("certificate"));
+    writeFile(profile.path(), "[http]\nca_file = '" + std::string(certificate.data()) + "'");
+    chmod(profile.path().c_str(), 0600);
+    EXPECT_EQ(get(url.data()).status, 404);
+    chmod(profile.path().c_str(), 0666);
+    EXPECT_THAT(error(get(url.data())), HasSubstr("certificate"));
+    kill(std::stoi(process.data()), SIGTERM);
+    pclose(server);
 }
 
 TEST_F(HttpTest, AnswersRequestsAtOnceAndLetsGoOfThoseUnderWayAtItsEnd) {

@@ -18,7 +18,7 @@
 namespace vrx::host {
 
 // Answers each request of each connection on loopback with whatever the test's function makes of it; an empty answer
-// keeps silent and the connection open.
+// keeps silent and the connection open, one of HTTP/1.0 ends with the connection.
 class LoopbackServer {
 public:
     using Answer = std::function<std::string(const std::string& request)>;
@@ -73,7 +73,8 @@ private:
         const std::size_t body = length < end ? std::stoul(connection.received.substr(length + 16)) : 0;
         if (connection.received.size() < end + 4 + body) return true;
         const std::string answer = answer_(std::exchange(connection.received, ""));
-        return send(connection.file, answer.data(), answer.size(), MSG_NOSIGNAL) == static_cast<ssize_t>(answer.size());
+        const ssize_t sent = send(connection.file, answer.data(), answer.size(), MSG_NOSIGNAL);
+        return sent == static_cast<ssize_t>(answer.size()) && !answer.starts_with("HTTP/1.0");
     }
 
     const Answer answer_;

@@ -1,8 +1,10 @@
-// What the host's tests share: a folder that goes away, and a platform that writes down what is logged.
+// What the host's tests share: a folder that goes away, a clock that the test sets, and a platform that writes down
+// what is logged.
 #pragma once
 
 #include <gtest/gtest.h>
 
+#include <atomic>
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
@@ -10,6 +12,8 @@
 #include <string>
 #include <vector>
 
+#include "codec/codec.h"
+#include "platform/clock.h"
 #include "platform/log.h"
 #include "platform/platform.h"
 
@@ -47,7 +51,14 @@ inline std::string fileText(const std::string& path) {
     return {std::istreambuf_iterator<char>(file), {}};
 }
 
-// The current platform, with nothing but a log that keeps its lines of level Default and above.
+class SettableClock final : public platform::Clock {
+public:
+    platform::Date now() const override { return platform::dateFromEpoch(seconds); }
+    std::chrono::seconds timeZoneOffset() const override { return {}; }
+    std::atomic<double> seconds = 784'111'777;  // 1994-11-06 08:49:37
+};
+
+// The current platform, with nothing but digests, and a log that keeps its lines of level Default and above.
 class LogRecorder final : public platform::SystemLog {
 public:
     bool isOn(platform::Level level) const override { return level != platform::Level::Debug; }
@@ -63,7 +74,8 @@ public:
 private:
     mutable std::mutex mutex_;
     std::vector<std::string> lines_;
-    platform::Platform platform_{{.systemLog = this}};
+    codec::Digest digest_;
+    platform::Platform platform_{{.digest = &digest_, .systemLog = this}};
     platform::ScopedPlatform current_{platform_};
 };
 

@@ -1,6 +1,7 @@
 // A file descriptor that is closed with its owner.
 #pragma once
 
+#include <sys/syscall.h>
 #include <unistd.h>
 
 #include <utility>
@@ -27,5 +28,11 @@ public:
 private:
     int number_;
 };
+
+// A descriptor of a process, readable once it has ended. The library's own function cannot be called from C++ before
+// glibc 2.37.
+inline Descriptor openProcess(pid_t processIdentifier) {
+    return Descriptor(static_cast<int>(syscall(SYS_pidfd_open, processIdentifier, 0)));
+}
 
 }  // namespace vrx::host

@@ -27,11 +27,6 @@ bool isSameFile(const struct stat& one, const struct stat& other) {
     return one.st_dev == other.st_dev && one.st_ino == other.st_ino;
 }
 
-// The library's own function cannot be called from C++ before glibc 2.37.
-int openPidfd(pid_t processIdentifier) {
-    return static_cast<int>(syscall(SYS_pidfd_open, processIdentifier, 0));
-}
-
 Descriptor openProcessFolder(pid_t processIdentifier) {
     const std::string path = "/proc/" + std::to_string(processIdentifier);
     return Descriptor(open(path.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
@@ -82,7 +77,7 @@ Result<PeerIdentity> PeerIdentity::ofPeer(int socket) {
     int pidfd = -1;
     size = sizeof pidfd;
     const bool isExact = getsockopt(socket, SOL_SOCKET, peerPidfdOption, &pidfd, &size) == 0;
-    const Descriptor guard(isExact ? pidfd : openPidfd(credentials.pid));
+    const Descriptor guard(isExact ? pidfd : openProcess(credentials.pid).release());
     if (!guard) return systemError("identify", "process " + std::to_string(credentials.pid), errno);
 
     PeerIdentity peer;

@@ -1,0 +1,47 @@
+// The input is an answer's headers, a line each. Whatever they are, the cache stays within its bounds, keeps nothing
+// that no-store forbids, and asks about what it keeps by headers that can be sent.
+#include <cmath>
+#include <cstdlib>
+
+#include "host/http_cache.h"
+#include "host/http_cache_rules.h"
+#include "host/text.h"
+
+using namespace vrx;
+
+namespace {
+
+struct StillClock final : platform::Clock {
+    platform::Date now() const override { return platform::dateFromEpoch(784'111'777); }
+    std::chrono::seconds timeZoneOffset() const override { return {}; }
+} still;
+
+void expect(bool isTrue) {
+    if (!isTrue) std::abort();
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t size) {
+    platform::HttpResponse answer{.status = 200};
+    for (std::string_view rest(reinterpret_cast<const char*>(bytes), size); !rest.empty();) {
+        const std::string_view line = rest.substr(0, rest.find('\n'));
+        rest.remove_prefix(std::min(line.size() + 1, rest.size()));
+        const std::size_t colon = std::min(line.find(':'), line.size());
+        answer.headers.emplace(line.substr(0, colon), host::trimmed(line.substr(std::min(colon + 1, line.size()))));
+    }
+    static host::HttpCache cache(still, 4, 4096);
+    const auto key = host::HttpCache::keyOf("https://host/", answer.headers);
+    cache.store(key, "https://host/", still.now(), answer);
+    expect(cache.entries() <= 4 && cache.bytes() <= 4096);
+    const auto stored = cache.find(key);
+    const platform::Duration age = host::ageOnArrival(answer.headers, still.now(), still.now());
+    const platform::Duration lifetime = host::freshnessLifetime(answer.headers, still.now());
+    expect(age.count() >= 0 && lifetime.count() >= 0 && std::isfinite(age.count() + lifetime.count()));
+    expect(!stored || host::parseCacheControl(answer.headers["Cache-Control"]).isStorable);
+    if (!stored) return 0;
+    expect(cache.freshAnswer(*stored).has_value() == (age < lifetime));
+    for (const auto& [name, value] : host::revalidationHeaders(stored->answer.headers)) expect(host::isOneLine(value));
+    expect(cache.revalidated(*stored, still.now(), answer.headers).status == 200);
+    return 0;
+}
