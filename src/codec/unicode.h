@@ -1,4 +1,4 @@
-// Text in UTF-8 and UTF-16, strictly: no overlong forms, no lone surrogates, nothing beyond U+10FFFF. Any thread may
+// UTF-8 to UTF-16 and back, strictly: no overlong forms, no lone surrogates, nothing beyond U+10FFFF. Any thread may
 // call.
 #pragma once
 
@@ -6,14 +6,14 @@
 #include <string>
 #include <string_view>
 
+#include "platform/utf8.h"
+
 namespace vrx::codec {
 
-// Takes the first character off the text; nothing, and the text as it was, where it does not begin with valid UTF-8.
-std::optional<char32_t> takeCharacter(std::string_view& rest);
-void appendUtf8(std::string& text, char32_t character);
+using platform::appendUtf8;
+using platform::takeCharacter;
 
 bool isAscii(std::string_view text);
-bool isUtf8(std::string_view text);
 std::optional<std::u16string> utf16FromUtf8(std::string_view text);
 std::optional<std::string> utf8FromUtf16(std::u16string_view text);
 

@@ -1,10 +1,15 @@
 #include "coverage/warranty_downloader.h"
 
+#include <chrono>
+
+#include "coverage/account_headers.h"
 #include "coverage/cache_metadata.h"
 #include "coverage/warranty.h"
 #include "platform/clock.h"
 #include "platform/defaults_store.h"
 #include "platform/files.h"
+#include "platform/http_request.h"
+#include "platform/json.h"
 #include "platform/locale.h"
 #include "platform/log.h"
 #include "platform/platform.h"
@@ -16,8 +21,12 @@
 namespace vrx {
 
 using platform::Data;
+using platform::HttpRequest;
+using platform::HttpResponse;
 using platform::Level;
+using platform::OnceCallback;
 using platform::Platform;
+using platform::Priority;
 using platform::Result;
 using platform::Url;
 using platform::Value;
@@ -25,6 +34,10 @@ using platform::Value;
 namespace {
 
 constexpr std::string_view warrantyURLKey = "WarrantyURL";
+constexpr std::int32_t mostRetries = 2;
+constexpr platform::Duration attemptTimeout = std::chrono::seconds(30);
+constexpr int ok = 200;
+constexpr int unauthorized = 401;
 
 // The file's content; nothing when it cannot be read or is empty.
 std::optional<Data> dataAt(const Url& url) {
@@ -33,6 +46,24 @@ std::optional<Data> dataAt(const Url& url) {
     Result<Data> data = Platform::current().files().read(*path);
     if (!data || data->empty()) return std::nullopt;
     return std::move(data).value();
+}
+
+// The JSON of an answer; null when there is none, and the log says why. Of the two failures that may have come together
+// the transport's is the cause.
+Value jsonFrom(const HttpResponse& response) {
+    Value json;
+    platform::MaybeError error = response.error;
+    if (response.body) {
+        const auto* text = reinterpret_cast<const char*>(response.body->data());
+        Result<Value> parsed = Platform::current().json().parse({text, response.body->size()});
+        if (parsed)
+            json = *parsed;
+        else if (!error)
+            error = parsed.error();
+    }
+    const std::string outcome = json.isNull() ? platform::describe(error) : json.description();
+    log(Level::Default, "load warranty status: %ld : %@", response.status, outcome);
+    return json;
 }
 
 void storeInCache(const VRXWarranty& warranty, const std::string& serialNumber) {
@@ -62,25 +93,66 @@ void VRXWarrantyDownloader::downloadWarrantyForSerialNumber(const std::optional<
     log(Level::Default, "%s: %{private}@",
         "-[VRXWarrantyDownloader downloadWarrantyForSerialNumber:completionHandler:]", serialNumber);
     Platform::current().defaultsStore().remove(serverVersionCacheKey);  // so that the versions are negotiated afresh
-    VRXServerVersionUtilities::serverVersionSupported(
-        [self = shared_from_this(), serialNumber, completion = std::move(completionHandler)](bool isSupported) mutable {
-            if (!isSupported) {
-                log(Level::Default, "Warranty download skipped server due to server version");
-                completion(false, nullptr);
-            } else if (!serialNumber) {
-                log(Level::Error, "vrxagent failed to load warranty");
-                completion(false, nullptr);
-            } else {
-                self->_downloadWarrantyForSerialNumber(*serialNumber, std::move(completion));
-            }
+    auto continueIfSupported = [self = shared_from_this(), serialNumber,
+                                completion = std::move(completionHandler)](bool isSupported) mutable {
+        if (!isSupported) {
+            log(Level::Default, "Warranty download skipped server due to server version");
+            completion(false, nullptr);
+        } else if (!serialNumber) {
+            log(Level::Error, "vrxagent failed to load warranty");
+            completion(false, nullptr);
+        } else {
+            self->_downloadWarrantyForSerialNumber(*serialNumber, std::move(completion));
+        }
+    };
+    // Asked on a worker: an override is answered before the question returns, and the first attempt runs on the thread
+    // of the answer. The caller's, a connection's or the main thread, must not be held while a credential is renewed.
+    Platform::current()
+        .queues()
+        .workers(Priority::UserInitiated)
+        .post([next = std::move(continueIfSupported)]() mutable {
+            VRXServerVersionUtilities::serverVersionSupported(std::move(next));
         });
 }
 
 void VRXWarrantyDownloader::_downloadWarrantyForSerialNumber(const std::string& serialNumber, Completion completion) {
+    auto finishWith = [self = shared_from_this(), serialNumber,
+                       completion = std::move(completion)](Value coverage) mutable {
+        self->finish(serialNumber, std::move(coverage), std::move(completion));
+    };
     std::optional<Url> url = Url::parse(Platform::current().defaultsStore().string(warrantyURLKey).value_or(""));
-    Value coverage;
-    if (url && url->isFile()) coverage = dictionaryFromURL(*url, serialNumber);
-    finish(serialNumber, std::move(coverage), std::move(completion));
+    if (!url) return finishWith(nullptr);  // as a request there would end, but no credential is renewed for it
+    if (url->isFile()) return finishWith(dictionaryFromURL(*url, serialNumber));
+    _downloadWarrantyFromServerURL(*url, serialNumber, mostRetries, std::move(finishWith));
+}
+
+void VRXWarrantyDownloader::_downloadWarrantyFromServerURL(const Url& url, const std::string& serialNumber,
+                                                           std::int32_t retries, OnceCallback<Value> completionBlock) {
+    log(Level::Default, "%{private}@ : warranty download attempt (%d/%d)", serialNumber, mostRetries - retries,
+        mostRetries);
+    HttpRequest request;
+    request.url = url.text();
+    request.timeout = attemptTimeout;
+    const bool forceReprovisioning = retries != mostRetries;  // the server has refused the token that is stored
+    constexpr bool avoidUI = true;
+    if (!vrx_signWithAccountHeaders(request, forceReprovisioning, avoidUI)) {
+        log(Level::Default, "Unable to load sign request, failing warranty download");
+        return completionBlock(nullptr);
+    }
+    vrx_setCoverageRequestBodyWithSerialNumber(request, serialNumber);
+    log(Level::Default, "Retrying request:");
+    log(Level::Default, "Headers: %@", headerDescription(request));
+    log(Level::Default, "Body: %@", bodyDescription(request));
+    request.sourceApplication = callingProcessBundleID_;
+
+    auto take = [self = shared_from_this(), url, serialNumber, retries,
+                 completionBlock = std::move(completionBlock)](const HttpResponse& response) mutable {
+        Value json = jsonFrom(response);
+        if (response.status == unauthorized && retries > 0)
+            return self->_downloadWarrantyFromServerURL(url, serialNumber, retries - 1, std::move(completionBlock));
+        completionBlock(response.status == ok ? std::move(json) : Value());
+    };
+    Platform::current().httpSessions().shared().send(std::move(request), std::move(take));
 }
 
 void VRXWarrantyDownloader::finish(const std::string& serialNumber, Value coverage, Completion completion) const {
@@ -96,7 +168,7 @@ void VRXWarrantyDownloader::finish(const std::string& serialNumber, Value covera
         storeInCache(*warranty, serialNumber);
         completion(true, std::move(warranty));
     };
-    Platform::current().queues().workers(platform::Priority::UserInitiated).post(std::move(buildAndCache));
+    Platform::current().queues().workers(Priority::UserInitiated).post(std::move(buildAndCache));
 }
 
 Value VRXWarrantyDownloader::dictionaryFromURL(const Url& url, const std::string& serialNumber) const {

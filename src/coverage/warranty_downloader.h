@@ -2,6 +2,7 @@
 // alive by it; any thread may start it.
 #pragma once
 
+#include <cstdint>
 #include <memory>
 #include <optional>
 #include <string>
@@ -22,12 +23,16 @@ public:
     // On behalf of an application, which is named as the source of the traffic.
     static std::shared_ptr<VRXWarrantyDownloader> initWithCallingProcessBundleID(std::string callingProcessBundleID);
 
-    // Returns at once unless everything is at hand locally; completes on a worker, or where the server's versions were
-    // refused. A device without a serial number has no record.
+    // Returns at once; completes on a worker. A device without a serial number has no record.
     void downloadWarrantyForSerialNumber(const std::optional<std::string>& serialNumber, Completion completionHandler);
 
-    // The download once the server's version is accepted.
+    // The download once the server's version is accepted. Like the next, it may hold its thread while a credential is
+    // renewed.
     void _downloadWarrantyForSerialNumber(const std::string& serialNumber, Completion completion);
+    // One attempt, and those that follow when the server refuses the credential: as many more as there are retries.
+    // Hands over the answer's JSON, or null for an answer of any other status or none.
+    void _downloadWarrantyFromServerURL(const platform::Url& url, const std::string& serialNumber, std::int32_t retries,
+                                        platform::OnceCallback<platform::Value> completionBlock);
     // The coverage dictionary of a property-list file: of the serial number's own file beside the URL's when there is
     // one, else of the URL's. Null when neither can be read.
     platform::Value dictionaryFromURL(const platform::Url& url, const std::string& serialNumber) const;

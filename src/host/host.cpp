@@ -34,6 +34,7 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel)
     facilities_.pairedDeviceRegistry = &profile_;
     facilities_.propertyList = &propertyList_;
     facilities_.queues = &queues_;
+    facilities_.uuidSource = &uuids_;
     platform_ = Platform(facilities_);
 }
 

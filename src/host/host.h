@@ -23,6 +23,7 @@
 #include "host/main_loop.h"
 #include "host/queues.h"
 #include "host/system_log.h"
+#include "host/uuid.h"
 #include "platform/bundle_lookup.h"
 #include "platform/platform.h"
 #include "platform/service_listener.h"
@@ -79,6 +80,7 @@ private:
     AccountSession accountSession_;
     Clock clock_;
     HttpSessions http_;
+    UuidSource uuids_;
 };
 
 }  // namespace vrx::host

@@ -28,7 +28,7 @@ std::string LogEntry::message(bool revealPrivate) const {
     for (const LogArgument& argument : arguments) {
         log_detail::Placeholder placeholder = log_detail::nextPlaceholder(format, position);
         text += format.substr(position, placeholder.begin - position);
-        text += argument.isPrivate && !revealPrivate ? "<private>" : argument.text;
+        text += argument.redacted && !revealPrivate ? *argument.redacted : argument.text;
         position = placeholder.end;
     }
     return text.append(format.substr(position));

@@ -5,6 +5,7 @@
 // its arguments does not compile. Any thread may log.
 #pragma once
 
+#include <optional>
 #include <string>
 #include <string_view>
 #include <type_traits>
@@ -18,7 +19,17 @@ enum class Level { Debug, Default, Error };
 
 struct LogArgument {
     std::string text;
-    bool isPrivate = false;
+    std::optional<std::string> redacted{};  // what a log shows in its place; the text itself when absent
+};
+
+inline constexpr std::string_view redactedMark = "<private>";
+
+// A text for "%@" that holds secrets, and what a log shows in its place.
+struct RedactableText {
+    std::string text;
+    std::string redacted;
+
+    std::string description() const { return text; }
 };
 
 // One line: the format names the line, the arguments fill it.
@@ -29,7 +40,7 @@ struct LogEntry {
     const char* file;
     int line;
 
-    // The line with its arguments; private ones read <private> unless they are to be revealed.
+    // The line with its arguments, in their redacted form unless what is private is to be revealed.
     std::string message(bool revealPrivate = false) const;
 };
 
@@ -120,6 +131,13 @@ std::string argumentText(const T& value) {
         return describe(value);
 }
 
+template <class T>
+LogArgument argument(Kind kind, const T& value) {
+    if (kind == Kind::Private) return {argumentText(value), std::string(redactedMark)};
+    if constexpr (std::is_same_v<T, RedactableText>) return {value.text, value.redacted};
+    return {argumentText(value)};
+}
+
 }  // namespace log_detail
 
 template <class... Args>
@@ -143,7 +161,7 @@ void log(Level level, std::type_identity_t<LogFormat<std::decay_t<Args>...>> for
     [[maybe_unused]] auto add = [&](const auto& value) {
         log_detail::Placeholder placeholder = log_detail::nextPlaceholder(format.text, position);
         position = placeholder.end;
-        entry.arguments.push_back({log_detail::argumentText(value), placeholder.kind == log_detail::Kind::Private});
+        entry.arguments.push_back(log_detail::argument(placeholder.kind, value));
     };
     (add(args), ...);
     sink.write(entry);

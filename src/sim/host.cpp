@@ -19,7 +19,8 @@ Host::Host()
                 .propertyList = &propertyList,
                 .queues = &queues,
                 .serviceListenerFactory = &listener,
-                .systemLog = &log}),
+                .systemLog = &log,
+                .uuidSource = &uuids}),
       scope_(platform) {}
 
 }  // namespace vrx::sim

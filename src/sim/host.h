@@ -24,6 +24,7 @@
 #include "sim/queues.h"
 #include "sim/service_listener.h"
 #include "sim/system_log.h"
+#include "sim/uuid.h"
 
 namespace vrx::sim {
 
@@ -56,6 +57,7 @@ public:
     codec::Json json;
     codec::PropertyList propertyList;
     codec::Digest digest;
+    UuidSource uuids;
     platform::Platform platform;
 
 private:

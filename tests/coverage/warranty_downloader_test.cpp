@@ -1,6 +1,7 @@
-// Downloads from a coverage file, and what they leave in the cache.
+// Downloads from a coverage file and from a server, and what they leave in the cache.
 #include "coverage/warranty_downloader.h"
 
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include "coverage/cache_metadata.h"
@@ -25,13 +26,15 @@ protected:
     }
     struct Outcome {
         int completions = 0;
+        platform::Date date;
         bool success = false;
         std::shared_ptr<VRXWarranty> warranty;
     };
     Outcome download(const std::optional<std::string>& serialNumber) {
         Outcome outcome;
-        auto complete = [&outcome](bool success, std::shared_ptr<VRXWarranty> warranty) {
+        auto complete = [this, &outcome](bool success, std::shared_ptr<VRXWarranty> warranty) {
             ++outcome.completions;
+            outcome.date = host.clock.now();
             outcome.success = success;
             outcome.warranty = std::move(warranty);
         };
@@ -41,6 +44,17 @@ protected:
         EXPECT_EQ(outcome.completions, 1);
         EXPECT_EQ(outcome.success, outcome.warranty != nullptr);
         return outcome;
+    }
+    // Says so in the log, and leaves cache and metadata as they were.
+    void expectFailure(const std::string& line) {
+        const auto cached = VRXWarranty::cachedWarrantyForSerialNumber("S");
+        const Value date = metadata(cachedWarrantyLastUpdatedDateKey);
+        host.log.clear();
+        EXPECT_FALSE(download("S").success);
+        EXPECT_THAT(host.log.messages(), testing::Contains(line));
+        EXPECT_EQ(host.log.messages().back(), "vrxagent failed to load warranty");
+        EXPECT_TRUE(VRXWarranty::cachedWarrantyForSerialNumber("S")->isEqual(cached.get()));
+        EXPECT_EQ(metadata(cachedWarrantyLastUpdatedDateKey), date);
     }
     Value metadata(std::string_view key) { return host.defaults.get(cacheMetadataKey("S", key)); }
     sim::Host host;
@@ -75,25 +89,15 @@ TEST_F(WarrantyDownloaderTest, PrefersTheSerialNumbersOwnFile) {
 
 TEST_F(WarrantyDownloaderTest, AFailureLeavesTheCacheAsItWas) {
     host.files.put("/data/Warranty.plist", propertyList(Dictionary{{"covered", true}}));
-    auto first = download("S").warranty;
-    Dictionary stored = host.defaults.dictionaryRepresentation();
-    host.clock.set(host.clock.now() + platform::Duration(1000));
-
-    auto expectFailure = [&](const char* line) {
-        host.log.clear();
-        EXPECT_FALSE(download("S").success);
-        EXPECT_TRUE(host.log.contains(line)) << line;
-        EXPECT_TRUE(host.log.contains("vrxagent failed to load warranty"));
-        EXPECT_TRUE(VRXWarranty::cachedWarrantyForSerialNumber("S")->isEqual(first.get()));
-        EXPECT_EQ(metadata(cachedWarrantyLastUpdatedDateKey),
-                  stored.at(cacheMetadataKey("S", cachedWarrantyLastUpdatedDateKey)));
-    };
+    EXPECT_TRUE(download("S").success);
+    const std::string url = "file:///data/Warranty.plist";
     host.files.put("/data/Warranty.plist", "garbage");
-    expectFailure("Error serializing plist file from URL '%@': %@");
+    expectFailure("loading warranty from: " + url);
+    EXPECT_TRUE(host.log.contains("Error serializing plist file from URL '%@': %@"));
     host.files.put("/data/Warranty.plist", propertyList(platform::Array{1}));
-    expectFailure("loading warranty from: %@");
+    expectFailure("loading warranty from: " + url);
     host.files.remove("/data/Warranty.plist");
-    expectFailure("URL '%@' contains no plist data");
+    expectFailure("URL '" + url + "' contains no plist data");
     host.defaults.set("WarrantyURL", "no url");
     expectFailure("vrxagent failed to load warranty");
     EXPECT_FALSE(download(std::nullopt).success);
@@ -111,6 +115,91 @@ TEST_F(WarrantyDownloaderTest, AServerOfOtherVersionsIsNotAsked) {
     // A cache from before is not believed: each download negotiates afresh, here with a server that is away.
     host.files.remove("/data/versions.plist");
     EXPECT_TRUE(download("S").success);
+}
+
+struct ServerTest : WarrantyDownloaderTest {
+    ServerTest() {
+        host.defaults.set("WarrantyURL", url);
+        host.http.answer(url, sim::HttpAnswer::ok(R"({"old": 1})"));
+        host.accounts.tokens[service] = "T0";
+        host.accounts.renewedToken = "T1";
+    }
+    std::string sentTokens() const {
+        std::string tokens;
+        for (const auto& sent : host.http.sentTo(url)) tokens += sent.request.headers.at("X-Orvane-KS-Token");
+        return tokens;
+    }
+    const char* const url = "https://coverage.example/summary";
+    const char* const service = "com.orvane.ks.supportapp.auth";
+};
+
+TEST_F(ServerTest, FailsForEveryAnswerButAnObject) {
+    using sim::HttpAnswer;
+    ASSERT_TRUE(download("S").success);
+    const HttpAnswer refusal = HttpAnswer::status(401, R"({"why": "token"})");
+    const std::pair<std::vector<HttpAnswer>, std::string> cases[] = {
+        {{refusal, refusal, refusal}, "401 : {why = token;}"},
+        {{refusal, HttpAnswer::status(500)}, "500 : invalid JSON at byte 0: unexpected end of input (json 74)"},
+        {{HttpAnswer::status(404, "{}")}, "404 : {}"},
+        {{HttpAnswer::status(201, "{}")}, "201 : {}"},
+        {{HttpAnswer::failure()}, "0 : connection lost (http 1)"},
+        {{HttpAnswer::ok("[1]")}, "200 : (1)"},
+        {{HttpAnswer::ok("null")}, "200 : (null)"},
+    };
+    std::size_t requests = 1;
+    for (const auto& [answers, lastStatus] : cases) {
+        SCOPED_TRACE(lastStatus);
+        for (const HttpAnswer& answer : answers) host.http.answerOnce(url, answer);
+        expectFailure("load warranty status: " + lastStatus);
+        requests += answers.size();
+        EXPECT_EQ(host.http.sentTo(url).size(), requests);
+        EXPECT_EQ(host.log.count("Reprovision KS tokens"), static_cast<int>(answers.size()) - 1);
+    }
+}
+
+TEST_F(ServerTest, RenewsARefusedTokenAndTriesAgain) {
+    for (int i = 0; i < 2; ++i) host.http.answerOnce(url, sim::HttpAnswer::status(401));
+    host.http.answerOnce(url, sim::HttpAnswer::ok(R"({"n": null})"));  // which no file can hold
+    EXPECT_TRUE(download("S").success);
+    EXPECT_FALSE(VRXWarranty::cachedWarrantyForSerialNumber("S"));
+    EXPECT_EQ(metadata(cachedWarrantyVersionKey), Value("2"));
+    EXPECT_EQ(sentTokens(), "T0T1T1");
+    EXPECT_TRUE(host.accounts.asked[0].avoidUI);
+    EXPECT_EQ(host.http.sentTo(url)[2].request.sourceApplication, "com.orvane.Preferences");
+
+    std::string formats;
+    for (const auto& entry : host.log.entries()) formats.append(entry.format).append("|");
+    const std::string attempt = "%{private}@ : warranty download attempt (%d/%d)|";
+    const std::string rest = "storeLocale %@|Retrying request:|Headers: %@|Body: %@|load warranty status: %ld : %@|";
+    const std::string retry = attempt + "Reprovision KS tokens|" + rest;
+    EXPECT_THAT(formats, testing::HasSubstr("|" + attempt + rest + retry + retry + "downloaded warranty: %@|"));
+    EXPECT_EQ(host.log.lastMessage("%{private}@ : warranty download attempt (%d/%d)"),
+              "S : warranty download attempt (2/2)");
+}
+
+TEST_F(ServerTest, SilentServersAreGivenUpInTime) {
+    host.defaults.set("ServerVersionURL", "https://cdn.example/versions");
+    host.http.answer("https://cdn.example/versions", sim::HttpAnswer::silence());
+    host.http.answer(url, sim::HttpAnswer::silence());
+    const platform::Date start = host.clock.now();
+    EXPECT_EQ(download("S").date - start, platform::Duration(60 + 30));
+}
+
+TEST_F(ServerTest, AnHourOfRenewalHoldsUpNothingElse) {
+    host.defaults.set("ServerVersionOverride", Dictionary{{"LowServerVersion", 2}, {"HighServerVersion", 3}});
+    host.accounts.tokens.clear();
+    host.accounts.renewalDelay = std::chrono::hours(1);
+    int successes = 0;
+    VRXWarrantyDownloader::initWithCallingProcessBundleID("com.orvane.Preferences")
+        ->downloadWarrantyForSerialNumber("S", [&](bool success, auto) { successes += success; });
+    EXPECT_TRUE(host.accounts.asked.empty()) << "the caller would have waited";
+    host.run();
+    host.accounts.tokens[service] = "T0";
+    EXPECT_TRUE(download("T").success);
+    EXPECT_EQ(successes, 0);
+    host.runFor(std::chrono::hours(1));
+    EXPECT_EQ(successes, 1);
+    EXPECT_EQ(sentTokens(), "T0T1");
 }
 
 }  // namespace

@@ -13,6 +13,7 @@ namespace {
 using namespace std::chrono_literals;
 using platform::Platform;
 using ::testing::HasSubstr;
+using ::testing::MatchesRegex;
 
 TEST(Host, IsTheCurrentPlatformAndHasItsHomeToItself) {
     TemporaryFolder folder;
@@ -28,6 +29,9 @@ TEST(Host, IsTheCurrentPlatformAndHasItsHomeToItself) {
                   "[account]\nidentifier = 'ada'\ncredential_helper = ['/bin/sleep', '100000']\n"
                   "[locale]\ntime_zone = 'America/Lima'\n");
         EXPECT_EQ(platform.clock().timeZoneOffset(), -5h);
+        const std::string uuid = platform.uuidSource().makeUuid();
+        EXPECT_THAT(uuid, MatchesRegex("[0-9a-f]{8}(-[0-9a-f]{4}){3}-[0-9a-f]{12}"));
+        EXPECT_NE(uuid, platform.uuidSource().makeUuid());
         EXPECT_THAT(Host(locations).open(HomeUse::Agent)->text, HasSubstr("another agent"));
         EXPECT_FALSE(Host(locations).open(HomeUse::Tool));
         EXPECT_EQ(&Platform::current(), &platform);

@@ -26,7 +26,7 @@ std::string written(const LogEntry& entry, Level lowest) {
 TEST(SystemLog, WritesOneLineAnEntryWhateverItsArgumentsHold) {
     const LogEntry entry{Level::Error,
                          "read %@ of %{private}@",
-                         {{"a\nb\r\x1b[2J\x7f\xc2\x85\xe2\x80\xa8 \xc3\xbc", false}, {"SERIAL", true}},
+                         {{"a\nb\r\x1b[2J\x7f\xc2\x85\xe2\x80\xa8 \xc3\xbc"}, {"SERIAL", "<private>"}},
                          "file.cpp",
                          1};
     EXPECT_THAT(written(entry, Level::Default),

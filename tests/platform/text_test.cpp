@@ -52,11 +52,12 @@ TEST(Sha256Hash, IsOfTheTextUpToItsFirstNul) {
 TEST(Log, FillsEachPlaceholderAndRedactsWhatIsPrivate) {
     sim::Host host;
     log(Level::Default, "%s: %@ %{private}@ (%d/%d) %ld %lu %.02f s%@", "-[Class operation:]",
-        std::optional<std::string>(), "S%@1", true, -2, std::int64_t{-3}, std::uint64_t{4}, Duration(-0.125), "");
+        std::optional<std::string>(), "S%@1", true, -2, std::int64_t{-3}, std::uint64_t{4}, Duration(-0.125),
+        RedactableText{" key", " ..."});
     ASSERT_EQ(host.log.entries().size(), 1u);
     const LogEntry& entry = host.log.entries()[0];
-    EXPECT_EQ(entry.message(), "-[Class operation:]: (null) <private> (1/-2) -3 4 -0.12 s");
-    EXPECT_EQ(entry.message(true), "-[Class operation:]: (null) S%@1 (1/-2) -3 4 -0.12 s");
+    EXPECT_EQ(entry.message(), "-[Class operation:]: (null) <private> (1/-2) -3 4 -0.12 s ...");
+    EXPECT_EQ(entry.message(true), "-[Class operation:]: (null) S%@1 (1/-2) -3 4 -0.12 s key");
     EXPECT_TRUE(std::string_view(entry.file).ends_with("text_test.cpp"));
 }
 

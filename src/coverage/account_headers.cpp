@@ -1,0 +1,205 @@
+#include "coverage/account_headers.h"
+
+#include <algorithm>
+#include <chrono>
+#include <cstdint>
+#include <set>
+#include <string_view>
+
+#include "platform/clock.h"
+#include "platform/defaults_store.h"
+#include "platform/device_properties.h"
+#include "platform/json.h"
+#include "platform/locale.h"
+#include "platform/number_text.h"
+#include "platform/platform.h"
+#include "platform/queue.h"
+#include "platform/text.h"
+#include "platform/utf8.h"
+#include "platform/uuid.h"
+#include "platform/value.h"
+#include "platform/vendor.h"
+
+namespace vrx {
+
+using platform::AccountStore;
+using platform::AuthenticationAccount;
+using platform::CloudAccount;
+using platform::Dictionary;
+using platform::HttpRequest;
+using platform::Level;
+using platform::Platform;
+using platform::RenewalResult;
+
+namespace {
+
+constexpr std::string_view keystoneServiceRemainder = ".ks.supportapp.auth";
+
+constexpr const char* contentTypeHeader = "Content-Type";
+constexpr const char* tokenHeader = "X-Orvane-KS-Token";
+constexpr const char* altDSIDHeader = "altDSID";
+constexpr const char* userAgentHeader = "User-Agent";
+constexpr const char* storefrontHeader = "storefrontLocale";  // also the defaults key of what replaces its value
+
+// No value leaves the header unset.
+void setHeader(HttpRequest& request, const char* name, const std::optional<std::string>& value) {
+    if (value)
+        request.headers[name] = *value;
+    else
+        request.headers.erase(name);
+}
+
+// The token after a renewal: the renewed one, or where it failed the one from before.
+std::optional<std::string> tokenAfterRenewal(AccountStore& store, const AuthenticationAccount& account,
+                                             const std::string& service, std::optional<std::string> token,
+                                             bool avoidUI) {
+    log(Level::Default, "Reprovision KS tokens");
+    auto hasEnded = Platform::current().queues().makeEvent();
+    // This stack outlives the completion's use of it: only its last step releases the wait, which has no other end.
+    auto takeToken = [&, hasEnded](const RenewalResult& result) {
+        if (result.code == RenewalResult::renewed)
+            token = store.credentialToken(account, service);
+        else
+            log(Level::Error, "No way to sign request with KS token because renewal of KS credential failed: %ld, %@",
+                result.code, result.error);
+        hasEnded->set();
+    };
+    store.renewCredentials(account, {.avoidUI = avoidUI, .services = {service}}, takeToken);
+    hasEnded->wait();
+    return token;
+}
+
+// The storefront that stands in the defaults, in place of the account's.
+std::optional<std::string> storefrontOverride() {
+    return Platform::current().defaultsStore().string(storefrontHeader);
+}
+
+// The one place that logs the storefront: one line for each set of headers.
+void setStorefront(HttpRequest& request, const std::optional<std::string>& storefront) {
+    setHeader(request, storefrontHeader, storefront);
+    log(Level::Default, "storeLocale %@", storefront);
+}
+
+// Milliseconds since 1970, a fraction cut off; a clock before that year shows its beginning.
+std::int64_t timestamp(platform::Date date) {
+    return std::max<std::int64_t>(0, platform::clampedInteger(platform::epochSeconds(date) * 1000.0));
+}
+
+// Whole hours east of GMT, cut off towards zero.
+std::int32_t hours(std::chrono::seconds timeZoneOffset) {
+    return static_cast<std::int32_t>(std::chrono::duration_cast<std::chrono::hours>(timeZoneOffset).count());
+}
+
+// The token is a secret, and any header that account services add may be one: shown are those that are known.
+bool isShownInLogs(const std::string& header) {
+    static const std::set<std::string_view, platform::HeaderNameOrder> shown{contentTypeHeader, altDSIDHeader,
+                                                                             userAgentHeader, storefrontHeader};
+    return shown.contains(header);
+}
+
+}  // namespace
+
+bool vrx_signWithAccountHeaders(HttpRequest& request, bool forceReprovisioning, bool avoidUI) {
+    Platform& platform = Platform::current();
+    AccountStore& store = platform.accountStore();
+    std::optional<CloudAccount> account = store.primaryCloudAccount();
+    if (!account) {
+        log(Level::Default, "No primary Nimbus account, can't sign this request");
+        return false;
+    }
+    if (!_addKSHeadersForAccount(request, *account, store, forceReprovisioning, avoidUI)) {
+        log(Level::Default, "Failed to add KS headers, can't sign this request");
+        return false;
+    }
+    platform.accountSession().addClientInformationHeader(request);
+    platform.accountSession().addDeviceIdentifierHeader(request);
+    for (const auto& [name, value] : platform.accountSession().accountHeaders(request)) request.headers[name] = value;
+    setHeader(request, altDSIDHeader, account->altDSID);
+    setHeader(request, userAgentHeader, _userAgent());
+
+    std::optional<std::string> storefront = storefrontOverride();
+    if (!storefront) storefront = store.storefront(*account);
+    setStorefront(request, storefront);
+    return true;
+}
+
+bool _addKSHeadersForAccount(HttpRequest& request, const CloudAccount& account, AccountStore& store,
+                             bool forceReprovisioning, bool avoidUI) {
+    std::optional<AuthenticationAccount> keystoneAccount = store.authenticationAccount(account);
+    if (!keystoneAccount) {
+        log(Level::Default, "Keystone signing failed because no KS account was provided.");
+        return false;
+    }
+    if (!keystoneAccount->altDSID) {
+        log(Level::Error, "Keystone signing failed because no there's no altDSID on the account.");
+        return false;
+    }
+    const std::string service = platform::vendorIdentifier(keystoneServiceRemainder);
+    std::optional<std::string> token = store.credentialToken(*keystoneAccount, service);
+    if (!token || forceReprovisioning) {
+        token = tokenAfterRenewal(store, *keystoneAccount, service, std::move(token), avoidUI);
+        if (!token) {
+            log(Level::Default, "Error: still no KS token even after calling renewCredentialsForAccount.");
+            return false;
+        }
+    }
+    setHeader(request, tokenHeader, token);
+    return true;
+}
+
+void vrx_setCoverageRequestBodyWithSerialNumber(HttpRequest& request, const std::string& serialNumber) {
+    Platform& platform = Platform::current();
+    request.method = "POST";
+    setHeader(request, contentTypeHeader, "application/json");
+    const Dictionary body{
+        {"serialNumber", serialNumber},
+        {"locale", platform.locale().preferredLocaleIdentifier()},
+        {"requestTimestamp", timestamp(platform.clock().now())},
+        {"requestTimezone", hours(platform.clock().timeZoneOffset())},
+    };
+    // Fails only for a serial number that is no text; the server refuses the request that then has no body.
+    if (auto json = platform.json().serialize(body)) request.body.assign(json->begin(), json->end());
+}
+
+void vrx_addTarnHeadersWithOfferID(HttpRequest& request, const std::string& offerID, const std::string& serialNumber) {
+    Platform& platform = Platform::current();
+    setHeader(request, "X-Orvane-SN", serialNumber);
+    setHeader(request, "X-Orvane-Txn-ID", platform.uuidSource().makeUuid());
+    setHeader(request, "X-Orvane-Content-Size", platform.deviceProperties().preferredContentSizeCategory());
+    setHeader(request, "X-Orvane-DM", "No");
+    setHeader(request, userAgentHeader, _userAgent());
+    setHeader(request, "Offer-ID", offerID);
+
+    std::optional<std::string> storefront = storefrontOverride();
+    if (!storefront) {
+        AccountStore& store = platform.accountStore();
+        if (std::optional<CloudAccount> account = store.primaryCloudAccount())
+            storefront = store.storefront(*account);
+        else
+            log(Level::Error, "Primary Nimbus Account is nil!");
+    }
+    setStorefront(request, storefront);
+}
+
+platform::RedactableText headerDescription(const HttpRequest& request) {
+    platform::HttpHeaders redacted = request.headers;
+    for (auto& [name, value] : redacted)
+        if (!isShownInLogs(name)) value = platform::redactedMark;
+    return {platform::describe(request.headers), platform::describe(redacted)};
+}
+
+std::optional<std::string> bodyDescription(const HttpRequest& request) {
+    std::string text(request.body.begin(), request.body.end());
+    if (text.empty() || !platform::isUtf8(text)) return std::nullopt;
+    return text;
+}
+
+// A part that the device does not tell reads (null), as it does in the log.
+std::string _userAgent() {
+    const platform::DeviceProperties& device = Platform::current().deviceProperties();
+    const std::string version = platform::describe(device.string("ProductVersion"));
+    const std::string type = platform::describe(device.string("ProductType"));
+    return platform::filled("<%@/%@/%@>", {platform::vendorIdentifier(platform::serviceNameRemainder), version, type});
+}
+
+}  // namespace vrx
