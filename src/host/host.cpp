@@ -5,7 +5,7 @@ namespace vrx::host {
 using platform::MaybeError;
 using platform::Platform;
 
-Host::Host(const HostLocations& locations, platform::Level lowestLevel)
+Host::Host(const HostLocations& locations, platform::Level lowestLevel, const HostLimits& limits)
     : home_(locations.home),
       log_(lowestLevel),
       facilities_{.systemLog = &log_},
@@ -16,10 +16,10 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel)
       database_(home_ + "/host.db"),
       defaults_(database_),
       profile_(locations.profile),
-      accounts_(profile_, home_),
+      accounts_(profile_, home_, limits.credentialHelper),
       accountSession_(profile_),
       clock_(profile_),
-      http_(queues_.workers(platform::Priority::UserInitiated), clock_, profile_) {
+      http_(queues_.workers(platform::Priority::UserInitiated), clock_, profile_, limits.http) {
     facilities_.accountSession = &accountSession_;
     facilities_.accountStore = &accounts_;
     facilities_.clock = &clock_;

@@ -64,13 +64,16 @@ std::string fileText(const std::string& path) {
 }
 
 Process::Process(const std::string& folder, const std::string& program, const Arguments& arguments,
-                 const Arguments& environment) {
+                 const Arguments& environment, int outputFile) {
     static std::atomic<int> count = 0;
     files_ = folder + "/process-" + std::to_string(++count);
     posix_spawn_file_actions_t actions;
     posix_spawn_file_actions_init(&actions);
     posix_spawn_file_actions_addopen(&actions, 0, "/dev/null", O_RDONLY, 0);
-    posix_spawn_file_actions_addopen(&actions, 1, (files_ + ".out").c_str(), O_WRONLY | O_CREAT, 0600);
+    if (outputFile >= 0)
+        posix_spawn_file_actions_adddup2(&actions, outputFile, 1);
+    else
+        posix_spawn_file_actions_addopen(&actions, 1, (files_ + ".out").c_str(), O_WRONLY | O_CREAT, 0600);
     posix_spawn_file_actions_addopen(&actions, 2, (files_ + ".err").c_str(), O_WRONLY | O_CREAT, 0600);
     Arguments words{program};
     words.insert(words.end(), arguments.begin(), arguments.end());

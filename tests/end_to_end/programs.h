@@ -20,9 +20,10 @@ std::string fileText(const std::string& path);
 // A child process with its standard output and error in files.
 class Process {
 public:
-    // The environment is this process's, with the given variables in front.
+    // The environment is this process's, with the given variables in front. Standard output goes to the given file
+    // instead, when there is one.
     Process(const std::string& folder, const std::string& program, const Arguments& arguments,
-            const Arguments& environment = {});
+            const Arguments& environment = {}, int outputFile = -1);
     ~Process();  // kills it, if it has not been waited for
     Process(const Process&) = delete;
     Process& operator=(const Process&) = delete;
