@@ -25,7 +25,9 @@ public:
         bytes_.swap(other.bytes_);
         return *this;
     }
-    ~Secret() { explicit_bzero(bytes_.data(), bytes_.size()); }
+    ~Secret() {
+        if (!bytes_.empty()) explicit_bzero(bytes_.data(), bytes_.size());
+    }
 
     platform::Data& bytes() { return bytes_; }
     std::string_view text() const { return {reinterpret_cast<const char*>(bytes_.data()), bytes_.size()}; }
