@@ -6,6 +6,7 @@
 #include "client/agent_connection.h"
 #include "command_line.h"
 #include "platform/text.h"
+#include "progress.h"
 
 namespace vrx::apps {
 namespace {
@@ -311,6 +312,7 @@ int run(int argc, const char* const* argv) {
     auto asking = [&options](auto verb) {
         return [&options, verb] {
             AgentConnection agent(options.connection());
+            const Progress progress("waiting for the agent…");
             return verb(agent);
         };
     };

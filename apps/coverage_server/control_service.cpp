@@ -1,6 +1,7 @@
 #include "coverage_server/control_service.h"
 
 #include <algorithm>
+#include <sstream>
 #include <stdexcept>
 
 namespace vrx::coverage_server {
@@ -28,8 +29,8 @@ void ControlService::serve(const httplib::Request& request, httplib::Response& r
             requests(request, response);
         else if (request.path == "/counters")
             counters(request, response);
-        else if (request.path == "/settings")
-            settings(request, response);
+        else if (request.path == "/document")
+            document(request, response);
         else if (request.path == "/tokens")
             tokens(request, response);
         else
@@ -43,15 +44,11 @@ void ControlService::faults(const httplib::Request& request, httplib::Response& 
     FaultList& list = coverage_.faults();
     const std::string id = request.path.substr(std::min(request.path.size(), std::string_view("/faults/").size()));
     if (request.method == "POST" && id.empty()) {
-        const Json json = Json::parse(request.body);
+        std::istringstream lines(request.body);
         std::vector<Fault> parsed;  // all of them, before any is added
-        if (json.is_array())
-            for (const Json& one : json) parsed.push_back(parseFault(one));
-        else
-            parsed.push_back(parseFault(json));
-        Json ids = Json::array();
-        for (Fault& fault : parsed) ids.push_back(list.add(std::move(fault)));
-        return answer(response, {{"ids", ids}}, 201);
+        for (std::string line; std::getline(lines, line);) parsed.push_back(parseFault(line));
+        for (Fault& fault : parsed) list.add(std::move(fault));
+        return answer(response, list.json(), 201);
     }
     if (request.method == "DELETE") {
         if (id.empty())
@@ -88,22 +85,12 @@ void ControlService::counters(const httplib::Request& request, httplib::Response
     answer(response, coverage_.log().counters());
 }
 
-void ControlService::settings(const httplib::Request& request, httplib::Response& response) {
-    if (request.method == "PATCH") {
-        const Json json = Json::parse(request.body);
-        if (!json.is_object()) throw std::invalid_argument("the settings are an object");
-        for (const auto& [name, value] : json.items())
-            if (name != "serverVersion" && name != "requiredHeaders")
-                throw std::invalid_argument("no such setting: " + name);
-        std::optional<std::vector<std::string>> headers;
-        if (json.contains("requiredHeaders")) headers = json["requiredHeaders"].get<std::vector<std::string>>();
-        if (json.contains("serverVersion")) coverage_.serverVersion().change(json["serverVersion"]);
-        if (headers) coverage_.setRequiredHeaders(std::move(*headers));
-    } else if (request.method != "GET") {
+void ControlService::document(const httplib::Request& request, httplib::Response& response) {
+    if (request.method == "PATCH")
+        coverage_.serverVersion().change(Json::parse(request.body));
+    else if (request.method != "GET")
         return answerNotAllowed(response);
-    }
-    answer(response,
-           {{"serverVersion", coverage_.serverVersion().json()}, {"requiredHeaders", coverage_.requiredHeaders()}});
+    answer(response, coverage_.serverVersion().json());
 }
 
 void ControlService::tokens(const httplib::Request& request, httplib::Response& response) {

@@ -10,8 +10,7 @@ namespace vrx::coverage_server {
 
 inline constexpr std::string_view controlHelp =
     "  GET    /faults        the faults, with what is left of their counts\n"
-    "  POST   /faults        adds a fault, or an array of them: a description as a string, or\n"
-    "                        {\"endpoint\",\"kind\",\"value\",\"count\",\"skip\",\"code\"}; gives their ids\n"
+    "  POST   /faults        adds faults, a description each line\n"
     "  DELETE /faults        removes all; /faults/ID removes one\n"
     "  GET    /requests      the requests seen, in order (at most the last 4096): id, time, connection,\n"
     "                        requestOfConnection, endpoint, method, path, headers, body, bodyBytes, answered, status,\n"
@@ -21,8 +20,8 @@ inline constexpr std::string_view controlHelp =
     "  DELETE /requests      forgets them\n"
     "  GET    /counters      connections, requests, requests on reused connections, by endpoint, by status, ...\n"
     "  DELETE /counters      sets them to 0\n"
-    "  GET    /settings      serverVersion{...} and requiredHeaders[...]\n"
-    "  PATCH  /settings      changes those that are given\n"
+    "  GET    /document      the settings of the server-version document\n"
+    "  PATCH  /document      changes those that are given\n"
     "  GET    /tokens        the valid ones; POST {\"token\":TEXT} adds one; DELETE makes all invalid\n";
 
 class ControlService final : public HttpService {
@@ -34,7 +33,7 @@ private:
     void faults(const httplib::Request& request, httplib::Response& response);
     void requests(const httplib::Request& request, httplib::Response& response);
     void counters(const httplib::Request& request, httplib::Response& response);
-    void settings(const httplib::Request& request, httplib::Response& response);
+    void document(const httplib::Request& request, httplib::Response& response);
     void tokens(const httplib::Request& request, httplib::Response& response);
 
     CoverageService& coverage_;

@@ -59,7 +59,11 @@ void judgeBody(const std::string& body, Verdict& verdict) {
     expect("serialNumber", isText, "a string that is not empty");
     expect("locale", isText, "a string that is not empty");
     expect(
-        "requestTimestamp", [](const Json& value) { return value.is_number_unsigned(); },
+        "requestTimestamp",
+        [](const Json& value) {
+            constexpr std::uint64_t year2001 = 1'000'000'000'000;  // what is before it was counted in seconds
+            return value.is_number_unsigned() && value.get<std::uint64_t>() >= year2001;
+        },
         "an unsigned integer, in milliseconds since 1970");
     expect(
         "requestTimezone",
@@ -84,7 +88,7 @@ Verdict judge(const httplib::Request& request, const Tokens& tokens, const std::
         return verdict;
     }
     const std::string token = soleHeader(request, std::string(tokenHeader), reasons);
-    if (reasons.empty() && !tokens.isValid(token)) reasons.push_back("the token is not valid");
+    if (reasons.empty() && !tokens.originOf(token)) reasons.push_back("the token is not valid");
     if (!reasons.empty()) {
         verdict.status = 401;
         return verdict;

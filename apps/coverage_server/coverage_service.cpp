@@ -48,6 +48,13 @@ std::string printable(std::string text) {
     return text;
 }
 
+httplib::Headers shownHeaders(httplib::Headers headers, const Tokens& tokens) {
+    const auto [begin, end] = headers.equal_range(std::string(tokenHeader));
+    for (auto header = begin; header != end; ++header)
+        header->second = "(hidden: " + tokens.originOf(header->second).value_or("not valid") + ")";
+    return headers;
+}
+
 std::map<std::string, std::string> keyValueLines(const std::string& text) {
     std::map<std::string, std::string> entries;
     std::istringstream lines(text);
@@ -59,24 +66,15 @@ std::map<std::string, std::string> keyValueLines(const std::string& text) {
     return entries;
 }
 
-std::map<std::string, std::string> members(const std::string& text) {
-    std::map<std::string, std::string> entries;
-    const Json json = Json::parse(text, nullptr, false);
-    if (json.is_object())
-        for (const auto& [name, value] : json.items())
-            if (value.is_string()) entries[name] = value;
-    return entries;
-}
-
 }  // namespace
 
 CoverageService::CoverageService(const CoverageServiceSettings& settings)
     : isQuiet_(settings.isQuiet),
       printsRequests_(settings.printsRequests),
+      requiredHeaders_(settings.requiredHeaders),
       records_(settings.records),
       serverVersion_(settings.serverVersion),
-      tokens_(settings.tokens),
-      requiredHeaders_(settings.requiredHeaders) {}
+      tokens_(settings.tokens) {}
 
 bool CoverageService::admit(Connection& connection) {
     log_.countConnection();
@@ -95,7 +93,7 @@ void CoverageService::serve(const httplib::Request& request, httplib::Response& 
     if (target.endpoint) seen.endpoint = nameOf(*target.endpoint);
     seen.method = request.method;
     seen.path = request.target;
-    seen.headers = request.headers;
+    seen.headers = shownHeaders(request.headers, tokens_);
     seen.body = request.body;
     seen.bodyBytes = request.body.size();
     Connection::Exchange& exchange = connection.exchange;
@@ -120,7 +118,7 @@ void CoverageService::answer(Endpoint endpoint, const httplib::Request& request,
 
 void CoverageService::answerCoverage(const httplib::Request& request, httplib::Response& response,
                                      std::string& reason) const {
-    const Verdict verdict = judge(request, tokens_, requiredHeaders());
+    const Verdict verdict = judge(request, tokens_, requiredHeaders_);
     if (verdict.status != 200) return refuse(response, verdict.status, reason, joined(verdict.reasons));
     std::string record;
     try {
@@ -133,30 +131,20 @@ void CoverageService::answerCoverage(const httplib::Request& request, httplib::R
     response.set_content(record, jsonType);
 }
 
-// Takes and gives JSON, or lines of key=value as text/plain, so that a credential helper can be one command of curl.
+// Takes and gives lines of key=value, as a credential helper does: it can be one command of curl.
 void CoverageService::answerToken(const httplib::Request& request, httplib::Response& response, std::string& reason) {
     if (request.method != "POST") return refuse(response, 405, reason, "the method is not POST");
-    const bool isPlain = request.get_header_value("Content-Type").starts_with("text/plain");
-    auto entries = isPlain ? keyValueLines(request.body) : members(request.body);
+    auto entries = keyValueLines(request.body);
     if (entries["account"].empty() || entries["service"].empty())
-        return refuse(response, 400, reason, "account and service are needed, as JSON strings or key=value lines");
-    const std::string token = tokens_.renew(entries["account"], entries["service"]);
+        return refuse(response, 400, reason, "lines account=... and service=... are needed");
     response.status = 200;
-    if (isPlain)
-        response.set_content("token=" + token + "\n", "text/plain");
-    else
-        response.set_content(
-            dumped({{"account", entries["account"]}, {"service", entries["service"]}, {"token", token}}), jsonType);
+    response.set_content("token=" + tokens_.renew(entries["account"], entries["service"]) + "\n", "text/plain");
 }
 
 void CoverageService::answered(const httplib::Request& request, const httplib::Response& response,
                                const Connection& connection) {
     const Connection::Exchange& exchange = connection.exchange;
     const int status = connection.isTakenOver() ? connection.status() : response.status;
-    if (!exchange.isServed) log_.countMalformed(status);
-    const SeenRequest seen =
-        exchange.isServed ? log_.finish(exchange.request, status, exchange.fault, exchange.reason) : SeenRequest{};
-
     const auto taken = std::chrono::steady_clock::now() - exchange.begun;
     std::string line = "#" + std::to_string(connection.id()) + "." + std::to_string(connection.requests()) + " ";
     line += exchange.isServed ? request.method + " " + printable(request.target) : "malformed request";
@@ -164,9 +152,12 @@ void CoverageService::answered(const httplib::Request& request, const httplib::R
     line += " " + std::to_string(std::chrono::duration_cast<Milliseconds>(taken).count()) + "ms";
     if (!exchange.fault.empty()) line += " fault=" + printable(exchange.fault);
     if (!exchange.reason.empty()) line += " (" + printable(exchange.reason) + ")";
-    print(line);
+    print(line);  // before whoever waits for the request to be answered goes on
+
+    if (!exchange.isServed) return log_.countMalformed(status);
+    const SeenRequest seen = log_.finish(exchange.request, status, exchange.fault, exchange.reason);
     if (printsRequests_ && seen.id) {
-        const std::string text = dumped(seen.json(true)) + "\n";
+        const std::string text = dumped(seen.json()) + "\n";
         std::fwrite(text.data(), 1, text.size(), stdout);
         std::fflush(stdout);
     }
@@ -187,16 +178,6 @@ void CoverageService::refused() {
 
 void CoverageService::print(const std::string& line) const {
     if (!isQuiet_) std::fprintf(stderr, "%s\n", line.c_str());
-}
-
-std::vector<std::string> CoverageService::requiredHeaders() const {
-    std::lock_guard lock(mutex_);
-    return requiredHeaders_;
-}
-
-void CoverageService::setRequiredHeaders(std::vector<std::string> names) {
-    std::lock_guard lock(mutex_);
-    requiredHeaders_ = std::move(names);
 }
 
 }  // namespace vrx::coverage_server

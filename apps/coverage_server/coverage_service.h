@@ -3,8 +3,6 @@
 
 #include <chrono>
 #include <filesystem>
-#include <functional>
-#include <mutex>
 #include <string>
 #include <vector>
 
@@ -49,8 +47,6 @@ public:
     RequestLog& log() { return log_; }
     Tokens& tokens() { return tokens_; }
     ServerVersionDocument& serverVersion() { return serverVersion_; }
-    std::vector<std::string> requiredHeaders() const;
-    void setRequiredHeaders(std::vector<std::string> names);
 
 private:
     void answer(Endpoint endpoint, const httplib::Request& request, httplib::Response& response, std::string& reason);
@@ -60,14 +56,12 @@ private:
 
     const bool isQuiet_;
     const bool printsRequests_;
+    const std::vector<std::string> requiredHeaders_;
     const CoverageRecords records_;
     ServerVersionDocument serverVersion_;
     Tokens tokens_;
     FaultList faults_;
     RequestLog log_;
-
-    mutable std::mutex mutex_;
-    std::vector<std::string> requiredHeaders_;
 };
 
 }  // namespace vrx::coverage_server

@@ -142,15 +142,6 @@ std::string Fault::spec() const {
     return text;
 }
 
-Json Fault::json() const {
-    Json json = {{"id", id}, {"endpoint", nameOf(endpoint)}, {"kind", kind->name}};
-    if (kind->value != FaultValue::None) json["value"] = value;
-    json["count"] = count ? Json(*count) : Json(nullptr);
-    json["skip"] = skip;
-    if (kind->kind == FaultKind::Redirect) json["code"] = code;
-    return json;
-}
-
 Fault parseFault(std::string_view spec) {
     const std::size_t colon = spec.find(':');
     if (colon == spec.npos) refuse("a fault is ENDPOINT:KIND[=VALUE][,count=N][,skip=N][,code=N]");
@@ -172,24 +163,6 @@ Fault parseFault(std::string_view spec) {
     if (equals != kind.npos) value = kind.substr(equals + 1);
     Fault fault = makeFault(spec.substr(0, colon), kind.substr(0, equals), std::move(value));
     for (const auto& [name, number] : options) setOption(fault, name, number);
-    return fault;
-}
-
-Fault parseFault(const Json& json) {
-    if (json.is_string()) return parseFault(std::string_view(json.get_ref<const std::string&>()));
-    if (!json.is_object() || !json.contains("kind") || !json["kind"].is_string())
-        refuse("a fault is a description as a string, or an object with the members endpoint and kind");
-    auto text = [](const Json& value) { return value.is_string() ? value.get<std::string>() : dumped(value); };
-    std::optional<std::string> value;
-    if (json.contains("value") && !json["value"].is_null()) value = text(json["value"]);
-    Fault fault = makeFault(json.contains("endpoint") ? text(json["endpoint"]) : "any", text(json["kind"]), value);
-    for (const auto& [name, member] : json.items()) {
-        if (name == "count" || name == "skip" || name == "code") {
-            if (!member.is_null()) setOption(fault, name, wholeNumber(text(member), "an option"));
-        } else if (name != "endpoint" && name != "kind" && name != "value" && name != "id") {
-            refuse("a fault has no member " + name);
-        }
-    }
     return fault;
 }
 
@@ -237,7 +210,7 @@ FaultPlan FaultList::take(Endpoint endpoint) {
 Json FaultList::json() const {
     std::lock_guard lock(mutex_);
     Json list = Json::array();
-    for (const Fault& fault : faults_) list.push_back(fault.json());
+    for (const Fault& fault : faults_) list.push_back({{"id", fault.id}, {"fault", fault.spec()}});
     return list;
 }
 

@@ -66,13 +66,10 @@ struct Fault {
     int code = 302;                      // of a redirect
 
     std::string spec() const;
-    Json json() const;
 };
 
 // "ENDPOINT:KIND[=VALUE][,count=N][,skip=N][,code=N]". Throws std::invalid_argument, whose text says what is wrong.
 Fault parseFault(std::string_view spec);
-// A description as a string, or an object of endpoint, kind, value, count, skip and code.
-Fault parseFault(const Json& json);
 
 // What happens to one request, or to one connection: waiting, then at most one thing more.
 struct FaultPlan {
@@ -90,7 +87,7 @@ public:
     // In the order in which they were added: every delay that applies, and the first other fault that does. A fault
     // counts a request as passed, or as its own, only when no earlier fault but a delay has taken it.
     FaultPlan take(Endpoint endpoint);
-    Json json() const;
+    Json json() const;  // an id and a description each
 
 private:
     mutable std::mutex mutex_;

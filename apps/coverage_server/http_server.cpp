@@ -116,15 +116,18 @@ void HttpServer::serveConnection(int socket, std::uint64_t id) {
                 const auto idle = keepAlive_.count() ? keepAlive_ : std::chrono::seconds(30);
                 // A compressed body is left as it is, since what a few bytes inflate to has no limit: the library
                 // looks for the header under its own name.
-                auto keepCompressed = [](httplib::Request& request) {
+                auto adjust = [](httplib::Request& request) {
                     if (auto header = request.headers.extract("Content-Encoding")) {
                         header.key() = "Content-Encoding-Received";
                         request.headers.insert(std::move(header));
                     }
+                    // Without a length there is no body: the library would read to the end of the connection.
+                    if (!request.has_header("Content-Length") && !request.has_header("Transfer-Encoding"))
+                        request.headers.emplace("Content-Length", "0");
                 };
                 bool isClosed = false;
                 while (!isClosed && connection.awaitRequest(idle)) {
-                    if (!process_request(connection, keepAlive_.count() == 0, isClosed, keepCompressed)) break;
+                    if (!process_request(connection, keepAlive_.count() == 0, isClosed, adjust)) break;
                     // Where the next request would begin after a malformed one, nobody knows.
                     if (!connection.exchange.isServed) break;
                 }

@@ -1,7 +1,6 @@
 // A coverage server and CDN for development and tests, on loopback only.
 #include <pthread.h>
 #include <signal.h>
-#include <unistd.h>
 
 #include <CLI/CLI.hpp>
 #include <cstdio>
@@ -24,7 +23,6 @@ struct Options {
     int port = 0;
     int controlPort = 0;
     long keepAlive = 60;
-    int readyDescriptor = -1;
     bool hasTls = false;
     CertificateSettings certificate;
     CoverageServiceSettings service;
@@ -38,10 +36,9 @@ std::string footer() {
         "both\n"
         "                                           with {\"reason\"}; else the record of the serial number\n"
         "  GET  /library/ORVANE/asset/vrxV2.plist   the server-version document\n"
-        "  POST /token/renew                        {\"account\",\"service\"} -> {\"account\",\"service\",\"token\"}, "
-        "or as\n"
-        "                                           text/plain lines key=value -> token=...; the old token, and those\n"
-        "                                           given at start, are no longer valid\n"
+        "  POST /token/renew                        lines account=... and service=... -> a line token=...; the old "
+        "token,\n"
+        "                                           and those given at start, are no longer valid\n"
         "  /moved/...                               the same once more, without faults\n"
         "\nFaults: ENDPOINT:KIND[=VALUE][,count=N][,skip=N][,code=N]\n"
         "  ENDPOINT is coverage, server-version, token, any, or connection (delay, close, reset, hang, not-http; "
@@ -87,8 +84,6 @@ std::optional<int> parse(int argc, char** argv, Options& options) {
     app.add_option("--keep-alive", options.keepAlive, "Seconds that an idle connection is kept; 0: one request each")
         ->check(CLI::Range(0, 86400))
         ->capture_default_str();
-    app.add_option("--ready-fd", options.readyDescriptor,
-                   "Writes {\"url\",\"control\",\"certificate\",\"pid\"} to this descriptor when ready, and closes it");
     app.add_option("--records", options.service.records,
                    "Folder of records: SERIAL.json, else default.json, read for each request. Strings such as @now+30d "
                    "or @now-12h:ms become epoch numbers")
@@ -161,21 +156,11 @@ std::optional<int> parse(int argc, char** argv, Options& options) {
     return std::nullopt;
 }
 
-void announce(const Options& options, const std::string& url, const std::string& control,
-              const std::string& certificate) {
+void announce(const std::string& url, const std::string& control, const std::string& certificate) {
     std::printf("control on %s\n", control.c_str());
     if (!certificate.empty()) std::printf("certificate %s\n", certificate.c_str());
     std::printf("listening on %s\n", url.c_str());
     std::fflush(stdout);
-    if (options.readyDescriptor < 0) return;
-    const Json json = {{"url", url},
-                       {"control", control},
-                       {"certificate", certificate.empty() ? Json(nullptr) : Json(certificate)},
-                       {"pid", getpid()}};
-    const std::string line = dumped(json) + "\n";
-    if (write(options.readyDescriptor, line.data(), line.size()) != static_cast<ssize_t>(line.size()))
-        std::fprintf(stderr, "cannot write to --ready-fd %d\n", options.readyDescriptor);
-    if (options.readyDescriptor > STDERR_FILENO) close(options.readyDescriptor);
 }
 
 void run(const Options& options) {
@@ -196,7 +181,7 @@ void run(const Options& options) {
     std::signal(SIGPIPE, SIG_IGN);
 
     const std::string host = "127.0.0.1:";
-    announce(options, (tls ? "https://" : "http://") + host + std::to_string(server.port()),
+    announce((tls ? "https://" : "http://") + host + std::to_string(server.port()),
              "http://" + host + std::to_string(control.port()), tls ? tls->certificateFile() : "");
     int signal = 0;
     while (sigwait(&signals, &signal) == 0 && signal == SIGUSR1)

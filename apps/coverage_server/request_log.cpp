@@ -1,12 +1,8 @@
 #include "coverage_server/request_log.h"
 
-#include <strings.h>
-
 #include <algorithm>
 #include <array>
 #include <ctime>
-
-#include "coverage_server/coverage_request.h"
 
 namespace vrx::coverage_server {
 
@@ -34,16 +30,14 @@ bool isOfLibrary(const std::string& name) {
 
 }  // namespace
 
-Json SeenRequest::json(bool hidesTokens) const {
+Json SeenRequest::json() const {
     Json list = Json::object();
     for (const auto& [name, value] : headers) {
         if (isOfLibrary(name)) continue;
-        const bool isHidden = hidesTokens && strcasecmp(name.c_str(), tokenHeader.data()) == 0;
-        const std::string shown = isHidden ? "(hidden)" : value;
         if (list.contains(name))
-            list[name] = list[name].get<std::string>() + ", " + shown;
+            list[name] = list[name].get<std::string>() + ", " + value;
         else
-            list[name] = shown;
+            list[name] = value;
     }
     return {{"id", id},
             {"time", isoTime(time)},
@@ -53,7 +47,7 @@ Json SeenRequest::json(bool hidesTokens) const {
             {"method", method},
             {"path", path},
             {"headers", list},
-            {"body", hidesTokens && endpoint == "token" ? "(hidden)" : body},
+            {"body", body},
             {"bodyBytes", bodyBytes},
             {"answered", isAnswered},
             {"status", status},
@@ -134,7 +128,7 @@ RequestLog::Seen RequestLog::requests(std::size_t atLeast, bool answered, std::c
     };
     changed_.wait_for(lock, longest, [&] { return isEnding_ || isEnough(); });
     Seen seen{Json::array(), isEnough()};
-    for (const SeenRequest& request : kept_) seen.requests.push_back(request.json(false));
+    for (const SeenRequest& request : kept_) seen.requests.push_back(request.json());
     return seen;
 }
 

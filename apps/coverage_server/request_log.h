@@ -23,15 +23,15 @@ struct SeenRequest {
     std::string endpoint;                   // empty for a path that is none
     std::string method;
     std::string path;
-    httplib::Headers headers;
-    std::string body;  // its beginning, when it is very long
+    httplib::Headers headers;  // the token's value replaced by its origin
+    std::string body;          // its beginning, when it is very long
     std::size_t bodyBytes = 0;
     bool isAnswered = false;
     int status = 0;  // 0 while there is none, or when none was sent
     std::string fault;
     std::string reason;
 
-    Json json(bool hidesTokens) const;
+    Json json() const;
     std::size_t bytes() const;  // that keeping it takes, about
 };
 

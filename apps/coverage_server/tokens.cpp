@@ -5,10 +5,12 @@
 
 namespace vrx::coverage_server {
 
-bool Tokens::isValid(const std::string& token) const {
+std::optional<std::string> Tokens::originOf(const std::string& token) const {
     std::lock_guard lock(mutex_);
-    return initial_.contains(token) ||
-           std::ranges::any_of(renewed_, [&](const auto& entry) { return entry.second == token; });
+    if (initial_.contains(token)) return "given";
+    // The token's own text says which renewal it is from.
+    if (std::ranges::none_of(renewed_, [&](const auto& entry) { return entry.second == token; })) return std::nullopt;
+    return token.substr(0, token.rfind('-'));
 }
 
 std::string Tokens::renew(const std::string& account, const std::string& service) {

@@ -3,6 +3,7 @@
 
 #include <map>
 #include <mutex>
+#include <optional>
 #include <set>
 #include <string>
 #include <utility>
@@ -14,7 +15,9 @@ class Tokens {
 public:
     explicit Tokens(const std::vector<std::string>& initial) : initial_(initial.begin(), initial.end()) {}
 
-    bool isValid(const std::string& token) const;
+    // Where a valid token is from, for people and tests, who are not shown the token itself: "given", or "renewed-N" of
+    // the N-th renewal. Nothing for one that is not valid.
+    std::optional<std::string> originOf(const std::string& token) const;
     // A new token for the account and service. The one that they had before is no longer valid, nor are those that
     // belong to no account: the ones given at start or added.
     std::string renew(const std::string& account, const std::string& service);

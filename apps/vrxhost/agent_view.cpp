@@ -61,16 +61,6 @@ std::string AgentLocale::preferredLocaleIdentifier() const {
     return found ? *found : profile_.preferredLocaleIdentifier();
 }
 
-namespace {
-
-std::string agentProfile(const std::optional<std::string>& named, host::Database& database) {
-    if (named) return *named;
-    const std::optional<std::string> told = host::hostFact(database, host::facts::profile);
-    return told ? *told : wire::findLocations().profile.path;
-}
-
-}  // namespace
-
 AgentView::AgentView(const std::string& home, const std::optional<std::string>& profile)
     : home_(home),
       facilities_{.systemLog = &errors_},
@@ -81,7 +71,7 @@ AgentView::AgentView(const std::string& home, const std::optional<std::string>& 
       stored_(database_),
       defaults_(stored_),
       followUps_(database_),
-      profile_(agentProfile(profile, database_)),
+      profile_(agentProfile(database_, profile)),
       locale_(profile_, database_),
       accounts_(profile_, home),
       clock_(profile_),

@@ -89,8 +89,7 @@ void addCacheVerb(CommandLine& line, const wire::LocationOverrides& places) {
     auto options = std::make_shared<Options>();
     CLI::App* verb =
         line.add("cache", "Shows what is cached for a serial number", inHome(places, [options](Home& home) {
-                     return showCache(home, options->serialNumber,
-                                      wire::findLocations({.profile = options->profile}).profile.path);
+                     return showCache(home, options->serialNumber, agentProfile(home.database(), options->profile));
                  }));
     verb->add_option("SERIAL", options->serialNumber, "The serial number")->required();
     verb->add_option("--device", options->profile, "The agent's device profile, for the language")->type_name("PATH");

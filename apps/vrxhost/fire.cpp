@@ -1,5 +1,7 @@
 // vrxhost fire: has the running agent fire an activity now, as the system does when it falls due.
+#include <chrono>
 #include <memory>
+#include <thread>
 
 #include "agent_activities.h"
 #include "home.h"
@@ -15,6 +17,17 @@ using platform::Date;
 namespace {
 
 constexpr platform::Duration answerLimit = std::chrono::seconds(10);
+// A run that has done its work hands its result back a second later; only one that takes longer is in the way.
+constexpr auto handBackLimit = std::chrono::seconds(3);
+
+std::optional<host::FiringAnswer> requestFiring(Home& home, const std::string& identifier) {
+    const auto end = std::chrono::steady_clock::now() + handBackLimit;
+    while (true) {
+        const auto answer = host::requestFiring(home.path(), home.database(), identifier, answerLimit);
+        if (answer != host::FiringAnswer::AlreadyRunning || std::chrono::steady_clock::now() > end) return answer;
+        std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    }
+}
 
 Outcome refused(const char* kind, std::string problem, std::string advice) {
     Outcome outcome = failed(ExitCode::Refused, std::move(problem), std::move(advice));
@@ -25,7 +38,7 @@ Outcome refused(const char* kind, std::string problem, std::string advice) {
 Outcome fire(Home& home, const std::string& name) {
     const std::string identifier = name.find('.') == std::string::npos ? activityIdentifier(name) : name;
     const std::optional<Date> target = home.defaults().date(identifier + ".TargetDate");
-    const auto answer = host::requestFiring(home.path(), home.database(), identifier, answerLimit);
+    const auto answer = requestFiring(home, identifier);
     if (!answer)
         return failed(ExitCode::TimedOut, "the agent did not answer in time", "Try again; its log says what it does.");
     switch (*answer) {

@@ -270,7 +270,7 @@ void addFollowUpVerbs(CommandLine& line, const wire::LocationOverrides& places) 
     auto options = std::make_shared<Options>();
     CLI::App* listing =
         line.add("followups", "Shows what the settings app would", inHome(places, [options, &line](Home& home) {
-                     const host::DeviceProfile profile(wire::findLocations({.profile = options->profile}).profile.path);
+                     const host::DeviceProfile profile(agentProfile(home.database(), options->profile));
                      return options->isWatch ? watch(line, home, profile) : list(home, profile).outcome;
                  }));
     CLI::Option* watch = listing->add_flag("--watch", options->isWatch, "Show it again after each change");

@@ -2,6 +2,7 @@
 
 #include <filesystem>
 
+#include "host/host_facts.h"
 #include "service/register_defaults.h"
 
 namespace vrx::apps {
@@ -13,6 +14,12 @@ Home::Home(const std::string& path) : path_(path), files_(path), database_(datab
 Outcome notReachable(std::string problem) {
     return failed(ExitCode::NotReachable, std::move(problem),
                   "An agent makes it at its first start; name the agent's home with --home.");
+}
+
+std::string agentProfile(host::Database& database, const std::optional<std::string>& named) {
+    if (named) return *named;
+    const std::optional<std::string> told = host::hostFact(database, host::facts::profile);
+    return told ? *told : wire::findLocations().profile.path;
 }
 
 CommandLine::Verb inHome(const wire::LocationOverrides& places, std::function<Outcome(Home&)> verb) {

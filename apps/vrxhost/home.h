@@ -52,6 +52,9 @@ private:
 
 Outcome notReachable(std::string problem);
 
+// The device profile: the one that is named, else the one that the agent has told of, else where an agent would look.
+std::string agentProfile(host::Database& database, const std::optional<std::string>& named);
+
 // A verb that is run within the home, which must be there. The places are read when it runs.
 CommandLine::Verb inHome(const wire::LocationOverrides& places, std::function<Outcome(Home&)> verb);
 

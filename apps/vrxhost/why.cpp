@@ -12,6 +12,7 @@
 #include "followup/follow_up_content.h"
 #include "followup/serial_number_hashes.h"
 #include "host/home_lock.h"
+#include "host/machine_conditions.h"
 #include "platform/defaults_store.h"
 #include "platform/sha256_hash.h"
 #include "platform/text.h"
@@ -184,7 +185,7 @@ Findings examine(AgentView& view, const std::string& serialNumber, const std::se
     facts.postRun = activities.post.nextRun();
     if (facts.postRun)
         facts.posting = predictedPosting(serialNumber, infos, settings, std::max(facts.now, *facts.postRun),
-                                         view.profile().facts()->minimumInterval.value_or(platform::minimumInterval));
+                                         host::minimumInterval(view.profile()));
 
     findings.nextPost = nextPostDate(infos, settings.dates, facts.now);
     findings.nextRefresh = nextRefreshDate(shown, true, RefreshDateSettings::read(), facts.now);

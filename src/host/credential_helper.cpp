@@ -94,6 +94,7 @@ MaybeError Helper::start(const std::vector<std::string>& command, int input, int
         if (const char* value = std::getenv(name)) settings.push_back(std::string(name) + "=" + value);
     auto pointers = [](const std::vector<std::string>& texts) {
         std::vector<char*> result;
+        result.reserve(texts.size() + 1);
         for (const std::string& text : texts) result.push_back(const_cast<char*>(text.c_str()));
         result.push_back(nullptr);
         return result;
@@ -115,7 +116,8 @@ int Helper::end() {
     if (identifier_ < 0) return -1;
     // Before the helper is waited for: until then nobody else can get its number. One that runs as another user may not
     // be killed, and is not waited for.
-    const int options = kill(-identifier_, SIGKILL) == 0 ? 0 : WNOHANG;
+    kill(-identifier_, SIGKILL);
+    const int options = kill(identifier_, SIGKILL) == 0 ? 0 : WNOHANG;
     int status = -1;
     pid_t ended;
     do ended = waitpid(identifier_, &status, options);

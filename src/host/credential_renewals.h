@@ -1,6 +1,6 @@
 // Renewals of credentials under way. Each runs on a thread of its own, on which whoever asked for it is answered. What
-// is asked once more while it runs is the same renewal: its token is newer than any that the second one can have been
-// refused with. Any thread may ask.
+// is asked once more while it runs is the same renewal: its token is newer than the one that was stored when the second
+// was asked for. Any thread may ask.
 #pragma once
 
 #include <functional>

@@ -11,7 +11,7 @@ namespace vrx::host {
 using platform::MaybeError;
 using platform::Platform;
 
-Host::Host(const HostLocations& locations, platform::Level lowestLevel)
+Host::Host(const HostLocations& locations, platform::Level lowestLevel, const HostLimits& limits)
     : home_(locations.home),
       log_(lowestLevel),
       facilities_{.systemLog = &log_},
@@ -23,10 +23,10 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel)
       defaults_(database_),
       followUps_(database_),
       profile_(locations.profile),
-      accounts_(profile_, home_),
+      accounts_(profile_, home_, limits.credentialHelper),
       accountSession_(profile_),
       clock_(profile_),
-      http_(queues_.workers(platform::Priority::UserInitiated), clock_, profile_),
+      http_(queues_.workers(platform::Priority::UserInitiated), clock_, profile_, limits.http),
       conditions_(mainLoop_.event(), profile_),
       activities_({.database = database_,
                    .mainQueue = mainLoop_,

@@ -47,12 +47,18 @@ struct HostLocations {
     std::string profile;  // empty for the bare machine's facts
 };
 
+struct HostLimits {
+    HttpLimits http{};
+    platform::Duration credentialHelper = std::chrono::seconds(60);
+};
+
 // The agent has a home to itself; its tools look in and may change settings beside it.
 enum class HomeUse { Agent, Tool };
 
 class Host {
 public:
-    explicit Host(const HostLocations& locations, platform::Level lowestLevel = platform::Level::Default);
+    explicit Host(const HostLocations& locations, platform::Level lowestLevel = platform::Level::Default,
+                  const HostLimits& limits = {});
     // Ends what is under way: requests go unanswered, renewals of credentials fail, running tasks are waited for.
     ~Host();
     Host(const Host&) = delete;

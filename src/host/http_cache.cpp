@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <array>
-#include <cmath>
 #include <string_view>
 
 #include "codec/digest.h"
@@ -37,7 +36,8 @@ bool HttpCache::isFor(const HttpHeaders& requestHeaders) {
     return std::ranges::none_of(own, [&](std::string_view name) { return requestHeaders.contains(name); });
 }
 
-std::size_t HttpCache::Entry::size() const {
+// With what a header takes beside its text.
+std::size_t HttpCache::sizeOf(const std::string& url, const HttpResponse& answer) {
     std::size_t size = sizeof(Entry) + url.size() + (answer.body ? answer.body->size() : 0);
     for (const auto& [name, value] : answer.headers) size += 100 + name.size() + value.size();
     return size;
@@ -49,7 +49,7 @@ HttpCache::Entries::iterator HttpCache::search(const Key& key) {
 
 void HttpCache::remove(Entries::iterator entry) {
     if (entry == entries_.end()) return;
-    bytes_ -= (*entry)->size();
+    bytes_ -= (*entry)->size;
     entries_.erase(entry);
 }
 
@@ -66,20 +66,19 @@ std::optional<HttpResponse> HttpCache::freshAnswer(const Entry& stored) const {
     // Once the clock has been set back nobody knows.
     if (resident < Duration(0) || age >= stored.lifetime) return std::nullopt;
     HttpResponse answer = stored.answer;
-    answer.headers["Age"] = std::to_string(std::llround(std::floor(age.count())));
+    answer.headers["Age"] = std::to_string(static_cast<std::int64_t>(age.count()));
     return answer;
 }
 
 void HttpCache::store(const Key& key, const std::string& url, Date asked, const HttpResponse& answer) {
     remove(search(key));
     const Date arrived = now();
-    if (!mayStore(answer.headers, arrived)) return;
-    auto entry =
-        std::make_shared<const Entry>(Entry{key, url, answer, arrived, ageOnArrival(answer.headers, asked, arrived),
-                                            freshnessLifetime(answer.headers, arrived)});
-    if (entry->size() > bytesAtMost_) return;
-    bytes_ += entry->size();
-    entries_.push_front(std::move(entry));
+    const std::size_t size = sizeOf(url, answer);
+    if (size > bytesAtMost_ || !mayStore(answer.headers, arrived)) return;
+    const Duration age = ageOnArrival(answer.headers, asked, arrived);
+    const Duration lifetime = freshnessLifetime(answer.headers, arrived);
+    entries_.push_front(std::make_shared<const Entry>(Entry{key, url, answer, arrived, age, lifetime, size}));
+    bytes_ += size;
     while (entries_.size() > entriesAtMost_ || bytes_ > bytesAtMost_) remove(std::prev(entries_.end()));
 }
 

@@ -29,7 +29,7 @@ public:
         platform::Date arrived;
         platform::Duration ageOnArrival;
         platform::Duration lifetime;
-        std::size_t size() const;
+        std::size_t size;
     };
     using Stored = std::shared_ptr<const Entry>;
 
@@ -54,6 +54,7 @@ public:
 
 private:
     using Entries = std::list<Stored>;
+    static std::size_t sizeOf(const std::string& url, const platform::HttpResponse& answer);
     void remove(Entries::iterator entry);
     Entries::iterator search(const Key& key);
 

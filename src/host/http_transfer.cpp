@@ -44,9 +44,7 @@ bool isSafeHeader(const std::string& name, const std::string& value) {
     return isHeaderName(name) && value.find_first_of(std::string_view("\r\n\0", 3)) == value.npos;
 }
 
-std::chrono::steady_clock::time_point deadlineAfter(Duration timeout) {
-    // A day is as good as for ever, and no number is no time.
-    constexpr Duration longest = std::chrono::hours(24);
+std::chrono::steady_clock::time_point deadlineAfter(Duration timeout, Duration longest) {
     const Duration bounded = timeout < longest ? timeout : longest;
     return std::chrono::steady_clock::now() +
            std::chrono::ceil<std::chrono::steady_clock::duration>(bounded > Duration(0) ? bounded : Duration(0));
@@ -77,7 +75,8 @@ HttpTransfer::HttpTransfer(HttpRequest request, bool isUncached, HttpSurrounding
     : request_(std::move(request)),
       isUncached_(isUncached),
       surroundings_(surroundings),
-      deadline_(deadlineAfter(request_.timeout.value_or(surroundings.limits.timeout))),
+      deadline_(
+          deadlineAfter(request_.timeout.value_or(surroundings.limits.timeout), surroundings.limits.longestTimeout)),
       completion_(std::move(completion)),
       address_(request_.url) {}
 

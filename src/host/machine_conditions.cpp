@@ -33,13 +33,17 @@ Moment presentMoment() {
     return {boot, bootTime(), std::chrono::system_clock::now()};
 }
 
+Duration minimumInterval(const DeviceProfile& profile) {
+    return std::min(profile.facts()->minimumInterval.value_or(platform::minimumInterval), platform::minimumInterval);
+}
+
 bool MachineConditions::shouldDefer() const {
     const std::optional<bool> override = profile_.facts()->shouldDefer;
     return override ? *override : isOnLowBattery();
 }
 
 Duration MachineConditions::minimumInterval() const {
-    return std::min(profile_.facts()->minimumInterval.value_or(platform::minimumInterval), platform::minimumInterval);
+    return host::minimumInterval(profile_);
 }
 
 void MachineConditions::start(Calls calls) {

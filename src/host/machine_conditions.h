@@ -11,6 +11,8 @@ namespace vrx::host {
 
 // The present moment; for tools beside the agent, too. Any thread.
 platform::Moment presentMoment();
+// From an activity's run to the one that it schedules itself: the profile can only make it shorter.
+platform::Duration minimumInterval(const DeviceProfile& profile);
 
 class MachineConditions final : public ActivityConditions {
 public:

@@ -42,13 +42,14 @@ void VRXFollowUpPost::performActivityForScheduler(const std::shared_ptr<VRXSched
         [self = shared_from_this(), run](DeviceInfoList deviceInfos) { self->finish(*run, deviceInfos); });
 }
 
-// It holds activity and scheduler weakly: the activity itself holds it.
+// It holds activity and scheduler weakly, as the activity holds it, and the run as well, which its work keeps.
 std::shared_ptr<platform::RepeatingTimer> VRXFollowUpPost::makeDeferralWatch(
     const std::shared_ptr<VRXScheduler>& scheduler, const std::shared_ptr<ActivityRun>& run) {
-    auto fire = [activity = weak_from_this(), watched = std::weak_ptr(scheduler), run] {
+    auto fire = [activity = weak_from_this(), asked = std::weak_ptr(scheduler), watched = std::weak_ptr(run)] {
         auto self = activity.lock();
-        auto asked = watched.lock();
-        if (!self || !self->followUpPostInProgress() || !asked || !asked->shouldDefer()) return;
+        auto scheduler = asked.lock();
+        auto run = watched.lock();
+        if (!self || !self->followUpPostInProgress() || !scheduler || !scheduler->shouldDefer() || !run) return;
         log(Level::Default, "FollowUp Post activity deferred.");
         self->end(*run, BackgroundActivityResult::Deferred);
     };

@@ -126,13 +126,14 @@ void VRXOutreachActivity::performActivityForScheduler(const std::shared_ptr<VRXS
     });
 }
 
-// It holds activity and scheduler weakly: the activity itself holds it.
+// It holds activity and scheduler weakly, as the activity holds it, and the run as well, which its work keeps.
 std::shared_ptr<platform::RepeatingTimer> VRXOutreachActivity::makeDeferralWatch(
     const std::shared_ptr<VRXScheduler>& scheduler, const std::shared_ptr<Run>& run) {
-    auto fire = [activity = weak_from_this(), watched = std::weak_ptr(scheduler), run] {
+    auto fire = [activity = weak_from_this(), asked = std::weak_ptr(scheduler), watched = std::weak_ptr(run)] {
         auto self = activity.lock();
-        auto asked = watched.lock();
-        if (!self || !self->outreachInProgress() || !asked || !asked->shouldDefer()) return;
+        auto scheduler = asked.lock();
+        auto run = watched.lock();
+        if (!self || !self->outreachInProgress() || !scheduler || !scheduler->shouldDefer() || !run) return;
         log(Level::Default, "Warranty download activity deferred.");
         end(*run, activity, BackgroundActivityResult::Deferred);
     };

@@ -108,6 +108,16 @@ TEST_F(CommandLine, HungAgentTimesOut) {
         verb.insert(verb.end(), {"--timeout", "0.2"});
         EXPECT_EQ(expect(5, verb, "hung")["error"]["kind"], Value("timed-out"));
     }
+    // A terminal shows that it takes long, until it is over; a pipe holds nothing of it.
+    const std::string slowly = place_ / "app/vrxctl" + " device --json --timeout 0.7 --socket " + place_ / "hung";
+    const Place::Outcome terminal =
+        place_.run("/usr/bin/script", {"-qec", slowly + " >" + place_ / "out", "/dev/null"});
+    const std::string line = "waiting for the agent…";
+    EXPECT_NE(terminal.output.find("\r" + line + "\r" + std::string(line.size(), ' ') + "\rvrxctl: "),
+              std::string::npos)
+        << terminal.output;
+    EXPECT_TRUE(fileText(place_ / "out").starts_with("{"));
+    EXPECT_EQ(place_.run("/bin/sh", {"-c", slowly}).errors.find(line), std::string::npos);
     close(hung);
 }
 

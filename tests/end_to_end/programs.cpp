@@ -39,18 +39,21 @@ std::string fileText(const std::string& path) {
 }
 
 Process::Process(const std::string& folder, const std::string& program, const Arguments& arguments,
-                 const Arguments& environment, int listeningSocket) {
+                 const Arguments& environment, const Handed& handed) {
     static std::atomic<int> count = 0;
     files_ = folder + "/process-" + std::to_string(++count);
     posix_spawn_file_actions_t actions;
     posix_spawn_file_actions_init(&actions);
     posix_spawn_file_actions_addopen(&actions, 0, "/dev/null", O_RDONLY, 0);
-    posix_spawn_file_actions_addopen(&actions, 1, (files_ + ".out").c_str(), O_WRONLY | O_CREAT, 0600);
+    if (handed.output >= 0)
+        posix_spawn_file_actions_adddup2(&actions, handed.output, 1);
+    else
+        posix_spawn_file_actions_addopen(&actions, 1, (files_ + ".out").c_str(), O_WRONLY | O_CREAT, 0600);
     posix_spawn_file_actions_addopen(&actions, 2, (files_ + ".err").c_str(), O_WRONLY | O_CREAT, 0600);
     Arguments words{program};
     Arguments variables = environment;
-    if (listeningSocket >= 0) {
-        posix_spawn_file_actions_adddup2(&actions, listeningSocket, 3);
+    if (handed.listeningSocket >= 0) {
+        posix_spawn_file_actions_adddup2(&actions, handed.listeningSocket, 3);
         variables.emplace_back("LISTEN_FDS=1");
         words = {"/bin/sh", "-c", "LISTEN_PID=$$ exec \"$0\" \"$@\"", program};  // the process must be named
     }

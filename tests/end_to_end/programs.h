@@ -20,10 +20,17 @@ std::string fileText(const std::string& path);
 // A child process with its standard output and error in files.
 class Process {
 public:
-    // The environment is this process's, with the given variables in front. A listening socket is handed over as a
-    // service manager does it.
+    // Descriptors that it gets.
+    struct Handed {
+        int output = -1;           // else its standard output is a file
+        int listeningSocket = -1;  // in the way of a service manager
+    };
+    // The environment is this process's, with the given variables in front.
     Process(const std::string& folder, const std::string& program, const Arguments& arguments,
-            const Arguments& environment = {}, int listeningSocket = -1);
+            const Arguments& environment, const Handed& handed);
+    Process(const std::string& folder, const std::string& program, const Arguments& arguments,
+            const Arguments& environment = {})
+        : Process(folder, program, arguments, environment, Handed()) {}
     ~Process();  // kills it, if it has not been waited for
     Process(const Process&) = delete;
     Process& operator=(const Process&) = delete;

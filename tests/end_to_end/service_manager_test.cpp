@@ -26,10 +26,10 @@ sockaddr_un addressOf(const std::string& path) {
 
 class ServiceManager : public testing::Test {
 protected:
-    std::unique_ptr<Process> startAgent(int listeningSocket = -1) const {
-        return std::make_unique<Process>(place_ / "", VRX_PROGRAMS "/vrxagent",
-                                         Arguments{"--home", place_ / "home", "--socket", place_ / "socket"},
-                                         Arguments{notices_.variable()}, listeningSocket);
+    std::unique_ptr<Process> startAgent(int listeningSocket = -1, const std::string& variable = "NONE=") const {
+        return std::make_unique<Process>(
+            place_ / "", VRX_PROGRAMS "/vrxagent", Arguments{"--home", place_ / "home", "--socket", place_ / "socket"},
+            Arguments{notices_.variable(), variable}, Process::Handed{.listeningSocket = listeningSocket});
     }
 
     Place place_;
@@ -75,6 +75,13 @@ TEST_F(ServiceManager, HearsThatTheAgentIsReadyWhenClientsCanConnect) {
     close(client);
     while (fillings-- > 0) EXPECT_EQ(notices_.next(*agent), "x");
     EXPECT_EQ(notices_.next(*agent), "READY=1");
+}
+
+// An agent whose main loop goes on says so at least that often.
+TEST_F(ServiceManager, IsToldAgainAndAgainThatTheAgentIsAlive) {
+    const std::unique_ptr<Process> agent = startAgent(-1, "WATCHDOG_USEC=400000");
+    while (notices_.next(*agent) != "READY=1") ASSERT_TRUE(agent->isRunning()) << agent->errors();
+    for (int count = 0; count < 2; ++count) EXPECT_EQ(notices_.next(*agent), "WATCHDOG=1");
 }
 
 // Which program another user's process runs, the agent may read with one capability alone. Nothing that it starts gets

@@ -6,10 +6,8 @@
 
 #include <future>
 
-#include "host/account_session.h"
 #include "host/credential_helper.h"
 #include "host/main_loop.h"
-#include "platform/text.h"
 #include "support.h"
 
 namespace vrx::host {
@@ -137,26 +135,6 @@ TEST_F(AccountStoreTest, SharesARenewalThatIsUnderWay) {
     EXPECT_EQ(fileText(folder / "runs"), "run\nrun\n");
     EXPECT_EQ(renew().code, RenewalResult::renewed);
     EXPECT_EQ(fileText(folder / "runs"), "run\nrun\nrun\n");
-}
-
-TEST_F(AccountStoreTest, GivesTheSessionsHeaders) {
-    const AccountSession session(profile);
-    auto headers = [&](const std::string& account) {
-        writeFile(profile.path(),
-                  "device = { serial_number = 'SN1', product_type = 'P1', product_version = '2' }\n" + account);
-        platform::HttpRequest request;
-        session.addClientInformationHeader(request);
-        session.addDeviceIdentifierHeader(request);
-        request.headers.merge(session.accountHeaders(request));
-        return describe(request.headers);
-    };
-    EXPECT_THAT(headers("account.identifier = 'ada'"),
-                StartsWith("{X-Orvane-Account-Id = ada; X-Orvane-Client-Info = P1 (2) com.orvane.vrxagent; "
-                           "X-Orvane-Device-Id = "));
-    EXPECT_EQ(
-        headers("account = { identifier = 'ada', client_information = 'c', device_identifier = 'd', headers = { X "
-                "= '1' } }"),
-        "{X = 1; X-Orvane-Client-Info = c; X-Orvane-Device-Id = d;}");
 }
 
 }  // namespace

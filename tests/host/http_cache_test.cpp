@@ -9,7 +9,6 @@ namespace vrx::host {
 namespace {
 
 using namespace std::chrono_literals;
-using platform::HttpHeaders;
 
 TEST(HttpCacheRules, ReadCacheControlAndDates) {
     // Storable, to be revalidated, max-age.
@@ -40,21 +39,19 @@ TEST(HttpCacheRules, ReadCacheControlAndDates) {
 TEST(HttpCache, StaysWithinItsBoundsAndLetsTheLeastRecentlyUsedGo) {
     SettableClock clock;
     HttpCache cache(clock, 3, 4000);
-    auto add = [&](const std::string& url, std::size_t size, const HttpHeaders& headers = {}) {
+    auto add = [&](const std::string& url, std::size_t size, const std::string& accept = "") {
         platform::HttpResponse answer{.status = 200, .headers = {{"Cache-Control", "max-age=9"}}};
         answer.body = platform::Data(size);
-        cache.store(HttpCache::keyOf(url, headers), url, clock.now(), answer);
+        cache.store(HttpCache::keyOf(url, {{"Accept", accept}}), url, clock.now(), answer);
         EXPECT_LE(cache.bytes(), 4000u);
     };
-    auto has = [&](const std::string& url, const HttpHeaders& headers = {}) {
-        return cache.find(HttpCache::keyOf(url, headers)) != nullptr;
+    auto has = [&](const std::string& url, const std::string& accept = "") {
+        return cache.find(HttpCache::keyOf(url, {{"Accept", accept}})) != nullptr;
     };
-    add("a", 1);
-    add("b", 1, {{"X", "1"}});
-    add("c", 1);
-    EXPECT_TRUE(has("a") && has("b", {{"X", "1"}}) && !has("b", {{"X", "2"}}) && has("a"));
+    for (const char* url : {"a", "b", "c"}) add(url, 1);
+    EXPECT_TRUE(has("a") && has("b") && !has("b", "x"));
     add("d", 1);
-    EXPECT_TRUE(has("b", {{"X", "1"}}) && !has("c") && has("a"));
+    EXPECT_TRUE(has("b") && !has("c") && has("a"));
     add("e", 3000);  // only one fits beside it
     EXPECT_TRUE(has("a") && has("e") && !has("d"));
     add("e", 5000);  // and this one replaces what it cannot be itself

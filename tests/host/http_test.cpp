@@ -281,7 +281,8 @@ TEST_F(HttpTest, KeepsNothingThatIsDoubtful) {
 }
 
 TEST_F(HttpTest, TrustsTheProfilesAuthorityWhileTheProfileIsTrusted) {
-    const std::string program = VRX_PROGRAMS "/vrx-coverage-server --tls";
+    const std::string program =
+        VRX_PROGRAMS "/vrx-coverage-server --tls --fault server-version:redirect=http://127.0.0.1/";
     FILE* server = popen(("exec 2>/dev/null; echo process $$; exec " + program).c_str(), "r");
     std::array<char, 1000> process, certificate, url;
     ASSERT_EQ(fscanf(server, "process %999s control on %*s certificate %999s listening on %999s", process.data(),
@@ -292,6 +293,7 @@ TEST_F(HttpTest, TrustsTheProfilesAuthorityWhileTheProfileIsTrusted) {
     writeFile(profile.path(), "[http]\nca_file = '" + std::string(certificate.data()) + "'");
     chmod(profile.path().c_str(), 0600);
     EXPECT_EQ(get(url.data()).status, 404);
+    EXPECT_EQ(error(get(url.data() + std::string("/library/ORVANE/asset/vrxV2.plist"))), "a redirect leaves https");
     chmod(profile.path().c_str(), 0666);
     EXPECT_THAT(error(get(url.data())), HasSubstr("certificate"));
     kill(std::stoi(process.data()), SIGTERM);

@@ -1,0 +1,29 @@
+// Tells a person at a terminal that something takes its time: a line on standard error that begins after half a second,
+// counts the seconds, and is gone when the object goes. Where standard error is no terminal nothing is written.
+#pragma once
+
+#include <condition_variable>
+#include <mutex>
+#include <string>
+#include <thread>
+
+namespace vrx::apps {
+
+class Progress {
+public:
+    explicit Progress(std::string text);
+    ~Progress();
+    Progress(const Progress&) = delete;
+    Progress& operator=(const Progress&) = delete;
+
+private:
+    void run();
+
+    const std::string text_;
+    std::mutex mutex_;
+    std::condition_variable ended_;
+    bool isEnded_ = false;
+    std::thread thread_;
+};
+
+}  // namespace vrx::apps

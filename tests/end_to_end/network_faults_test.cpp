@@ -1,0 +1,289 @@
+// What a client gets, what is cached afterwards and what went over the wire, whatever coverage server, network, account
+// and credential helper do. The agent runs on its real host, with transfers and helper limited to half a second;
+// clients reach it through its socket, and the server is a process of its own.
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <array>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <future>
+#include <thread>
+
+#include "client/agent_connection.h"
+#include "codec/json.h"
+#include "coverage/cache_metadata.h"
+#include "coverage_server.h"
+#include "host/host.h"
+#include "host/service/bundle_lookup.h"
+#include "host/service/service_listener.h"
+#include "platform/defaults_store.h"
+#include "service/start_up.h"
+
+namespace vrx::end_to_end {
+namespace {
+
+using namespace std::chrono_literals;
+using platform::Platform;
+using platform::Value;
+
+constexpr platform::Duration timeLimit = 500ms;
+constexpr const char* serialNumber = "VRXPHONE0001";
+constexpr std::string_view metadataKeys[] = {cachedWarrantyLastUpdatedDateKey, cachedWarrantyLocaleKey,
+                                             cachedWarrantyVersionKey};
+constexpr const char* signedIn = "identifier = 'maya@orvane.example'\nalt_dsid = '000001-02'\n";
+
+class Network : public testing::Test {
+protected:
+    // A profile of a phone and two watches that entitles this program; the lines are its account's. The time zone is
+    // its own: the thread sanitizer does not see that the C library guards the machine's.
+    void useAccount(const std::string& lines) const {
+        place.write("device.toml",
+                    "[device]\nserial_number = 'VRXPHONE0001'\nproduct_type = 'Phone12,3'\nproduct_version = '18.1'\n"
+                    "[locale]\ntime_zone = 'Asia/Kathmandu'\n"
+                    "[features.Vireo]\nMeridian_3_0 = true\n"
+                    "[[watches]]\nserial_number = 'VRXWATCH0001'\n[[watches]]\nserial_number = 'VRXWATCH0002'\n"
+                    "[[bundles]]\nexecutables = ['" +
+                        std::filesystem::read_symlink("/proc/self/exe").string() +
+                        "']\nidentifier = 'com.orvane.tests'\n"
+                        "[bundles.entitlements]\n'com.orvane.private.vrxagent' = true\n" +
+                        (lines.empty() ? "" : "[account]\ncredential_helper = ['" + place / "helper" + "']\n" + lines));
+    }
+    // The credential helper, a script.
+    void useHelper(const std::string& script) const {
+        place.write("helper", "#!/bin/sh\n" + script + "\n");
+        std::filesystem::permissions(place / "helper", std::filesystem::perms::owner_all);
+    }
+    void serveRecord(int round) const {
+        place.write("records/default.json", R"({"covered": true, "round": )" + std::to_string(round) + "}");
+    }
+    // In KiB, since the last reset.
+    static long peakMemory() {
+        std::ifstream status("/proc/self/status");
+        long peak = 0;
+        for (std::string word; word != "VmHWM:" && status >> word;) {
+        }
+        status >> peak;
+        return peak;
+    }
+    static void resetPeakMemory() { std::ofstream("/proc/self/clear_refs") << 5; }
+    static void setDefault(std::string_view key, Value value) {
+        Platform::current().defaultsStore().set(std::string(key), std::move(value));
+    }
+
+    // What is cached for this device: the file and the metadata.
+    using Cached = std::pair<std::string, std::array<Value, std::size(metadataKeys)>>;
+    Cached cached() const {
+        Cached cached{fileText(place / "home/Library/Application Support/com.orvane.Vireo/" +
+                               platform::sha256Hash(serialNumber) + "_Warranty.plist"),
+                      {}};
+        for (std::size_t i = 0; i < std::size(metadataKeys); ++i)
+            cached.second[i] = Platform::current().defaultsStore().get(cacheMetadataKey(serialNumber, metadataKeys[i]));
+        return cached;
+    }
+
+    Place place;
+    std::optional<CoverageServer> server;
+    std::optional<client::AgentConnection> clients;
+
+    // An agent that has refreshed its record once.
+    void SetUp() override {
+        setenv("no_proxy", "*", 1);  // nothing leaves this machine
+        std::filesystem::create_directory(place / "records");
+        serveRecord(1);
+        server.emplace(place / "", Arguments{"--quiet", "--records", place / "records", "--cache-control", "no-store"});
+        useHelper("exec '" VRX_SOURCE "/examples/credential-helper' " + server->url());
+        useAccount(signedIn);
+        std::promise<void> isReady;
+        thread_ = std::thread([&] { runAgent(isReady); });
+        isReady.get_future().wait();
+        setDefault("WarrantyURL", server->url() + "/api/v2/coverage/summary");
+        setDefault("ServerVersionURL", server->url() + "/library/ORVANE/asset/vrxV2.plist");
+        clients.emplace(client::ConnectionOptions{.socketPath = place / "socket"});
+        ASSERT_TRUE((*clients->getDefaultDeviceInfoUsingPolicy(VRXWarrantyLookupPolicyRefresh))->warranty());
+        EXPECT_EQ(server->requests(3), "s200 t200 c1:200");
+        server->ask("DELETE", "/requests");
+        server->ask("DELETE", "/counters");
+        serveRecord(2);
+    }
+    void TearDown() override {
+        clients.reset();
+        loop_->stop();
+        mayEnd_.set_value();  // the loop is of no more use to this thread
+        thread_.join();
+    }
+
+private:
+    // As the agent's main thread.
+    void runAgent(std::promise<void>& isReady) {
+        host::Host host({.home = place / "home", .profile = place / "device.toml"}, platform::Level::Error,
+                        {.http = {.longestTimeout = timeLimit}, .credentialHelper = timeLimit});
+        EXPECT_FALSE(host.open(host::HomeUse::Agent));
+        host::BundleLookup bundles([&] { return host.profile().facts(); });
+        host::ServiceListenerFactory factory(host.mainLoop().event(), bundles);
+        EXPECT_FALSE(factory.open(place / "socket"));
+        host.setBundleLookup(&bundles);
+        host.setServiceListenerFactory(&factory);
+        const StartUp startUp;
+        loop_ = &host.mainLoop();
+        isReady.set_value();
+        loop_->run();
+        mayEnd_.get_future().wait();
+    }
+
+    host::MainLoop* loop_ = nullptr;
+    std::promise<void> mayEnd_;
+    std::thread thread_;
+};
+
+enum class Outcome {
+    NewRecord,
+    NoRecord,       // what was cached stays as it was
+    RecordUnfiled,  // delivered, and its metadata written, but not its file
+};
+using enum Outcome;
+
+// What is other than usual.
+struct Change {
+    const char* warrantyURL = nullptr;
+    const char* serverVersionURL = nullptr;
+    const char* document = nullptr;  // of the server-version document
+    const char* helper = nullptr;    // empty: there is none
+    const char* account = nullptr;
+    bool isLong = false;  // takes the whole time limit
+};
+
+struct Fault {
+    const char* name;
+    const char* faults;    // of the server
+    const char* requests;  // that the server saw, as CoverageServer::requests() gives them
+    Outcome outcome;
+    Change change{};
+};
+
+std::ostream& operator<<(std::ostream& stream, const Fault& fault) {
+    return stream << fault.name;
+}
+
+const char* const refusing = "http://127.0.0.1:1/";
+// No host's name is that long: no resolver asks another machine for it.
+const char* const nowhere = "https://0123456789012345678901234567890123456789012345678901234567890123.invalid/";
+const char* const untrusted = "";  // a server with a certificate of its own making
+const char* const hangs = "sleep 1000 & wait";
+const char* const babbles = "head -c 1000 /dev/urandom";
+const char* const withoutToken = "identifier = 'ada@orvane.example'\nalt_dsid = '000002-03'\n";
+const char* const withoutAltDSID = "identifier = 'maya@orvane.example'\n";
+
+const Fault faults[] = {
+    {"Unauthorized", "coverage:status=401", "s200 c1:401 t200 c2:401 t200 c3:401", NoRecord},
+    {"UnauthorizedOnce", "coverage:status=401,count=1", "s200 c1:401 t200 c2:200", NewRecord},
+    {"ServerError", "coverage:status=500", "s200 c1:500", NoRecord},
+    {"NotFound", "coverage:status=404", "s200 c1:404", NoRecord},
+    {"Redirect", "coverage:redirect", "s200 c1:302", NoRecord},
+    {"NeverAnswers", "coverage:hang", "s200 c1:0", NoRecord, {.isLong = true}},
+    {"Drips", "coverage:drip=50ms", "s200 c1:200", NoRecord, {.isLong = true}},
+    {"ConnectionRefused", "", "s200", NoRecord, {.warrantyURL = refusing}},
+    {"NoSuchHost", "", "s200", NoRecord, {.warrantyURL = nowhere}},
+    {"UnknownCertificate", "", "s200", NoRecord, {.warrantyURL = untrusted}},
+    {"DropsMidBody", "coverage:drop", "s200 c1:200", NoRecord},
+    {"Garbage", "coverage:garbage", "s200 c1:200", NoRecord},
+    {"NotJson", "coverage:not-json", "s200 c1:200", NoRecord},
+    {"Large", "coverage:large=100MiB", "s200 c1:200", NoRecord},
+    {"Bomb", "coverage:bomb=1100MiB", "s200 c1:200", NoRecord},
+    {"Empty", "coverage:empty", "s200 c1:200", NoRecord},
+    {"Array", "coverage:array", "s200 c1:200", NoRecord},
+    {"Nulls", "coverage:nulls", "s200 c1:200", RecordUnfiled},
+
+    {"VersionsTwiceAnArray", "server-version:array", "s200 s200! c1:200", NewRecord},
+    {"OneVersion", "", "s200", NoRecord, {.document = R"({"highVersion": null})"}},
+    {"VersionsAsStrings", "", "s200 c1:200", NewRecord, {.document = R"({"versionsAsStrings": true})"}},
+    {"VersionsUnreachable", "", "c1:200", NewRecord, {.serverVersionURL = refusing}},
+    {"VersionsNeverAnswered", "server-version:hang", "s0 c1:200", NewRecord, {.isLong = true}},
+
+    {"HelperMissing", "coverage:status=401,count=1", "s200 c1:401 c1:200", NewRecord, {.helper = ""}},
+    {"HelperFails", "coverage:status=401,count=1", "s200 c1:401 c1:200", NewRecord, {.helper = "exit 1"}},
+    {"HelperHangs", "coverage:status=401,count=1", "s200 c1:401 c1:200", NewRecord, {.helper = hangs, .isLong = true}},
+    {"HelperBabbles", "coverage:status=401,count=1", "s200 c1:401 c1:200", NewRecord, {.helper = babbles}},
+    {"HelperMissingWithoutToken", "", "s200", NoRecord, {.helper = "", .account = withoutToken}},
+    {"HelperFailsWithoutToken", "", "s200", NoRecord, {.helper = "exit 1", .account = withoutToken}},
+    {"HelperHangsWithoutToken", "", "s200", NoRecord, {.helper = hangs, .account = withoutToken, .isLong = true}},
+    {"HelperBabblesWithoutToken", "", "s200", NoRecord, {.helper = babbles, .account = withoutToken}},
+    {"NoAccount", "", "s200", NoRecord, {.account = ""}},
+    {"NoAltDSID", "", "s200", NoRecord, {.account = withoutAltDSID}},
+};
+
+class NetworkFaults : public Network, public testing::WithParamInterface<Fault> {};
+
+TEST_P(NetworkFaults, EndAsTheyShould) {
+    const Fault& fault = GetParam();
+    std::optional<CoverageServer> tls;
+    if (fault.change.warrantyURL == untrusted) tls.emplace(place / "", Arguments{"--tls"});
+    if (fault.change.warrantyURL) setDefault("WarrantyURL", tls ? tls->url() : fault.change.warrantyURL);
+    if (fault.change.serverVersionURL) setDefault("ServerVersionURL", fault.change.serverVersionURL);
+    if (fault.change.document) server->ask("PATCH", "/document", fault.change.document);
+    if (fault.change.helper) useHelper(fault.change.helper);
+    if (fault.change.account) useAccount(fault.change.account);
+    server->ask("POST", "/faults", fault.faults);
+    if (fault.outcome == RecordUnfiled)
+        for (std::string_view key : metadataKeys) setDefault(cacheMetadataKey(serialNumber, key), nullptr);
+    const Cached before = cached();
+    resetPeakMemory();
+    const long memoryBefore = peakMemory();
+
+    auto reply = std::make_shared<std::promise<std::shared_ptr<VRXDeviceInfo>>>();  // which may be kept only once
+    auto replied = reply->get_future();
+    clients->getDefaultDeviceInfoUsingPolicy(VRXWarrantyLookupPolicyRefresh,
+                                             [reply](std::shared_ptr<VRXDeviceInfo> info) { reply->set_value(info); });
+    EXPECT_TRUE(*clients->getDefaultDeviceInfoUsingPolicy(VRXWarrantyLookupPolicyCachedOnly));
+    const bool isPending = replied.wait_for(0s) == std::future_status::timeout;
+    EXPECT_TRUE(isPending || !fault.change.isLong) << "the other client had to wait";
+    const auto record = replied.get()->warranty();
+
+    EXPECT_LT(peakMemory() - memoryBefore, 64 * 1024) << "KiB";
+    EXPECT_EQ(server->requests(1 + std::ranges::count(std::string_view(fault.requests), ' ')), fault.requests);
+    if (tls) {
+        EXPECT_EQ(tls->ask("GET", "/counters")["handshakeFailures"], Value(1));
+    }
+    ASSERT_EQ(record != nullptr, fault.outcome != NoRecord);
+    const Cached after = cached();
+    if (fault.outcome == NoRecord) {
+        EXPECT_EQ(after, before);
+        return;
+    }
+    EXPECT_EQ(after.first == before.first, fault.outcome == RecordUnfiled);
+    for (std::size_t i = 0; i < std::size(metadataKeys); ++i) EXPECT_FALSE(after.second[i].isNull()) << metadataKeys[i];
+    EXPECT_NE(after.second[0], before.second[0]);
+    if (fault.outcome == RecordUnfiled) return;
+    EXPECT_EQ(record->dictionaryRepresentation()["round"], Value(2));
+    const auto lookup = clients->getDefaultDeviceInfoUsingPolicy(VRXWarrantyLookupPolicyCachedOnly);
+    EXPECT_EQ((*lookup)->warranty()->dictionaryRepresentation(), record->dictionaryRepresentation());
+}
+
+INSTANTIATE_TEST_SUITE_P(Each, NetworkFaults, testing::ValuesIn(faults),
+                         [](const auto& fault) { return std::string(fault.param.name); });
+
+TEST_F(Network, DevicesAreRefreshedAtTheSameTimeOverFewConnections) {
+    const auto infos = clients->getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicyRefresh, false);
+    ASSERT_EQ(infos->size(), 3u);
+    for (const auto& info : *infos) EXPECT_TRUE(info->warranty());
+    const Value counters = server->ask("GET", "/counters");
+    EXPECT_EQ(counters["requestsByEndpoint"], codec::parseJson(R"({"coverage": 3, "server-version": 3})").value());
+    // One was there from before.
+    EXPECT_LE(*counters["connections"].asInteger(), 2);
+    EXPECT_GE(*counters["requestsOnReusedConnections"].asInteger(), 4);
+}
+
+TEST_F(Network, RequestsForOneDeviceAtTheSameTimeAreADownloadEach) {
+    server->ask("POST", "/faults", "coverage:delay=200ms");
+    std::array<std::promise<std::shared_ptr<VRXDeviceInfo>>, 2> replies;
+    for (auto& reply : replies)
+        clients->getDeviceInfoForSerialNumber(
+            "VRXWATCH0001", VRXWarrantyLookupPolicyDefault,
+            [&reply](std::shared_ptr<VRXDeviceInfo> info) { reply.set_value(std::move(info)); });
+    for (auto& reply : replies) EXPECT_TRUE(reply.get_future().get()->warranty());
+    EXPECT_EQ(server->ask("GET", "/counters")["requestsByEndpoint"]["coverage"], Value(2));
+}
+
+}  // namespace
+}  // namespace vrx::end_to_end
