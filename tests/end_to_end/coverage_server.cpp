@@ -17,7 +17,8 @@ using platform::Value;
 CoverageServer::CoverageServer(const std::string& folder, const Arguments& arguments) {
     std::array<int, 2> ends{};
     EXPECT_EQ(pipe2(ends.data(), O_CLOEXEC), 0);
-    process_.emplace(folder, VRX_PROGRAMS "/vrx-coverage-server", arguments, Arguments{}, ends[1]);
+    process_.emplace(folder, VRX_PROGRAMS "/vrx-coverage-server", arguments, Arguments{},
+                     Process::Handed{.output = ends[1], .listeningSocket = -1});
     close(ends[1]);
     std::FILE* output = fdopen(ends[0], "r");
     std::array<char, 200> line{}, address{};

@@ -121,7 +121,7 @@ private:
                         {.http = {.longestTimeout = timeLimit}, .credentialHelper = timeLimit});
         EXPECT_FALSE(host.open(host::HomeUse::Agent));
         host::BundleLookup bundles([&] { return host.profile().facts(); });
-        host::ServiceListenerFactory factory(host.mainLoop().event(), bundles);
+        host::ServiceListenerFactory factory(host.mainLoop().event(), bundles, host.lifecycle());
         EXPECT_FALSE(factory.open(place / "socket"));
         host.setBundleLookup(&bundles);
         host.setServiceListenerFactory(&factory);
