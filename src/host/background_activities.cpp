@@ -12,12 +12,12 @@ namespace vrx::host {
 using platform::ActivityHandler;
 using platform::BackgroundActivityResult;
 using platform::Duration;
+using platform::Error;
 using platform::FiringDecision;
 using platform::Level;
 using platform::log;
 using platform::MaybeError;
 using platform::Moment;
-using platform::Result;
 
 namespace {
 
@@ -66,15 +66,7 @@ void scheduleOwn(Connection& connection, const std::string& agentVersion, const 
 void BackgroundActivities::start(std::string agentVersion) {
     agentVersion_ = std::move(agentVersion);
     isStarted_ = true;
-    around_.conditions.start({.wake = [this] { reconsider(); },
-                              .wallClockSet =
-                                  [this] {
-                                      store([now = around_.conditions.now()](Connection& connection) {
-                                          ActivityRegistry registry(connection);
-                                          carryOverAll(registry, now);
-                                      });
-                                      reconsider();
-                                  }});
+    around_.conditions.start({.wake = [this] { reconsider(); }, .wallClockSet = [this] { carryOver(); }});
     reconsider();
 }
 
@@ -115,11 +107,25 @@ void BackgroundActivities::reconsider() {
         around_.conditions.wakeAt(around_.conditions.now().sinceBoot + retryAfterFailure, false);
 }
 
-// Logs the first of several failures.
-bool BackgroundActivities::isDone(const MaybeError& error) {
-    if (isFailing_.exchange(error.has_value()) || !error) return !error;
-    log(Level::Error, "No background activity is fired until this works: %@", error->text);
+void BackgroundActivities::carryOver() {
+    store([now = around_.conditions.now()](Connection& connection) {
+        ActivityRegistry registry(connection);
+        carryOverAll(registry, now);
+    });
+    reconsider();
+}
+
+// Gives false, and logs the first of several failures.
+bool BackgroundActivities::failed(const Error& error) {
+    if (!isFailing_.exchange(true))
+        log(Level::Error, "No background activity is fired until this works: %@", error.text);
     return false;
+}
+
+bool BackgroundActivities::write(const Change& change) {
+    if (const MaybeError error = around_.database.write(change)) return failed(*error);
+    isFailing_ = false;
+    return true;
 }
 
 // Stores the change after the earlier ones. False when it is kept for later.
@@ -130,14 +136,15 @@ bool BackgroundActivities::store(Change change) {
 }
 
 bool BackgroundActivities::storeUnsaved() {
-    const bool isStored = isDone(around_.database.write([this](Connection& connection) {
+    const bool isStored = write([this](Connection& connection) {
         for (const Change& change : unsaved_) change(connection);
-    }));
-    if (isStored) unsaved_.clear();
-    if (isStored)
+    });
+    if (isStored) {
+        unsaved_.clear();
         unsavedWork_.reset();
-    else if (!unsavedWork_)
+    } else if (!unsavedWork_) {
         unsavedWork_ = around_.lifecycle.beginWork();
+    }
     return isStored;
 }
 
@@ -148,8 +155,9 @@ bool BackgroundActivities::takeUpIfReplaced() {
         if (!unsaved_.empty() && !storeUnsaved()) return false;
     }
     std::uint64_t opening = 0;
-    if (!isDone(around_.database.peek([&](Connection&, const Database::Stamp& stamp) { opening = stamp.opening; })))
-        return false;
+    const MaybeError error =
+        around_.database.peek([&](Connection&, const Database::Stamp& stamp) { opening = stamp.opening; });
+    if (error) return failed(*error);
     if (std::exchange(takenUp_, opening) == opening) return true;
     std::set<std::string, std::less<>> running;
     {
@@ -170,7 +178,7 @@ bool BackgroundActivities::fireDue() {
     std::vector<ScheduledActivity> activities;
     const MaybeError error =
         around_.database.read([&](Connection& connection) { activities = ActivityRegistry(connection).scheduled(); });
-    if (error) return false;
+    if (error) return failed(*error);
 
     const Moment now = conditions.now();
     std::optional<Duration> next;
@@ -194,8 +202,9 @@ bool BackgroundActivities::fireDue() {
 
 bool BackgroundActivities::answerRequests() {
     std::vector<FiringRequest> requests;
-    if (!isDone(around_.database.read([&](Connection& connection) { requests = openRequests(connection); })))
-        return false;
+    const MaybeError error =
+        around_.database.read([&](Connection& connection) { requests = openRequests(connection); });
+    if (error) return failed(*error);
     for (const FiringRequest& request : requests) {
         const FiringAnswer answer = fireRequested(request.identifier);
         if (!store([number = request.number, answer](Connection& connection) {
@@ -212,12 +221,12 @@ FiringAnswer BackgroundActivities::fireRequested(const std::string& identifier) 
     const ActivityHandler handler = handlerFor(identifier);
     if (!handler) return FiringAnswer::Unknown;
     std::optional<ScheduledActivity> activity;
-    const bool isFound = isDone(around_.database.write([&](Connection& connection) {
+    const bool isFound = write([&](Connection& connection) {
         ActivityRegistry registry(connection);
         if (!registry.scheduled(identifier))
             registry.schedule(identifier, {}, dueAfter(Duration(0), around_.conditions.now()));
         activity = registry.scheduled(identifier);
-    }));
+    });
     return isFound && fire(*activity, handler) ? FiringAnswer::Fired : FiringAnswer::NotStored;
 }
 
@@ -225,12 +234,12 @@ FiringAnswer BackgroundActivities::fireRequested(const std::string& identifier) 
 bool BackgroundActivities::fire(const ScheduledActivity& activity, const ActivityHandler& handler) {
     const Run run{activity.identifier, activity.generation};
     bool isPresent = false;
-    const bool isStored = isDone(around_.database.write([&](Connection& connection) {
+    const bool isStored = write([&](Connection& connection) {
         ActivityRegistry registry(connection);
         const std::optional<ScheduledActivity> present = registry.scheduled(run.identifier);
         isPresent = present && present->generation == run.generation;
         if (isPresent) registry.beginRun(run.identifier, run.generation, around_.conditions.now().wall);
-    }));
+    });
     if (!isStored) return false;
     if (!isPresent) return true;  // it has just been registered anew, and will be looked at
     {

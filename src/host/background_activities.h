@@ -57,10 +57,12 @@ private:
         std::int64_t generation;
     };
 
-    bool isDone(const platform::MaybeError& error);
+    bool failed(const platform::Error& error);
+    bool write(const Change& change);
     bool store(Change change);
     bool storeUnsaved();
     bool takeUpIfReplaced();
+    void carryOver();
     bool answerRequests();
     bool fireDue();
     FiringAnswer fireRequested(const std::string& identifier);
