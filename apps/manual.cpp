@@ -82,7 +82,7 @@ std::string synopsis(const CLI::App& app) {
 }
 
 std::string manPage(const CLI::App& app) {
-    const std::string name = app.get_name();
+    const std::string& name = app.get_name();
     const bool hasVerbs = !verbsOf(app).empty();
     std::string text = ".TH " + replaced(name, {{'-', "\\-"}}) + " 1 \"\" \"vrxagent " VRX_VERSION "\"\n";
     text += ".SH NAME\n" + roff(name) + " \\- " + roff(app.get_description()) + "\n";
