@@ -2,11 +2,16 @@
 #include <gtest/gtest.h>
 
 #include <atomic>
+#include <future>
 #include <latch>
+#include <thread>
 
 #include "coverage/warranty.h"
 #include "devices/device_info.h"
+#include "followup/follow_up.h"
 #include "host/host.h"
+#include "scheduling/outreach_activity.h"
+#include "scheduling/scheduler.h"
 #include "service/agent.h"
 #include "service/register_defaults.h"
 #include "support.h"
@@ -14,25 +19,34 @@
 namespace vrx::host {
 namespace {
 
-TEST(Agents, AnswerOverlappingAllDevicesRequests) {
-    TemporaryFolder folder;
-    const HostLocations locations{folder / "home", folder / "device.toml"};
-    writeFile(locations.profile,
-              "[device]\nserial_number = 'PHONE'\n[account]\nidentifier = 'user'\n[features.Vireo]\nMeridian_3_0 "
-              "= true\n"
-              "[[watches]]\nname = 'One'\nserial_number = 'W1'\npaired = true\n"
-              "[[watches]]\nname = 'Two'\nserial_number = 'W2'\npaired = true\n");
-    writeFile(folder / "Warranty.plist", "<plist version='1.0'><dict><key>covered</key><true/></dict></plist>");
-    writeFile(folder / "versions.plist",
-              "<plist version='1.0'><dict><key>LowServerVersion</key><integer>2</integer><key>HighServerVersion</key>"
-              "<integer>3</integer></dict></plist>");
-    Host host(locations, platform::Level::Error);
-    ASSERT_FALSE(host.open(HomeUse::Agent));
-    auto& defaults = platform::Platform::current().defaultsStore();
-    vrx_registerDefaults(defaults);
-    defaults.set("WarrantyURL", "file://" + folder / "Warranty.plist");
-    defaults.set("ServerVersionURL", "file://" + folder / "versions.plist");
+// A device with two watches, whose records come from files.
+class Agents : public ::testing::Test {
+protected:
+    void SetUp() override {
+        writeFile(folder_ / "device.toml",
+                  "[device]\nserial_number = 'PHONE'\n[account]\nidentifier = 'user'\n[features.Vireo]\nMeridian_3_0 "
+                  "= true\n[locale]\ntime_zone = 'UTC'\n"
+                  "[[watches]]\nname = 'One'\nserial_number = 'W1'\npaired = true\n"
+                  "[[watches]]\nname = 'Two'\nserial_number = 'W2'\npaired = true\n");
+        writeRecord("Warranty.plist", "<key>covered</key><true/>");
+        writeRecord("versions.plist",
+                    "<key>LowServerVersion</key><integer>2</integer><key>HighServerVersion</key><integer>3</integer>");
+        ASSERT_FALSE(host_.open(HomeUse::Agent));
+        vrx_registerDefaults(defaults());
+        defaults().set("WarrantyURL", "file://" + folder_ / "Warranty.plist");
+        defaults().set("ServerVersionURL", "file://" + folder_ / "versions.plist");
+    }
+    void writeRecord(const std::string& name, const std::string& entries) const {
+        writeFile(folder_ / name, "<plist version='1.0'><dict>" + entries + "</dict></plist>");
+    }
+    static platform::DefaultsStore& defaults() { return platform::Platform::current().defaultsStore(); }
 
+private:
+    TemporaryFolder folder_;
+    Host host_{{.home = folder_ / "home", .profile = folder_ / "device.toml"}, platform::Level::Error};
+};
+
+TEST_F(Agents, AnswerOverlappingAllDevicesRequests) {
     constexpr int rounds = 10;
     const std::shared_ptr<VRXAgent> agents[] = {VRXAgent::initWithCallingProcessBundleID("one"),
                                                 VRXAgent::initWithCallingProcessBundleID("two")};
@@ -47,6 +61,47 @@ TEST(Agents, AnswerOverlappingAllDevicesRequests) {
                 });
     replies.wait();
     EXPECT_EQ(records, rounds * 2 * 2 * 3);
+}
+
+TEST_F(Agents, FindTheEarliestOfDatesThatComeAtOnce) {
+    const std::pair<const char*, const char*> dates[] = {
+        {"PHONE", "3000000000"}, {"W1", "2900000000"}, {"W2", "2950000000"}};
+    for (const auto& [serialNumber, date] : dates)
+        writeRecord(std::string("Warranty.") + serialNumber + ".plist",
+                    std::string("<key>featureToggleParameters</key><dict><key>qxOfferDisplay</key><true/></dict>"
+                                "<key>qxOfferFollowupDisplayDate</key><integer>") +
+                        date + "</integer>");
+    constexpr const char* targetDate = "com.orvane.vrxagent.followuppost.TargetDate";
+    for (int round = 0; round < 20; ++round) {
+        defaults().remove(targetDate);
+        auto outreach = std::make_shared<VRXOutreachActivity>(ActivityCollaborators{});
+        std::promise<platform::BackgroundActivityResult> result;
+        outreach->performActivityForScheduler(VRXScheduler::newSchedulerWithActivityDelegate(outreach),
+                                              [&](auto given) { result.set_value(given); });
+        ASSERT_EQ(result.get_future().get(), platform::BackgroundActivityResult::Finished);
+        ASSERT_EQ(defaults().date(targetDate), platform::dateFromEpoch(2900000000));
+    }
+}
+
+TEST_F(Agents, RememberPostsAndDismissalsThatComeAtOnce) {
+    constexpr std::size_t devices = 10;
+    auto serialNumber = [](std::size_t device) { return "DEVICE" + std::to_string(device); };
+    const auto offer = VRXWarranty::warrantyWithDictionary(
+        platform::Dictionary{{"featureToggleParameters", platform::Dictionary{{"qxOfferDisplay", true}}}});
+    auto forAll = [&](auto act) {
+        return std::thread([act] {
+            for (std::size_t device = 0; device < devices; ++device) act(device);
+        });
+    };
+    auto post = [&](std::size_t device) {
+        VRXFollowUp().postFollowUpWithDeviceInfo(VRXDeviceInfo::deviceInfoWithDevice(
+            VRXDevice::deviceWithName("Device", serialNumber(device), std::nullopt, VRXDeviceTypeWatch), offer));
+    };
+    auto dismiss = [&](std::size_t device) { VRXFollowUp().dismissFollowUpForSerialNumber(serialNumber(device)); };
+    std::thread threads[] = {forAll(post), forAll(post), forAll(dismiss), forAll(dismiss)};
+    for (std::thread& thread : threads) thread.join();
+    EXPECT_EQ(defaults().get("FollowupPostedSerialNumberHashes").asArray()->size(), devices);
+    EXPECT_EQ(defaults().get("FollowupDismissedSerialNumberHashes").asArray()->size(), 2 * devices);
 }
 
 }  // namespace
