@@ -146,7 +146,7 @@ TEST_F(Explanations, TellWhyAFollowUpIsNotThere) {
     std::filesystem::copy(VRX_SOURCE "/examples/device.toml", place_ / "device.toml",
                           std::filesystem::copy_options::overwrite_existing);
     ASSERT_EQ(place_.vrxctl({"dismiss", phone}).code, 0);
-    ASSERT_EQ(place_.stop(), 0);
+    ASSERT_EQ(place_.stop(), 0) << place_.agent().errors();
     const Dictionary before = homeContents();
     expectWhy("dismissed", "dismissed");
     EXPECT_EQ(homeContents(), before);
@@ -161,7 +161,7 @@ TEST_F(Explanations, FireWhatTheTargetDateLets) {
     EXPECT_EQ(activity("outreach")["targetDate"], outreach["targetDate"]);
     EXPECT_EQ(host({"fire", "nothing"}).document["error"]["kind"], Value("unknown-activity"));
 
-    ASSERT_EQ(place_.stop(), 0);
+    ASSERT_EQ(place_.stop(), 0) << place_.agent().errors();
     const Dictionary before = homeContents();
     EXPECT_EQ(host({"fire", "outreach"}).code, 3);
     EXPECT_EQ(host({"activities"}).document["agentRunning"], Value(false));
@@ -201,7 +201,7 @@ TEST_F(Explanations, FindWhatIsWrongAndWriteNothing) {
     std::filesystem::remove(place_ / "coverage/ServerVersion.plist");
     expectFirstProblem(1, "server version");
 
-    ASSERT_EQ(place_.stop(), 0);
+    ASSERT_EQ(place_.stop(), 0) << place_.agent().errors();
     expectFirstProblem(3, "agent");
     place_.write("home/host.db", std::string(8192, 'x'));
     expectFirstProblem(3, "database");
