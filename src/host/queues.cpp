@@ -144,9 +144,32 @@ public:
     }
 
 private:
+    // The queue's turn on a worker. One that the pool discards at its end, unrun, lets the tasks go: they may hold what
+    // holds the queue.
+    class Turn {
+    public:
+        explicit Turn(std::shared_ptr<SerialQueue> queue) : queue_(std::move(queue)) {}
+        Turn(Turn&&) noexcept = default;
+        ~Turn() {
+            if (queue_) queue_->discardAll();
+        }
+        void operator()() { std::exchange(queue_, nullptr)->runAll(); }
+
+    private:
+        std::shared_ptr<SerialQueue> queue_;
+    };
+
     void schedule() {
-        if (std::shared_ptr<WorkerPool> pool = pool_.lock())
-            pool->post(Priority::UserInitiated, [self = shared_from_this()] { self->runAll(); });
+        Turn turn(shared_from_this());
+        if (std::shared_ptr<WorkerPool> pool = pool_.lock()) pool->post(Priority::UserInitiated, std::move(turn));
+    }
+
+    void discardAll() {
+        platform::ShutdownScope shutdown;
+        std::deque<Task> discarded;  // goes outside the lock: what it holds may post here
+        std::lock_guard lock(mutex_);
+        discarded.swap(tasks_);
+        isRunning_ = false;
     }
 
     void runAll() {

@@ -113,6 +113,16 @@ TEST_F(HostQueues, ASerialQueueRunsInOrderAndOneAtATimeAndLivesUntilItsWorkIsDon
     EXPECT_TRUE(std::is_sorted(order.begin(), order.end()));
 }
 
+// A task may hold what holds its queue.
+TEST_F(HostQueues, ASerialQueueKeepsNothingBeyondTheEndOfTheWorkers) {
+    auto held = std::make_shared<int>();
+    auto queue = queues.makeSerialQueue("serial");
+    queues.stop();
+    for (int i = 0; i < 2; ++i) queue->post([queue, held] {});
+    queue.reset();
+    EXPECT_EQ(held.use_count(), 1);
+}
+
 TEST_F(HostQueues, TheMainQueueRunsPostsInOrderAndTimersByTheirTimeNeverEarly) {
     std::vector<std::string> order;
     const auto begin = std::chrono::steady_clock::now();
