@@ -32,7 +32,7 @@ NextStep nextConsideration(const Circumstances& device) {
 }
 
 std::string endOfOffer(const Circumstances& device) {
-    return device.eligibleUntil ? "the offer has ended" : "the record says of no end of the offer";
+    return device.eligibleUntil ? "the offer has ended" : "the record names no end of the offer";
 }
 
 Explanation explainShown(const Circumstances& device) {
