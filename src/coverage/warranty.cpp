@@ -30,21 +30,6 @@ constexpr std::string_view dictionaryRepresentationKey = "DictionaryRepresentati
 
 // Reading a value as each rule has it; what a rule does not expect, a null among it, reads as absent.
 
-bool flagFromText(std::string_view text) {
-    text.remove_prefix(std::min(text.find_first_not_of(" \t\n\v\f\r"), text.size()));
-    if (text.starts_with('+') || text.starts_with('-')) text.remove_prefix(1);
-    text.remove_prefix(std::min(text.find_first_not_of('0'), text.size()));
-    constexpr std::string_view yes = "YyTt123456789";
-    return !text.empty() && yes.find(text.front()) != std::string_view::npos;
-}
-
-bool flagFrom(const Value& value) {
-    if (const std::string* text = value.asString()) return flagFromText(*text);
-    if (auto flag = value.asBool()) return *flag;
-    auto number = value.asNumber();
-    return number && *number != 0;
-}
-
 Duration daysFrom(const Value& value) {
     double seconds = platform::numberFromValue(value) * secondsOfDay;
     return Duration(std::isfinite(seconds) ? seconds : 0);
@@ -155,7 +140,7 @@ constexpr auto rows = std::to_array<Row>({
 // clang-format on
 
 void read(const Value& value, bool& field) {
-    field = flagFrom(value);
+    field = platform::flagFromValue(value);
 }
 void read(const Value& value, std::optional<Date>& field) {
     field = VRXWarranty::_dateWithEpochNumber(value);

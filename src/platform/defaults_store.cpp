@@ -12,6 +12,10 @@ double DefaultsStore::number(std::string_view key) const {
     return numberFromValue(get(key));
 }
 
+bool DefaultsStore::boolean(std::string_view key) const {
+    return flagFromValue(get(key));
+}
+
 std::optional<std::string> DefaultsStore::string(std::string_view key) const {
     Value value = get(key);
     const std::string* text = value.asString();

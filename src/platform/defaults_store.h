@@ -32,10 +32,11 @@ public:
 
     void remove(std::string_view key) { set(key, nullptr); }
 
-    // Typed reads: a number as such or out of a string's leading digits, else 0; any other type than the one asked for
-    // is nothing.
+    // Typed reads: a number as such or out of a string's leading digits, else 0; a flag as number_text.h has it; any
+    // other type than the one asked for is nothing.
     std::int64_t integer(std::string_view key) const;
     double number(std::string_view key) const;
+    bool boolean(std::string_view key) const;
     std::optional<std::string> string(std::string_view key) const;
     std::optional<Date> date(std::string_view key) const;
     // Null when the value is no dictionary.

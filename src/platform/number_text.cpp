@@ -64,6 +64,19 @@ std::int64_t clampedInteger(double value) {
     return static_cast<std::int64_t>(value);
 }
 
+bool leadingFlag(std::string_view text) {
+    text.remove_prefix(std::min(text.find_first_not_of(" \t\n\v\f\r"), text.size()));
+    if (text.starts_with('+') || text.starts_with('-')) text.remove_prefix(1);
+    text.remove_prefix(std::min(text.find_first_not_of('0'), text.size()));
+    constexpr std::string_view yes = "YyTt123456789";
+    return !text.empty() && yes.find(text.front()) != std::string_view::npos;
+}
+
+bool flagFromValue(const Value& value) {
+    if (const std::string* text = value.asString()) return leadingFlag(*text);
+    return numberFromValue(value) != 0;
+}
+
 double numberFromValue(const Value& value) {
     if (auto number = value.asNumber()) return *number;
     if (auto flag = value.asBool()) return *flag ? 1 : 0;

@@ -1,4 +1,4 @@
-// Numbers out of the beginning of a text, as property values read them. Independent of the locale.
+// Numbers and flags out of the beginning of a text, as property values read them. Independent of the locale.
 #pragma once
 
 #include <cstdint>
@@ -12,11 +12,15 @@ namespace vrx::platform {
 // becomes the nearest value.
 double leadingDecimal(std::string_view text);
 std::int64_t leadingInteger(std::string_view text);
+// Whether the text says yes: after leading blanks, a sign and zeros it begins with Y, y, T, t or a digit from 1 to 9.
+bool leadingFlag(std::string_view text);
 
 // A value as a number: a number by its value, true as 1, a string by what it begins with, anything else 0. The integer
 // reading cuts off a fraction and keeps to the range of int64; what is not a number at all (NaN) is 0.
 double numberFromValue(const Value& value);
 std::int64_t integerFromValue(const Value& value);
+// A value as a flag: a boolean as such, a number unless it is 0, a string by what it begins with, anything else false.
+bool flagFromValue(const Value& value);
 
 // A double cut to an integer, kept within the integer's range; NaN is 0.
 std::int64_t clampedInteger(double value);

@@ -26,7 +26,7 @@ constexpr std::string_view activationDateKey = "DefaultDeviceActivationDate";
 constexpr std::string_view outreachDelayKey = "PostUpgradeOutreachDelay";
 
 bool isUpgradeCompleted() {
-    return Platform::current().defaultsStore().integer(upgradeCompletedKey) != 0;
+    return Platform::current().defaultsStore().boolean(upgradeCompletedKey);
 }
 
 void rescheduleIfNotComplete(std::shared_ptr<VRXSchedulerActivityDelegate> activity) {

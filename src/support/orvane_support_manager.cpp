@@ -42,13 +42,6 @@ constexpr int offered = 3;
 constexpr std::string_view overrideSetting = "AppSupportAvailability";
 constexpr platform::Duration purchaseWait{5.0};
 
-// Settings read as booleans: a boolean, a number other than 0.
-bool isOverridden() {
-    const Value setting = Platform::current().defaultsStore().get(overrideSetting);
-    if (std::optional<bool> flag = setting.asBool()) return *flag;
-    return setting.asNumber().value_or(0) != 0;
-}
-
 // The address as the store's own campaign is to see it, appended as it stands even behind a query.
 std::string withCampaign(const std::optional<std::string>& address) {
     return address.value_or("").empty() ? std::string() : *address + "?pt=2003&ct=coverage.settings&mt=8";
@@ -120,7 +113,7 @@ private:
 
 void VRXOrvaneSupportManager::checkIsAvailableInStore(std::string bundleIdentifier, Reply reply) {
     log(Level::Default, "Checking for %@ in the Marketplace", bundleIdentifier);
-    if (isOverridden()) return reply(overrideAnswer());
+    if (Platform::current().defaultsStore().boolean(overrideSetting)) return reply(overrideAnswer());
 
     platform::Store& store = Platform::current().store();
     const platform::StoreProfile profile = store.lookupProfile();
