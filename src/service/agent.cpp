@@ -1,5 +1,6 @@
 #include "service/agent.h"
 
+#include <mutex>
 #include <utility>
 
 #include "coverage/warranty.h"
@@ -189,26 +190,6 @@ void VRXAgent::dismissFollowUpForSerialNumber(std::string serialNumber, Reply<bo
 
 void VRXAgent::getWarrantyUsingPolicy(VRXWarrantyLookupPolicy policy, WarrantyReply reply) {
     getWarrantyUsingPolicy(policy, deviceProvider()->defaultDevice()->serialNumber(), std::move(reply));
-}
-
-std::shared_ptr<VRXAgentWarrantyProvider> VRXAgent::warrantyProvider() const {
-    std::lock_guard lock(providersMutex_);
-    return warrantyProvider_;
-}
-
-void VRXAgent::setWarrantyProvider(std::shared_ptr<VRXAgentWarrantyProvider> provider) {
-    std::lock_guard lock(providersMutex_);
-    warrantyProvider_.swap(provider);
-}
-
-std::shared_ptr<VRXAgentDeviceProvider> VRXAgent::deviceProvider() const {
-    std::lock_guard lock(providersMutex_);
-    return deviceProvider_;
-}
-
-void VRXAgent::setDeviceProvider(std::shared_ptr<VRXAgentDeviceProvider> provider) {
-    std::lock_guard lock(providersMutex_);
-    deviceProvider_.swap(provider);
 }
 
 }  // namespace vrx
