@@ -23,7 +23,6 @@ using platform::Platform;
 namespace {
 
 constexpr std::string_view upgradeCompletedKey = "PostUpgradeActivityCompleted";
-constexpr std::string_view activationDateKey = "DefaultDeviceActivationDate";
 
 bool isUpgradeCompleted() {
     return Platform::current().defaultsStore().boolean(upgradeCompletedKey);
@@ -58,7 +57,7 @@ void VRXPostUpgradeActivity::performActivityForScheduler(const std::shared_ptr<V
 void VRXPostUpgradeActivity::performUpgrade() const {
     DefaultsStore& defaults = Platform::current().defaultsStore();
     VRXScheduler::clearScheduledActivities();
-    defaults.set(activationDateKey, Platform::current().clock().now());
+    defaults.set(platform::settings::defaultDeviceActivationDate, Platform::current().clock().now());
     VRXScheduler::newSchedulerWithActivityDelegate(std::make_shared<VRXOutreachActivity>(collaborators_))
         ->scheduleActivityWithDelay(Duration(defaults.number(platform::settings::postUpgradeOutreachDelay)));
     defaults.set(upgradeCompletedKey, true);

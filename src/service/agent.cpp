@@ -11,6 +11,7 @@
 #include "platform/defaults_store.h"
 #include "platform/log.h"
 #include "platform/platform.h"
+#include "platform/settings_keys.h"
 #include "platform/vendor.h"
 #include "serverversion/server_version_utilities.h"
 #include "service/default_warranty_provider.h"
@@ -26,7 +27,8 @@ namespace {
 constexpr platform::Duration outreachDelay{1.0};
 
 // The tables by which testers let one serial number stand for another, the first that knows it.
-constexpr std::string_view overrideTables[] = {"PairedWatchesSerialNumbers", "PairedBluetoothDevicesSerialNumbers"};
+constexpr std::string_view overrideTables[] = {platform::settings::pairedWatchesSerialNumbers,
+                                               "PairedBluetoothDevicesSerialNumbers"};
 
 std::string withOverride(std::string serialNumber) {
     for (std::string_view table : overrideTables) {
