@@ -11,6 +11,7 @@
 #include "coverage_server/control_service.h"
 #include "coverage_server/coverage_service.h"
 #include "coverage_server/http_server.h"
+#include "manual.h"
 
 using namespace vrx::coverage_server;
 
@@ -79,6 +80,7 @@ std::optional<int> parse(int argc, char** argv, Options& options) {
                  "vrx-coverage-server");
     app.footer(footer());
     app.set_version_flag("--version", VRX_VERSION);
+    vrx::apps::addManualOption(app);
     const CLI::Range ports(0, 65535);
     ServerVersionSettings& serverVersion = options.service.serverVersion;
     bool noEtag = false, noLastModified = false, noConditional = false;
