@@ -114,7 +114,7 @@ const std::vector<FaultKindInfo>& faultKinds() {
     static const std::vector<FaultKindInfo> kinds = {
         {Status, "status", FaultValue::Status, "none", false, false, "answers with this status and a JSON reason"},
         {Delay, "delay", FaultValue::Duration, "none", true, true, "waits first; the next fault applies as well"},
-        {Hold, "hold", FaultValue::None, "", true, false, "waits until the fault is removed; the same"},
+        {Hold, "hold", FaultValue::None, "", true, false, "the same, until the fault is removed"},
         {Drop, "drop", FaultValue::None, "", true, false, "sends head and half of the body, then ends the connection"},
         {Reset, "reset", FaultValue::None, "", false, true, "resets the connection instead of answering"},
         {Close, "close", FaultValue::None, "", false, true, "closes the connection instead of answering"},

@@ -89,7 +89,7 @@ public:
     // In the order in which they were added: every delay and hold that applies, and the first other fault that does. A
     // fault counts a request as passed, or as its own, only when no earlier one of these others has taken it.
     FaultPlan take(Endpoint endpoint);
-    // Whether a fault that the plan waits for is there yet.
+    // Whether a fault that the plan waits for is still there.
     bool holds(const FaultPlan& plan) const;
     Json json() const;  // an id and a description each
 
