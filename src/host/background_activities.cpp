@@ -72,15 +72,17 @@ void BackgroundActivities::start(std::string agentVersion) {
 
 void BackgroundActivities::schedule(const platform::ActivityRegistration& registration, ActivityHandler handler) {
     const std::string& identifier = registration.identifier;
-    bool isByOwnRun = false;
     {
         std::lock_guard lock(mutex_);
         handlers_[identifier].swap(handler);  // the earlier one goes outside the lock: it may hold what comes here
-        isByOwnRun = running_.contains(identifier);
+        if (!registration.isPreregistered) {
+            registeredByOwnRun_.erase(identifier);
+            if (registration.isByOwnRun && running_.contains(identifier)) registeredByOwnRun_.insert(identifier);
+        }
     }
     if (!registration.isPreregistered) {
         const platform::ActivityCriteria criteria = registration.criteria.value_or(platform::ActivityCriteria{});
-        const Duration interval = isByOwnRun ? around_.conditions.minimumInterval() : Duration(0);
+        const Duration interval = registration.isByOwnRun ? around_.conditions.minimumInterval() : Duration(0);
         const platform::DueTime due = dueTime(criteria, interval, around_.conditions.now());
         store([identifier, criteria, due](Connection& connection) {
             ActivityRegistry(connection).schedule(identifier, criteria, due);
@@ -180,11 +182,17 @@ bool BackgroundActivities::fireDue() {
         around_.database.read([&](Connection& connection) { activities = ActivityRegistry(connection).scheduled(); });
     if (error) return failed(*error);
 
+    // The boot activity takes up what was scheduled before the boot, in its own way: until it has, that is held.
+    const std::string boot = platform::vendorIdentifier(platform::bootActivityRemainder);
+    const std::string upgrade = platform::vendorIdentifier(platform::upgradeActivityRemainder);
+    std::ranges::stable_partition(activities, [&](const auto& activity) { return activity.identifier == boot; });
+
     const Moment now = conditions.now();
     std::optional<Duration> next;
     bool isWaitingForNetwork = false;
     for (const ScheduledActivity& activity : activities) {
-        if (isRunning(activity.identifier)) continue;  // its end comes here again
+        const bool isHeld = isRunning(boot) && activity.identifier != upgrade;
+        if (isHeld || isRunning(activity.identifier)) continue;  // the end of that run comes here again
         const bool isDue = timeLeft(activity.due, now) == Duration(0);
         const FiringDecision decision =
             decideFiring(activity.due, activity.criteria, now,
@@ -254,13 +262,17 @@ bool BackgroundActivities::fire(const ScheduledActivity& activity, const Activit
 
 void BackgroundActivities::end(const Run& run, BackgroundActivityResult result) {
     const bool isFinished = result == BackgroundActivityResult::Finished;
-    const Duration interval = around_.conditions.minimumInterval();
+    Duration interval{0};
+    {
+        std::lock_guard lock(mutex_);
+        if (registeredByOwnRun_.erase(run.identifier) > 0) interval = around_.conditions.minimumInterval();
+    }
     store([run, isFinished, interval, now = around_.conditions.now()](Connection& connection) {
         ActivityRegistry registry(connection);
         registry.endRun(run.identifier, isFinished ? RunOutcome::Finished : RunOutcome::Deferred, now.wall);
         const std::optional<ScheduledActivity> activity = registry.scheduled(run.identifier);
         if (!activity) return;
-        if (activity->generation != run.generation)  // registered by the run
+        if (activity->generation != run.generation)  // registered during the run
             return registry.postpone(activity->generation, noSoonerThan(activity->due, interval, now), 0);
         if (isFinished) return registry.remove(run.generation);
         const int deferrals = activity->deferrals + 1;

@@ -82,6 +82,7 @@ private:
     std::map<std::string, platform::ActivityHandler, std::less<>> handlers_;
     std::function<platform::ActivityHandler(const std::string&)> factory_;
     std::set<std::string, std::less<>> running_;
+    std::set<std::string, std::less<>> registeredByOwnRun_;  // of those running
 
     std::atomic<bool> isFailing_ = false;  // the database, since it was last logged
     std::mutex storing_;                   // taken before the database

@@ -44,7 +44,7 @@ inline constexpr Duration firingMargin{1.0};
 // costs a run now and then, not a processor.
 inline constexpr Duration minimumInterval{15.0 * 60};
 
-// When a registration falls due. The interval is 0 for one that no run of the same activity makes.
+// When a registration falls due. The interval is 0 for one that no run of the activity itself makes.
 DueTime dueTime(const ActivityCriteria& criteria, Duration interval, const Moment& now);
 
 // From an activity's result to the next attempt, after so many deferred results in a row: soon at first, hourly at

@@ -45,6 +45,9 @@ struct ActivityRegistration {
     bool repeats = false;
     QualityOfService qualityOfService = QualityOfService::Default;
     std::optional<ActivityCriteria> criteria{};
+    // A run of the activity registers it for its next one. So that a rule that gives "at once" over and over is no hot
+    // loop, that comes no sooner than activity_timing.h's minimum interval after the run.
+    bool isByOwnRun = false;
 };
 
 // The system's registry of activities. Any thread may use it.
@@ -70,6 +73,7 @@ public:
     const std::string& identifier() const { return registration_.identifier; }
     void setPreregistered(bool isPreregistered) { registration_.isPreregistered = isPreregistered; }
     void setRepeats(bool repeats) { registration_.repeats = repeats; }
+    void setRegisteredByOwnRun(bool isByOwnRun) { registration_.isByOwnRun = isByOwnRun; }
     void setQualityOfService(QualityOfService quality) { registration_.qualityOfService = quality; }
     void setAdditionalActivityCriteria(const ActivityCriteria& criteria) { registration_.criteria = criteria; }
     // Hands the activity to the system as the attributes say; the system keeps the handler.

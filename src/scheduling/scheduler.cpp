@@ -35,12 +35,14 @@ std::int64_t wholeSeconds(Duration duration) {
     return static_cast<std::int64_t>(std::min(duration.count(), most));
 }
 
-// Takes an activity's result: a finished one has no target date any longer, and in every case the system is told.
-VRXScheduler::CompletionHandler resultHandler(std::string targetDateKey, VRXScheduler::CompletionHandler block) {
-    return [key = std::move(targetDateKey), block = std::move(block)](BackgroundActivityResult result) mutable {
+// Takes the result of a run: a finished one has no target date any longer, and in every case the system is told.
+VRXScheduler::CompletionHandler resultHandler(std::string targetDateKey, VRXScheduler::CompletionHandler block,
+                                              std::shared_ptr<void> run) {
+    return [key = std::move(targetDateKey), block = std::move(block),
+            run = std::move(run)](BackgroundActivityResult result) mutable {
         if (result == BackgroundActivityResult::Finished) Platform::current().defaultsStore().remove(key);
         Platform::current().queues().mainQueue().postAfter(
-            handBackDelay, [result, block = std::move(block)]() mutable { block(result); });
+            handBackDelay, [result, block = std::move(block), run = std::move(run)]() mutable { block(result); });
     };
 }
 
@@ -81,6 +83,7 @@ void VRXScheduler::_scheduleActivityWithDelay(Duration delay, std::optional<Date
     log(Level::Default, "scheduled '%@' with delay: %.02f (%@)", identifier(), delay, date);
     setPreregistered(false);
     setRepeats(false);
+    setRegisteredByOwnRun(activityDelegate()->isRunning());
     setQualityOfService(platform::QualityOfService::Background);
     if (!(delay > Duration(0))) delay = Duration(0);
     setAdditionalActivityCriteria({.delay = wholeSeconds(delay),
@@ -102,10 +105,13 @@ void VRXScheduler::performScheduledOutreachWithBlock(CompletionHandler block) {
     std::optional<Date> date = scheduledActivityDate();
     log(Level::Default, "activity for '%@' should occur on: %@", identifier(), date);
     Duration remaining = date ? *date - Platform::current().clock().now() : Duration(0);
-    CompletionHandler handler = resultHandler(targetDateKey(identifier()), std::move(block));
+    const auto run = std::make_shared<char>();
+    CompletionHandler handler = resultHandler(targetDateKey(identifier()), std::move(block), run);
     if (remaining <= Duration(0)) {
         log(Level::Default, "target reached for '%@', trigger activity", identifier());
-        activityDelegate()->performActivityForScheduler(shared_from_this(), std::move(handler));
+        const std::shared_ptr<VRXSchedulerActivityDelegate> activity = activityDelegate();
+        activity->run_.set(run);
+        activity->performActivityForScheduler(shared_from_this(), std::move(handler));
     } else {
         log(Level::Default, "target not past for '%@', defer for: %.02f", identifier(), remaining);
         handler(BackgroundActivityResult::Deferred);

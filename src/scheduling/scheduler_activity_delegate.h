@@ -5,6 +5,7 @@
 #include <string>
 
 #include "platform/background_activity_scheduler.h"
+#include "platform/property.h"
 #include "platform/task.h"
 
 namespace vrx {
@@ -22,6 +23,14 @@ public:
     // Runs the work, on a thread of the system's, and answers once, on any thread.
     virtual void performActivityForScheduler(const std::shared_ptr<VRXScheduler>& scheduler,
                                              CompletionHandler completionHandler) = 0;
+
+    // Whether a run is under way, from its firing until the system has its result: what schedules the activity by this
+    // object meanwhile is the run itself.
+    bool isRunning() const { return !run_.get().expired(); }
+
+private:
+    friend class VRXScheduler;
+    platform::Property<std::weak_ptr<void>> run_;  // its owner is what hands the result back
 };
 
 }  // namespace vrx

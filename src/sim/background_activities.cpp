@@ -29,7 +29,8 @@ void BackgroundActivities::schedule(const platform::ActivityRegistration& regist
     attachment.handler.swap(handler);  // the old one is let go at the end
     if (!registration.isPreregistered) {
         ActivityCriteria criteria = registration.criteria.value_or(ActivityCriteria());
-        Duration interval = attachment.runningGeneration ? platform::minimumInterval : atOnce;
+        Duration interval = registration.isByOwnRun ? platform::minimumInterval : atOnce;
+        attachment.isRegisteredByOwnRun = registration.isByOwnRun;
         addRow(registration.identifier, criteria, platform::dueTime(criteria, interval, now()));
     }
     considerLater(registration.identifier, atOnce);
@@ -97,10 +98,17 @@ void BackgroundActivities::considerLater(const std::string& identifier, Duration
     lane_->postAfter(delay, [this, identifier] { consider(identifier); });
 }
 
+// Until the boot activity has taken up what was scheduled before the boot.
+bool BackgroundActivities::isHeldForBoot(const std::string& identifier) {
+    const std::string boot = platform::vendorIdentifier(platform::bootActivityRemainder);
+    const std::string upgrade = platform::vendorIdentifier(platform::upgradeActivityRemainder);
+    return identifier != boot && identifier != upgrade && rows_.contains(boot) && attachments_[boot].handler;
+}
+
 // Asked whenever something has changed and when time has come, and also when neither is so any more.
 void BackgroundActivities::consider(const std::string& identifier) {
     auto row = rows_.find(identifier);
-    if (row == rows_.end() || attachments_[identifier].runningGeneration) return;
+    if (row == rows_.end() || attachments_[identifier].runningGeneration || isHeldForBoot(identifier)) return;
     row->second.due = platform::carriedOver(row->second.due, now());  // the wall clock may have been set
     auto decision =
         platform::decideFiring(row->second.due, row->second.criteria, now(), isNetworkAvailable_, shouldDefer_);
@@ -121,17 +129,19 @@ void BackgroundActivities::fire(const std::string& identifier, int generation) {
 }
 
 void BackgroundActivities::takeResult(const std::string& identifier, BackgroundActivityResult result) {
-    const int ranGeneration = *std::exchange(attachments_[identifier].runningGeneration, std::nullopt);
+    Attachment& attachment = attachments_[identifier];
+    const int ranGeneration = *std::exchange(attachment.runningGeneration, std::nullopt);
+    const bool isByOwnRun = std::exchange(attachment.isRegisteredByOwnRun, false);
     auto entry = rows_.find(identifier);
     if (entry == rows_.end()) return;
     Row& row = entry->second;
-    if (row.generation != ranGeneration)  // its own run registered it anew
-        row.due = platform::noSoonerThan(row.due, platform::minimumInterval, now());
+    if (row.generation != ranGeneration)  // registered during the run
+        row.due = platform::noSoonerThan(row.due, isByOwnRun ? platform::minimumInterval : atOnce, now());
     else if (result == BackgroundActivityResult::Finished)
-        return void(rows_.erase(entry));
+        rows_.erase(entry);
     else
         row.due = platform::dueAfter(platform::retryDelay(++row.deferrals), now());
-    considerLater(identifier, atOnce);
+    considerAll();  // others may have been held
 }
 
 }  // namespace vrx::sim

@@ -4,8 +4,9 @@
 //
 // An activity fires a second after its delay at the earliest, once there is network if it needs any; while the system
 // asks for deferral, its grace period is waited for. It is never fired while a run of it has not handed back its
-// result. The system itself fires the upgrade activity at the first start of each version of the agent, and the boot
-// activity once a boot.
+// result, and no sooner than the minimum interval after a run that registered it itself. The system itself fires the
+// upgrade activity at the first start of each version of the agent, and the boot activity once a boot,
+// before all that was scheduled.
 #pragma once
 
 #include <map>
@@ -68,10 +69,12 @@ private:
     struct Attachment {
         platform::ActivityHandler handler;
         std::optional<int> runningGeneration;  // while a run is under way
+        bool isRegisteredByOwnRun = false;     // that is under way
     };
 
     platform::Moment now() const;
     void addRow(const std::string& identifier, const platform::ActivityCriteria& criteria, platform::DueTime due);
+    bool isHeldForBoot(const std::string& identifier);
     void considerAll();
     void considerLater(const std::string& identifier, platform::Duration delay);
     void consider(const std::string& identifier);

@@ -48,8 +48,9 @@ class BackgroundActivitiesContract : public testing::Test {
 protected:
     void SetUp() override { subject.restart(); }
 
-    void schedule(const ActivityCriteria& criteria, const char* handlerName = "") {
-        subject.activities().schedule({.identifier = "a", .criteria = criteria}, handler(handlerName));
+    void schedule(const ActivityCriteria& criteria, const char* handlerName = "", bool isByOwnRun = false) {
+        subject.activities().schedule({.identifier = "a", .criteria = criteria, .isByOwnRun = isByOwnRun},
+                                      handler(handlerName));
     }
     void monitor(const char* handlerName = "") {
         subject.activities().schedule({.identifier = "a", .isPreregistered = true}, handler(handlerName));
@@ -111,12 +112,16 @@ TYPED_TEST(BackgroundActivitiesContract, NeverFireARunTwice) {
     this->answer.reset();
     this->schedule({.delay = 0});
     EXPECT_THAT(this->firingsAfter(1h), ElementsAre("1"));
-    this->schedule({.delay = 0}, "own ");  // during its run
+    this->schedule({.delay = 0}, "own ", true);
     this->monitor("own ");
     EXPECT_THAT(this->firingsAfter(1h), IsEmpty()) << "the result isn't there yet";
     this->open(Finished);  // which is not the new registration's
     EXPECT_THAT(this->firingsAfter(899s), IsEmpty());
     EXPECT_THAT(this->firingsAfter(1h), ElementsAre("own 8100"));
+    this->schedule({.delay = 0}, "own ", true);
+    this->schedule({.delay = 1}, "other ");
+    this->open(Finished);
+    EXPECT_THAT(this->firingsAfter(1h), ElementsAre("other 11701"));
     this->open(Deferred);
     this->answer = Finished;
     EXPECT_EQ(this->firingsAfter(1h).size(), 1u);
@@ -200,6 +205,17 @@ TYPED_TEST(BackgroundActivitiesContract, FireTheSystemsOwnOncePerVersionAndBoot)
     this->subject.boot(10s);
     monitorBoth();
     EXPECT_THAT(this->firingsAfter(1h), ElementsAre("boot3610"));
+
+    // What is due at the boot is registered anew before it fires.
+    this->schedule({.delay = 0}, "early ");
+    this->subject.boot(10s);
+    this->monitor("early ");
+    this->subject.activities().schedule({.identifier = "com.orvane.vrxagent.boot", .isPreregistered = true},
+                                        [&](platform::OnceCallback<BackgroundActivityResult> completion) {
+                                            this->schedule({.delay = 0}, "taken up ");
+                                            completion(Finished);
+                                        });
+    EXPECT_THAT(this->firingsAfter(1h), ElementsAre("taken up 7221"));
 }
 
 }  // namespace
