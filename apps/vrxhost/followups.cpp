@@ -41,7 +41,7 @@ Outcome failedWith(const char* kind, const platform::Error& error) {
 std::optional<std::string> deviceName(const host::DeviceProfile& profile, const std::string& serialNumber) {
     if (profile.string("SerialNumber") == serialNumber) return profile.string("UserAssignedDeviceName");
     for (const platform::PairedWatch& watch : profile.watches())
-        if (watch.serialNumber == serialNumber) return watch.name ? watch.name : watch.localizedModelName;
+        if (watch.serialNumber == serialNumber) return watch.displayName();
     return std::nullopt;
 }
 

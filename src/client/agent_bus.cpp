@@ -10,11 +10,13 @@
 #include <cstring>
 
 #include "wire/encoding.h"
+#include "wire/message.h"
 
 namespace vrx::client {
 
 using platform::Error;
 using platform::MaybeError;
+using wire::MessagePointer;
 
 namespace {
 
@@ -41,11 +43,6 @@ struct BusError {
     bool is(const char* name) const { return sd_bus_error_has_name(&error, name) > 0; }
     std::string text() const { return error.message ? error.message : error.name ? error.name : "unknown error"; }
 };
-
-struct MessageRelease {
-    void operator()(sd_bus_message* message) const { sd_bus_message_unref(message); }
-};
-using MessagePointer = std::unique_ptr<sd_bus_message, MessageRelease>;
 
 CallResult failed(int result, const BusError& error) {
     if (result == -ETIMEDOUT) return Failure{Failure::Kind::TimedOut, "the agent has not replied in time"};

@@ -12,6 +12,7 @@
 #include "platform/locale.h"
 #include "platform/log.h"
 #include "platform/platform.h"
+#include "platform/settings_keys.h"
 
 namespace vrx::client {
 
@@ -55,7 +56,7 @@ class FixedDefaults final : public platform::DefaultsStore {
     void registerDefaults(const Dictionary&) override {}
     Dictionary dictionaryRepresentation() const override { return *values_.asDictionary(); }
 
-    const Value values_ = Dictionary{{"OneDayInterval", 86400.0}};
+    const Value values_ = Dictionary{{std::string(platform::settings::oneDayInterval), 86400.0}};
 };
 
 class NoLog final : public platform::SystemLog {

@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <chrono>
-#include <cmath>
 #include <cstdio>
 
 namespace vrx::codec {
@@ -10,20 +9,11 @@ namespace vrx::codec {
 using namespace std::chrono;
 
 std::optional<std::string> isoTextFromDate(platform::Date date) {
-    constexpr double yearOne = -62135596800.0;
-    constexpr double year10000 = 253402300800.0;
-    const double epoch = std::floor(platform::epochSeconds(date));
-    if (!(epoch >= yearOne && epoch < year10000)) return std::nullopt;
-
-    const sys_seconds instant(seconds(static_cast<std::int64_t>(epoch)));
-    const auto day = floor<days>(instant);
-    const year_month_day calendar(day);
-    const hh_mm_ss time(instant - day);
+    const std::optional<platform::CalendarTime> time = platform::calendarTime(date);
+    if (!time) return std::nullopt;
     char text[64];
-    std::snprintf(text, sizeof text, "%04d-%02u-%02uT%02d:%02d:%02dZ", static_cast<int>(calendar.year()),
-                  static_cast<unsigned>(calendar.month()), static_cast<unsigned>(calendar.day()),
-                  static_cast<int>(time.hours().count()), static_cast<int>(time.minutes().count()),
-                  static_cast<int>(time.seconds().count()));
+    std::snprintf(text, sizeof text, "%04d-%02u-%02uT%02d:%02d:%02dZ", time->year, time->month, time->day, time->hour,
+                  time->minute, time->second);
     return text;
 }
 

@@ -12,16 +12,18 @@ using platform::Result;
 using platform::Value;
 
 Result<Value> parsePropertyList(const Data& document) {
-    if (document.size() > platform::limits::documentBytes)
-        return invalidPropertyList("byte " + std::to_string(platform::limits::documentBytes), "document too large");
+    if (document.size() > platform::limits::fileBytes)
+        return invalidPropertyList("byte " + std::to_string(platform::limits::fileBytes), "document too large");
     return isBinaryPropertyList(document) ? parseBinaryPropertyList(document) : parseXmlPropertyList(document);
 }
 
 Result<Data> serializePropertyList(const Value& root, platform::PropertyListFormat format) {
     if (platform::nestingDepth(root, platform::limits::documentDepth) > platform::limits::documentDepth)
         return unwritablePropertyList("containers nested so deeply");
-    return format == platform::PropertyListFormat::Binary ? serializeBinaryPropertyList(root)
-                                                          : serializeXmlPropertyList(root);
+    Result<Data> document = format == platform::PropertyListFormat::Binary ? serializeBinaryPropertyList(root)
+                                                                           : serializeXmlPropertyList(root);
+    if (document && document->size() > platform::limits::fileBytes) return unwritablePropertyList("so much");
+    return document;
 }
 
 }  // namespace vrx::codec

@@ -18,7 +18,6 @@
 namespace vrx {
 
 using platform::Date;
-using platform::Dictionary;
 using platform::Duration;
 using platform::Level;
 using platform::Platform;
@@ -29,8 +28,7 @@ namespace {
 constexpr double secondsOfDay = 86400.0;
 constexpr std::string_view dictionaryRepresentationKey = "DictionaryRepresentation";
 
-// Reading a value as each rule has it; what a rule does not expect, a null among it, reads as absent.
-
+// A number of days; what is none, or beyond all numbers, counts as 0.
 Duration daysFrom(const Value& value) {
     double seconds = platform::numberFromValue(value) * secondsOfDay;
     return Duration(std::isfinite(seconds) ? seconds : 0);

@@ -25,8 +25,8 @@ public:
     static constexpr std::string_view archiveClassName = "VRXWarranty";
 
     // The record of a coverage dictionary; null when there is no dictionary. Whatever the dictionary holds makes a
-    // record: a value of an unexpected type reads as an absent one. The serial number is not kept: a record is the same
-    // whether built from an answer, a cache file or an archive, and only the first would know it.
+    // record: a date or an object of an unexpected type reads as an absent one. The serial number is not kept: a record
+    // is the same whether built from an answer, a cache file or an archive, and only the first would know it.
     static std::shared_ptr<VRXWarranty> warrantyWithDictionary(const Value& dictionary);
     static std::shared_ptr<VRXWarranty> warrantyWithDictionary(const Value& dictionary,
                                                                const std::optional<std::string>& serialNumber);
@@ -298,8 +298,8 @@ public:
         bool displayRepairAndSupport = false;
         Value kelURL;
         Value supportAppURL;
-        Value serialNumber;
         Value dictionaryRepresentation;
+        Value serialNumber;
     };
 
 private:

@@ -31,7 +31,7 @@ public:
     // renewed.
     void _downloadWarrantyForSerialNumber(const std::string& serialNumber, Completion completion);
     // One attempt, and those that follow when the server refuses the credential: as many more as there are retries.
-    // Hands over the answer's JSON, or null for an answer of any other status or none.
+    // Hands over the JSON of an answer with status 200, else null.
     void _downloadWarrantyFromServerURL(const platform::Url& url, const std::string& serialNumber, std::int32_t retries,
                                         platform::OnceCallback<platform::Value> completionBlock);
     // The coverage dictionary of a property-list file: of the serial number's own file beside the URL's when there is

@@ -60,8 +60,8 @@ DevicesBySerialNumber testWatches(const platform::Dictionary& serialNumbers) {
 DevicesBySerialNumber registryWatches(const std::vector<PairedWatch>& active) {
     DevicesBySerialNumber watches;
     for (const PairedWatch& watch : active)
-        add(watches, VRXDevice::deviceWithName(watch.name ? watch.name : watch.localizedModelName, watch.serialNumber,
-                                               watch.pairedDate, VRXDeviceTypeWatch));
+        add(watches,
+            VRXDevice::deviceWithName(watch.displayName(), watch.serialNumber, watch.pairedDate, VRXDeviceTypeWatch));
     return watches;
 }
 
@@ -106,7 +106,7 @@ DevicesBySerialNumber VRXDevicesManager::allDevices() {
 
 std::vector<PairedWatch> VRXDevicesManager::_activePairedWatches() const {
     std::vector<PairedWatch> watches = Platform::current().pairedDeviceRegistry().watches();
-    std::erase_if(watches, [](const PairedWatch& watch) { return !watch.isPaired || watch.isArchived; });
+    std::erase_if(watches, [](const PairedWatch& watch) { return !watch.isActive(); });
     log(Level::Default, "%s -> pairedDevices: %@", "-[VRXDevicesManager _activePairedWatches]", watches);
     return watches;
 }

@@ -1,4 +1,4 @@
-// Facts about the installation that many ask for.
+// What kind of system the agent runs on.
 #pragma once
 
 namespace vrx {

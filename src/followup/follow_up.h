@@ -27,8 +27,8 @@ public:
     // Posts without looking at dates or dismissals, provided that there is an offer and a serial number.
     void postFollowUpWithDeviceInfo(const std::shared_ptr<VRXDeviceInfo>& deviceInfo);
 
-    // These give the device infos whose follow-up is shown afterwards: those updated, whether or not the service took
-    // the update, and those posted again.
+    // These give the device infos whose follow-up counts as shown afterwards: those updated, whether or not the service
+    // took the update, and, if one of them was due, all that may be posted again.
     DeviceInfoList refreshFollowupWithDeviceInfos(const DeviceInfoList& deviceInfos) override;
     DeviceInfoList refreshFollowupWithDeviceInfo(const std::shared_ptr<VRXDeviceInfo>& deviceInfo,
                                                  bool allowForcePost) override;

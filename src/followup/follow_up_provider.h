@@ -18,7 +18,7 @@ public:
     virtual bool postFollowUpItem(const platform::FollowUpItem& item, platform::MaybeError* error) = 0;
     virtual bool clearPendingFollowUpItemsWithUniqueIdentifiers(const std::vector<std::string>& uniqueIdentifiers,
                                                                 platform::MaybeError* error) = 0;
-    // What is pending, in the order of posting; with an error, whatever could be had.
+    // What is pending, in the order of first posting; with an error, whatever could be had.
     virtual std::vector<platform::FollowUpItem> pendingFollowUpItems(platform::MaybeError* error) = 0;
 };
 

@@ -14,9 +14,10 @@ std::vector<std::string> languages(std::string identifier) {
     std::vector<std::string> result;
     // It becomes the name of a folder.
     if (identifier.find_first_of("/.") != std::string::npos) identifier.clear();
-    for (; !identifier.empty(); identifier.resize(std::min(identifier.find_last_of("_-"), identifier.size()))) {
+    while (!identifier.empty()) {
         result.push_back(identifier);
-        if (identifier.find_last_of("_-") == std::string::npos) break;
+        const std::size_t part = identifier.find_last_of("_-");
+        identifier.resize(part == std::string::npos ? 0 : part);
     }
     result.emplace_back("en");
     return result;

@@ -22,7 +22,7 @@ constexpr platform::Duration retryAfterFailure{60.0};
 std::set<std::string> pairedWatches(const DeviceProfile& profile) {
     std::set<std::string> lines;
     for (const PairedWatch& watch : profile.watches()) {
-        if (!watch.isPaired || watch.isArchived) continue;
+        if (!watch.isActive()) continue;
         const std::string name = watch.name.value_or("") + "\n" + watch.localizedModelName.value_or("");
         const double paired = watch.pairedDate ? platform::epochSeconds(*watch.pairedDate) : 0;
         lines.insert(platform::sha256Hash(watch.serialNumber.value_or(name) + "\n" + std::to_string(paired)));

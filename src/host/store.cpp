@@ -79,12 +79,12 @@ StoreItem itemOf(const Value& entry) {
     return item;
 }
 
-// Through the shared session. The address is that of a server that a profile names; without one nothing is asked.
+// Nothing that was answered before counts: what was not to be had may have been bought meanwhile.
 void get(const std::string& url, platform::OnceCallback<HttpResponse> completion) {
     platform::HttpRequest request;
     request.url = url;
     request.headers["Accept"] = "application/json";
-    Platform::current().httpSessions().shared().send(std::move(request), std::move(completion));
+    Platform::current().httpSessions().makeUncached()->send(std::move(request), std::move(completion));
 }
 
 class Lookup final : public platform::StoreLookup {

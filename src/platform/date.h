@@ -2,6 +2,7 @@
 #pragma once
 
 #include <chrono>
+#include <optional>
 
 namespace vrx::platform {
 
@@ -16,5 +17,14 @@ constexpr Date dateFromEpoch(double seconds) {
 constexpr double epochSeconds(Date date) {
     return date.time_since_epoch().count();
 }
+
+// A date in the calendar, in UTC and to the second below it.
+struct CalendarTime {
+    int year;
+    unsigned month, day;
+    int hour, minute, second;
+};
+// Nothing outside of the years 1 to 9999, where the calendar of std::chrono ends; those are dates all the same.
+std::optional<CalendarTime> calendarTime(Date date);
 
 }  // namespace vrx::platform

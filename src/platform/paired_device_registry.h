@@ -17,6 +17,10 @@ struct PairedWatch {
     bool isPaired = false;
     bool isArchived = false;
 
+    // Paired now, and not only once.
+    bool isActive() const { return isPaired && !isArchived; }
+    // The user's name for it, else its model's.
+    const std::optional<std::string>& displayName() const { return name ? name : localizedModelName; }
     std::string description() const { return name.value_or("(null)") + " (" + serialNumber.value_or("(null)") + ")"; }
 };
 

@@ -29,6 +29,7 @@ public:
     virtual bool waitFor(Duration limit) = 0;
 };
 
+// Of two tasks that wait for a worker, the one that a user waits for goes first; Background is the usual one.
 enum class Priority { Background, UserInitiated };
 
 class Queues {

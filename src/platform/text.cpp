@@ -1,7 +1,6 @@
 #include "platform/text.h"
 
 #include <charconv>
-#include <cmath>
 #include <cstdio>
 
 #include "platform/error.h"
@@ -19,20 +18,11 @@ std::string describe(double number) {
 }
 
 std::string describe(Date date) {
-    // Beyond these the calendar of std::chrono ends; they are dates all the same.
-    constexpr double yearOne = -62135596800.0;
-    constexpr double year10000 = 253402300800.0;
-    double seconds = epochSeconds(date);
-    if (!(seconds >= yearOne && seconds < year10000)) return describe(seconds) + " s from 1970-01-01 00:00:00 +0000";
-    auto whole = std::chrono::sys_seconds(std::chrono::seconds(static_cast<std::int64_t>(std::floor(seconds))));
-    auto day = std::chrono::floor<std::chrono::days>(whole);
-    std::chrono::year_month_day calendar(day);
-    std::chrono::hh_mm_ss time(whole - day);
+    const std::optional<CalendarTime> time = calendarTime(date);
+    if (!time) return describe(epochSeconds(date)) + " s from 1970-01-01 00:00:00 +0000";
     char buffer[64];
-    std::snprintf(buffer, sizeof buffer, "%04d-%02u-%02u %02d:%02d:%02d +0000", static_cast<int>(calendar.year()),
-                  static_cast<unsigned>(calendar.month()), static_cast<unsigned>(calendar.day()),
-                  static_cast<int>(time.hours().count()), static_cast<int>(time.minutes().count()),
-                  static_cast<int>(time.seconds().count()));
+    std::snprintf(buffer, sizeof buffer, "%04d-%02u-%02u %02d:%02d:%02d +0000", time->year, time->month, time->day,
+                  time->hour, time->minute, time->second);
     return buffer;
 }
 

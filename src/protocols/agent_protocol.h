@@ -21,9 +21,9 @@ public:
 
     virtual ~VRXAgentProtocol() = default;
 
-    // Starts a new outreach run; true.
+    // Has an outreach run a second from now; true.
     virtual void scheduleOutreachWithReply(Reply<bool> reply) = 0;
-    // The Marketplace's data for an application, a dictionary; null when it is not offered.
+    // Whether the Marketplace offers an application, and its data of it: a dictionary; null when it could not be asked.
     virtual void checkIsAvailableInStore(std::string bundleIdentifier, Reply<platform::Value> reply) = 0;
     // Whether an application is installed, was purchased or is offered: a dictionary.
     virtual void appSupportAvailability(std::string bundleIdentifier, Reply<platform::Value> reply) = 0;

@@ -7,9 +7,13 @@ namespace vrx {
 using platform::Date;
 using platform::Duration;
 
+namespace {
+
 Duration fromNow(const std::optional<Date>& date, Date now) {
     return date ? *date - now : Duration(0);
 }
+
+}  // namespace
 
 bool isEarlier(const std::optional<Date>& date, const std::optional<Date>& other, Date now) {
     return fromNow(date, now) < fromNow(other, now);

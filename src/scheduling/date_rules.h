@@ -11,7 +11,6 @@ namespace vrx {
 class VRXDeviceInfo;
 class VRXWarranty;
 
-platform::Duration fromNow(const std::optional<platform::Date>& date, platform::Date now);
 bool isEarlier(const std::optional<platform::Date>& date, const std::optional<platform::Date>& other,
                platform::Date now);
 bool isFuture(const std::optional<platform::Date>& date, platform::Date now);

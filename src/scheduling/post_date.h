@@ -19,7 +19,7 @@ struct PostDateSettings {
     static PostDateSettings read();
 };
 
-// Nothing when no device waits for its post. A date in the past when an offer has ended that was never posted.
+// Nothing when no device has a post to come. A date in the past when an offer has ended that was never posted.
 std::optional<platform::Date> nextPostDate(const DeviceInfoList& deviceInfos, const PostDateSettings& settings,
                                            platform::Date now);
 

@@ -30,7 +30,6 @@ public:
     // Both set the target date and register the activity afresh. No date is as good as now, and leaves no target date.
     void scheduleActivityWithDelay(platform::Duration delay);
     void scheduleActivityForDate(std::optional<platform::Date> date);
-    void _scheduleActivityWithDelay(platform::Duration delay, std::optional<platform::Date> date);
 
     std::optional<platform::Date> scheduledActivityDate() const;
 
@@ -48,6 +47,7 @@ public:
 
 private:
     explicit VRXScheduler(std::shared_ptr<VRXSchedulerActivityDelegate> activityDelegate);
+    void _scheduleActivityWithDelay(platform::Duration delay, std::optional<platform::Date> date);
 
     platform::Property<std::shared_ptr<VRXSchedulerActivityDelegate>> activityDelegate_;
 };

@@ -1,6 +1,7 @@
 #include "serverversion/server_version_utilities.h"
 
 #include <algorithm>
+#include <cmath>
 #include <iterator>
 
 #include "platform/defaults_store.h"
@@ -53,7 +54,8 @@ void storeServerVersionCache(const Value& dictionary) {
 std::optional<double> versionFrom(const Value& dictionary, std::string_view key) {
     const Value& value = dictionary[key];
     if (const std::string* text = value.asString()) return static_cast<double>(platform::leadingInteger(*text));
-    if (auto number = value.asNumber()) return number;
+    // What is no number at all, NaN, has no place in an ordered set, and is as good as missing.
+    if (auto number = value.asNumber(); number && !std::isnan(*number)) return number;
     log(Level::Error, "Server version dictionary missing key '%@'", key);
     return std::nullopt;
 }

@@ -98,8 +98,7 @@ std::shared_ptr<VRXAgent> VRXAgent::initWithWarrantyProvider(std::shared_ptr<VRX
 
 void VRXAgent::scheduleOutreachWithReply(Reply<bool> reply) {
     log(Level::Default, "scheduling new outreach");
-    if (!collaborators_.scheduleOutreach) return reply(false);
-    collaborators_.scheduleOutreach(outreachDelay);
+    if (collaborators_.scheduleOutreach) collaborators_.scheduleOutreach(outreachDelay);
     reply(true);
 }
 

@@ -53,7 +53,7 @@ public:
     // Moves what the older single-device layout left to this device, once: for start-up, before anything else uses it.
     void performMigrationIfNeeded();
 
-    // Read and replaced whole; a request keeps to what it has read.
+    // Read and replaced whole; each step of a request asks the present one.
     std::shared_ptr<VRXAgentWarrantyProvider> warrantyProvider() const { return warrantyProvider_.get(); }
     void setWarrantyProvider(std::shared_ptr<VRXAgentWarrantyProvider> provider) {
         warrantyProvider_.set(std::move(provider));

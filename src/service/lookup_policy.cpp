@@ -60,6 +60,7 @@ bool isFresh(VRXAgentWarrantyProvider& provider, const SerialNumber& serialNumbe
         log(Level::Default, "warranty valid for %.02f seconds", remaining);
         return true;
     }
+    // The negated duration, without a sign when it is 0.
     log(Level::Default, "warranty validity expired %.02f seconds ago, refresh it", Duration::zero() - remaining);
     return false;
 }

@@ -5,6 +5,7 @@
 
 #include "platform/log.h"
 #include "platform/platform.h"
+#include "platform/utf8.h"
 #include "platform/vendor.h"
 #include "service/agent.h"
 
@@ -39,8 +40,9 @@ bool ServiceDelegate::shouldAcceptNewConnection(platform::ServiceListener& /*lis
 std::optional<Bundle> ServiceDelegate::_bundleForPID(std::int32_t processIdentifier) const {
     std::array<char, callerPathBytes> buffer;
     std::size_t length = Platform::current().bundleLookup().executablePath(processIdentifier, buffer);
-    if (length == 0) return std::nullopt;
-    return Platform::current().bundleLookup().bundleContaining(std::string(buffer.data(), length));
+    const std::string path(buffer.data(), length);
+    if (path.empty() || !platform::isUtf8(path)) return std::nullopt;  // no URL could be made of it
+    return Platform::current().bundleLookup().bundleContaining(path);
 }
 
 }  // namespace vrx

@@ -120,7 +120,7 @@ void VRXOrvaneSupportManager::checkIsAvailableInStore(std::string bundleIdentifi
     store.registerBagKeys(profile);
     auto lookup = store.makeLookup(store.openBag(profile.name, profile.version), bundleIdentifier,
                                    platform::StoreKeyProfile::Lockup);
-    auto answer = [self = shared_from_this(), bundleIdentifier,
+    auto answer = [bundleIdentifier,
                    reply = std::move(reply)](platform::Result<std::vector<platform::StoreItem>> items) mutable {
         if (!items) {
             log(Level::Default, "Lookup for %@ in the Marketplace failed with error %@", bundleIdentifier,

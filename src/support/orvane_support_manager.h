@@ -1,11 +1,10 @@
 // Whether the support app is installed, was purchased or is offered in the Marketplace, with the data that a client
-// shows of it. Made for one question and kept alive by it; any thread may ask.
+// shows of it. It has no state; any thread may ask.
 //
 // Answers are dictionaries: "AppAvailabilityType" tells the class of the answer, the other keys are texts and
 // addresses.
 #pragma once
 
-#include <memory>
 #include <string>
 
 #include "platform/task.h"
@@ -14,8 +13,7 @@
 
 namespace vrx {
 
-class VRXOrvaneSupportManager final : public VRXSupportManaging,
-                                      public std::enable_shared_from_this<VRXOrvaneSupportManager> {
+class VRXOrvaneSupportManager final : public VRXSupportManaging {
 public:
     using Reply = platform::OnceCallback<platform::Value>;
 

@@ -5,11 +5,16 @@
 #include <array>
 #include <string_view>
 
+#include "platform/vendor.h"
+
 namespace vrx::wire {
 
 inline constexpr const char* serviceName = "com.orvane.vrxagent";  // also the socket's file name
 inline constexpr const char* objectPath = "/com/orvane/vrxagent";
 inline constexpr const char* interfaceName = "com.orvane.VRXAgentProtocol";
+static_assert(std::string_view(serviceName).starts_with(platform::vendorPrefix) &&
+              std::string_view(serviceName).ends_with(platform::serviceNameRemainder) &&
+              std::string_view(interfaceName).starts_with(platform::vendorPrefix));
 
 // Every reply is one dictionary of the encoding (see encoding.h).
 inline constexpr const char* replySignature = "a{sv}";

@@ -95,8 +95,15 @@ TEST(PropertyList, IsHeldToTheLimits) {
         EXPECT_FALSE(serializePropertyList(Array{deepest}, form));
         EXPECT_TRUE(parsePropertyList(*serializePropertyList(many, form)));
         EXPECT_FALSE(parsePropertyList(*serializePropertyList(oneMore, form)));
-        EXPECT_FALSE(parsePropertyList(*serializePropertyList(std::string(documentBytes, 'x'), form)));
+        EXPECT_FALSE(serializePropertyList(std::string(fileBytes, 'x'), form));
     }
+    EXPECT_FALSE(parsePropertyList(Data(fileBytes + 1)));
+    // The largest answers of a server.
+    const Value wide = "é" + std::string(documentBytes - 4, 'x');
+    EXPECT_EQ(parsePropertyList(*serializePropertyList(wide, PropertyListFormat::Binary)).value(), wide);
+    Dictionary entries;
+    for (std::size_t i = 1; i < documentValues; ++i) entries["key " + std::to_string(i)] = static_cast<double>(i) / 3;
+    EXPECT_EQ(parsePropertyList(*serializePropertyList(entries, PropertyListFormat::Binary)).value(), Value(entries));
     const auto tooDeep = parseXml(
         "<array><array><array><array><array><array><array><array><array><array><array><array>"
         "<array><array><array><array><array>");

@@ -5,15 +5,13 @@
 #include <systemd/sd-bus.h>
 #include <unistd.h>
 
-#include <memory>
 #include <stdexcept>
+
+#include "wire/message.h"
 
 namespace vrx::test {
 
-struct MessageRelease {
-    void operator()(sd_bus_message* message) const { sd_bus_message_unref(message); }
-};
-using Message = std::unique_ptr<sd_bus_message, MessageRelease>;
+using Message = wire::MessagePointer;
 
 // A bus that has begun to authenticate itself at a socket at which nobody answers: enough to make messages with.
 class Bus {

@@ -12,6 +12,7 @@ namespace vrx::host {
 
 using platform::Level;
 using platform::log;
+using wire::MessagePointer;
 
 ClientSession::ClientSession(Descriptor socket, const PeerIdentity& peer, std::shared_ptr<VRXAgentProtocol> agent,
                              std::shared_ptr<ReplyBox> box, const ServiceLimits& limits, ProcessLifecycle& lifecycle)

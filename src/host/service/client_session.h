@@ -16,6 +16,7 @@
 #include "host/service/server_bus.h"
 #include "host/service/service_limits.h"
 #include "protocols/agent_protocol.h"
+#include "wire/message.h"
 #include "wire/names.h"
 
 namespace vrx::host {
@@ -53,7 +54,7 @@ private:
     std::array<Method, wire::operations.size()> methods_;
     ServerBus bus_;
     RequestNumber lastRequest_ = 0;
-    std::unordered_map<RequestNumber, MessagePointer> openCalls_;
+    std::unordered_map<RequestNumber, wire::MessagePointer> openCalls_;
     bool isCutOff_ = false;
 };
 

@@ -7,16 +7,10 @@
 #include <systemd/sd-bus.h>
 
 #include <cstdint>
-#include <memory>
 
 #include "host/service/descriptor.h"
 
 namespace vrx::host {
-
-struct MessageRelease {
-    void operator()(sd_bus_message* message) const { sd_bus_message_unref(message); }
-};
-using MessagePointer = std::unique_ptr<sd_bus_message, MessageRelease>;
 
 class ServerBus {
 public:
