@@ -8,6 +8,7 @@
 #include "host/activity_requests.h"
 #include "host/home_lock.h"
 #include "platform/text.h"
+#include "scheduling/scheduler.h"
 #include "verbs.h"
 
 namespace vrx::apps {
@@ -37,7 +38,7 @@ Outcome refused(const char* kind, std::string problem, std::string advice) {
 
 Outcome fire(Home& home, const std::string& name) {
     const std::string identifier = name.find('.') == std::string::npos ? activityIdentifier(name) : name;
-    const std::optional<Date> target = home.defaults().date(identifier + ".TargetDate");
+    const std::optional<Date> target = home.defaults().date(VRXScheduler::targetDateKey(identifier));
     const auto answer = requestFiring(home, identifier);
     if (!answer)
         return failed(ExitCode::TimedOut, "the agent did not answer in time", "Try again; its log says what it does.");

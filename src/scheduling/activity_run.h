@@ -2,17 +2,15 @@
 // that. Whoever comes first ends it and gives the result; what the other would give is dropped. Any thread may use it.
 #pragma once
 
+#include <functional>
+#include <memory>
 #include <mutex>
 #include <utility>
 
-#include "platform/date.h"
+#include "platform/timer.h"
 #include "scheduling/scheduler_activity_delegate.h"
 
 namespace vrx {
-
-// So long that no process sees a watch fire: a run ends by its work. Cutting runs off sooner is not wanted, as each
-// begins its downloads anew.
-inline constexpr platform::Duration deferralWatchInterval{2'000'000'000.0};
 
 class ActivityRun {
 public:
@@ -30,5 +28,10 @@ private:
     std::mutex mutex_;
     CompletionHandler completionHandler_;
 };
+
+// A watch over a run, on the main queue: calls when the system asks the scheduler for deferral. It holds the scheduler
+// weakly.
+std::shared_ptr<platform::RepeatingTimer> makeDeferralWatch(const std::shared_ptr<VRXScheduler>& scheduler,
+                                                            std::function<void()> defer);
 
 }  // namespace vrx

@@ -33,28 +33,20 @@ void VRXFollowUpPost::performActivityForScheduler(const std::shared_ptr<VRXSched
                                                   CompletionHandler completionHandler) {
     setFollowUpPostInProgress(true);
     auto run = std::make_shared<ActivityRun>(std::move(completionHandler));
-    setFollowUpPostTimer(makeDeferralWatch(scheduler, run));
+    // The watch, which the activity holds, holds it weakly, and the run as well, which its work keeps.
+    setFollowUpPostTimer(makeDeferralWatch(scheduler, [activity = weak_from_this(), watched = std::weak_ptr(run)] {
+        auto self = activity.lock();
+        auto run = watched.lock();
+        if (!self || !self->followUpPostInProgress() || !run) return;
+        log(Level::Default, "FollowUp Post activity deferred.");
+        self->end(*run, BackgroundActivityResult::Deferred);
+    }));
     auto agent = collaborators_.makeAgent();
     if (!agent) return finish(*run, std::nullopt);
     constexpr bool updateFollowUps = false;
     agent->getAllDeviceInfosUsingPolicy(
         VRXWarrantyLookupPolicyRefresh, updateFollowUps,
         [self = shared_from_this(), run](DeviceInfoList deviceInfos) { self->finish(*run, deviceInfos); });
-}
-
-// It holds activity and scheduler weakly, as the activity holds it, and the run as well, which its work keeps.
-std::shared_ptr<platform::RepeatingTimer> VRXFollowUpPost::makeDeferralWatch(
-    const std::shared_ptr<VRXScheduler>& scheduler, const std::shared_ptr<ActivityRun>& run) {
-    auto fire = [activity = weak_from_this(), asked = std::weak_ptr(scheduler), watched = std::weak_ptr(run)] {
-        auto self = activity.lock();
-        auto scheduler = asked.lock();
-        auto run = watched.lock();
-        if (!self || !self->followUpPostInProgress() || !scheduler || !scheduler->shouldDefer() || !run) return;
-        log(Level::Default, "FollowUp Post activity deferred.");
-        self->end(*run, BackgroundActivityResult::Deferred);
-    };
-    return platform::RepeatingTimer::schedule(Platform::current().queues().mainQueue(), deferralWatchInterval,
-                                              std::move(fire));
 }
 
 void VRXFollowUpPost::finish(ActivityRun& run, const std::optional<DeviceInfoList>& deviceInfos) {

@@ -39,8 +39,6 @@ public:
     }
 
 private:
-    std::shared_ptr<platform::RepeatingTimer> makeDeferralWatch(const std::shared_ptr<VRXScheduler>& scheduler,
-                                                                const std::shared_ptr<ActivityRun>& run);
     void finish(ActivityRun& run, const std::optional<DeviceInfoList>& deviceInfos);
     void post(const DeviceInfoList& deviceInfos);
     void end(ActivityRun& run, platform::BackgroundActivityResult result);

@@ -99,7 +99,14 @@ void VRXOutreachActivity::performActivityForScheduler(const std::shared_ptr<VRXS
                                                       CompletionHandler completionHandler) {
     setOutreachInProgress(true);
     auto run = std::make_shared<Run>(std::move(completionHandler));
-    setOutReachTimer(makeDeferralWatch(scheduler, run));
+    // The watch, which the activity holds, holds it weakly, and the run as well, which its work keeps.
+    setOutReachTimer(makeDeferralWatch(scheduler, [activity = weak_from_this(), watched = std::weak_ptr(run)] {
+        auto self = activity.lock();
+        auto run = watched.lock();
+        if (!self || !self->outreachInProgress() || !run) return;
+        log(Level::Default, "Warranty download activity deferred.");
+        end(*run, activity, BackgroundActivityResult::Deferred);
+    }));
     DeviceList devices = allDevices();
     log(Level::Default, "%s: devices: %@", "-[VRXOutreachActivity performActivityForScheduler:withCompletionHandler:]",
         devices);
@@ -125,21 +132,6 @@ void VRXOutreachActivity::performActivityForScheduler(const std::shared_ptr<VRXS
         }
         end(*run, activity, BackgroundActivityResult::Finished);
     });
-}
-
-// It holds activity and scheduler weakly, as the activity holds it, and the run as well, which its work keeps.
-std::shared_ptr<platform::RepeatingTimer> VRXOutreachActivity::makeDeferralWatch(
-    const std::shared_ptr<VRXScheduler>& scheduler, const std::shared_ptr<Run>& run) {
-    auto fire = [activity = weak_from_this(), asked = std::weak_ptr(scheduler), watched = std::weak_ptr(run)] {
-        auto self = activity.lock();
-        auto scheduler = asked.lock();
-        auto run = watched.lock();
-        if (!self || !self->outreachInProgress() || !scheduler || !scheduler->shouldDefer() || !run) return;
-        log(Level::Default, "Warranty download activity deferred.");
-        end(*run, activity, BackgroundActivityResult::Deferred);
-    };
-    return platform::RepeatingTimer::schedule(Platform::current().queues().mainQueue(), deferralWatchInterval,
-                                              std::move(fire));
 }
 
 // The activity may be gone; its system waits for the result all the same.

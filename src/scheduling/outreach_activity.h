@@ -38,8 +38,6 @@ public:
 private:
     class Run;
 
-    std::shared_ptr<platform::RepeatingTimer> makeDeferralWatch(const std::shared_ptr<VRXScheduler>& scheduler,
-                                                                const std::shared_ptr<Run>& run);
     static void end(Run& run, const std::weak_ptr<VRXOutreachActivity>& activity,
                     platform::BackgroundActivityResult result);
 

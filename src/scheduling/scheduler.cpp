@@ -25,10 +25,6 @@ constexpr std::string_view targetDateSuffix = ".TargetDate";
 // The system hears of a result this much later than the activity gave it.
 constexpr Duration handBackDelay{1.0};
 
-std::string targetDateKey(const std::string& identifier) {
-    return identifier + std::string(targetDateSuffix);
-}
-
 // A duration that is not negative, truncated; one that is too long for the system is the longest there is.
 std::int64_t wholeSeconds(Duration duration) {
     constexpr double most = 9223372036854774784.0;  // the largest double below 2^63
@@ -99,6 +95,10 @@ void VRXScheduler::_scheduleActivityWithDelay(Duration delay, std::optional<Date
 
 std::optional<Date> VRXScheduler::scheduledActivityDate() const {
     return Platform::current().defaultsStore().date(targetDateKey(identifier()));
+}
+
+std::string VRXScheduler::targetDateKey(const std::string& identifier) {
+    return identifier + std::string(targetDateSuffix);
 }
 
 void VRXScheduler::performScheduledOutreachWithBlock(CompletionHandler block) {

@@ -6,6 +6,7 @@
 
 #include <memory>
 #include <optional>
+#include <string>
 
 #include "platform/background_activity_scheduler.h"
 #include "platform/date.h"
@@ -32,6 +33,8 @@ public:
     void scheduleActivityForDate(std::optional<platform::Date> date);
 
     std::optional<platform::Date> scheduledActivityDate() const;
+    // Of the setting that keeps an activity's target date.
+    static std::string targetDateKey(const std::string& identifier);
 
     // What a firing of any activity does; the block is the system's completion handler. It gets the result a second
     // after the activity has given it, on the main queue.
