@@ -112,7 +112,7 @@ struct ThousandDevices {
     sim::Host host;
     platform::Date now = host.clock.now();
     DeviceInfoList infos;
-    PostDateSettings settings{.outreachDelay = platform::Duration(2 * 86400)};
+    PostDateSettings settings{{}, platform::Duration(2 * 86400)};
 
     ThousandDevices() {
         for (int i = 0; i < 1000; ++i) {
