@@ -27,7 +27,7 @@ constexpr std::chrono::milliseconds gatheringTime(5);
 // With so much pending they are written at once.
 constexpr std::size_t enoughPending = 16 * 1024;
 // With so much pending whoever logs waits for the thread: nothing is dropped, and memory stays bounded.
-constexpr std::size_t mostPending = 256 * 1024;
+constexpr std::size_t mostPending = 64 * 1024;
 
 sockaddr_un journalAddress() {
     return {AF_UNIX, "/run/systemd/journal/socket"};
