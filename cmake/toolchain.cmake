@@ -1,8 +1,8 @@
 # Warnings are errors; ccache and mold serve when present.
 add_compile_options(-Wall -Wextra -Wpedantic -Wconversion -Wsign-conversion -Wnon-virtual-dtor -Werror)
 
-# The agent is there all the time, and runs seldom: its size counts for more than the last bit of speed.
-add_compile_options("$<$<NOT:$<CONFIG:Debug>>:-Os;-ffunction-sections;-fdata-sections>")
+# What nobody calls is left out of the programs.
+add_compile_options("$<$<NOT:$<CONFIG:Debug>>:-ffunction-sections;-fdata-sections>")
 add_link_options($<$<NOT:$<CONFIG:Debug>>:-Wl,--gc-sections>)
 
 find_program(VRX_CCACHE ccache)
