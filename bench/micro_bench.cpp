@@ -8,6 +8,9 @@
 #include "platform/files.h"
 #include "platform/json.h"
 #include "platform/property_list.h"
+#include "platform/sha256_hash.h"
+#include "scheduling/post_date.h"
+#include "scheduling/refresh_date.h"
 #include "service/agent.h"
 #include "service/register_defaults.h"
 #include "sim/host.h"
@@ -103,6 +106,39 @@ void refreshHundredDevices(benchmark::State& state) {
     }
 }
 BENCHMARK(refreshHundredDevices)->Unit(benchmark::kMillisecond);
+
+// Watches whose offers end on different days; every other one has its follow-up.
+struct ThousandDevices {
+    sim::Host host;
+    platform::Date now = host.clock.now();
+    DeviceInfoList infos;
+    PostDateSettings settings{{}, platform::Duration(2 * 86400)};
+
+    ThousandDevices() {
+        for (int i = 0; i < 1000; ++i) {
+            const std::string serial = "WATCH" + std::to_string(i);
+            auto warranty = VRXWarranty::warrantyWithDictionary(Dictionary{});
+            warranty->setQxOfferDisplay(true);
+            warranty->setQxOfferEligibleUntil(now + std::chrono::hours(24 + i));
+            auto watch = VRXDevice::deviceWithName("Watch", serial, now - std::chrono::hours(i), VRXDeviceTypeWatch);
+            infos.push_back(VRXDeviceInfo::deviceInfoWithDevice(std::move(watch), std::move(warranty)));
+            if (i % 2) settings.postedSerialNumberHashes.insert(platform::sha256Hash(serial));
+        }
+    }
+};
+
+void postDateOfThousandDevices(benchmark::State& state) {
+    const ThousandDevices devices;
+    for (auto _ : state) benchmark::DoNotOptimize(nextPostDate(devices.infos, devices.settings, devices.now));
+}
+BENCHMARK(postDateOfThousandDevices)->Unit(benchmark::kMicrosecond);
+
+void refreshDateOfThousandDevices(benchmark::State& state) {
+    const ThousandDevices devices;
+    const RefreshDateSettings settings{platform::Duration(86400), devices.settings.outreachDelay};
+    for (auto _ : state) benchmark::DoNotOptimize(nextRefreshDate(devices.infos, true, settings, devices.now));
+}
+BENCHMARK(refreshDateOfThousandDevices)->Unit(benchmark::kMicrosecond);
 
 }  // namespace
 }  // namespace vrx

@@ -9,6 +9,19 @@ namespace vrx::codec {
 
 class LazyLibrary {
 public:
+    // A function, which becomes the type that it is put into; null when it is not there.
+    class Function {
+    public:
+        explicit Function(void* address) : address_(address) {}
+        template <class Pointer>
+        operator Pointer() const {
+            return reinterpret_cast<Pointer>(address_);
+        }
+
+    private:
+        void* address_;
+    };
+
     // The library's file name, found where the linker would find it. What its functions are called ends with the
     // suffix.
     explicit LazyLibrary(std::string fileName, std::string suffix = "")
@@ -16,20 +29,19 @@ public:
     LazyLibrary(const LazyLibrary&) = delete;
     LazyLibrary& operator=(const LazyLibrary&) = delete;
 
-    // A function by its name, null when there is no such library or function:
-    //     auto open = library.function<decltype(&::unum_open)>("unum_open");
-    template <class Pointer>
-    Pointer function(const char* name) const {
-        return reinterpret_cast<Pointer>(symbol(name));
-    }
+    // By its name:
+    //     decltype(&::unum_open) open = icu().function("unum_open");
+    Function function(const char* name) const;
+
+    // What was not there, the library or the first such function, as a text that names it; empty when all was.
+    std::string missing() const;
 
 private:
-    void* symbol(const char* name) const;
-
     const std::string fileName_;
     const std::string suffix_;
-    mutable std::once_flag isOpened_;
+    mutable std::mutex mutex_;
     mutable void* library_ = nullptr;
+    mutable std::string missing_;
 };
 
 }  // namespace vrx::codec

@@ -16,12 +16,12 @@ namespace {
 constexpr const char* commonStyle = "root";
 
 struct Functions {
-    decltype(&::uloc_getDefault) getDefault = icu().function<decltype(getDefault)>("uloc_getDefault");
-    decltype(&::uloc_getLanguage) getLanguage = icu().function<decltype(getLanguage)>("uloc_getLanguage");
-    decltype(&::unum_open) open = icu().function<decltype(open)>("unum_open");
-    decltype(&::unum_close) close = icu().function<decltype(close)>("unum_close");
-    decltype(&::unum_formatDecimal) format = icu().function<decltype(format)>("unum_formatDecimal");
-    decltype(&::unum_getLocaleByType) getLocale = icu().function<decltype(getLocale)>("unum_getLocaleByType");
+    decltype(&::uloc_getDefault) getDefault = icu().function("uloc_getDefault");
+    decltype(&::uloc_getLanguage) getLanguage = icu().function("uloc_getLanguage");
+    decltype(&::unum_open) open = icu().function("unum_open");
+    decltype(&::unum_close) close = icu().function("unum_close");
+    decltype(&::unum_formatDecimal) format = icu().function("unum_formatDecimal");
+    decltype(&::unum_getLocaleByType) getLocale = icu().function("unum_getLocaleByType");
 
     bool areThere() const { return getDefault && getLanguage && open && close && format && getLocale; }
 };

@@ -11,12 +11,11 @@ namespace vrx::codec {
 namespace {
 
 struct Functions {
-    decltype(&::ucal_getCanonicalTimeZoneID) getCanonicalID =
-        icu().function<decltype(getCanonicalID)>("ucal_getCanonicalTimeZoneID");
-    decltype(&::ucal_open) open = icu().function<decltype(open)>("ucal_open");
-    decltype(&::ucal_close) close = icu().function<decltype(close)>("ucal_close");
-    decltype(&::ucal_setMillis) setMillis = icu().function<decltype(setMillis)>("ucal_setMillis");
-    decltype(&::ucal_get) get = icu().function<decltype(get)>("ucal_get");
+    decltype(&::ucal_getCanonicalTimeZoneID) getCanonicalID = icu().function("ucal_getCanonicalTimeZoneID");
+    decltype(&::ucal_open) open = icu().function("ucal_open");
+    decltype(&::ucal_close) close = icu().function("ucal_close");
+    decltype(&::ucal_setMillis) setMillis = icu().function("ucal_setMillis");
+    decltype(&::ucal_get) get = icu().function("ucal_get");
 
     bool areThere() const { return getCanonicalID && open && close && setMillis && get; }
 };

@@ -7,6 +7,7 @@
 
 #include "codec/base64.h"
 #include "codec/iso_date.h"
+#include "codec/lazy_library.h"
 #include "codec/property_list_error.h"
 #include "codec/value_builder.h"
 #include "codec/xml_property_list.h"
@@ -18,6 +19,29 @@ using platform::Result;
 using platform::Value;
 
 namespace {
+
+// Opened when the first document is read: what the agent keeps itself is binary.
+struct Expat {
+    const LazyLibrary library{"libexpat.so.1"};
+    decltype(&::XML_ParserCreate) parserCreate = library.function("XML_ParserCreate");
+    decltype(&::XML_SetUserData) setUserData = library.function("XML_SetUserData");
+    decltype(&::XML_SetElementHandler) setElementHandler = library.function("XML_SetElementHandler");
+    decltype(&::XML_SetCharacterDataHandler) setCharacterDataHandler = library.function("XML_SetCharacterDataHandler");
+    decltype(&::XML_SetEntityDeclHandler) setEntityDeclHandler = library.function("XML_SetEntityDeclHandler");
+    decltype(&::XML_SetSkippedEntityHandler) setSkippedEntityHandler = library.function("XML_SetSkippedEntityHandler");
+    decltype(&::XML_Parse) parse = library.function("XML_Parse");
+    decltype(&::XML_ErrorString) errorString = library.function("XML_ErrorString");
+    decltype(&::XML_GetErrorCode) getErrorCode = library.function("XML_GetErrorCode");
+    decltype(&::XML_GetCurrentLineNumber) getCurrentLineNumber = library.function("XML_GetCurrentLineNumber");
+    decltype(&::XML_GetCurrentColumnNumber) getCurrentColumnNumber = library.function("XML_GetCurrentColumnNumber");
+    decltype(&::XML_StopParser) stopParser = library.function("XML_StopParser");
+    decltype(&::XML_ParserFree) parserFree = library.function("XML_ParserFree");
+};
+
+const Expat& expat() {
+    static const Expat expat;
+    return expat;
+}
 
 constexpr std::string_view whiteSpace = " \t\r\n";
 
@@ -67,29 +91,29 @@ std::optional<Value> valueOf(const std::optional<T>& content) {
 // Reads a document by the events of expat. The first complaint ends the parse.
 class XmlReader {
 public:
-    XmlReader() : parser_(XML_ParserCreate(nullptr)) {
-        XML_SetUserData(parser_.get(), this);
-        XML_SetElementHandler(
+    XmlReader() : parser_(expat().parserCreate(nullptr)) {
+        expat().setUserData(parser_.get(), this);
+        expat().setElementHandler(
             parser_.get(), [](void* self, const char* name, const char**) { of(self).begin(name); },
             [](void* self, const char* name) { of(self).end(name); });
-        XML_SetCharacterDataHandler(parser_.get(), [](void* self, const char* text, int length) {
+        expat().setCharacterDataHandler(parser_.get(), [](void* self, const char* text, int length) {
             of(self).characters({text, static_cast<std::size_t>(length)});
         });
         // Entities can make a small document a huge one, or drop out of it unseen; property lists have no use for them.
-        XML_SetEntityDeclHandler(
+        expat().setEntityDeclHandler(
             parser_.get(), [](void* self, const char*, int, const char*, int, const char*, const char*, const char*,
                               const char*) { of(self).complain("entities are not supported"); });
-        XML_SetSkippedEntityHandler(
+        expat().setSkippedEntityHandler(
             parser_.get(), [](void* self, const char*, int) { of(self).complain("entities are not supported"); });
     }
 
     Result<Value> read(const Data& document) {
         const auto* bytes = reinterpret_cast<const char*>(document.data());
         const bool parsed =
-            XML_Parse(parser_.get(), bytes, static_cast<int>(document.size()), XML_TRUE) == XML_STATUS_OK;
+            expat().parse(parser_.get(), bytes, static_cast<int>(document.size()), XML_TRUE) == XML_STATUS_OK;
         if (complaint_.empty()) {
             if (parsed) return builder_.takeRoot();
-            complain(XML_ErrorString(XML_GetErrorCode(parser_.get())));
+            complain(expat().errorString(expat().getErrorCode(parser_.get())));
         }
         return invalidPropertyList(place_, complaint_);
     }
@@ -100,9 +124,9 @@ private:
     void complain(const std::string& complaint) {
         if (!complaint_.empty()) return;
         complaint_ = complaint;
-        place_ = "line " + std::to_string(XML_GetCurrentLineNumber(parser_.get())) + ":" +
-                 std::to_string(XML_GetCurrentColumnNumber(parser_.get()) + 1);
-        XML_StopParser(parser_.get(), XML_FALSE);
+        place_ = "line " + std::to_string(expat().getCurrentLineNumber(parser_.get())) + ":" +
+                 std::to_string(expat().getCurrentColumnNumber(parser_.get()) + 1);
+        expat().stopParser(parser_.get(), XML_FALSE);
     }
     void requireLimit(bool within) {
         if (!within) complain(builder_.complaint());
@@ -178,7 +202,7 @@ private:
     }
 
     struct FreeParser {
-        void operator()(XML_Parser parser) const { XML_ParserFree(parser); }
+        void operator()(XML_Parser parser) const { expat().parserFree(parser); }
     };
 
     std::unique_ptr<std::remove_pointer_t<XML_Parser>, FreeParser> parser_;
@@ -193,6 +217,8 @@ private:
 }  // namespace
 
 Result<Value> parseXmlPropertyList(const Data& document) {
+    if (const std::string missing = expat().library.missing(); !missing.empty())
+        return invalidPropertyList("its beginning", missing);
     return XmlReader().read(document);
 }
 

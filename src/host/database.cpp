@@ -91,6 +91,13 @@ private:
     int file_;
 };
 
+// The whole database is some ten pages. As it comes, SQLite would set aside, and touch, room for twenty pages and for
+// the statements of a busy server, for each connection.
+bool configure() {
+    return sqlite3_config(SQLITE_CONFIG_PAGECACHE, nullptr, 0, 0) == SQLITE_OK &&
+           sqlite3_config(SQLITE_CONFIG_LOOKASIDE, 512, 16) == SQLITE_OK;
+}
+
 // SQLite would make the file readable for others; what it makes beside it has the file's own mode.
 void createPrivately(const std::string& path) {
     int file = ::open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600);
@@ -173,6 +180,8 @@ std::span<const std::uint8_t> Statement::bytes(int column) const {
 }
 
 Connection::Connection(const std::string& path, std::chrono::milliseconds busyLimit, bool isLooking) {
+    static const bool isConfigured = configure();
+    static_cast<void>(isConfigured);
     const int flags = isLooking ? SQLITE_OPEN_READONLY | SQLITE_OPEN_URI : SQLITE_OPEN_READWRITE;
     const int result = sqlite3_open_v2((isLooking ? lookingUri(path) : path).c_str(), &connection_,
                                        flags | SQLITE_OPEN_NOMUTEX, nullptr);

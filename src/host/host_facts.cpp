@@ -14,8 +14,15 @@ std::optional<std::string> hostFact(Connection& connection, std::string_view nam
     return std::string(query.text(0));
 }
 
+// What is there already is not written: at most starts that spares the disk's syncs.
 void setHostFact(Connection& connection, std::string_view name, std::string_view value) {
-    connection.statement("REPLACE INTO host_facts VALUES (?, ?)").bind(0, name).bind(1, value).step();
+    connection
+        .statement(
+            "INSERT INTO host_facts VALUES (?, ?) ON CONFLICT (name) DO UPDATE SET value = excluded.value "
+            "WHERE value <> excluded.value")
+        .bind(0, name)
+        .bind(1, value)
+        .step();
 }
 
 }  // namespace vrx::host

@@ -1,7 +1,5 @@
 #include "host/http.h"
 
-#include <curl/curl.h>
-
 #include <climits>
 #include <csignal>
 #include <map>
@@ -10,6 +8,7 @@
 #include <thread>
 #include <vector>
 
+#include "host/curl.h"
 #include "host/files.h"
 #include "host/http_cache.h"
 #include "host/http_transfer.h"
@@ -73,10 +72,12 @@ void HttpTransfers::send(HttpRequest request, bool isUncached, Completion comple
     }
     if (!start()) {
         lock.unlock();
-        return answer(transfer->takeCompletion(), httpFailure(httpError(CURLE_FAILED_INIT, "cannot begin")));
+        const std::string& why = curl().problem;
+        return answer(transfer->takeCompletion(),
+                      httpFailure(httpError(CURLE_FAILED_INIT, why.empty() ? "cannot begin" : why)));
     }
     sent_.push_back(std::move(transfer));
-    curl_multi_wakeup(multi_);
+    curl().multiWakeup(multi_);
 }
 
 // Read here and not by the library, which could wait for ever on what is no regular file.
@@ -93,13 +94,12 @@ void HttpTransfers::sendFile(const Url& url, Completion completion) {
 
 bool HttpTransfers::start() {
     if (multi_) return true;
-    static const CURLcode isReady = curl_global_init(CURL_GLOBAL_DEFAULT);
-    if (isReady != CURLE_OK || !(multi_ = curl_multi_init())) return false;
-    curl_multi_setopt(multi_, CURLMOPT_MAXCONNECTS, 8L);
+    if (!curl().problem.empty() || !(multi_ = curl().multiInit())) return false;
+    curl().multiSetopt(multi_, CURLMOPT_MAXCONNECTS, 8L);
     try {
         thread_ = std::thread([this] { run(); });
     } catch (const std::system_error&) {
-        curl_multi_cleanup(std::exchange(multi_, nullptr));
+        curl().multiCleanup(std::exchange(multi_, nullptr));
         return false;
     }
     return true;
@@ -110,13 +110,14 @@ void HttpTransfers::stop() {
     {
         std::lock_guard lock(mutex_);
         if (std::exchange(isStopping_, true)) return;
-        if (multi_) curl_multi_wakeup(multi_);
+        if (!multi_) return;
+        curl().multiWakeup(multi_);
     }
-    if (thread_.joinable()) thread_.join();
+    thread_.join();
     sent_.clear();
-    for (auto& [transfer, owned] : running_) curl_multi_remove_handle(multi_, transfer->easy());
+    for (auto& [transfer, owned] : running_) curl().multiRemoveHandle(multi_, transfer->easy());
     running_.clear();
-    curl_multi_cleanup(multi_);
+    curl().multiCleanup(multi_);
 }
 
 void HttpTransfers::run() {
@@ -135,29 +136,29 @@ void HttpTransfers::run() {
         }
         for (auto& transfer : sent) begin(std::move(transfer));
         int running = 0;
-        curl_multi_perform(multi_, &running);
+        curl().multiPerform(multi_, &running);
         finishEnded();
         // Wakes for bytes, for the library's own timers, and for a new request: never otherwise.
-        curl_multi_poll(multi_, nullptr, 0, INT_MAX, nullptr);
+        curl().multiPoll(multi_, nullptr, 0, INT_MAX, nullptr);
     }
 }
 
 void HttpTransfers::begin(std::unique_ptr<HttpTransfer> transfer) {
     if (std::optional<HttpResponse> response = transfer->prepare())
         return answer(transfer->takeCompletion(), std::move(*response));
-    curl_multi_add_handle(multi_, transfer->easy());
+    curl().multiAddHandle(multi_, transfer->easy());
     HttpTransfer* key = transfer.get();
     running_.emplace(key, std::move(transfer));
 }
 
 void HttpTransfers::finishEnded() {
     int left = 0;
-    while (CURLMsg* message = curl_multi_info_read(multi_, &left)) {
+    while (CURLMsg* message = curl().multiInfoRead(multi_, &left)) {
         if (message->msg != CURLMSG_DONE) continue;
         const CURLcode result = message->data.result;
         HttpTransfer* ended = nullptr;
-        curl_easy_getinfo(message->easy_handle, CURLINFO_PRIVATE, &ended);
-        curl_multi_remove_handle(multi_, ended->easy());
+        curl().easyGetinfo(message->easy_handle, CURLINFO_PRIVATE, &ended);
+        curl().multiRemoveHandle(multi_, ended->easy());
         std::unique_ptr<HttpTransfer> transfer = std::move(running_.extract(ended).mapped());
 
         if (std::optional<HttpResponse> response = transfer->finish(result))

@@ -1,12 +1,12 @@
 #include "host/http_cache_rules.h"
 
-#include <curl/curl.h>
 #include <strings.h>
 
 #include <algorithm>
 #include <charconv>
 #include <ctime>
 
+#include "host/curl.h"
 #include "host/text.h"
 
 namespace vrx::host {
@@ -88,7 +88,7 @@ CacheControl parseCacheControl(std::string_view value) {
 }
 
 std::optional<Date> parseHttpDate(const std::string& text) {
-    const std::time_t time = curl_getdate(text.c_str(), nullptr);
+    const std::time_t time = curl().problem.empty() ? curl().getdate(text.c_str(), nullptr) : -1;
     if (time == -1) return std::nullopt;
     return platform::dateFromEpoch(static_cast<double>(time));
 }

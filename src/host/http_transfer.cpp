@@ -23,13 +23,13 @@ namespace {
 constexpr std::size_t headerBytes = 256 * 1024;
 
 struct UrlFreed {
-    void operator()(CURLU* url) const { curl_url_cleanup(url); }
-    void operator()(char* text) const { curl_free(text); }
+    void operator()(CURLU* url) const { curl().urlCleanup(url); }
+    void operator()(char* text) const { curl().free(text); }
 };
 
 std::string urlPart(CURLU* url, CURLUPart part) {
     char* text = nullptr;
-    if (curl_url_get(url, part, &text, 0) != CURLUE_OK) return "";
+    if (curl().urlGet(url, part, &text, 0) != CURLUE_OK) return "";
     return std::unique_ptr<char, UrlFreed>(text).get();
 }
 
@@ -68,7 +68,7 @@ HttpResponse httpSuccess(int status, HttpHeaders headers, Data body) {
 
 void HttpTransfer::Freed::operator()(curl_slist* list) const {
     for (curl_slist* line = list; line; line = line->next) explicit_bzero(line->data, strlen(line->data));
-    curl_slist_free_all(list);
+    curl().slistFreeAll(list);
 }
 
 HttpTransfer::HttpTransfer(HttpRequest request, bool isUncached, HttpSurroundings surroundings, Completion completion)
@@ -85,8 +85,8 @@ HttpTransfer::~HttpTransfer() {
 }
 
 MaybeError HttpTransfer::checkAddress() {
-    std::unique_ptr<CURLU, UrlFreed> url(curl_url());
-    if (curl_url_set(url.get(), CURLUPART_URL, address_.c_str(), CURLU_NON_SUPPORT_SCHEME) != CURLUE_OK)
+    std::unique_ptr<CURLU, UrlFreed> url(curl().url());
+    if (curl().urlSet(url.get(), CURLUPART_URL, address_.c_str(), CURLU_NON_SUPPORT_SCHEME) != CURLUE_OK)
         return httpError(CURLE_URL_MALFORMAT, "the URL is malformed");
     const std::string scheme = urlPart(url.get(), CURLUPART_SCHEME);
     isPlain_ = scheme == "http";
@@ -110,9 +110,9 @@ std::optional<HttpResponse> HttpTransfer::prepare() {
     if (redirects_ == 0) nameSourceApplication();
     if (std::optional<HttpResponse> stored = storedAnswer()) return stored;
 
-    if (!easy_) easy_.reset(curl_easy_init());
+    if (!easy_) easy_.reset(curl().easyInit());
     if (!easy_) return httpFailure(httpError(CURLE_OUT_OF_MEMORY, "out of memory"));
-    curl_easy_reset(easy_.get());  // keeps the connections
+    curl().easyReset(easy_.get());  // keeps the connections
     headers_.clear();
     headerSize_ = 0;
     body_.clear();
@@ -183,15 +183,15 @@ void HttpTransfer::addHeaderLine(const std::string& name, std::string_view value
         line.append(";");
     else
         line.append(": ").append(value);
-    headerList_.reset(curl_slist_append(headerList_.release(), line.c_str()));
+    headerList_.reset(curl().slistAppend(headerList_.release(), line.c_str()));
     wipe(line);
 }
 
 MaybeError HttpTransfer::setHeaders() {
     const HttpHeaders& own = ownHeaders();
     // What the library would add to a body of its own accord.
-    headerList_.reset(curl_slist_append(nullptr, "Expect:"));
-    if (!own.contains("Content-Type")) headerList_.reset(curl_slist_append(headerList_.release(), "Content-Type:"));
+    headerList_.reset(curl().slistAppend(nullptr, "Expect:"));
+    if (!own.contains("Content-Type")) headerList_.reset(curl().slistAppend(headerList_.release(), "Content-Type:"));
     if (isUncached_ && !own.contains("Cache-Control")) addHeaderLine("Cache-Control", "no-cache");
     for (const auto& [name, value] : own) {
         if (!isSafeHeader(name, value))
@@ -236,14 +236,14 @@ std::size_t HttpTransfer::onBody(char* bytes, std::size_t, std::size_t size, voi
 const char* HttpTransfer::redirect() const {
     const char* location = nullptr;
     if (request_.method == "GET" || request_.method == "HEAD")
-        curl_easy_getinfo(easy_.get(), CURLINFO_REDIRECT_URL, &location);
+        curl().easyGetinfo(easy_.get(), CURLINFO_REDIRECT_URL, &location);
     return location;
 }
 
 // A body of whose length HTTP/1 says nothing ends with the connection, which may have broken.
 bool HttpTransfer::isWhole() const {
     long version = 0;
-    curl_easy_getinfo(easy_.get(), CURLINFO_HTTP_VERSION, &version);
+    curl().easyGetinfo(easy_.get(), CURLINFO_HTTP_VERSION, &version);
     return version >= CURL_HTTP_VERSION_2_0 || headers_.contains("Content-Length") ||
            headers_.contains("Transfer-Encoding");
 }
@@ -251,9 +251,9 @@ bool HttpTransfer::isWhole() const {
 std::optional<HttpResponse> HttpTransfer::finish(CURLcode result) {
     if (tooLarge_) return httpFailure(httpError(CURLE_FILESIZE_EXCEEDED, tooLarge_));
     if (result != CURLE_OK)
-        return httpFailure(httpError(result, errorText_[0] ? errorText_.data() : curl_easy_strerror(result)));
+        return httpFailure(httpError(result, errorText_[0] ? errorText_.data() : curl().easyStrerror(result)));
     long status = 0;
-    curl_easy_getinfo(easy_.get(), CURLINFO_RESPONSE_CODE, &status);
+    curl().easyGetinfo(easy_.get(), CURLINFO_RESPONSE_CODE, &status);
     HttpCache& cache = surroundings_.cache;
 
     if (stored_ && status == 304) {

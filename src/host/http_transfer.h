@@ -2,14 +2,13 @@
 // once it is there. The request's headers, which may hold credentials, are wiped with it.
 #pragma once
 
-#include <curl/curl.h>
-
 #include <array>
 #include <chrono>
 #include <memory>
 #include <optional>
 #include <string>
 
+#include "host/curl.h"
 #include "host/device_profile.h"
 #include "host/http.h"
 #include "host/http_cache.h"
@@ -48,7 +47,7 @@ public:
 
 private:
     struct Freed {
-        void operator()(CURL* easy) const { curl_easy_cleanup(easy); }
+        void operator()(CURL* easy) const { curl().easyCleanup(easy); }
         void operator()(curl_slist* list) const;
     };
     using SteadyClock = std::chrono::steady_clock;
@@ -65,7 +64,7 @@ private:
     bool isWhole() const;
     template <class T>
     void set(CURLoption option, T value) {
-        curl_easy_setopt(easy_.get(), option, value);
+        curl().easySetopt(easy_.get(), option, value);
     }
 
     static std::size_t onHeader(char* bytes, std::size_t one, std::size_t size, void* self);

@@ -24,8 +24,10 @@ namespace {
 
 // How long records are gathered: one wake-up serves them all.
 constexpr std::chrono::milliseconds gatheringTime(5);
+// With so much pending they are written at once.
+constexpr std::size_t enoughPending = 16 * 1024;
 // With so much pending whoever logs waits for the thread: nothing is dropped, and memory stays bounded.
-constexpr std::size_t mostPending = 256 * 1024;
+constexpr std::size_t mostPending = 64 * 1024;
 
 sockaddr_un journalAddress() {
     return {AF_UNIX, "/run/systemd/journal/socket"};
@@ -112,8 +114,8 @@ std::string_view LogWriter::Batch::record(std::size_t index) const {
 
 void LogWriter::add(std::string_view record) {
     std::unique_lock lock(mutex_);
-    if (isFull()) changed_.notify_one();
-    hasRoom_.wait(lock, [this] { return !isFull(); });
+    hasRoom_.wait(lock, [this] { return pending_.bytes.size() <= mostPending; });
+    const bool wasEnough = isEnough();
     pending_.bytes += record;
     pending_.ends.push_back(pending_.bytes.size());
     if (!thread_.joinable()) {
@@ -123,13 +125,13 @@ void LogWriter::add(std::string_view record) {
         pthread_sigmask(SIG_SETMASK, &all, &before);
         thread_ = std::thread([this] { run(); });
         pthread_sigmask(SIG_SETMASK, &before, nullptr);
-    } else if (std::exchange(isIdle_, false)) {
+    } else if (std::exchange(isIdle_, false) || isEnough() != wasEnough) {
         changed_.notify_one();
     }
 }
 
-bool LogWriter::isFull() const {
-    return pending_.bytes.size() > mostPending;
+bool LogWriter::isEnough() const {
+    return pending_.bytes.size() > enoughPending;
 }
 
 void LogWriter::run() {
@@ -138,7 +140,7 @@ void LogWriter::run() {
     while (!isEnding_) {
         isIdle_ = pending_.ends.empty();
         if (isIdle_) changed_.wait(lock, [this] { return isEnding_ || !isIdle_; });
-        changed_.wait_for(lock, gatheringTime, [this] { return isEnding_ || isFull(); });
+        changed_.wait_for(lock, gatheringTime, [this] { return isEnding_ || isEnough(); });
         lock.unlock();
         flush();
         lock.lock();

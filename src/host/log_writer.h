@@ -41,7 +41,7 @@ private:
     class CrashGuard;
 
     void run();
-    bool isFull() const;  // under mutex_
+    bool isEnough() const;  // under mutex_
     void write(const Batch& batch) const;
     void writeToFile(std::string_view bytes) const;
     void sendToJournal(const Batch& batch) const;

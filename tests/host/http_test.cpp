@@ -300,6 +300,19 @@ TEST_F(HttpTest, TrustsTheProfilesAuthorityWhileTheProfileIsTrusted) {
     pclose(server);
 }
 
+TEST_F(HttpTest, NamesTheLibraryThatItCannotOpen) {
+    writeFile(folder / "libcurl.so.4", "no library");
+    setenv("LD_LIBRARY_PATH", folder.path().c_str(), 1);  // heeded by a process that begins
+    GTEST_FLAG_SET(death_test_style, "threadsafe");
+    auto tellError = [this] {
+        std::fputs(error(get("https://localhost")).c_str(), stderr);
+        std::filesystem::remove_all(folder.path());
+        _exit(0);
+    };
+    EXPECT_EXIT(tellError(), ::testing::ExitedWithCode(0), "libcurl.so.4");
+    unsetenv("LD_LIBRARY_PATH");
+}
+
 TEST_F(HttpTest, AnswersRequestsAtOnceAndLetsGoOfThoseUnderWayAtItsEnd) {
     LoopbackServer server([](const std::string& request) {
         return request.starts_with("GET /silent") ? std::string() : answer("200 OK", "x");

@@ -1,6 +1,7 @@
 #include "host/service/service_listener.h"
 
 #include <fcntl.h>
+#include <malloc.h>
 #include <sys/eventfd.h>
 #include <sys/socket.h>
 
@@ -71,6 +72,8 @@ private:
 
     void removeEnded() {
         std::erase_if(connections_, [](auto& connection) { return connection->hasEnded(); });
+        // What serving took goes back to the system: it may be long until the next client comes.
+        if (connections_.empty()) malloc_trim(0);
     }
 
     bool hasUnread() const {
