@@ -249,11 +249,15 @@ bool HttpTransfer::isWhole() const {
 }
 
 std::optional<HttpResponse> HttpTransfer::finish(CURLcode result) {
-    if (tooLarge_) return httpFailure(httpError(CURLE_FILESIZE_EXCEEDED, tooLarge_));
-    if (result != CURLE_OK)
-        return httpFailure(httpError(result, errorText_[0] ? errorText_.data() : curl().easyStrerror(result)));
     long status = 0;
     curl().easyGetinfo(easy_.get(), CURLINFO_RESPONSE_CODE, &status);
+    if (result != CURLE_OK) {
+        const char* text = errorText_[0] ? errorText_.data() : curl().easyStrerror(result);
+        HttpResponse response =
+            httpFailure(tooLarge_ ? httpError(CURLE_FILESIZE_EXCEEDED, tooLarge_) : httpError(result, text));
+        response.status = static_cast<int>(status);  // that of an answer which broke off
+        return response;
+    }
     HttpCache& cache = surroundings_.cache;
 
     if (stored_ && status == 304) {

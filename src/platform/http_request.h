@@ -29,7 +29,7 @@ struct HttpRequest {
 };
 
 struct HttpResponse {
-    int status = 0;  // 0 when there is no HTTP response
+    int status = 0;  // 0 when there is no HTTP response; that of one which broke off comes with the error
     HttpHeaders headers{};
     std::optional<Data> body{};  // absent when none arrived
     MaybeError error{};          // of the transport
