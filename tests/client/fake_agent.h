@@ -2,11 +2,16 @@
 // agent's main thread, and entitles callers as the test says.
 #pragma once
 
+#include <gtest/gtest.h>
+
 #include <atomic>
 #include <condition_variable>
 #include <functional>
 #include <mutex>
+#include <optional>
 #include <thread>
+#include <utility>
+#include <vector>
 
 #include "client/agent_connection.h"
 #include "host/main_loop.h"
@@ -225,6 +230,48 @@ private:
     std::atomic<int> ends_ = 0;
     host::ServiceListenerFactory* factory_ = nullptr;
     std::unique_ptr<platform::ServiceListener> listener_;
+};
+
+// A test with an agent of its own, which is served from the beginning.
+class WithFakeAgent : public testing::Test {
+protected:
+    // Serves anew, in another way than the usual one.
+    void serve(const host::ServiceLimits& limits, bool isEntitled = true) {
+        service.emplace(agent, limits, isEntitled);
+    }
+    client::ConnectionOptions options() const { return {.socketPath = service->socketPath()}; }
+
+    // The agent owes the replies to requests for an outreach from now on.
+    void holdOutreach() {
+        agent->onOutreach = [this](VRXAgentProtocol::Reply<bool> reply) { hold(std::move(reply)); };
+    }
+    void hold(VRXAgentProtocol::Reply<bool> reply) {
+        std::lock_guard lock(mutex_);
+        held_.push_back(std::move(reply));
+        isHeld_.notify_all();
+    }
+    std::size_t held() {
+        std::lock_guard lock(mutex_);
+        return held_.size();
+    }
+    void awaitHeld(std::size_t number = 1) {
+        std::unique_lock lock(mutex_);
+        isHeld_.wait(lock, [&] { return held_.size() >= number; });
+    }
+    void answerHeld() {
+        std::lock_guard lock(mutex_);
+        for (auto& reply : std::exchange(held_, {})) reply(true);
+    }
+
+    std::shared_ptr<FakeAgent> agent = std::make_shared<FakeAgent>();
+
+private:
+    std::mutex mutex_;
+    std::condition_variable isHeld_;
+    std::vector<VRXAgentProtocol::Reply<bool>> held_;
+
+protected:
+    std::optional<FakeService> service{std::in_place, agent};
 };
 
 }  // namespace vrx::test
