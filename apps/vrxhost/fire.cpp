@@ -23,7 +23,7 @@ platform::Result<std::optional<host::FiringAnswer>> requestFiring(Home& home, co
                                                                   platform::Duration limit) {
     const auto end = std::chrono::steady_clock::now() + handBackLimit;
     while (true) {
-        const auto answer = host::requestFiring(home.path(), home.database(), identifier, limit);
+        auto answer = host::requestFiring(home.path(), home.database(), identifier, limit);
         if (!answer || *answer != host::FiringAnswer::AlreadyRunning || std::chrono::steady_clock::now() > end)
             return answer;
         std::this_thread::sleep_for(std::chrono::milliseconds(50));

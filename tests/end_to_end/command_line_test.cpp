@@ -203,6 +203,7 @@ TEST_F(CommandLine, TellsThatItIsRefused) {
     if (getuid() == 0)
         other.insert(other.begin(), {"/usr/bin/setpriv", "--reuid", "65534", "--regid", "65534", "--clear-groups"});
     expectAll(other, vrxhostVerbs, 3, {place_ / "home", "as the agent's user"});
+    permissions(std::filesystem::path(place_ / "home"), perms::owner_all);
 }
 
 TEST_F(CommandLine, TellsThatNobodyAnswersInTime) {
