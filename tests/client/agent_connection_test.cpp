@@ -143,11 +143,11 @@ TEST_F(AgentConnectionTest, AsksAgainOnceWhenTheAgentEnded) {
 
     // The agent ends while it owes a reply: once, and then each time.
     std::atomic<bool> answersSecond = true;
-    agent->onOutreach = [&](VRXAgentProtocol::Reply<bool> reply) {
-        if (answersSecond && held() == 1) return reply(true);
+    agent->onOutreach = [&](Outreach reply) {
+        if (answersSecond && held == 1) return reply(true);
         hold(std::move(reply));
     };
-    auto restartAtRequest = [&](std::size_t number) {
+    auto restartAtRequest = [&](int number) {
         awaitHeld(number);
         service->restart();
     };
@@ -163,7 +163,7 @@ TEST_F(AgentConnectionTest, AsksAgainOnceWhenTheAgentEnded) {
     });
     EXPECT_EQ(connection.scheduleOutreachWithReply().failure().kind, Failure::Kind::NotReachable);
     twice.join();
-    EXPECT_EQ(held(), 3u) << "not a third time";
+    EXPECT_EQ(held, 3) << "not a third time";
     answerHeld();
 }
 

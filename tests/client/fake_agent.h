@@ -10,8 +10,6 @@
 #include <mutex>
 #include <optional>
 #include <thread>
-#include <utility>
-#include <vector>
 
 #include "client/agent_connection.h"
 #include "host/main_loop.h"
@@ -235,6 +233,8 @@ private:
 // A test with an agent of its own, which is served from the beginning.
 class WithFakeAgent : public testing::Test {
 protected:
+    using Outreach = VRXAgentProtocol::Reply<bool>;
+
     // Serves anew, in another way than the usual one.
     void serve(const host::ServiceLimits& limits, bool isEntitled = true) {
         service.emplace(agent, limits, isEntitled);
@@ -243,35 +243,27 @@ protected:
 
     // The agent owes the replies to requests for an outreach from now on.
     void holdOutreach() {
-        agent->onOutreach = [this](VRXAgentProtocol::Reply<bool> reply) { hold(std::move(reply)); };
+        agent->onOutreach = [this](Outreach reply) { hold(std::move(reply)); };
     }
-    void hold(VRXAgentProtocol::Reply<bool> reply) {
+    void hold(Outreach reply) {
         std::lock_guard lock(mutex_);
-        held_.push_back(std::move(reply));
-        isHeld_.notify_all();
+        replies_.push_back(std::move(reply));
+        ++held;
+        held.notify_all();
     }
-    std::size_t held() {
-        std::lock_guard lock(mutex_);
-        return held_.size();
-    }
-    void awaitHeld(std::size_t number = 1) {
-        std::unique_lock lock(mutex_);
-        isHeld_.wait(lock, [&] { return held_.size() >= number; });
+    void awaitHeld(int number = 1) const {
+        for (int count; (count = held) < number;) held.wait(count);
     }
     void answerHeld() {
         std::lock_guard lock(mutex_);
-        for (auto& reply : std::exchange(held_, {})) reply(true);
+        for (Outreach& reply : replies_) reply(true);
     }
 
     std::shared_ptr<FakeAgent> agent = std::make_shared<FakeAgent>();
-
-private:
+    std::atomic<int> held = 0;
     std::mutex mutex_;
-    std::condition_variable isHeld_;
-    std::vector<VRXAgentProtocol::Reply<bool>> held_;
-
-protected:
-    std::optional<FakeService> service{std::in_place, agent};
+    std::vector<Outreach> replies_;
+    std::optional<FakeService> service{std::in_place, agent};  // goes first
 };
 
 }  // namespace vrx::test

@@ -11,7 +11,11 @@ namespace {
 
 class HostileClients : public WithFakeAgent {
 protected:
-    RawClient rawClient() const { return RawClient(service->socketPath()); }
+    RawClient rawClient(const std::string& bytes = "") const {
+        RawClient client(service->socketPath());
+        client.write(bytes);
+        return client;
+    }
     void expectGoesOn() const {
         auto answer = client::AgentConnection(options()).defaultDevice();
         EXPECT_TRUE(answer) << answer.failure().text;
@@ -20,9 +24,8 @@ protected:
 
 TEST_F(HostileClients, AuthenticateAndCallInOneWrite) {
     for (int round = 0; round < 200; ++round) {
-        RawClient client = rawClient();
-        client.write(RawClient::authentication() + RawClient::call("defaultDevice", 1) +
-                     RawClient::call("readWebURLOverride", 2));
+        RawClient client = rawClient(RawClient::authentication() + RawClient::call("defaultDevice", 1) +
+                                     RawClient::call("readWebURLOverride", 2));
         ASSERT_TRUE(client.readUntil("Phone")) << round;
         ASSERT_TRUE(client.readUntil("https://web.example")) << round;
     }
@@ -35,20 +38,17 @@ TEST_F(HostileClients, WriteGarbage) {
     for (const std::string& bytes : {std::string("GET / HTTP/1.1\r\n\r\n"), std::string(100'000, '\0'),
                                      RawClient::authentication() + std::string(64, '\xff'),
                                      std::string(1, '\0') + "AUTH EXTERNAL 39393939\r\nBEGIN\r\n"}) {
-        RawClient client = rawClient();
-        client.write(bytes);
+        RawClient client = rawClient(bytes);
         shutdown(client.file(), SHUT_WR);
         EXPECT_TRUE(client.isClosedByAgent());
     }
     {
-        RawClient client = rawClient();
-        client.write(RawClient::authentication() + half);
+        RawClient client = rawClient(RawClient::authentication() + half);
         shutdown(client.file(), SHUT_WR);
         EXPECT_TRUE(client.isClosedByAgent());
     }
     {
-        RawClient client = rawClient();
-        client.write(RawClient::authentication());
+        RawClient client = rawClient(RawClient::authentication());
         ASSERT_TRUE(client.readUntil("OK "));
         client.write(RawClient::call("defaultDevice", 1));
         ASSERT_TRUE(client.readUntil("Phone"));
@@ -66,8 +66,7 @@ TEST_F(HostileClients, NeverSpeak) {
 
 TEST_F(HostileClients, SendAStringOfAMebibyte) {
     const std::string text(1 << 20, 'x');
-    RawClient client = rawClient();
-    client.write(RawClient::authentication() + RawClient::call("checkIsAvailableInStore", 1, &text));
+    RawClient client = rawClient(RawClient::authentication() + RawClient::call("checkIsAvailableInStore", 1, &text));
     EXPECT_TRUE(client.readUntil("InvalidArgs"));
     client.write(RawClient::call("defaultDevice", 2));
     EXPECT_TRUE(client.readUntil("Phone")) << "the connection stays";
@@ -75,8 +74,7 @@ TEST_F(HostileClients, SendAStringOfAMebibyte) {
 
 TEST_F(HostileClients, VanishWithARequestOpen) {
     holdOutreach();
-    RawClient client = rawClient();
-    client.write(RawClient::authentication() + RawClient::call("scheduleOutreachWithReply", 1));
+    RawClient client = rawClient(RawClient::authentication() + RawClient::call("scheduleOutreachWithReply", 1));
     awaitHeld();
     client.close();
     expectGoesOn();
@@ -86,12 +84,11 @@ TEST_F(HostileClients, VanishWithARequestOpen) {
 TEST_F(HostileClients, OpenTooManyRequests) {
     serve({.requestsPerConnection = 2});
     holdOutreach();
-    RawClient client = rawClient();
-    client.write(RawClient::authentication());
+    RawClient client = rawClient(RawClient::authentication());
     for (std::uint32_t serial = 1; serial <= 3; ++serial)
         client.write(RawClient::call("scheduleOutreachWithReply", serial));
     EXPECT_TRUE(client.readUntil("LimitsExceeded")) << "the third comes while two wait for their replies";
-    EXPECT_EQ(held(), 2u);
+    EXPECT_EQ(held, 2);
     answerHeld();
 }
 
@@ -116,8 +113,7 @@ TEST_F(HostileClients, ComeTwoHundredAtOnce) {
 // The programs of others must not use what this one was entitled to.
 TEST_F(HostileClients, HandTheirConnectionToAnotherProcess) {
     const std::string call = RawClient::call("readWebURLOverride", 2);
-    RawClient client = rawClient();
-    client.write(RawClient::authentication() + RawClient::call("defaultDevice", 1));
+    RawClient client = rawClient(RawClient::authentication() + RawClient::call("defaultDevice", 1));
     ASSERT_TRUE(client.readUntil("Phone"));
     if (const pid_t child = fork(); child == 0) {
         [[maybe_unused]] ssize_t size = write(client.file(), call.data(), call.size());
