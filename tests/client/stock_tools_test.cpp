@@ -53,6 +53,7 @@ Value deepestRecord() {
 
 TEST_F(StockTools, SeeTheDeepestRecordWhole) {
     agent->record = deepestRecord();
+    serve({});  // by threads that see it
     for (const std::string& command : {busctl(std::string(busctlCall) + "getAllDeviceInfosUsingPolicy tb 0 false"),
                                        gdbus("getAllDeviceInfosUsingPolicy", "0 false"),
                                        dbusSend("getAllDeviceInfosUsingPolicy", "uint64:0 boolean:false")}) {
