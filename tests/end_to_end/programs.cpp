@@ -153,7 +153,7 @@ Place::Place() {
     std::string pattern = std::filesystem::canonical(std::filesystem::temp_directory_path()) / "vrx-XXXXXX";
     folder_ = mkdtemp(pattern.data());
     std::filesystem::create_directory(*this / "app");
-    for (const char* name : {"vrxctl", "bundle.toml"})
+    for (const char* name : {"vrxctl", "vrxhost", "bundle.toml"})
         std::filesystem::copy(std::string(VRX_PROGRAMS "/") + name, *this / "app");
     std::filesystem::copy(VRX_SOURCE "/examples/device.toml", folder_);
     std::filesystem::copy(VRX_SOURCE "/examples/coverage", *this / "coverage");
@@ -197,7 +197,7 @@ Place::Outcome Place::vrxctl(const Arguments& arguments, const std::string& sock
 Place::Outcome Place::vrxhost(const Arguments& arguments, const std::string& home) const {
     Arguments all{"--home", *this / home};
     all.insert(all.end(), arguments.begin(), arguments.end());
-    return run(VRX_PROGRAMS "/vrxhost", all);
+    return run(*this / "app/vrxhost", all);
 }
 
 Place::Outcome Place::run(const std::string& program, const Arguments& arguments) const {

@@ -91,7 +91,7 @@ private:
     const int file_;
 };
 
-// A folder with an agent's home, profile, socket and coverage files, and an entitled copy of vrxctl.
+// A folder with an agent's home, profile, socket and coverage files, and entitled copies of the tools.
 class Place {
 public:
     Place();
