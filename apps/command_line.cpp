@@ -2,7 +2,10 @@
 
 #include <algorithm>
 #include <array>
+#include <cerrno>
+#include <cmath>
 #include <cstdio>
+#include <cstring>
 #include <filesystem>
 
 #include "codec/json.h"
@@ -56,8 +59,8 @@ bool hasFlag(int argc, const char* const* argv, const std::string& flag) {
 
 }  // namespace
 
-Outcome failed(ExitCode code, std::string problem, std::string advice) {
-    return {.code = code, .problem = std::move(problem), .advice = std::move(advice)};
+Outcome failed(ExitCode code, std::string problem, std::string advice, std::string kind) {
+    return {.code = code, .problem = std::move(problem), .advice = std::move(advice), .kind = std::move(kind)};
 }
 
 std::string printable(std::string_view text) {
@@ -87,6 +90,19 @@ std::string absolutePath(const std::string& path) {
     std::string result = std::filesystem::absolute(path).lexically_normal();
     while (result.size() > 1 && result.ends_with('/')) result.pop_back();
     return result;
+}
+
+void addTimeout(CLI::App& app, double& seconds, const std::string& help) {
+    const auto check = [](const std::string& text) {
+        double number = 0;
+        const bool isNumber = CLI::detail::lexical_cast(text, number);
+        return isNumber && std::isfinite(number) && number > 0 ? "" : "'" + text + "' is no number of seconds above 0";
+    };
+    app.add_option("--timeout", seconds, help)->type_name("SECONDS")->check(check, "")->capture_default_str();
+}
+
+std::string secondsText(double seconds) {
+    return Value(seconds).description() + " s";
 }
 
 std::string table(const std::vector<std::vector<std::string>>& rows) {
@@ -152,6 +168,9 @@ Outcome CommandLine::read(int argc, const char* const* argv) {
         return {.isShown = true};
     } catch (const CLI::ParseError& error) {
         return failed(ExitCode::Usage, error.what(), "See " + program_ + " --help.");
+    } catch (const std::exception& error) {
+        return failed(ExitCode::NoAnswer, error.what(),
+                      "Try again; what stays so is a fault of " + program_ + ", or of the machine.", "failed");
     }
 }
 
@@ -174,12 +193,13 @@ bool CommandLine::show(const Outcome& outcome) const {
 
 int CommandLine::report(const Outcome& outcome) const {
     const bool isWritten = outcome.isShown || show(outcome);
+    const int error = errno;
     const int code = static_cast<int>(outcome.code);
     if (!outcome.problem.empty())
         std::fprintf(stderr, "%s: %s\n", program_.c_str(), printable(outcome.problem).c_str());
     if (!outcome.advice.empty()) std::fprintf(stderr, "%s\n", printable(outcome.advice).c_str());
     if (isWritten) return code;
-    std::fprintf(stderr, "%s: standard output cannot be written\n", program_.c_str());
+    std::fprintf(stderr, "%s: standard output cannot be written: %s\n", program_.c_str(), std::strerror(error));
     return code ? code : static_cast<int>(ExitCode::NoAnswer);
 }
 

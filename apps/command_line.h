@@ -34,7 +34,7 @@ struct Outcome {
     bool isShown = false;  // by show(): nothing of it is left to print
 };
 
-Outcome failed(ExitCode code, std::string problem, std::string advice);
+Outcome failed(ExitCode code, std::string problem, std::string advice, std::string kind = "");
 
 // A value as people read it. Texts come from servers and files: what could steer a terminal, or break a line, is shown
 // as an escape.
@@ -43,6 +43,11 @@ std::string printableValue(const platform::Value& value);
 
 // A path from the command line, in the form that the host needs: absolute, without a slash at its end.
 std::string absolutePath(const std::string& path);
+
+// --timeout, in seconds above 0: how long the program waits for what the help says.
+void addTimeout(CLI::App& app, double& seconds, const std::string& help);
+
+std::string secondsText(double seconds);
 
 // Left-aligned columns, a line each row, the first row being the heading; cells are made printable.
 std::string table(const std::vector<std::vector<std::string>>& rows);

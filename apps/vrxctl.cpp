@@ -1,6 +1,5 @@
 // vrxctl: asks the agent, one verb for each of its operations.
 #include <charconv>
-#include <cmath>
 #include <map>
 
 #include "client/agent_connection.h"
@@ -112,6 +111,20 @@ std::string textOf(const VRXWarranty& record) {
 
 // The verbs.
 
+constexpr const char* seeLog = "The agent's log says why.";
+
+const char* adviceFor(Failure::Refusal refusal) {
+    switch (refusal) {
+        case Failure::Refusal::Entitlement:
+            return "A bundle.toml in the program's folder, or above, grants it, if nobody but root and the agent's "
+                   "user "
+                   "can write there; vrxhost doctor checks that for vrxctl.";
+        case Failure::Refusal::Limit: return "Try again once fewer programs ask at a time.";
+        case Failure::Refusal::Argument: break;
+    }
+    return "Correct the argument; vrxctl --help tells what is wanted.";
+}
+
 // What the agent answered, shown; or why it did not.
 template <class T, class Show>
 Outcome outcomeOf(const AgentConnection& agent, const Answer<T>& answer, Show show) {
@@ -121,24 +134,21 @@ Outcome outcomeOf(const AgentConnection& agent, const Answer<T>& answer, Show sh
         case Failure::Kind::NotReachable:
             return failed(ExitCode::NotReachable, failure.text,
                           "Is vrxagent running with the socket " + agent.socketPath() +
-                              "? Start it, or name its socket with --socket.");
-        case Failure::Kind::Refused:
-            return failed(ExitCode::Refused, failure.text,
-                          "The agent serves programs below a bundle.toml that grants its entitlement, a limited number "
-                          "of them at a time.");
+                              "? Start it: systemctl --user start vrxagent; or name its socket with --socket. vrxhost "
+                              "doctor tells what is wrong.");
+        case Failure::Kind::Refused: return failed(ExitCode::Refused, failure.text, adviceFor(failure.refusal));
         case Failure::Kind::TimedOut:
-            return failed(ExitCode::TimedOut, failure.text,
-                          "The agent may still do what was asked. Try again, or give it longer with --timeout.");
+            return failed(ExitCode::TimedOut, failure.text + ": " + secondsText(agent.timeLimit().count()),
+                          "The agent may still do what was asked. Try again, or give it longer with --timeout; its log "
+                          "says what it does.");
         case Failure::Kind::BadReply: break;
     }
-    Outcome outcome = failed(ExitCode::NoAnswer, failure.text, "Use a vrxctl of the agent's own release.");
-    outcome.kind = "bad-reply";
-    return outcome;
+    return failed(ExitCode::NoAnswer, failure.text, "Use a vrxctl of the agent's own release.", "bad-reply");
 }
 
 Outcome device(AgentConnection& agent) {
     return outcomeOf(agent, agent.defaultDevice(), [](const std::shared_ptr<VRXDevice>& device) {
-        if (!device) return failed(ExitCode::NoAnswer, "the agent knows no device", "");
+        if (!device) return failed(ExitCode::NoAnswer, "the agent knows no device", seeLog);
         return Outcome{.document = {{"device", documentOf(device.get())}},
                        .text = table({deviceHeading, rowOf(device.get())})};
     });
@@ -161,7 +171,7 @@ Outcome info(AgentConnection& agent, const std::optional<std::string>& serialNum
     const auto answer = serialNumber ? agent.getDeviceInfoForSerialNumber(*serialNumber, policy)
                                      : agent.getDefaultDeviceInfoUsingPolicy(policy);
     return outcomeOf(agent, answer, [&](const std::shared_ptr<VRXDeviceInfo>& info) {
-        if (!info) return failed(ExitCode::NoAnswer, "the agent gives nothing for this device", "");
+        if (!info) return failed(ExitCode::NoAnswer, "the agent gives nothing for this device", seeLog);
         Outcome outcome{.document = documentOf(*info), .text = table({deviceHeading, rowOf(info->device().get())})};
         if (const auto record = info->warranty()) {
             outcome.text += textOf(*record);
@@ -208,7 +218,7 @@ Outcome outreach(AgentConnection& agent) {
 // The agent says that it has done so, whatever became of it.
 Outcome dismiss(AgentConnection& agent, const std::string& serialNumber) {
     return outcomeOf(agent, agent.dismissFollowUpForSerialNumber(serialNumber), [&](bool isDone) {
-        if (!isDone) return failed(ExitCode::NoAnswer, "the agent did not dismiss the follow-up", "");
+        if (!isDone) return failed(ExitCode::NoAnswer, "the agent did not dismiss the follow-up", seeLog);
         return Outcome{.document = {{"serialNumber", serialNumber}}};
     });
 }
@@ -291,12 +301,6 @@ void addPolicy(CLI::App* verb, Options& options) {
         ->type_name("POLICY");
 }
 
-std::string checkTimeout(const std::string& text) {
-    double seconds = 0;
-    const bool isNumber = CLI::detail::lexical_cast(text, seconds);
-    return isNumber && std::isfinite(seconds) && seconds > 0 ? "" : "'" + text + "' is no number of seconds above 0";
-}
-
 int run(int argc, const char* const* argv) {
     CommandLine line("vrxctl", "Asks the coverage agent about this device and its paired watches.");
     Options options;
@@ -304,11 +308,7 @@ int run(int argc, const char* const* argv) {
         .add_option("--socket", options.socket, "The agent's socket")
         ->type_name("PATH")
         ->check([](const std::string& path) { return path.empty() ? "a path is needed" : ""; }, "");
-    line.app()
-        .add_option("--timeout", options.timeout, "How long to wait for an answer")
-        ->type_name("SECONDS")
-        ->check(checkTimeout, "")
-        ->capture_default_str();
+    addTimeout(line.app(), options.timeout, "How long to wait for an answer");
 
     auto asking = [&options](auto verb) {
         return [&options, verb] {

@@ -1,5 +1,6 @@
 // vrxhost activities: what the agent has scheduled, when it falls due, and how it went the last time.
 #include "agent_activities.h"
+#include "home.h"
 #include "host/home_lock.h"
 #include "platform/text.h"
 #include "verbs.h"
@@ -73,8 +74,7 @@ std::vector<std::string> rowOf(const AgentActivity& activity, bool isAgentRunnin
 
 Outcome activities(AgentView& view) {
     const Result<std::vector<AgentActivity>> list = agentActivities(view);
-    if (!list)
-        return failed(ExitCode::NotReachable, list.error().text, "vrxhost doctor tells what is wrong, and what to do.");
+    if (!list) return databaseFailure(list.error(), "not-read");
     const bool isAgentRunning = host::HomeLock::isInUse(view.home());
     Array documents;
     std::vector<std::vector<std::string>> rows{{"IDENTIFIER", "DUE", "CRITERIA", "TARGET DATE", "LAST RUN"}};

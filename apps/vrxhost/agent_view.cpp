@@ -1,6 +1,5 @@
 #include "agent_view.h"
 
-#include <filesystem>
 #include <utility>
 
 #include "home.h"
@@ -109,12 +108,10 @@ void AgentView::use(platform::Queues* queues, platform::HttpSessions* sessions) 
 CommandLine::Verb looking(const wire::LocationOverrides& places, std::shared_ptr<std::optional<std::string>> profile,
                           std::function<Outcome(AgentView&)> verb) {
     return [&places, profile = std::move(profile), verb = std::move(verb)] {
-        AgentView view(absolutePath(wire::findLocations(places).home.path), *profile);
-        const std::string database = Home::databasePath(view.home());
-        std::error_code error;
-        if (!std::filesystem::exists(database, error)) return notReachable("there is no agent's database " + database);
-        if (MaybeError problem = view.open())
-            return failed(ExitCode::NotReachable, problem->text, "vrxhost doctor tells what is wrong, and what to do.");
+        const std::string home = absolutePath(wire::findLocations(places).home.path);
+        if (std::optional<Outcome> missing = missingDatabase(home)) return *std::move(missing);
+        AgentView view(home, *profile);
+        if (MaybeError problem = view.open()) return databaseFailure(*problem, "not-read");
         return verb(view);
     };
 }

@@ -53,10 +53,9 @@ Outcome showCache(Home& home, const std::string& serialNumber, const std::string
     if (file.state == CacheFile::State::Missing)
         outcome = failed(ExitCode::NoAnswer, file.problem + " for this serial number",
                          "A download makes it: vrxctl info SERIAL --policy refresh.");
-    if (file.state == CacheFile::State::Damaged) {
-        outcome = failed(ExitCode::NoAnswer, file.problem, "The agent takes it for absent; a download replaces it.");
-        outcome.kind = "damaged";
-    }
+    if (file.state == CacheFile::State::Damaged)
+        outcome = failed(ExitCode::NoAnswer, file.problem, "The agent takes it for absent; a download replaces it.",
+                         "damaged");
     outcome.document = {{"path", path},
                         {"lastUpdated", stored},
                         {"locale", locale},
@@ -87,10 +86,10 @@ void addCacheVerb(CommandLine& line, const wire::LocationOverrides& places) {
         std::optional<std::string> profile;
     };
     auto options = std::make_shared<Options>();
-    CLI::App* verb =
-        line.add("cache", "Shows what is cached for a serial number", inHome(places, [options](Home& home) {
-                     return showCache(home, options->serialNumber, agentProfile(home.database(), options->profile));
-                 }));
+    CLI::App* verb = line.add(
+        "cache", "Shows what is cached for a serial number", inHome(places, Access::Look, [options](Home& home) {
+            return showCache(home, options->serialNumber, agentProfile(home.database(), options->profile));
+        }));
     verb->add_option("SERIAL", options->serialNumber, "The serial number")->required();
     verb->add_option("--device", options->profile, "The agent's device profile, for the language")->type_name("PATH");
 }

@@ -1,6 +1,7 @@
 // vrxhost defaults: the agent's settings.
 #include "codec/iso_date.h"
 #include "codec/json.h"
+#include "codec/property_list.h"
 #include "home.h"
 #include "verbs.h"
 
@@ -53,13 +54,10 @@ Outcome readDefault(Home& home, const std::string& key) {
             .text = printableValue(value) + (isRegistered ? std::string("  (") + registeredMark + ")\n" : "\n")};
 }
 
-// The store only logs that it could not write.
 Outcome storeDefault(Home& home, const std::string& key, const Value& value) {
-    home.defaults().set(key, value);
-    if (home.stored().get(key) == value) return {.document = {{"key", key}, {"value", value}}};
-    Outcome outcome = failed(ExitCode::NoAnswer, "the database could not be written", "The line above says why.");
-    outcome.kind = "not-written";
-    return outcome;
+    if (const platform::MaybeError error = home.defaults().write(key, value))
+        return databaseFailure(*error, "not-written");
+    return {.document = {{"key", key}, {"value", value}}};
 }
 
 Outcome deleteDefault(Home& home, const std::string& key) {
@@ -94,6 +92,8 @@ void addValue(CLI::App* verb, Setting& setting) {
             throw CLI::ValidationError("VALUE",
                                        "no JSON value, " + value.error().text + "; a text is given with --string");
         if (value->isNull()) throw CLI::ValidationError("VALUE", "null cannot be stored; use defaults delete");
+        if (const auto bytes = codec::serializePropertyList(*value, platform::PropertyListFormat::Binary); !bytes)
+            throw CLI::ValidationError("VALUE", "cannot be stored: " + bytes.error().text);
         setting.value = *value;
     };
     group->add_option_function<std::string>("VALUE", json, "A JSON value")->type_name("JSON");
@@ -115,17 +115,21 @@ void addValue(CLI::App* verb, Setting& setting) {
 void addDefaultsVerbs(CommandLine& line, const wire::LocationOverrides& places) {
     auto setting = std::make_shared<Setting>();
     CLI::App* group = line.addGroup("defaults", "The agent's settings");
-    line.add("list", "Lists all settings, stored and registered", inHome(places, listDefaults), group);
+    line.add("list", "Lists all settings, stored and registered", inHome(places, Access::Look, listDefaults), group);
     addKey(line.add("read", "Shows a setting",
-                    inHome(places, [setting](Home& home) { return readDefault(home, setting->key); }), group),
+                    inHome(places, Access::Look, [setting](Home& home) { return readDefault(home, setting->key); }),
+                    group),
            *setting);
-    CLI::App* write = line.add(
-        "write", "Stores a setting",
-        inHome(places, [setting](Home& home) { return storeDefault(home, setting->key, setting->value); }), group);
+    CLI::App* write =
+        line.add("write", "Stores a setting",
+                 inHome(places, Access::Change,
+                        [setting](Home& home) { return storeDefault(home, setting->key, setting->value); }),
+                 group);
     addKey(write, *setting);
     addValue(write, *setting);
     addKey(line.add("delete", "Removes a stored setting; a registered value holds again",
-                    inHome(places, [setting](Home& home) { return deleteDefault(home, setting->key); }), group),
+                    inHome(places, Access::Change, [setting](Home& home) { return deleteDefault(home, setting->key); }),
+                    group),
            *setting);
 }
 

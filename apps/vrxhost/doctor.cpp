@@ -6,13 +6,13 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <cmath>
 #include <cstring>
 #include <filesystem>
 #include <fstream>
 
 #include "agent_activities.h"
 #include "agent_view.h"
+#include "home.h"
 #include "host/home_lock.h"
 #include "host/network_routes.h"
 #include "host/service/bundle_lookup.h"
@@ -147,11 +147,11 @@ Check Examination::database() {
     std::error_code ignored;
     if (!std::filesystem::exists(view_.home() + "/host.db", ignored))
         return problem("there is none", "Start an agent, which makes it.", ExitCode::NotReachable);
-    return problem(
-        error->text,
-        "An agent takes over one of an older release, and sets a damaged one aside and begins afresh; one of "
-        "a newer release it leaves alone: use that release.",
-        ExitCode::NotReachable);
+    if (const Outcome failure = databaseFailure(*error, ""); failure.code == ExitCode::TimedOut)
+        return problem(failure.problem, failure.advice, failure.code);
+    return problem(error->text,
+                   "An agent takes over one of an older release, and sets a damaged one aside and begins afresh; one "
+                   "of a newer release it leaves alone: use that release.");
 }
 
 Check Examination::profile() const {
@@ -289,7 +289,7 @@ Check Examination::coverageServer(const Reachability& servers) const {
 Check Examination::activities() {
     if (!isDatabaseReadable_) return skipped("needs the database");
     const Result<std::vector<AgentActivity>> all = agentActivities(view_);
-    if (!all) return problem(all.error().text, "");
+    if (!all) return problem(all.error().text, "Try again; an agent examines the database at its next start.");
     std::string text;
     for (const AgentActivity& activity : *all)
         if (const auto next = activity.nextRun())
@@ -324,12 +324,6 @@ Outcome report(const std::vector<Check>& checks) {
     return outcome;
 }
 
-std::string checkSeconds(const std::string& text) {
-    double seconds = 0;
-    const bool isNumber = CLI::detail::lexical_cast(text, seconds);
-    return isNumber && std::isfinite(seconds) && seconds > 0 ? "" : "'" + text + "' is no number of seconds above 0";
-}
-
 }  // namespace
 
 void addDoctorVerb(CommandLine& line, const wire::LocationOverrides& places) {
@@ -346,10 +340,7 @@ void addDoctorVerb(CommandLine& line, const wire::LocationOverrides& places) {
     });
     addProfileOption(verb, options->profile);
     verb->add_option("--socket", options->socket, "The agent's socket")->type_name("PATH");
-    verb->add_option("--timeout", options->limit, "How long to wait for the servers")
-        ->type_name("SECONDS")
-        ->check(checkSeconds, "")
-        ->capture_default_str();
+    addTimeout(*verb, options->limit, "How long to wait for the servers");
 }
 
 }  // namespace vrx::apps

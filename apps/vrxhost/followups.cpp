@@ -32,12 +32,6 @@ using platform::Value;
 
 namespace {
 
-Outcome failedWith(const char* kind, const platform::Error& error) {
-    Outcome outcome = failed(ExitCode::NoAnswer, error.text, "");
-    outcome.kind = kind;
-    return outcome;
-}
-
 std::optional<std::string> deviceName(const host::DeviceProfile& profile, const std::string& serialNumber) {
     if (profile.string("SerialNumber") == serialNumber) return profile.string("UserAssignedDeviceName");
     for (const platform::PairedWatch& watch : profile.watches())
@@ -146,7 +140,7 @@ struct Listing {
 
 Listing list(Home& home, const host::DeviceProfile& profile) {
     const auto items = home.followUps().makeController(followUpClientIdentifier())->pendingFollowUpItems();
-    if (!items) return {failedWith("not-read", items.error())};
+    if (!items) return {databaseFailure(items.error(), "not-read")};
     Duration day(home.defaults().number(platform::settings::oneDayInterval));
     if (!(day.count() > 0)) day = std::chrono::days(1);
     const Date now = host::Clock(profile).now();
@@ -183,7 +177,9 @@ Outcome watch(const CommandLine& line, Home& home, const host::DeviceProfile& pr
     }
     return last;
 } catch (const std::system_error& error) {
-    return failedWith("not-watched", {"system", error.code().value(), error.what()});
+    return failed(ExitCode::NoAnswer, error.what(),
+                  "Is the limit of files or of inotify instances reached? End what watches files, and try again.",
+                  "not-watched");
 }
 
 Result<std::string> readAll(const std::string& file) {
@@ -232,11 +228,11 @@ Outcome post(Home& home, const std::string& file) {
     if (!item) return failed(ExitCode::Usage, item.error().text, advice);
     const auto controller = home.followUps().makeController(followUpClientIdentifier());
     const auto before = controller->pendingFollowUpItems();
-    if (!before) return failedWith("not-read", before.error());
+    if (!before) return databaseFailure(before.error(), "not-read");
     const bool isReplaced = isPending(*before, item->uniqueIdentifier);
     if (const MaybeError error = controller->postFollowUpItem(*item)) {
         if (error->domain == "property list") return failed(ExitCode::Usage, file + ": " + error->text, advice);
-        return failedWith("not-written", *error);
+        return databaseFailure(*error, "not-written");
     }
     return {.document = {{"uniqueIdentifier", item->uniqueIdentifier}, {"replaced", isReplaced}},
             .text = (isReplaced ? "Replaced " : "Posted ") + printable(item->uniqueIdentifier) + ".\n"};
@@ -245,9 +241,9 @@ Outcome post(Home& home, const std::string& file) {
 Outcome clear(Home& home, const std::vector<std::string>& identifiers) {
     const auto controller = home.followUps().makeController(followUpClientIdentifier());
     const auto before = controller->pendingFollowUpItems();
-    if (!before) return failedWith("not-read", before.error());
+    if (!before) return databaseFailure(before.error(), "not-read");
     if (const MaybeError error = controller->clearPendingFollowUpItems(identifiers))
-        return failedWith("not-written", *error);
+        return databaseFailure(*error, "not-written");
     Array cleared, notPending;
     Outcome outcome;
     for (const std::string& identifier : identifiers) {
@@ -269,24 +265,29 @@ void addFollowUpVerbs(CommandLine& line, const wire::LocationOverrides& places) 
         std::vector<std::string> identifiers;
     };
     auto options = std::make_shared<Options>();
-    CLI::App* listing =
-        line.add("followups", "Shows what the settings app would", inHome(places, [options, &line](Home& home) {
-                     const host::DeviceProfile profile(agentProfile(home.database(), options->profile));
-                     return options->isWatch ? watch(line, home, profile) : list(home, profile).outcome;
-                 }));
+    const auto showing = [options, &line](Home& home) {
+        const host::DeviceProfile profile(agentProfile(home.database(), options->profile));
+        return options->isWatch ? watch(line, home, profile) : list(home, profile).outcome;
+    };
+    // To watch is to wait for those who write, as one of them.
+    const CommandLine::Verb look = inHome(places, Access::Look, showing),
+                            stay = inHome(places, Access::Change, showing);
+    CLI::App* listing = line.add("followups", "Shows what the settings app would",
+                                 [options, look, stay] { return options->isWatch ? stay() : look(); });
     CLI::Option* watch = listing->add_flag("--watch", options->isWatch, "Show it again after each change");
     watch->disable_flag_override();
     CLI::Option* device =
         listing->add_option("--device", options->profile, "The agent's device profile, for names and language");
     device->type_name("PATH");
 
-    CLI::App* post =
-        line.add("post", "Posts an item, or replaces the pending one of the same identifier",
-                 inHome(places, [options](Home& home) { return apps::post(home, options->file); }), listing);
+    CLI::App* post = line.add(
+        "post", "Posts an item, or replaces the pending one of the same identifier",
+        inHome(places, Access::Change, [options](Home& home) { return apps::post(home, options->file); }), listing);
     post->add_option("FILE", options->file, "The item as JSON; - for standard input")->required();
-    CLI::App* clear =
-        line.add("clear", "Clears items",
-                 inHome(places, [options](Home& home) { return apps::clear(home, options->identifiers); }), listing);
+    CLI::App* clear = line.add(
+        "clear", "Clears items",
+        inHome(places, Access::Change, [options](Home& home) { return apps::clear(home, options->identifiers); }),
+        listing);
     clear->add_option("ID", options->identifiers, "Unique identifiers of items")->required();
     for (CLI::App* change : {post, clear}) change->excludes(watch)->excludes(device);
 }

@@ -1,13 +1,20 @@
 #include "home.h"
 
-#include <filesystem>
+#include <sys/stat.h>
+
+#include <cerrno>
+#include <cstring>
 
 #include "host/host_facts.h"
 #include "service/register_defaults.h"
 
 namespace vrx::apps {
 
-Home::Home(const std::string& path) : path_(path), files_(path), database_(databasePath(path)) {
+Home::Home(const std::string& path, Access access)
+    : path_(path),
+      files_(path),
+      database_(access == Access::Look ? host::Database::toLookAt(databasePath(path))
+                                       : host::Database(databasePath(path))) {
     vrx_registerDefaults(defaults_);
 }
 
@@ -16,20 +23,37 @@ Outcome notReachable(std::string problem) {
                   "An agent makes it at its first start; name the agent's home with --home.");
 }
 
+std::optional<Outcome> missingDatabase(const std::string& home) {
+    const std::string database = Home::databasePath(home);
+    struct stat status;
+    if (stat(database.c_str(), &status) == 0) return std::nullopt;
+    const int error = errno;
+    if (error == ENOENT) return notReachable("there is no agent's database " + database);
+    return failed(ExitCode::NotReachable,
+                  "cannot get at the agent's database " + database + ": " + std::strerror(error),
+                  error == EACCES ? "Run vrxhost as the agent's user, or name another home with --home."
+                                  : "Name the agent's home with --home.");
+}
+
+Outcome databaseFailure(const platform::Error& error, const char* kind) {
+    if ((error.code & 0xff) == SQLITE_BUSY)
+        return failed(ExitCode::TimedOut, error.text,
+                      "Another process holds it: fuser tells which have the file open. Try again once it is done.");
+    return failed(ExitCode::NoAnswer, error.text, "vrxhost doctor tells what is wrong, and what to do.", kind);
+}
+
 std::string agentProfile(host::Database& database, const std::optional<std::string>& named) {
     if (named) return *named;
     const std::optional<std::string> told = host::hostFact(database, host::facts::profile);
     return told ? *told : wire::findLocations().profile.path;
 }
 
-CommandLine::Verb inHome(const wire::LocationOverrides& places, std::function<Outcome(Home&)> verb) {
-    return [&places, verb = std::move(verb)] {
+CommandLine::Verb inHome(const wire::LocationOverrides& places, Access access, std::function<Outcome(Home&)> verb) {
+    return [&places, access, verb = std::move(verb)] {
         const std::string path = absolutePath(wire::findLocations(places).home.path);
-        const std::string database = Home::databasePath(path);
-        std::error_code error;
-        if (!std::filesystem::exists(database, error)) return notReachable("there is no agent's database " + database);
-        Home home(path);
-        if (platform::MaybeError problem = home.open()) return notReachable(problem->text);
+        if (std::optional<Outcome> missing = missingDatabase(path)) return *std::move(missing);
+        Home home(path, access);
+        if (platform::MaybeError problem = home.open()) return databaseFailure(*problem, "not-read");
         return verb(home);
     };
 }

@@ -2,6 +2,7 @@
 #pragma once
 
 #include <functional>
+#include <optional>
 #include <string>
 
 #include "codec/codec.h"
@@ -16,17 +17,20 @@
 
 namespace vrx::apps {
 
+// To look is to change no file: a database that is damaged, or of an older release, is left to the agent.
+enum class Access { Look, Change };
+
 // What is in it, and the platform that the agent's own classes read it through.
 class Home {
 public:
-    explicit Home(const std::string& path);
+    Home(const std::string& path, Access access);
 
     static std::string databasePath(const std::string& home) { return home + "/host.db"; }
 
     platform::MaybeError open() { return database_.open(); }
     const std::string& path() const { return path_; }
     host::Database& database() { return database_; }
-    platform::DefaultsStore& defaults() { return defaults_; }
+    host::DefaultsStore& defaults() { return defaults_; }
     // Without the registered values.
     const platform::DefaultsStore& stored() const { return stored_; }
     const platform::Files& files() const { return files_; }
@@ -52,10 +56,15 @@ private:
 
 Outcome notReachable(std::string problem);
 
+// When the home has no database that this user can get at.
+std::optional<Outcome> missingDatabase(const std::string& home);
+// When there is one that cannot be used; the kind is the one of an error other than a lock that is held for long.
+Outcome databaseFailure(const platform::Error& error, const char* kind);
+
 // The device profile: the one that is named, else the one that the agent has told of, else where an agent would look.
 std::string agentProfile(host::Database& database, const std::optional<std::string>& named);
 
 // A verb that is run within the home, which must be there. The places are read when it runs.
-CommandLine::Verb inHome(const wire::LocationOverrides& places, std::function<Outcome(Home&)> verb);
+CommandLine::Verb inHome(const wire::LocationOverrides& places, Access access, std::function<Outcome(Home&)> verb);
 
 }  // namespace vrx::apps

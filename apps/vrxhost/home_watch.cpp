@@ -66,8 +66,7 @@ HomeWatch::Wake HomeWatch::wait(std::optional<platform::Date> latest) {
     drain(timer_);
     std::error_code ignored;
     if (!std::filesystem::exists(Home::databasePath(home_.path()), ignored)) return Wake::Gone;
-    letWritersFinish();
-    return Wake::Look;
+    return letWritersFinish();
 }
 
 // On the wall clock, also when it is set: that ends the wait.
@@ -82,11 +81,13 @@ void HomeWatch::arm(std::optional<platform::Date> latest) const {
 }
 
 // A writer changes the files first and then, unseen, makes the change hold: it is waited for by its lock.
-void HomeWatch::letWritersFinish() {
-    platform::MaybeError error;
-    do {
-        error = home_.database().write([](host::Connection&) {});
-    } while (error && (error->code & 0xff) == SQLITE_BUSY);
+HomeWatch::Wake HomeWatch::letWritersFinish() {
+    pollfd ended{signals_, POLLIN, 0};
+    while (true) {
+        const platform::MaybeError error = home_.database().write([](host::Connection&) {});
+        if (!error || (error->code & 0xff) != SQLITE_BUSY) return Wake::Look;
+        if (poll(&ended, 1, 0) > 0) return Wake::End;
+    }
 }
 
 }  // namespace vrx::apps

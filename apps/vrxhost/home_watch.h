@@ -27,7 +27,7 @@ public:
 
 private:
     void arm(std::optional<platform::Date> latest) const;
-    void letWritersFinish();
+    Wake letWritersFinish();
 
     Home& home_;
     const int changes_;

@@ -17,7 +17,7 @@ Reachability askServers(AgentView& view, platform::Duration limit) {
     host::MainLoop loop;
     host::Queues queues(loop);
     host::HttpSessions sessions(queues.workers(platform::Priority::UserInitiated), platform.clock(), view.profile(),
-                                {.timeout = limit});
+                                {.timeout = limit + std::chrono::hours(1)});  // this function's own limit ends it
     view.use(&queues, &sessions);
     view.errors().take();
 

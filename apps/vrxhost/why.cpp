@@ -11,6 +11,7 @@
 #include "follow_up_explanation.h"
 #include "followup/follow_up_content.h"
 #include "followup/serial_number_hashes.h"
+#include "home.h"
 #include "host/home_lock.h"
 #include "host/machine_conditions.h"
 #include "platform/defaults_store.h"
@@ -267,9 +268,7 @@ Outcome report(const std::string& serialNumber, const Findings& findings, const 
 Outcome why(AgentView& view, const std::string& serialNumber) {
     const Result<std::vector<AgentActivity>> all = agentActivities(view);
     const Result<std::set<std::string>> pending = pendingSerialNumbers();
-    if (!all || !pending)
-        return failed(ExitCode::NotReachable, (all ? pending.error() : all.error()).text,
-                      "vrxhost doctor tells what is wrong, and what to do.");
+    if (!all || !pending) return databaseFailure(all ? pending.error() : all.error(), "not-read");
     const Activities activities{activityNamed(*all, "outreach"), activityNamed(*all, "followuppost"),
                                 activityNamed(*all, "followuprefresh")};
     return report(serialNumber, examine(view, serialNumber, *pending, activities), activities,

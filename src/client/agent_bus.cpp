@@ -45,12 +45,15 @@ struct BusError {
 };
 
 CallResult failed(int result, const BusError& error) {
-    if (result == -ETIMEDOUT) return Failure{Failure::Kind::TimedOut, "the agent has not replied in time"};
+    using enum Failure::Kind;
+    using enum Failure::Refusal;
+    if (result == -ETIMEDOUT) return Failure{TimedOut, "the agent has not replied in time"};
     if (meansEnded(-result)) return ConnectionEnded{"the connection ended before the reply"};
     if (error.is(wire::noReply)) return ConnectionEnded{error.text()};
-    if (error.is(wire::accessDenied) || error.is(wire::limitsExceeded) || error.is(wire::invalidArguments))
-        return Failure{Failure::Kind::Refused, error.text()};
-    return Failure{Failure::Kind::BadReply, error.text()};
+    if (error.is(wire::accessDenied)) return Failure{Refused, error.text(), Entitlement};
+    if (error.is(wire::limitsExceeded)) return Failure{Refused, error.text(), Limit};
+    if (error.is(wire::invalidArguments)) return Failure{Refused, error.text(), Argument};
+    return Failure{BadReply, error.text()};
 }
 
 }  // namespace
@@ -68,6 +71,7 @@ MaybeError AgentBus::open(const std::string& path, Deadline deadline) {
     const timeval limit{static_cast<time_t>(wait / 1'000'000), static_cast<suseconds_t>(wait % 1'000'000)};
     setsockopt(file, SOL_SOCKET, SO_SNDTIMEO, &limit, sizeof limit);
     int r = connect(file, reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0 ? 0 : -errno;
+    if (r == -EAGAIN) r = -ETIMEDOUT;  // the limit's own error
     if (r >= 0) r = sd_bus_new(&bus_);
     if (r >= 0) r = sd_bus_set_fd(bus_, file, file);
     if (r < 0) {
@@ -99,7 +103,8 @@ CallResult AgentBus::call(const wire::Operation& operation, const CallArguments&
     if (r >= 0) r = appendArguments(message, operation.signature, arguments);
     if (r == -EINVAL)
         return Failure{Failure::Kind::Refused,
-                       "an argument holds what the bus does not carry: text in UTF-8 without NUL it does"};
+                       "an argument holds what the bus does not carry: text in UTF-8 without NUL it does",
+                       Failure::Refusal::Argument};
     if (r < 0) return failed(r, error);
 
     r = sd_bus_call(bus_, message, microsecondsUntil(deadline), &error.error, &message);

@@ -37,7 +37,8 @@ public:
     AgentBus(const AgentBus&) = delete;
     AgentBus& operator=(const AgentBus&) = delete;
 
-    // Opens the socket: an error's text is for people. What follows may be interrupted.
+    // Opens the socket: an error's text is for people, and its code ETIMEDOUT when no place came free in the agent's
+    // queue. What follows may be interrupted.
     platform::MaybeError open(const std::string& socketPath, Deadline deadline);
 
     // The archived root of the operation's reply. After anything else the connection is of no more use.

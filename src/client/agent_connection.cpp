@@ -104,6 +104,7 @@ public:
     }
 
     const std::string& socketPath() const { return pool_.socketPath(); }
+    platform::Duration timeLimit() const { return timeLimit_; }
 
 private:
     Deadline deadline() const {
@@ -125,6 +126,10 @@ AgentConnection::~AgentConnection() = default;
 
 const std::string& AgentConnection::socketPath() const {
     return implementation_->socketPath();
+}
+
+platform::Duration AgentConnection::timeLimit() const {
+    return implementation_->timeLimit();
 }
 
 Answer<bool> AgentConnection::scheduleOutreachWithReply() {

@@ -43,12 +43,18 @@ namespace vrx::client {
 struct Failure {
     enum class Kind {
         NotReachable,  // nobody answers at the socket, or the connection ended twice
-        Refused,       // the caller is not entitled, too many requests are open, or an argument is not admitted
+        Refused,       // see Refusal
         TimedOut,      // no reply within the time limit; the agent may still do what was asked
         BadReply,      // the answer is not what the operation gives: agent and library do not fit each other
     };
+    enum class Refusal {
+        Entitlement,  // the caller does not hold it
+        Limit,        // too much at a time: connections, requests, or the size of the reply
+        Argument,     // one is too long, or no text
+    };
     Kind kind;
-    std::string text;  // for people; of a refusal, the agent's own words
+    std::string text;                        // for people; of a refusal, the agent's own words
+    Refusal refusal = Refusal::Entitlement;  // when it is one
 };
 
 // What the agent answered, or why it did not. The answer itself may be nothing, such as a null pointer. value() and
@@ -115,6 +121,7 @@ public:
     void dismissFollowUpForSerialNumber(std::string serialNumber, Reply<bool> completion) override;
 
     const std::string& socketPath() const;
+    platform::Duration timeLimit() const;
 
 private:
     class Implementation;

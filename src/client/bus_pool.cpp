@@ -1,5 +1,7 @@
 #include "client/bus_pool.h"
 
+#include <cerrno>
+
 namespace vrx::client {
 
 using platform::Value;
@@ -32,7 +34,8 @@ CallResult BusPool::callOnce(const wire::Operation& operation, const CallArgumen
     } else {
         bus = std::make_unique<AgentBus>();
         if (platform::MaybeError error = bus->open(socketPath_, deadline))
-            result = Failure{Failure::Kind::NotReachable, error->text};
+            result =
+                Failure{error->code == ETIMEDOUT ? Failure::Kind::TimedOut : Failure::Kind::NotReachable, error->text};
         else if (beginUse(*bus))
             result = bus->call(operation, arguments, deadline);
     }

@@ -58,15 +58,15 @@ void dropRequests(Connection& connection) {
     connection.execute("DELETE FROM activity_requests WHERE true");
 }
 
-std::optional<FiringAnswer> requestFiring(const std::string& home, Database& database, std::string_view identifier,
-                                          platform::Duration limit) {
-    if (!HomeLock::isInUse(home)) return std::nullopt;
+platform::Result<std::optional<FiringAnswer>> requestFiring(const std::string& home, Database& database,
+                                                            std::string_view identifier, platform::Duration limit) {
+    if (!HomeLock::isInUse(home)) return std::optional<FiringAnswer>();
     std::int64_t number = 0;
     const MaybeError error = database.write([&](Connection& connection) {
         connection.statement("INSERT INTO activity_requests (identifier) VALUES (?)").bind(0, identifier).step();
         number = connection.integer("SELECT last_insert_rowid()");
     });
-    if (error) return FiringAnswer::NotStored;
+    if (error) return *error;
     touch(home + "/" + requestFileName);
 
     const auto end = std::chrono::steady_clock::now() + limit;

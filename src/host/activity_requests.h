@@ -9,6 +9,7 @@
 
 #include "host/database.h"
 #include "platform/date.h"
+#include "platform/error.h"
 
 namespace vrx::host {
 
@@ -16,7 +17,7 @@ enum class FiringAnswer {
     Fired = 1,
     AlreadyRunning = 2,  // its earlier run has not handed back its result
     Unknown = 3,         // nobody has a handler for it
-    NotStored = 4,       // the database cannot be written
+    NotStored = 4,       // the agent cannot write the database
 };
 
 inline constexpr const char* requestFileName = "fire";  // in the home
@@ -33,8 +34,8 @@ void answerRequest(Connection& connection, std::int64_t number, FiringAnswer ans
 void dropRequests(Connection& connection);
 
 // The tool's side. Waits for the answer; nothing when no agent has the home, or when none has answered in time, and
-// then the request is taken back.
-std::optional<FiringAnswer> requestFiring(const std::string& home, Database& database, std::string_view identifier,
-                                          platform::Duration limit);
+// then the request is taken back. An error when the database cannot be written.
+platform::Result<std::optional<FiringAnswer>> requestFiring(const std::string& home, Database& database,
+                                                            std::string_view identifier, platform::Duration limit);
 
 }  // namespace vrx::host

@@ -8,6 +8,7 @@
 #include <cerrno>
 #include <cstring>
 #include <ctime>
+#include <thread>
 
 #include "host/files.h"
 #include "platform/log.h"
@@ -78,9 +79,17 @@ struct FileIdentity {
 // the fresh one.
 class FolderLock {
 public:
-    explicit FolderLock(const std::string& folder) : file_(::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC)) {
+    FolderLock(const std::string& folder, std::chrono::milliseconds limit)
+        : file_(::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC)) {
         if (file_ < 0) throw DatabaseError(SQLITE_CANTOPEN, systemError("open", folder, errno).text);
-        while (flock(file_, LOCK_EX) != 0 && errno == EINTR) {
+        const auto end = std::chrono::steady_clock::now() + limit;
+        while (flock(file_, LOCK_EX | LOCK_NB) != 0) {
+            if (std::chrono::steady_clock::now() < end) {
+                std::this_thread::sleep_for(std::chrono::milliseconds(2));
+                continue;
+            }
+            ::close(file_);
+            throw DatabaseError(SQLITE_BUSY, "another process keeps " + folder + " locked");
         }
     }
     ~FolderLock() { ::close(file_); }
@@ -305,7 +314,7 @@ std::shared_ptr<Database::Opening> Database::opening(MaybeError& error) {
     std::lock_guard lock(mutex_);
     if (opening_ && FileIdentity::of(path_) == opening_->file) return opening_;
     try {
-        FolderLock folder(path_.substr(0, path_.rfind('/') + 1));
+        const FolderLock folder(path_.substr(0, path_.rfind('/') + 1), busyLimit_);
         if (opening_) leaveReplacedFile();
         opening_ = openChecked();
         opening_->number = ++openings_;
@@ -372,8 +381,9 @@ std::int64_t Database::checkedVersion(Connection& connection) const {
 }
 
 void Database::migrate(Connection& writer) const {
-    writer.execute("BEGIN IMMEDIATE");
     const auto newest = static_cast<std::int64_t>(schema_.size());
+    if (checkedVersion(writer) == newest) return;  // without waiting for a writer
+    writer.execute("BEGIN IMMEDIATE");
     const std::int64_t version = checkedVersion(writer);
     for (std::int64_t step = version; step < newest; ++step) writer.execute(schema_[static_cast<std::size_t>(step)]);
     if (version < newest) writer.execute(("PRAGMA user_version = " + std::to_string(newest)).c_str());

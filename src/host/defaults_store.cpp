@@ -90,7 +90,11 @@ Value DefaultsStore::get(std::string_view key) const {
 }
 
 void DefaultsStore::set(std::string_view key, Value value) {
-    logFailure(database_.write([&](Connection& connection) { store(connection, key, value); }), "write", key);
+    logFailure(write(key, value), "write", key);
+}
+
+MaybeError DefaultsStore::write(std::string_view key, const Value& value) {
+    return database_.write([&](Connection& connection) { store(connection, key, value); });
 }
 
 void DefaultsStore::update(std::string_view key, const std::function<Value(const Value&)>& change) {

@@ -23,6 +23,9 @@ public:
     void registerDefaults(const platform::Dictionary& values) override;
     platform::Dictionary dictionaryRepresentation() const override;
 
+    // As set(), which only logs a failure.
+    platform::MaybeError write(std::string_view key, const platform::Value& value);
+
 private:
     platform::Value registered(std::string_view key) const;
 

@@ -28,11 +28,11 @@ const Value awkwardRecord = platform::Dictionary{
     {"large", std::int64_t{1} << 62},
 };
 
-TEST(AgentConnection, AsksEveryOperationAndWaits) {
-    auto agent = std::make_shared<FakeAgent>();
+using AgentConnectionTest = WithFakeAgent;
+
+TEST_F(AgentConnectionTest, AsksEveryOperationAndWaits) {
     agent->record = awkwardRecord;
-    FakeService service(agent);
-    AgentConnection connection({.socketPath = service.socketPath()});
+    AgentConnection connection(options());
 
     EXPECT_TRUE(*connection.scheduleOutreachWithReply());
     EXPECT_EQ(*connection.checkIsAvailableInStore("com.example"),
@@ -42,10 +42,7 @@ TEST(AgentConnection, AsksEveryOperationAndWaits) {
     auto device = *connection.defaultDevice();
     EXPECT_EQ(device->name(), "Phone");
     EXPECT_EQ(device->activationDate(), agent->device->activationDate());
-    auto paired = *connection.pairedDevices();
-    ASSERT_EQ(paired.size(), 2u);
-    EXPECT_EQ(paired[1]->name(), std::nullopt);
-    EXPECT_EQ(paired[1]->deviceType(), VRXDeviceTypeWatch);
+    EXPECT_EQ(connection.pairedDevices()->at(1)->name(), std::nullopt);
     EXPECT_EQ((*connection.getDefaultDeviceInfoUsingPolicy(VRXWarrantyLookupPolicyRefresh))->device()->serialNumber(),
               "SN1");
     auto info = *connection.getDeviceInfoForSerialNumber("SN7", 77);
@@ -57,12 +54,10 @@ TEST(AgentConnection, AsksEveryOperationAndWaits) {
                                                "paired", "info 2", "info SN7 77", "all 1 update", "dismiss SN1"));
 }
 
-TEST(AgentConnection, RepliesLaterOnAThreadOfItsOwn) {
-    auto agent = std::make_shared<FakeAgent>();
-    FakeService service(agent);
+TEST_F(AgentConnectionTest, RepliesLaterOnAThreadOfItsOwn) {
     std::atomic<int> replies = 0;
     {
-        AgentConnection connection({.socketPath = service.socketPath(), .connections = 3});
+        AgentConnection connection({.socketPath = service->socketPath(), .connections = 3});
         VRXAgentProtocol& remote = connection;
         Signal done;
         auto count = [&](const auto& answer) {
@@ -84,28 +79,22 @@ TEST(AgentConnection, RepliesLaterOnAThreadOfItsOwn) {
     EXPECT_EQ(replies, 9);
 }
 
-TEST(AgentConnection, TellsWhyThereIsNoAnswer) {
-    auto agent = std::make_shared<FakeAgent>();
-    FakeService service(agent);
-    Signal isAsked;
-    VRXAgentProtocol::Reply<bool> held;
-    agent->onOutreach = [&](VRXAgentProtocol::Reply<bool> reply) {
-        held = std::move(reply);
-        isAsked.set();
-    };
+TEST_F(AgentConnectionTest, TellsWhyThereIsNoAnswer) {
+    holdOutreach();
     agent->onStore = [](std::string, VRXAgentProtocol::Reply<Value> reply) { reply("no dictionary"); };
 
-    AgentConnection connection({.socketPath = service.socketPath()});
+    AgentConnection connection(options());
     EXPECT_EQ(connection.checkIsAvailableInStore("x").failure().kind, Failure::Kind::BadReply);
     EXPECT_EQ(connection.dismissFollowUpForSerialNumber(std::string("S\0N", 3)).failure().kind, Failure::Kind::Refused);
     auto tooLong = connection.dismissFollowUpForSerialNumber(std::string(1 << 20, 'x'));
     EXPECT_EQ(tooLong.failure().kind, Failure::Kind::Refused);
+    EXPECT_EQ(tooLong.failure().refusal, Failure::Refusal::Argument);
     EXPECT_THAT(tooLong.failure().text, HasSubstr("longer than 1024"));
 
-    AgentConnection hasty({.socketPath = service.socketPath(), .timeLimit = platform::Duration(0.05)});
+    AgentConnection hasty({.socketPath = service->socketPath(), .timeLimit = platform::Duration(0.05)});
     EXPECT_EQ(hasty.scheduleOutreachWithReply().failure().kind, Failure::Kind::TimedOut);
-    isAsked.wait();
-    held(true);  // late, and for nobody
+    awaitHeld();
+    answerHeld();  // late, and for nobody
     EXPECT_TRUE(*connection.defaultDevice());
 
     std::string failed;
@@ -126,43 +115,38 @@ TEST(AgentConnection, TellsWhyThereIsNoAnswer) {
     EXPECT_EQ(failed, "defaultDevice");
 }
 
-TEST(AgentConnection, TellsItsUserWhatTheAgentSaidOfARefusal) {
-    FakeService service(std::make_shared<FakeAgent>(), {}, false);
-    AgentConnection connection({.socketPath = service.socketPath()});
+TEST_F(AgentConnectionTest, TellsItsUserWhatTheAgentSaidOfARefusal) {
+    serve({}, false);
+    AgentConnection connection(options());
     for (int i = 0; i < 3; ++i) {
         auto answer = connection.defaultDevice();
         ASSERT_FALSE(answer);
         EXPECT_EQ(answer.failure().kind, Failure::Kind::Refused);
+        EXPECT_EQ(answer.failure().refusal, Failure::Refusal::Entitlement);
         EXPECT_THAT(answer.failure().text, HasSubstr("client_tests does not hold the entitlement test.entitlement"));
     }
+    serve({.connections = 1});
+    AgentConnection served(options()), tooMany(options());
+    EXPECT_TRUE(served.defaultDevice());
+    EXPECT_EQ(tooMany.defaultDevice().failure().refusal, Failure::Refusal::Limit);
 }
 
-TEST(AgentConnection, AsksAgainOnceWhenTheAgentEnded) {
-    auto agent = std::make_shared<FakeAgent>();
-    FakeService service(agent);
-    AgentConnection connection({.socketPath = service.socketPath()});
+TEST_F(AgentConnectionTest, AsksAgainOnceWhenTheAgentEnded) {
+    AgentConnection connection(options());
     ASSERT_TRUE(connection.defaultDevice());
-    service.stop();
-    service.start();
+    service->stop();
+    service->start();
     EXPECT_TRUE(connection.defaultDevice()) << "the kept connection has ended";
 
     // The agent ends while it owes a reply: once, and then each time.
-    std::mutex mutex;
-    std::condition_variable isAsked;
     std::atomic<bool> answersSecond = true;
-    std::vector<VRXAgentProtocol::Reply<bool>> held;
-    agent->onOutreach = [&](VRXAgentProtocol::Reply<bool> reply) {
-        std::lock_guard lock(mutex);
-        if (answersSecond && held.size() == 1) return reply(true);
-        held.push_back(std::move(reply));
-        isAsked.notify_all();
+    agent->onOutreach = [&](Outreach reply) {
+        if (answersSecond && held == 1) return reply(true);
+        hold(std::move(reply));
     };
-    auto restartAtRequest = [&](std::size_t number) {
-        {
-            std::unique_lock lock(mutex);
-            isAsked.wait(lock, [&] { return held.size() >= number; });
-        }
-        service.restart();
+    auto restartAtRequest = [&](int number) {
+        awaitHeld(number);
+        service->restart();
     };
     std::thread once(restartAtRequest, 1);
     auto answer = connection.scheduleOutreachWithReply();
@@ -176,75 +160,60 @@ TEST(AgentConnection, AsksAgainOnceWhenTheAgentEnded) {
     });
     EXPECT_EQ(connection.scheduleOutreachWithReply().failure().kind, Failure::Kind::NotReachable);
     twice.join();
-    EXPECT_EQ(held.size(), 3u) << "not a third time";
-    for (auto& reply : held) reply(true);
+    EXPECT_EQ(held, 3) << "not a third time";
+    answerHeld();
 }
 
-TEST(AgentConnection, KeepsTheAgentFromEndingWithARequestAndNotWithSilence) {
-    auto agent = std::make_shared<FakeAgent>();
-    FakeService service(agent);
-    AgentConnection silent({.socketPath = service.socketPath()}), asking({.socketPath = service.socketPath()});
+TEST_F(AgentConnectionTest, KeepsTheAgentFromEndingWithARequestAndNotWithSilence) {
+    AgentConnection silent(options()), asking(options());
     ASSERT_TRUE(silent.defaultDevice());
 
-    FakeAgent::Reply<bool> open;
-    Signal isAsked, isAnswered;
-    agent->onOutreach = [&](FakeAgent::Reply<bool> reply) {
-        open = std::move(reply);
-        isAsked.set();
-    };
+    holdOutreach();
+    Signal isAnswered;
     asking.scheduleOutreachWithReply([&](bool answer) {
         EXPECT_TRUE(answer);
         isAnswered.set();
     });
-    isAsked.wait();
-    service.exitCleanWhenIdle();
+    awaitHeld();
+    service->exitCleanWhenIdle();
     EXPECT_TRUE(silent.defaultDevice()) << "others are served meanwhile";
-    EXPECT_EQ(service.ends(), 0);
-    open(true);
-    service.waitForEnd(1);
+    EXPECT_EQ(service->ends(), 0);
+    answerHeld();
+    service->waitForEnd(1);
     isAnswered.wait();
     EXPECT_TRUE(silent.defaultDevice()) << "asked again, of the next";
-    EXPECT_EQ(service.ends(), 1);
+    EXPECT_EQ(service->ends(), 1);
 }
 
-TEST(AgentConnection, IsServedAtTheSameTimeAsOthers) {
-    auto agent = std::make_shared<FakeAgent>();
-    FakeService service(agent);
+TEST_F(AgentConnectionTest, IsServedAtTheSameTimeAsOthers) {
     std::barrier bothInside(2);
     agent->onDeviceInfo = [&](std::string, VRXAgentProtocol::Reply<std::shared_ptr<VRXDeviceInfo>> reply) {
         bothInside.arrive_and_wait();
         reply(agent->info());
     };
-    AgentConnection connection({.socketPath = service.socketPath()});
+    AgentConnection connection(options());
     std::thread other([&] { EXPECT_TRUE(connection.getDeviceInfoForSerialNumber("SN1", 0)); });
     EXPECT_TRUE(connection.getDeviceInfoForSerialNumber("SN2", 0));
     other.join();
 }
 
-TEST(AgentConnection, EndsItsCallsWhenItGoes) {
-    auto agent = std::make_shared<FakeAgent>();
-    FakeService service(agent);
-    Signal isAsked;
-    VRXAgentProtocol::Reply<bool> held;
-    agent->onOutreach = [&](VRXAgentProtocol::Reply<bool> reply) {
-        held = std::move(reply);
-        isAsked.set();
-    };
+TEST_F(AgentConnectionTest, EndsItsCallsWhenItGoes) {
+    holdOutreach();
     std::atomic<int> failures = 0;
     std::atomic<int> replies = 0;
     {
-        AgentConnection connection({.socketPath = service.socketPath(), .connections = 1},
+        AgentConnection connection({.socketPath = service->socketPath(), .connections = 1},
                                    [&](std::string_view, const Failure&) { ++failures; });
         connection.scheduleOutreachWithReply([&](bool isDone) { replies += isDone ? 100 : 1; });
         connection.defaultDevice([&](std::shared_ptr<VRXDevice> device) { replies += device ? 100 : 1; });
-        isAsked.wait();
+        awaitHeld();
     }
     EXPECT_EQ(failures, 2);
     EXPECT_EQ(replies, 2);
-    held(true);
+    answerHeld();
 }
 
-TEST(AgentConnection, GivesRecordsTheirDerivedTextsWithoutAPlatform) {
+TEST_F(AgentConnectionTest, GivesRecordsTheirDerivedTextsWithoutAPlatform) {
     platform::Platform* before = platform::Platform::hasCurrent() ? &platform::Platform::current() : nullptr;
     platform::Platform::setCurrent(nullptr);
     AgentConnection connection({.socketPath = "/nowhere"});

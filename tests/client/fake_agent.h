@@ -2,10 +2,13 @@
 // agent's main thread, and entitles callers as the test says.
 #pragma once
 
+#include <gtest/gtest.h>
+
 #include <atomic>
 #include <condition_variable>
 #include <functional>
 #include <mutex>
+#include <optional>
 #include <thread>
 
 #include "client/agent_connection.h"
@@ -225,6 +228,42 @@ private:
     std::atomic<int> ends_ = 0;
     host::ServiceListenerFactory* factory_ = nullptr;
     std::unique_ptr<platform::ServiceListener> listener_;
+};
+
+// A test with an agent of its own, which is served from the beginning.
+class WithFakeAgent : public testing::Test {
+protected:
+    using Outreach = VRXAgentProtocol::Reply<bool>;
+
+    // Serves anew, in another way than the usual one.
+    void serve(const host::ServiceLimits& limits, bool isEntitled = true) {
+        service.emplace(agent, limits, isEntitled);
+    }
+    client::ConnectionOptions options() const { return {.socketPath = service->socketPath()}; }
+
+    // The agent owes the replies to requests for an outreach from now on.
+    void holdOutreach() {
+        agent->onOutreach = [this](Outreach reply) { hold(std::move(reply)); };
+    }
+    void hold(Outreach reply) {
+        std::lock_guard lock(mutex_);
+        replies_.push_back(std::move(reply));
+        ++held;
+        held.notify_all();
+    }
+    void awaitHeld(int number = 1) const {
+        for (int count; (count = held) < number;) held.wait(count);
+    }
+    void answerHeld() {
+        std::lock_guard lock(mutex_);
+        for (Outreach& reply : replies_) reply(true);
+    }
+
+    std::shared_ptr<FakeAgent> agent = std::make_shared<FakeAgent>();
+    std::atomic<int> held = 0;
+    std::mutex mutex_;
+    std::vector<Outreach> replies_;
+    std::optional<FakeService> service{std::in_place, agent};  // goes first
 };
 
 }  // namespace vrx::test

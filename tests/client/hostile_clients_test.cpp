@@ -9,113 +9,92 @@
 namespace vrx::test {
 namespace {
 
-class HostileClients : public testing::Test {
+class HostileClients : public WithFakeAgent {
 protected:
-    void expectGoesOn(FakeService& service) {
-        client::AgentConnection connection({.socketPath = service.socketPath()});
-        auto answer = connection.defaultDevice();
+    RawClient rawClient(const std::string& bytes = "") const {
+        RawClient client(service->socketPath());
+        client.write(bytes);
+        return client;
+    }
+    void expectGoesOn() const {
+        auto answer = client::AgentConnection(options()).defaultDevice();
         EXPECT_TRUE(answer) << answer.failure().text;
     }
-
-    std::shared_ptr<FakeAgent> agent = std::make_shared<FakeAgent>();
 };
 
 TEST_F(HostileClients, AuthenticateAndCallInOneWrite) {
-    FakeService service(agent);
     for (int round = 0; round < 200; ++round) {
-        RawClient client(service.socketPath());
-        client.write(RawClient::authentication() + RawClient::call("defaultDevice", 1) +
-                     RawClient::call("readWebURLOverride", 2));
+        RawClient client = rawClient(RawClient::authentication() + RawClient::call("defaultDevice", 1) +
+                                     RawClient::call("readWebURLOverride", 2));
         ASSERT_TRUE(client.readUntil("Phone")) << round;
         ASSERT_TRUE(client.readUntil("https://web.example")) << round;
     }
 }
 
 TEST_F(HostileClients, WriteGarbage) {
-    FakeService service(agent);
     std::string huge = RawClient::call("defaultDevice", 1);
     huge[7] = 5;  // 80 MiB of body are to come
     const std::string half = RawClient::call("defaultDevice", 1).substr(0, 40);
     for (const std::string& bytes : {std::string("GET / HTTP/1.1\r\n\r\n"), std::string(100'000, '\0'),
                                      RawClient::authentication() + std::string(64, '\xff'),
                                      std::string(1, '\0') + "AUTH EXTERNAL 39393939\r\nBEGIN\r\n"}) {
-        RawClient client(service.socketPath());
-        client.write(bytes);
+        RawClient client = rawClient(bytes);
         shutdown(client.file(), SHUT_WR);
         EXPECT_TRUE(client.isClosedByAgent());
     }
     {
-        RawClient client(service.socketPath());
-        client.write(RawClient::authentication() + half);
+        RawClient client = rawClient(RawClient::authentication() + half);
         shutdown(client.file(), SHUT_WR);
         EXPECT_TRUE(client.isClosedByAgent());
     }
     {
-        RawClient client(service.socketPath());
-        client.write(RawClient::authentication());
+        RawClient client = rawClient(RawClient::authentication());
         ASSERT_TRUE(client.readUntil("OK "));
         client.write(RawClient::call("defaultDevice", 1));
         ASSERT_TRUE(client.readUntil("Phone"));
         client.write(huge);
         EXPECT_TRUE(client.isClosedByAgent()) << "a message is too long, by its header";
     }
-    expectGoesOn(service);
+    expectGoesOn();
     EXPECT_EQ(agent->requests().size(), 2u);
 }
 
 TEST_F(HostileClients, NeverSpeak) {
-    FakeService service(agent, {.authentication = std::chrono::milliseconds(1)});
-    EXPECT_TRUE(RawClient(service.socketPath()).isClosedByAgent());
+    serve({.authentication = std::chrono::milliseconds(1)});
+    EXPECT_TRUE(rawClient().isClosedByAgent());
 }
 
 TEST_F(HostileClients, SendAStringOfAMebibyte) {
-    FakeService service(agent);
     const std::string text(1 << 20, 'x');
-    RawClient client(service.socketPath());
-    client.write(RawClient::authentication() + RawClient::call("checkIsAvailableInStore", 1, &text));
+    RawClient client = rawClient(RawClient::authentication() + RawClient::call("checkIsAvailableInStore", 1, &text));
     EXPECT_TRUE(client.readUntil("InvalidArgs"));
     client.write(RawClient::call("defaultDevice", 2));
     EXPECT_TRUE(client.readUntil("Phone")) << "the connection stays";
 }
 
 TEST_F(HostileClients, VanishWithARequestOpen) {
-    FakeService service(agent);
-    Signal isAsked;
-    VRXAgentProtocol::Reply<bool> held;
-    agent->onOutreach = [&](VRXAgentProtocol::Reply<bool> reply) {
-        held = std::move(reply);
-        isAsked.set();
-    };
-    RawClient client(service.socketPath());
-    client.write(RawClient::authentication() + RawClient::call("scheduleOutreachWithReply", 1));
-    isAsked.wait();
+    holdOutreach();
+    RawClient client = rawClient(RawClient::authentication() + RawClient::call("scheduleOutreachWithReply", 1));
+    awaitHeld();
     client.close();
-    expectGoesOn(service);
-    held(true);
+    expectGoesOn();
+    answerHeld();
 }
 
 TEST_F(HostileClients, OpenTooManyRequests) {
-    FakeService service(agent, {.requestsPerConnection = 2});
-    std::mutex mutex;
-    std::vector<VRXAgentProtocol::Reply<bool>> held;
-    agent->onOutreach = [&](VRXAgentProtocol::Reply<bool> reply) {
-        std::lock_guard lock(mutex);
-        held.push_back(std::move(reply));
-    };
-    RawClient client(service.socketPath());
-    client.write(RawClient::authentication());
+    serve({.requestsPerConnection = 2});
+    holdOutreach();
+    RawClient client = rawClient(RawClient::authentication());
     for (std::uint32_t serial = 1; serial <= 3; ++serial)
         client.write(RawClient::call("scheduleOutreachWithReply", serial));
     EXPECT_TRUE(client.readUntil("LimitsExceeded")) << "the third comes while two wait for their replies";
-    std::lock_guard lock(mutex);
-    EXPECT_EQ(held.size(), 2u);
-    for (auto& reply : held) reply(true);
+    EXPECT_EQ(held, 2);
+    answerHeld();
 }
 
 TEST_F(HostileClients, ComeTwoHundredAtOnce) {
-    FakeService service(agent);
     std::vector<RawClient> clients;
-    for (int i = 0; i < 200; ++i) clients.emplace_back(service.socketPath());
+    for (int i = 0; i < 200; ++i) clients.push_back(rawClient());
     int served = 0;
     int refused = 0;
     for (RawClient& client : clients) {
@@ -127,16 +106,14 @@ TEST_F(HostileClients, ComeTwoHundredAtOnce) {
     EXPECT_GT(refused, 0);
     // A place is free once the agent has seen a client go: asked until it has.
     clients.clear();
-    client::AgentConnection connection({.socketPath = service.socketPath()});
+    client::AgentConnection connection(options());
     while (!connection.defaultDevice()) std::this_thread::yield();
 }
 
 // The programs of others must not use what this one was entitled to.
 TEST_F(HostileClients, HandTheirConnectionToAnotherProcess) {
-    FakeService service(agent);
     const std::string call = RawClient::call("readWebURLOverride", 2);
-    RawClient client(service.socketPath());
-    client.write(RawClient::authentication() + RawClient::call("defaultDevice", 1));
+    RawClient client = rawClient(RawClient::authentication() + RawClient::call("defaultDevice", 1));
     ASSERT_TRUE(client.readUntil("Phone"));
     if (const pid_t child = fork(); child == 0) {
         [[maybe_unused]] ssize_t size = write(client.file(), call.data(), call.size());
@@ -148,8 +125,7 @@ TEST_F(HostileClients, HandTheirConnectionToAnotherProcess) {
 }
 
 TEST_F(HostileClients, RunAnotherProgram) {
-    FakeService service(agent);
-    const std::string path = service.socketPath();
+    const std::string path = service->socketPath();
     const std::string first = RawClient::authentication() + RawClient::call("defaultDevice", 1);
     const std::string callFile = path + ".call";
     {

@@ -23,20 +23,21 @@ ToolRun run(const std::string& command) {
     return run;
 }
 
-std::string busctl(const FakeService& service, const std::string& arguments) {
-    return "busctl --address=unix:path=" + service.socketPath() + " " + arguments;
-}
-
-std::string gdbus(const FakeService& service, const std::string& member, const std::string& arguments) {
-    return "gdbus call --address unix:path=" + service.socketPath() +
-           " --dest com.orvane.vrxagent --object-path /com/orvane/vrxagent --method com.orvane.VRXAgentProtocol." +
-           member + " " + arguments;
-}
-
-std::string dbusSend(const FakeService& service, const std::string& member, const std::string& arguments) {
-    return "dbus-send --peer=unix:path=" + service.socketPath() +
-           " --print-reply /com/orvane/vrxagent com.orvane.VRXAgentProtocol." + member + " " + arguments;
-}
+class StockTools : public WithFakeAgent {
+protected:
+    std::string busctl(const std::string& arguments) const {
+        return "busctl --address=unix:path=" + service->socketPath() + " " + arguments;
+    }
+    std::string gdbus(const std::string& member, const std::string& arguments) const {
+        return "gdbus call --address unix:path=" + service->socketPath() +
+               " --dest com.orvane.vrxagent --object-path /com/orvane/vrxagent --method com.orvane.VRXAgentProtocol." +
+               member + " " + arguments;
+    }
+    std::string dbusSend(const std::string& member, const std::string& arguments) const {
+        return "dbus-send --peer=unix:path=" + service->socketPath() +
+               " --print-reply /com/orvane/vrxagent com.orvane.VRXAgentProtocol." + member + " " + arguments;
+    }
+};
 
 constexpr const char* busctlCall =
     "--json=short call com.orvane.vrxagent /com/orvane/vrxagent com.orvane.VRXAgentProtocol ";
@@ -50,14 +51,12 @@ Value deepestRecord() {
     return value;
 }
 
-TEST(StockTools, SeeTheDeepestRecordWhole) {
-    auto agent = std::make_shared<FakeAgent>();
+TEST_F(StockTools, SeeTheDeepestRecordWhole) {
     agent->record = deepestRecord();
-    FakeService service(agent);
-    for (const std::string& command :
-         {busctl(service, std::string(busctlCall) + "getAllDeviceInfosUsingPolicy tb 0 false"),
-          gdbus(service, "getAllDeviceInfosUsingPolicy", "0 false"),
-          dbusSend(service, "getAllDeviceInfosUsingPolicy", "uint64:0 boolean:false")}) {
+    serve({});  // by threads that see it
+    for (const std::string& command : {busctl(std::string(busctlCall) + "getAllDeviceInfosUsingPolicy tb 0 false"),
+                                       gdbus("getAllDeviceInfosUsingPolicy", "0 false"),
+                                       dbusSend("getAllDeviceInfosUsingPolicy", "uint64:0 boolean:false")}) {
         ToolRun result = run(command);
         EXPECT_EQ(result.status, 0) << command << "\n" << result.output;
         EXPECT_NE(result.output.find("the very bottom"), std::string::npos) << command << "\n" << result.output;
@@ -65,23 +64,20 @@ TEST(StockTools, SeeTheDeepestRecordWhole) {
     }
 }
 
-TEST(StockTools, FindTheInterfaceAndItsErrors) {
-    FakeService service(std::make_shared<FakeAgent>());
-    ToolRun introspection = run(busctl(service, "introspect com.orvane.vrxagent /com/orvane/vrxagent"));
+TEST_F(StockTools, FindTheInterfaceAndItsErrors) {
+    ToolRun introspection = run(busctl("introspect com.orvane.vrxagent /com/orvane/vrxagent"));
     for (const wire::Operation& operation : wire::operations)
         EXPECT_NE(introspection.output.find("." + std::string(operation.member) + " "), std::string::npos)
             << introspection.output;
-    EXPECT_NE(
-        run(busctl(service, "call com.orvane.vrxagent / org.freedesktop.DBus.Peer GetMachineId")).output.find("s \""),
-        std::string::npos);
-    EXPECT_NE(run(dbusSend(service, "noSuchThing", "")).output.find("UnknownMethod"), std::string::npos);
-    EXPECT_NE(run(dbusSend(service, "checkIsAvailableInStore", "uint32:7")).output.find("InvalidArgs"),
+    EXPECT_NE(run(busctl("call com.orvane.vrxagent / org.freedesktop.DBus.Peer GetMachineId")).output.find("s \""),
               std::string::npos);
+    EXPECT_NE(run(dbusSend("noSuchThing", "")).output.find("UnknownMethod"), std::string::npos);
+    EXPECT_NE(run(dbusSend("checkIsAvailableInStore", "uint32:7")).output.find("InvalidArgs"), std::string::npos);
 }
 
-TEST(StockTools, AreToldWhyTheyAreRefused) {
-    FakeService service(std::make_shared<FakeAgent>(), {}, false);
-    for (const std::string& command : {gdbus(service, "defaultDevice", ""), dbusSend(service, "defaultDevice", "")}) {
+TEST_F(StockTools, AreToldWhyTheyAreRefused) {
+    serve({}, false);
+    for (const std::string& command : {gdbus("defaultDevice", ""), dbusSend("defaultDevice", "")}) {
         ToolRun result = run(command);
         EXPECT_NE(result.status, 0);
         EXPECT_NE(result.output.find("does not hold the entitlement test.entitlement"), std::string::npos)
@@ -89,8 +85,7 @@ TEST(StockTools, AreToldWhyTheyAreRefused) {
             << result.output;
     }
     // This one has a text of its own for it.
-    EXPECT_NE(run(busctl(service, std::string(busctlCall) + "defaultDevice")).output.find("Access denied"),
-              std::string::npos);
+    EXPECT_NE(run(busctl(std::string(busctlCall) + "defaultDevice")).output.find("Access denied"), std::string::npos);
 }
 
 }  // namespace

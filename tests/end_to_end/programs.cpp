@@ -1,12 +1,12 @@
 #include "programs.h"
 
+#include <arpa/inet.h>
 #include <fcntl.h>
 #include <poll.h>
 #include <spawn.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
-#include <sys/un.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -36,6 +36,35 @@ std::vector<char*> pointers(const Arguments& texts) {
 std::string fileText(const std::string& path) {
     std::ifstream file(path, std::ios::binary);
     return {std::istreambuf_iterator<char>(file), {}};
+}
+
+sockaddr_un addressOf(const std::string& path) {
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    path.copy(address.sun_path, sizeof address.sun_path - 1);
+    return address;
+}
+
+SilentServer::SilentServer(const std::string& path)
+    : file_(socket(path.empty() ? AF_INET : AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0)) {
+    const sockaddr_un there = addressOf(path);
+    sockaddr_in loopback{};
+    loopback.sin_family = AF_INET;
+    loopback.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+    socklen_t size = path.empty() ? sizeof loopback : sizeof there;
+    EXPECT_EQ(
+        bind(file_,
+             path.empty() ? reinterpret_cast<const sockaddr*>(&loopback) : reinterpret_cast<const sockaddr*>(&there),
+             size),
+        0);
+    EXPECT_EQ(listen(file_, 64), 0);
+    if (!path.empty()) return;
+    EXPECT_EQ(getsockname(file_, reinterpret_cast<sockaddr*>(&loopback), &size), 0);
+    url_ = "http://127.0.0.1:" + std::to_string(ntohs(loopback.sin_port)) + "/";
+}
+
+SilentServer::~SilentServer() {
+    close(file_);
 }
 
 Process::Process(const std::string& folder, const std::string& program, const Arguments& arguments,
@@ -102,11 +131,9 @@ std::string Process::errors() const {
 
 NoticeSocket::NoticeSocket(const std::string& path)
     : path_(path), file_(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0)) {
-    sockaddr_un address{};
-    address.sun_family = AF_UNIX;
-    path.copy(address.sun_path, sizeof address.sun_path - 1);
+    const sockaddr_un address = addressOf(path);
     unlink(path.c_str());
-    EXPECT_EQ(bind(file_, reinterpret_cast<sockaddr*>(&address), sizeof address), 0);
+    EXPECT_EQ(bind(file_, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
 }
 
 NoticeSocket::~NoticeSocket() {
@@ -126,7 +153,7 @@ Place::Place() {
     std::string pattern = std::filesystem::canonical(std::filesystem::temp_directory_path()) / "vrx-XXXXXX";
     folder_ = mkdtemp(pattern.data());
     std::filesystem::create_directory(*this / "app");
-    for (const char* name : {"vrxctl", "bundle.toml"})
+    for (const char* name : {"vrxctl", "vrxhost", "bundle.toml"})
         std::filesystem::copy(std::string(VRX_PROGRAMS "/") + name, *this / "app");
     std::filesystem::copy(VRX_SOURCE "/examples/device.toml", folder_);
     std::filesystem::copy(VRX_SOURCE "/examples/coverage", *this / "coverage");
@@ -170,15 +197,27 @@ Place::Outcome Place::vrxctl(const Arguments& arguments, const std::string& sock
 Place::Outcome Place::vrxhost(const Arguments& arguments, const std::string& home) const {
     Arguments all{"--home", *this / home};
     all.insert(all.end(), arguments.begin(), arguments.end());
-    return run(VRX_PROGRAMS "/vrxhost", all);
+    return run(*this / "app/vrxhost", all);
 }
 
 Place::Outcome Place::run(const std::string& program, const Arguments& arguments) const {
-    Process process(folder_, program, arguments);
-    const int code = process.wait();
-    Outcome outcome{code, process.output(), process.errors(), {}};
-    if (auto document = codec::parseJson(outcome.output)) outcome.document = *document;
-    return outcome;
+    Arguments words{program};
+    words.insert(words.end(), arguments.begin(), arguments.end());
+    return runAll({words}).front();
+}
+
+std::vector<Place::Outcome> Place::runAll(const std::vector<Arguments>& commands) const {
+    std::vector<std::unique_ptr<Process>> processes;
+    for (const Arguments& words : commands)
+        processes.push_back(
+            std::make_unique<Process>(folder_, words.front(), Arguments(words.begin() + 1, words.end())));
+    std::vector<Outcome> outcomes;
+    for (const auto& process : processes) {
+        const int code = process->wait();
+        Outcome& outcome = outcomes.emplace_back(Outcome{code, process->output(), process->errors(), {}});
+        if (auto document = codec::parseJson(outcome.output)) outcome.document = *document;
+    }
+    return outcomes;
 }
 
 }  // namespace vrx::end_to_end

@@ -3,6 +3,7 @@
 #pragma once
 
 #include <gtest/gtest.h>
+#include <sys/un.h>
 
 #include <memory>
 #include <optional>
@@ -16,6 +17,25 @@ namespace vrx::end_to_end {
 using Arguments = std::vector<std::string>;
 
 std::string fileText(const std::string& path);
+
+sockaddr_un addressOf(const std::string& path);
+
+// Takes connections, and never says anything: at a path, or without one on loopback.
+class SilentServer {
+public:
+    explicit SilentServer(const std::string& path = "");
+    ~SilentServer();
+    SilentServer(const SilentServer&) = delete;
+    SilentServer& operator=(const SilentServer&) = delete;
+
+    int file() const { return file_; }
+    // Of the one on loopback.
+    const std::string& url() const { return url_; }
+
+private:
+    const int file_;
+    std::string url_;
+};
 
 // A child process with its standard output and error in files.
 class Process {
@@ -71,7 +91,7 @@ private:
     const int file_;
 };
 
-// A folder with an agent's home, profile, socket and coverage files, and an entitled copy of vrxctl.
+// A folder with an agent's home, profile, socket and coverage files, and entitled copies of the tools.
 class Place {
 public:
     Place();
@@ -102,6 +122,8 @@ public:
     Outcome vrxhost(const Arguments& arguments, const std::string& home = "home") const;
     // A path in the programs' folder, or here.
     Outcome run(const std::string& program, const Arguments& arguments) const;
+    // All at the same time. The programs are the first words.
+    std::vector<Outcome> runAll(const std::vector<Arguments>& commands) const;
 
 private:
     std::string folder_;

@@ -5,7 +5,6 @@
 #include <sys/inotify.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
-#include <sys/un.h>
 #include <unistd.h>
 
 #include <array>
@@ -16,13 +15,6 @@
 
 namespace vrx::end_to_end {
 namespace {
-
-sockaddr_un addressOf(const std::string& path) {
-    sockaddr_un address{};
-    address.sun_family = AF_UNIX;
-    path.copy(address.sun_path, sizeof address.sun_path - 1);
-    return address;
-}
 
 class ServiceManager : public testing::Test {
 protected:
@@ -38,13 +30,10 @@ protected:
 
 // Clients connect to a socket that is the service manager's; who answers them there may change.
 TEST_F(ServiceManager, HandsItsSocketToOneAgentAfterTheOther) {
-    const sockaddr_un address = addressOf(place_ / "socket");
-    const int listening = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
-    ASSERT_EQ(bind(listening, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
-    ASSERT_EQ(listen(listening, 10), 0);
+    const SilentServer listening(place_ / "socket");
     for (int round = 1; round <= 2; ++round) {
         Process early(place_ / "", place_ / "app/vrxctl", {"--socket", place_ / "socket", "device"});
-        const std::unique_ptr<Process> agent = startAgent(listening);
+        const std::unique_ptr<Process> agent = startAgent(listening.file());
         EXPECT_EQ(notices_.next(*agent), "READY=1") << agent->errors();
         EXPECT_EQ(early.wait(), 0) << early.errors();
         EXPECT_EQ(place_.vrxctl({"device"}).code, 0);
@@ -52,7 +41,6 @@ TEST_F(ServiceManager, HandsItsSocketToOneAgentAfterTheOther) {
         EXPECT_EQ(notices_.next(*agent), "STOPPING=1");
         EXPECT_EQ(agent->wait(), 0) << agent->errors();
     }
-    close(listening);
 }
 
 // The notice is held up in a full queue: the socket must be there by then.

@@ -65,7 +65,7 @@ TEST(Host, FiresActivitiesThatItsToolsAskFor) {
     const HostLocations locations{folder / "home", folder / "device.toml"};
     Host agent(locations, platform::Level::Error);
     ASSERT_FALSE(Host(locations).open(HomeUse::Tool));
-    EXPECT_EQ(requestFiring(agent.home(), agent.database(), "a", 60s), std::nullopt) << "no agent has it";
+    EXPECT_EQ(*requestFiring(agent.home(), agent.database(), "a", 60s), std::nullopt) << "no agent has it";
     ASSERT_FALSE(agent.open(HomeUse::Agent));
     platform::BackgroundActivities& activities = Platform::current().backgroundActivities();
     std::atomic<int> runs = 0, fired = 0;
@@ -83,7 +83,7 @@ TEST(Host, FiresActivitiesThatItsToolsAskFor) {
         tools.emplace_back([&, identifier] {
             Database database(agent.home() + "/host.db");
             for (int i = 0; i < 10; ++i) {
-                const std::optional<FiringAnswer> answer = requestFiring(agent.home(), database, identifier, 60s);
+                const std::optional<FiringAnswer> answer = *requestFiring(agent.home(), database, identifier, 60s);
                 fired += answer == FiringAnswer::Fired;
                 EXPECT_TRUE(answer == FiringAnswer::Fired || answer == FiringAnswer::AlreadyRunning);
             }
