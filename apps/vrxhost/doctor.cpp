@@ -18,6 +18,7 @@
 #include "host/service/bundle_lookup.h"
 #include "host/service/descriptor.h"
 #include "platform/defaults_store.h"
+#include "platform/settings_keys.h"
 #include "platform/text.h"
 #include "platform/vendor.h"
 #include "reachability.h"
@@ -262,7 +263,8 @@ Check Examination::network() const {
 }
 
 Check Examination::serverVersion(const Reachability& servers) const {
-    const std::string url = Platform::current().defaultsStore().string("ServerVersionURL").value_or("");
+    const std::string url =
+        Platform::current().defaultsStore().string(platform::settings::serverVersionURL).value_or("");
     const std::string advice = "Is ServerVersionURL right? vrxhost defaults read ServerVersionURL.";
     if (!servers.isServerVersionSupported) return problem(url + " did not answer in time", advice, ExitCode::TimedOut);
     if (!servers.serverVersionErrors.empty()) return problem(servers.serverVersionErrors.front(), advice);

@@ -15,6 +15,7 @@
 #include "host/device_profile.h"
 #include "host/follow_up_document.h"
 #include "platform/number_text.h"
+#include "platform/settings_keys.h"
 #include "platform/text.h"
 #include "verbs.h"
 
@@ -146,7 +147,7 @@ struct Listing {
 Listing list(Home& home, const host::DeviceProfile& profile) {
     const auto items = home.followUps().makeController(followUpClientIdentifier())->pendingFollowUpItems();
     if (!items) return {failedWith("not-read", items.error())};
-    Duration day(home.defaults().number("OneDayInterval"));
+    Duration day(home.defaults().number(platform::settings::oneDayInterval));
     if (!(day.count() > 0)) day = std::chrono::days(1);
     const Date now = host::Clock(profile).now();
 

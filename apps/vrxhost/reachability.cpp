@@ -4,6 +4,7 @@
 #include "host/main_loop.h"
 #include "host/queues.h"
 #include "platform/clock.h"
+#include "platform/settings_keys.h"
 #include "serverversion/server_version_utilities.h"
 
 namespace vrx::apps {
@@ -30,7 +31,7 @@ Reachability askServers(AgentView& view, platform::Duration limit) {
     };
     VRXServerVersionUtilities::serverVersionSupported(
         [&](bool isSupported) { answered([&found, isSupported] { found.isServerVersionSupported = isSupported; }); });
-    found.coverageUrl = platform.defaultsStore().string("WarrantyURL").value_or("");
+    found.coverageUrl = platform.defaultsStore().string(platform::settings::warrantyURL).value_or("");
     platform::HttpRequest request;
     request.url = found.coverageUrl;
     sessions.makeUncached()->send(std::move(request), [&](HttpResponse response) {

@@ -12,6 +12,7 @@
 #include "platform/log.h"
 #include "platform/number_text.h"
 #include "platform/platform.h"
+#include "platform/settings_keys.h"
 #include "platform/text.h"
 
 namespace vrx {
@@ -194,7 +195,7 @@ std::optional<Date> VRXWarranty::_dateWithEpochNumber(const Value& number) {
 }
 
 std::uint32_t VRXWarranty::daysEligible() const {
-    Duration day(Platform::current().defaultsStore().number("OneDayInterval"));
+    Duration day(Platform::current().defaultsStore().number(platform::settings::oneDayInterval));
     return daysEligible(qxOfferEligibleUntil(), day, Platform::current().clock().now());
 }
 

@@ -16,6 +16,7 @@
 #include "platform/process_lifecycle.h"
 #include "platform/property_list.h"
 #include "platform/queue.h"
+#include "platform/settings_keys.h"
 #include "platform/text.h"
 #include "serverversion/server_version_utilities.h"
 
@@ -34,7 +35,6 @@ using platform::Value;
 
 namespace {
 
-constexpr std::string_view warrantyURLKey = "WarrantyURL";
 constexpr std::int32_t mostRetries = 2;
 constexpr platform::Duration attemptTimeout = std::chrono::seconds(30);
 constexpr int ok = 200;
@@ -125,7 +125,8 @@ void VRXWarrantyDownloader::_downloadWarrantyForSerialNumber(const std::string& 
                        completion = std::move(completion)](Value coverage) mutable {
         self->finish(serialNumber, std::move(coverage), std::move(completion));
     };
-    std::optional<Url> url = Url::parse(Platform::current().defaultsStore().string(warrantyURLKey).value_or(""));
+    std::optional<Url> url =
+        Url::parse(Platform::current().defaultsStore().string(platform::settings::warrantyURL).value_or(""));
     if (!url) return finishWith(nullptr);  // as a request there would end, but no credential is renewed for it
     if (url->isFile()) return finishWith(dictionaryFromURL(*url, serialNumber));
     _downloadWarrantyFromServerURL(*url, serialNumber, mostRetries, std::move(finishWith));

@@ -4,12 +4,12 @@
 
 #include <cstdint>
 #include <memory>
-#include <mutex>
 #include <optional>
 #include <string>
 
 #include "platform/date.h"
 #include "platform/keyed_archiver.h"
+#include "platform/property.h"
 
 namespace vrx {
 
@@ -29,15 +29,15 @@ public:
                                                      std::optional<platform::Date> activationDate,
                                                      VRXDeviceType deviceType);
 
-    std::optional<std::string> name() const { return get(name_); }
-    void setName(std::optional<std::string> name) { set(name_, std::move(name)); }
-    std::optional<std::string> serialNumber() const { return get(serialNumber_); }
-    void setSerialNumber(std::optional<std::string> serialNumber) { set(serialNumber_, std::move(serialNumber)); }
+    std::optional<std::string> name() const { return name_.get(); }
+    void setName(std::optional<std::string> name) { name_.set(std::move(name)); }
+    std::optional<std::string> serialNumber() const { return serialNumber_.get(); }
+    void setSerialNumber(std::optional<std::string> serialNumber) { serialNumber_.set(std::move(serialNumber)); }
     // When this device was first seen, or the watch paired.
-    std::optional<platform::Date> activationDate() const { return get(activationDate_); }
-    void setActivationDate(std::optional<platform::Date> date) { set(activationDate_, date); }
-    VRXDeviceType deviceType() const { return get(deviceType_); }
-    void setDeviceType(VRXDeviceType type) { set(deviceType_, type); }
+    std::optional<platform::Date> activationDate() const { return activationDate_.get(); }
+    void setActivationDate(std::optional<platform::Date> date) { activationDate_.set(date); }
+    VRXDeviceType deviceType() const { return deviceType_.get(); }
+    void setDeviceType(VRXDeviceType type) { deviceType_.set(type); }
 
     // "Other", "Watch", and "Default" for every other value.
     std::string deviceTypeString() const;
@@ -49,22 +49,10 @@ public:
     static std::shared_ptr<VRXDevice> initWithCoder(platform::KeyedDecoder& coder);
 
 private:
-    template <class T>
-    T get(const T& property) const {
-        std::lock_guard lock(mutex_);
-        return property;
-    }
-    template <class T>
-    void set(T& property, T value) {
-        std::lock_guard lock(mutex_);
-        property = std::move(value);
-    }
-
-    mutable std::mutex mutex_;
-    std::optional<std::string> name_;
-    std::optional<std::string> serialNumber_;
-    std::optional<platform::Date> activationDate_;
-    VRXDeviceType deviceType_;
+    platform::Property<std::optional<std::string>> name_;
+    platform::Property<std::optional<std::string>> serialNumber_;
+    platform::Property<std::optional<platform::Date>> activationDate_;
+    platform::Property<VRXDeviceType> deviceType_;
 };
 
 }  // namespace vrx

@@ -3,11 +3,11 @@
 #pragma once
 
 #include <memory>
-#include <mutex>
 #include <string>
 
 #include "coverage/warranty.h"
 #include "devices/device.h"
+#include "platform/property.h"
 
 namespace vrx {
 
@@ -19,11 +19,11 @@ public:
     static std::shared_ptr<VRXDeviceInfo> deviceInfoWithDevice(std::shared_ptr<VRXDevice> device,
                                                                std::shared_ptr<VRXWarranty> warranty);
 
-    std::shared_ptr<VRXDevice> device() const { return get(device_); }
-    void setDevice(std::shared_ptr<VRXDevice> device) { set(device_, std::move(device)); }
+    std::shared_ptr<VRXDevice> device() const { return device_.get(); }
+    void setDevice(std::shared_ptr<VRXDevice> device) { device_.set(std::move(device)); }
     // Null, which is usual, when no record was cached or downloaded.
-    std::shared_ptr<VRXWarranty> warranty() const { return get(warranty_); }
-    void setWarranty(std::shared_ptr<VRXWarranty> warranty) { set(warranty_, std::move(warranty)); }
+    std::shared_ptr<VRXWarranty> warranty() const { return warranty_.get(); }
+    void setWarranty(std::shared_ptr<VRXWarranty> warranty) { warranty_.set(std::move(warranty)); }
 
     // The same device object and equal records. Infos that lack a device or a record are not equal, not even to
     // themselves: there is nothing by which to tell. An object of another class is equal only if it is this very
@@ -37,20 +37,8 @@ public:
     static std::shared_ptr<VRXDeviceInfo> initWithCoder(platform::KeyedDecoder& coder);
 
 private:
-    template <class T>
-    T get(const T& property) const {
-        std::lock_guard lock(mutex_);
-        return property;
-    }
-    template <class T>
-    void set(T& property, T value) {
-        std::lock_guard lock(mutex_);
-        property.swap(value);  // the old object is released outside of the lock, when value goes
-    }
-
-    mutable std::mutex mutex_;
-    std::shared_ptr<VRXDevice> device_;
-    std::shared_ptr<VRXWarranty> warranty_;
+    platform::Property<std::shared_ptr<VRXDevice>> device_;
+    platform::Property<std::shared_ptr<VRXWarranty>> warranty_;
 };
 
 }  // namespace vrx

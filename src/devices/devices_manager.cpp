@@ -9,6 +9,7 @@
 #include "platform/device_properties.h"
 #include "platform/log.h"
 #include "platform/platform.h"
+#include "platform/settings_keys.h"
 #include "platform/text.h"
 #include "serverversion/server_version_utilities.h"
 
@@ -24,8 +25,6 @@ namespace {
 
 constexpr std::string_view serialNumberKey = "SerialNumber";
 constexpr std::string_view deviceNameKey = "UserAssignedDeviceName";
-constexpr std::string_view activationDateKey = "DefaultDeviceActivationDate";
-constexpr std::string_view testWatchesKey = "PairedWatchesSerialNumbers";
 constexpr std::string_view activationIntervalSuffix = ".activationInterval";
 constexpr std::string_view featureDomain = "Vireo";
 constexpr std::string_view pairedDevicesFlag = "Meridian_3_0";
@@ -76,7 +75,7 @@ std::shared_ptr<VRXDevicesManager> VRXDevicesManager::sharedManager() {
 std::shared_ptr<VRXDevice> VRXDevicesManager::defaultDevice() {
     auto serialNumber = defaultSerialNumber();
     auto name = Platform::current().deviceProperties().string(deviceNameKey);
-    auto activationDate = Platform::current().defaultsStore().date(activationDateKey);
+    auto activationDate = Platform::current().defaultsStore().date(platform::settings::defaultDeviceActivationDate);
     return VRXDevice::deviceWithName(std::move(name), std::move(serialNumber), activationDate, VRXDeviceTypeDefault);
 }
 
@@ -89,8 +88,9 @@ DevicesBySerialNumber VRXDevicesManager::pairedDevices() {
         log(Level::Default, "Meridian 3.0 disabled by server, ignore paired devices");
         return {};
     }
-    Value tested =
-        VRXUtilities::isInternal() ? Platform::current().defaultsStore().dictionary(testWatchesKey) : Value();
+    Value tested = VRXUtilities::isInternal()
+                       ? Platform::current().defaultsStore().dictionary(platform::settings::pairedWatchesSerialNumbers)
+                       : Value();
     DevicesBySerialNumber devices =
         tested.asDictionary() ? testWatches(*tested.asDictionary()) : registryWatches(_activePairedWatches());
     log(Level::Default, "%s - %@", "-[VRXDevicesManager pairedDevices]", devices);

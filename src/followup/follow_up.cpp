@@ -13,6 +13,7 @@
 #include "platform/defaults_store.h"
 #include "platform/log.h"
 #include "platform/platform.h"
+#include "platform/settings_keys.h"
 #include "platform/sha256_hash.h"
 
 namespace vrx {
@@ -27,8 +28,6 @@ namespace {
 
 using SharedDevice = std::shared_ptr<VRXDevice>;
 using SharedDeviceInfo = std::shared_ptr<VRXDeviceInfo>;
-
-constexpr std::string_view outreachDelayKey = "PostUpgradeOutreachDelay";
 
 std::optional<std::string> serialNumberOf(const VRXDeviceInfo& info) {
     const SharedDevice device = info.device();
@@ -158,7 +157,8 @@ bool VRXFollowUp::postFollowUpWithDevicesInfo(const DeviceInfoList& deviceInfos)
 
 bool VRXFollowUp::_postFollowUpWithDevicesInfo(const DeviceInfoList& deviceInfos, bool repostAllowed) {
     const std::set<std::string> dismissed = serialNumberHashes(dismissedSerialNumberHashesKey);
-    const Duration outreachDelay(Platform::current().defaultsStore().number(outreachDelayKey));
+    const Duration outreachDelay(
+        Platform::current().defaultsStore().number(platform::settings::postUpgradeOutreachDelay));
     DeviceInfoList due;
     for (const SharedDeviceInfo& info : deviceInfos) {
         const std::optional<std::string> serialNumber = serialNumberOf(*info);

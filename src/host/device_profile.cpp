@@ -214,6 +214,7 @@ ProfileBundle readBundle(Table& table) {
     bundle.identifier = table.requiredString("identifier");
     bundle.name = table.string("name");
     bundle.vendor = table.string("vendor");
+    bundle.group = table.string("group");
     table.table("entitlements", [&](Table& entitlements) {
         entitlements.each([&](const std::string& name, const toml::node& node) {
             std::optional<Value> value = entitlementValue(node);

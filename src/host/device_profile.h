@@ -27,6 +27,7 @@ struct ProfileBundle {
     std::string identifier;
     std::optional<std::string> name;
     std::optional<std::string> vendor;
+    std::optional<std::string> group;   // only callers whose group this is hold the entitlements
     platform::Dictionary entitlements;  // booleans, numbers, texts and lists of texts
 };
 

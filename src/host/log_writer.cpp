@@ -133,6 +133,7 @@ bool LogWriter::isFull() const {
 }
 
 void LogWriter::run() {
+    pthread_setname_np(pthread_self(), "log");
     std::unique_lock lock(mutex_);
     while (!isEnding_) {
         isIdle_ = pending_.ends.empty();

@@ -1,5 +1,7 @@
 #include "host/queues.h"
 
+#include <pthread.h>
+
 #include <algorithm>
 #include <system_error>
 
@@ -63,6 +65,7 @@ void WorkerPool::addThreadIfNeeded() {
 }
 
 void WorkerPool::work() {
+    pthread_setname_np(pthread_self(), "worker");
     ofThisThread_ = this;
     std::unique_lock lock(mutex_);
     Task task;

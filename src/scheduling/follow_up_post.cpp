@@ -95,14 +95,4 @@ std::optional<Date> VRXFollowUpPost::nextFollowUpPostDateWithDevicesInfo(const D
     return nextPostDate(deviceInfos, PostDateSettings::read(), Platform::current().clock().now());
 }
 
-std::shared_ptr<platform::RepeatingTimer> VRXFollowUpPost::followUpPostTimer() const {
-    std::lock_guard lock(mutex_);
-    return followUpPostTimer_;
-}
-
-void VRXFollowUpPost::setFollowUpPostTimer(std::shared_ptr<platform::RepeatingTimer> timer) {
-    std::lock_guard lock(mutex_);
-    followUpPostTimer_.swap(timer);
-}
-
 }  // namespace vrx

@@ -4,10 +4,10 @@
 
 #include <atomic>
 #include <memory>
-#include <mutex>
 #include <optional>
 
 #include "platform/date.h"
+#include "platform/property.h"
 #include "platform/timer.h"
 #include "scheduling/activity_collaborators.h"
 #include "scheduling/activity_run.h"
@@ -33,8 +33,10 @@ public:
     bool followUpPostInProgress() const { return followUpPostInProgress_; }
     void setFollowUpPostInProgress(bool followUpPostInProgress) { followUpPostInProgress_ = followUpPostInProgress; }
     // The deferral watch of the run under way, else null.
-    std::shared_ptr<platform::RepeatingTimer> followUpPostTimer() const;
-    void setFollowUpPostTimer(std::shared_ptr<platform::RepeatingTimer> timer);
+    std::shared_ptr<platform::RepeatingTimer> followUpPostTimer() const { return followUpPostTimer_.get(); }
+    void setFollowUpPostTimer(std::shared_ptr<platform::RepeatingTimer> timer) {
+        followUpPostTimer_.set(std::move(timer));
+    }
 
 private:
     std::shared_ptr<platform::RepeatingTimer> makeDeferralWatch(const std::shared_ptr<VRXScheduler>& scheduler,
@@ -45,8 +47,7 @@ private:
 
     const ActivityCollaborators collaborators_;
     std::atomic<bool> followUpPostInProgress_ = false;
-    mutable std::mutex mutex_;
-    std::shared_ptr<platform::RepeatingTimer> followUpPostTimer_;
+    platform::Property<std::shared_ptr<platform::RepeatingTimer>> followUpPostTimer_;
 };
 
 }  // namespace vrx

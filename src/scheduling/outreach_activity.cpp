@@ -1,6 +1,7 @@
 #include "scheduling/outreach_activity.h"
 
 #include <algorithm>
+#include <mutex>
 #include <optional>
 #include <utility>
 
@@ -171,16 +172,6 @@ bool VRXOutreachActivity::currentDeviceShouldReceiveOutreachForWarranty(const VR
         return false;
     }
     return true;
-}
-
-std::shared_ptr<platform::RepeatingTimer> VRXOutreachActivity::outReachTimer() const {
-    std::lock_guard lock(mutex_);
-    return outReachTimer_;
-}
-
-void VRXOutreachActivity::setOutReachTimer(std::shared_ptr<platform::RepeatingTimer> timer) {
-    std::lock_guard lock(mutex_);
-    outReachTimer_.swap(timer);
 }
 
 }  // namespace vrx

@@ -5,8 +5,8 @@
 
 #include <atomic>
 #include <memory>
-#include <mutex>
 
+#include "platform/property.h"
 #include "platform/timer.h"
 #include "scheduling/activity_collaborators.h"
 #include "scheduling/scheduler_activity_delegate.h"
@@ -32,8 +32,8 @@ public:
     bool outreachInProgress() const { return outreachInProgress_; }
     void setOutreachInProgress(bool outreachInProgress) { outreachInProgress_ = outreachInProgress; }
     // The deferral watch of the run under way, else null.
-    std::shared_ptr<platform::RepeatingTimer> outReachTimer() const;
-    void setOutReachTimer(std::shared_ptr<platform::RepeatingTimer> timer);
+    std::shared_ptr<platform::RepeatingTimer> outReachTimer() const { return outReachTimer_.get(); }
+    void setOutReachTimer(std::shared_ptr<platform::RepeatingTimer> timer) { outReachTimer_.set(std::move(timer)); }
 
 private:
     class Run;
@@ -45,8 +45,7 @@ private:
 
     const ActivityCollaborators collaborators_;
     std::atomic<bool> outreachInProgress_ = false;
-    mutable std::mutex mutex_;
-    std::shared_ptr<platform::RepeatingTimer> outReachTimer_;
+    platform::Property<std::shared_ptr<platform::RepeatingTimer>> outReachTimer_;
 };
 
 }  // namespace vrx

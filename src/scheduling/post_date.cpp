@@ -4,6 +4,7 @@
 #include "followup/serial_number_hashes.h"
 #include "platform/defaults_store.h"
 #include "platform/platform.h"
+#include "platform/settings_keys.h"
 #include "platform/sha256_hash.h"
 #include "scheduling/date_rules.h"
 
@@ -38,7 +39,8 @@ std::optional<Date> withOffer(const std::optional<Date>& next, const VRXDeviceIn
 }  // namespace
 
 PostDateSettings PostDateSettings::read() {
-    const double delay = platform::Platform::current().defaultsStore().number("PostUpgradeOutreachDelay");
+    const double delay =
+        platform::Platform::current().defaultsStore().number(platform::settings::postUpgradeOutreachDelay);
     return {serialNumberHashes(postedSerialNumberHashesKey), platform::Duration(delay)};
 }
 

@@ -3,6 +3,7 @@
 #include "devices/device_info.h"
 #include "platform/defaults_store.h"
 #include "platform/platform.h"
+#include "platform/settings_keys.h"
 #include "scheduling/date_rules.h"
 
 namespace vrx {
@@ -39,7 +40,8 @@ std::optional<Date> withOffer(const std::optional<Date>& next, const VRXDeviceIn
 
 RefreshDateSettings RefreshDateSettings::read() {
     const platform::DefaultsStore& defaults = platform::Platform::current().defaultsStore();
-    return {Duration(defaults.number("OneDayInterval")), Duration(defaults.number("PostUpgradeOutreachDelay"))};
+    return {Duration(defaults.number(platform::settings::oneDayInterval)),
+            Duration(defaults.number(platform::settings::postUpgradeOutreachDelay))};
 }
 
 std::optional<Date> nextRefreshDate(const DeviceInfoList& deviceInfos, bool isInitialCall,

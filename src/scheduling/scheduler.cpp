@@ -118,14 +118,4 @@ platform::ActivityHandler VRXScheduler::firingHandler() {
     };
 }
 
-std::shared_ptr<VRXSchedulerActivityDelegate> VRXScheduler::activityDelegate() const {
-    std::lock_guard lock(mutex_);
-    return activityDelegate_;
-}
-
-void VRXScheduler::setActivityDelegate(std::shared_ptr<VRXSchedulerActivityDelegate> activityDelegate) {
-    std::lock_guard lock(mutex_);
-    activityDelegate_.swap(activityDelegate);
-}
-
 }  // namespace vrx

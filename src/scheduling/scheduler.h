@@ -5,11 +5,11 @@
 #pragma once
 
 #include <memory>
-#include <mutex>
 #include <optional>
 
 #include "platform/background_activity_scheduler.h"
 #include "platform/date.h"
+#include "platform/property.h"
 #include "scheduling/scheduler_activity_delegate.h"
 
 namespace vrx {
@@ -41,14 +41,15 @@ public:
     platform::ActivityHandler firingHandler();
 
     // Read and replaced whole.
-    std::shared_ptr<VRXSchedulerActivityDelegate> activityDelegate() const;
-    void setActivityDelegate(std::shared_ptr<VRXSchedulerActivityDelegate> activityDelegate);
+    std::shared_ptr<VRXSchedulerActivityDelegate> activityDelegate() const { return activityDelegate_.get(); }
+    void setActivityDelegate(std::shared_ptr<VRXSchedulerActivityDelegate> activityDelegate) {
+        activityDelegate_.set(std::move(activityDelegate));
+    }
 
 private:
     explicit VRXScheduler(std::shared_ptr<VRXSchedulerActivityDelegate> activityDelegate);
 
-    mutable std::mutex mutex_;
-    std::shared_ptr<VRXSchedulerActivityDelegate> activityDelegate_;
+    platform::Property<std::shared_ptr<VRXSchedulerActivityDelegate>> activityDelegate_;
 };
 
 }  // namespace vrx

@@ -6,6 +6,7 @@
 #include "platform/defaults_store.h"
 #include "platform/log.h"
 #include "platform/platform.h"
+#include "platform/settings_keys.h"
 #include "platform/vendor.h"
 #include "scheduling/follow_up_refresh.h"
 #include "scheduling/outreach_activity.h"
@@ -22,8 +23,6 @@ using platform::Platform;
 namespace {
 
 constexpr std::string_view upgradeCompletedKey = "PostUpgradeActivityCompleted";
-constexpr std::string_view activationDateKey = "DefaultDeviceActivationDate";
-constexpr std::string_view outreachDelayKey = "PostUpgradeOutreachDelay";
 
 bool isUpgradeCompleted() {
     return Platform::current().defaultsStore().boolean(upgradeCompletedKey);
@@ -58,9 +57,9 @@ void VRXPostUpgradeActivity::performActivityForScheduler(const std::shared_ptr<V
 void VRXPostUpgradeActivity::performUpgrade() const {
     DefaultsStore& defaults = Platform::current().defaultsStore();
     VRXScheduler::clearScheduledActivities();
-    defaults.set(activationDateKey, Platform::current().clock().now());
+    defaults.set(platform::settings::defaultDeviceActivationDate, Platform::current().clock().now());
     VRXScheduler::newSchedulerWithActivityDelegate(std::make_shared<VRXOutreachActivity>(collaborators_))
-        ->scheduleActivityWithDelay(Duration(defaults.number(outreachDelayKey)));
+        ->scheduleActivityWithDelay(Duration(defaults.number(platform::settings::postUpgradeOutreachDelay)));
     defaults.set(upgradeCompletedKey, true);
 }
 

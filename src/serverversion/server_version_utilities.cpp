@@ -9,6 +9,7 @@
 #include "platform/number_text.h"
 #include "platform/platform.h"
 #include "platform/property_list.h"
+#include "platform/settings_keys.h"
 #include "platform/text.h"
 
 namespace vrx {
@@ -24,9 +25,8 @@ using platform::Value;
 
 namespace {
 
-constexpr std::string_view lowServerVersionKey = "LowServerVersion";
-constexpr std::string_view highServerVersionKey = "HighServerVersion";
-constexpr std::string_view serverVersionURLKey = "ServerVersionURL";
+namespace settings = platform::settings;
+
 constexpr std::string_view serverVersionOverrideKey = "ServerVersionOverride";
 constexpr std::string_view webFlowURLKey = "WebFlowURL";
 
@@ -37,8 +37,9 @@ DefaultsStore& defaults() {
 }
 
 Value clientVersionDictionary() {
-    Value dictionary = Dictionary{{std::string(lowServerVersionKey), defaults().integer(lowServerVersionKey)},
-                                  {std::string(highServerVersionKey), defaults().integer(highServerVersionKey)}};
+    Value dictionary =
+        Dictionary{{std::string(settings::lowServerVersion), defaults().integer(settings::lowServerVersion)},
+                   {std::string(settings::highServerVersion), defaults().integer(settings::highServerVersion)}};
     log(Level::Default, "Using Client version: %@", dictionary);
     return dictionary;
 }
@@ -68,14 +69,14 @@ std::optional<VersionSet> versionsSharedWith(const Value& server) {
         log(Level::Error, "Incorrect serverDictionary format");
         return std::nullopt;
     }
-    std::optional<double> low = versionFrom(server, lowServerVersionKey);
+    std::optional<double> low = versionFrom(server, settings::lowServerVersion);
     if (!low) return std::nullopt;
-    std::optional<double> high = versionFrom(server, highServerVersionKey);
+    std::optional<double> high = versionFrom(server, settings::highServerVersion);
     if (!high) return std::nullopt;
     VersionSet serverSet{*low, *high};
     log(Level::Default, "Server versions '%@'", serverSet);
-    VersionSet clientSet{static_cast<double>(defaults().integer(lowServerVersionKey)),
-                         static_cast<double>(defaults().integer(highServerVersionKey))};
+    VersionSet clientSet{static_cast<double>(defaults().integer(settings::lowServerVersion)),
+                         static_cast<double>(defaults().integer(settings::highServerVersion))};
     log(Level::Default, "Client versions '%@'", clientSet);
     VersionSet shared;
     std::ranges::set_intersection(clientSet, serverSet, std::inserter(shared, shared.end()));
@@ -156,7 +157,7 @@ void VRXServerVersionUtilities::_supportedVersionsForClientAndServer(VRXServerLo
         if (isRefresh || !fetched.isNull()) storeServerVersionCache(used);
         completion(versionsSharedWith(used));
     };
-    _dictionaryFromURL(defaults().string(serverVersionURLKey).value_or(""), true, std::move(finish));
+    _dictionaryFromURL(defaults().string(settings::serverVersionURL).value_or(""), true, std::move(finish));
 }
 
 void VRXServerVersionUtilities::serverVersionSupported(Completion<bool> completion) {
@@ -171,7 +172,7 @@ void VRXServerVersionUtilities::serverVersionSupported(Completion<bool> completi
 void VRXServerVersionUtilities::isHighServerVersionFeaturesetEnabled(VRXServerLookupPolicy policy,
                                                                      Completion<bool> completion) {
     auto answer = [completion = std::move(completion)](const std::optional<VersionSet>& shared) mutable {
-        auto high = static_cast<double>(defaults().integer(highServerVersionKey));
+        auto high = static_cast<double>(defaults().integer(settings::highServerVersion));
         const bool isEnabled = shared && shared->contains(high);
         log(Level::Default, "High Server version supported - %@", isEnabled ? "YES" : "NO");
         completion(isEnabled);

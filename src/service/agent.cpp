@@ -1,5 +1,6 @@
 #include "service/agent.h"
 
+#include <mutex>
 #include <utility>
 
 #include "coverage/warranty.h"
@@ -10,6 +11,7 @@
 #include "platform/defaults_store.h"
 #include "platform/log.h"
 #include "platform/platform.h"
+#include "platform/settings_keys.h"
 #include "platform/vendor.h"
 #include "serverversion/server_version_utilities.h"
 #include "service/default_warranty_provider.h"
@@ -25,7 +27,8 @@ namespace {
 constexpr platform::Duration outreachDelay{1.0};
 
 // The tables by which testers let one serial number stand for another, the first that knows it.
-constexpr std::string_view overrideTables[] = {"PairedWatchesSerialNumbers", "PairedBluetoothDevicesSerialNumbers"};
+constexpr std::string_view overrideTables[] = {platform::settings::pairedWatchesSerialNumbers,
+                                               "PairedBluetoothDevicesSerialNumbers"};
 
 std::string withOverride(std::string serialNumber) {
     for (std::string_view table : overrideTables) {
@@ -189,26 +192,6 @@ void VRXAgent::dismissFollowUpForSerialNumber(std::string serialNumber, Reply<bo
 
 void VRXAgent::getWarrantyUsingPolicy(VRXWarrantyLookupPolicy policy, WarrantyReply reply) {
     getWarrantyUsingPolicy(policy, deviceProvider()->defaultDevice()->serialNumber(), std::move(reply));
-}
-
-std::shared_ptr<VRXAgentWarrantyProvider> VRXAgent::warrantyProvider() const {
-    std::lock_guard lock(providersMutex_);
-    return warrantyProvider_;
-}
-
-void VRXAgent::setWarrantyProvider(std::shared_ptr<VRXAgentWarrantyProvider> provider) {
-    std::lock_guard lock(providersMutex_);
-    warrantyProvider_.swap(provider);
-}
-
-std::shared_ptr<VRXAgentDeviceProvider> VRXAgent::deviceProvider() const {
-    std::lock_guard lock(providersMutex_);
-    return deviceProvider_;
-}
-
-void VRXAgent::setDeviceProvider(std::shared_ptr<VRXAgentDeviceProvider> provider) {
-    std::lock_guard lock(providersMutex_);
-    deviceProvider_.swap(provider);
 }
 
 }  // namespace vrx

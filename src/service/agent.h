@@ -4,11 +4,11 @@
 #pragma once
 
 #include <memory>
-#include <mutex>
 #include <optional>
 #include <string>
 
 #include "platform/completion_group.h"
+#include "platform/property.h"
 #include "platform/queue.h"
 #include "protocols/agent_collaborators.h"
 #include "protocols/agent_device_provider.h"
@@ -54,10 +54,14 @@ public:
     void performMigrationIfNeeded();
 
     // Read and replaced whole; a request keeps to what it has read.
-    std::shared_ptr<VRXAgentWarrantyProvider> warrantyProvider() const;
-    void setWarrantyProvider(std::shared_ptr<VRXAgentWarrantyProvider> provider);
-    std::shared_ptr<VRXAgentDeviceProvider> deviceProvider() const;
-    void setDeviceProvider(std::shared_ptr<VRXAgentDeviceProvider> provider);
+    std::shared_ptr<VRXAgentWarrantyProvider> warrantyProvider() const { return warrantyProvider_.get(); }
+    void setWarrantyProvider(std::shared_ptr<VRXAgentWarrantyProvider> provider) {
+        warrantyProvider_.set(std::move(provider));
+    }
+    std::shared_ptr<VRXAgentDeviceProvider> deviceProvider() const { return deviceProvider_.get(); }
+    void setDeviceProvider(std::shared_ptr<VRXAgentDeviceProvider> provider) {
+        deviceProvider_.set(std::move(provider));
+    }
 
 private:
     VRXAgent(std::shared_ptr<VRXAgentWarrantyProvider> warrantyProvider,
@@ -65,9 +69,8 @@ private:
 
     std::shared_ptr<platform::Queue> _policyLookupQueue;
     platform::CompletionGroup _group;  // of the lookups of all-devices requests
-    mutable std::mutex providersMutex_;
-    std::shared_ptr<VRXAgentWarrantyProvider> warrantyProvider_;
-    std::shared_ptr<VRXAgentDeviceProvider> deviceProvider_;
+    platform::Property<std::shared_ptr<VRXAgentWarrantyProvider>> warrantyProvider_;
+    platform::Property<std::shared_ptr<VRXAgentDeviceProvider>> deviceProvider_;
     const AgentCollaborators collaborators_;
 };
 

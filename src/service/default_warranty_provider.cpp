@@ -11,6 +11,7 @@
 #include "platform/defaults_store.h"
 #include "platform/log.h"
 #include "platform/platform.h"
+#include "platform/settings_keys.h"
 
 namespace vrx {
 
@@ -20,7 +21,6 @@ using platform::Value;
 
 namespace {
 
-constexpr std::string_view validityDurationKey = "CachedWarrantyValidityDuration";
 constexpr std::string_view migrationVersionKey = "VRXMigrationVersion";
 
 // A device without a serial number has no metadata.
@@ -91,7 +91,8 @@ void VRXAgentDefaultWarrantyProvider::migrateLegacyFollowUpIfNeededWithDeviceInf
 }
 
 platform::Duration VRXAgentDefaultWarrantyProvider::cachedWarrantyValidityDuration() {
-    return platform::Duration(Platform::current().defaultsStore().number(validityDurationKey));
+    return platform::Duration(
+        Platform::current().defaultsStore().number(platform::settings::cachedWarrantyValidityDuration));
 }
 
 bool VRXAgentDefaultWarrantyProvider::isSignedInToNimbus() {

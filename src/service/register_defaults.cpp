@@ -1,19 +1,22 @@
 #include "service/register_defaults.h"
 
 #include "platform/defaults_store.h"
+#include "platform/settings_keys.h"
 
 namespace vrx {
 
+namespace settings = platform::settings;
+
 void vrx_registerDefaults(platform::DefaultsStore& defaults) {
-    // Durations in seconds.
     defaults.registerDefaults({
-        {"CachedWarrantyValidityDuration", 86400},
-        {"HighServerVersion", 3},
-        {"LowServerVersion", 2},
-        {"OneDayInterval", 86400},
-        {"PostUpgradeOutreachDelay", 172800},
-        {"ServerVersionURL", "https://configuration.orvane.example/library/ORVANE/asset/vrxV2.plist"},
-        {"WarrantyURL", "https://coverage.orvane.example/api/v2/coverage/summary"},
+        {std::string(settings::cachedWarrantyValidityDuration), 86400},
+        {std::string(settings::highServerVersion), 3},
+        {std::string(settings::lowServerVersion), 2},
+        {std::string(settings::oneDayInterval), 86400},
+        {std::string(settings::postUpgradeOutreachDelay), 172800},
+        {std::string(settings::serverVersionURL),
+         "https://configuration.orvane.example/library/ORVANE/asset/vrxV2.plist"},
+        {std::string(settings::warrantyURL), "https://coverage.orvane.example/api/v2/coverage/summary"},
     });
 }
 

@@ -95,7 +95,7 @@ TEST_F(BundleLookupTest, ReadsEntitlementsOfAnyType) {
 TEST_F(BundleLookupTest, TakesTestersBundlesFromATrustedProfile) {
     auto facts = std::make_shared<ProfileFacts>();
     std::filesystem::create_symlink(folder + "/app/bin/viewer", folder + "/other-name");
-    facts->bundles.push_back({{"/nowhere", folder + "/other-name"}, "com.example.tester", {}, {}, {}});
+    facts->bundles.push_back({{"/nowhere", folder + "/other-name"}, "com.example.tester", {}, {}, {}, {}});
     BundleLookup lookup([facts] { return facts; });
     EXPECT_EQ(identifier(lookup), "com.example.viewer");
     facts->isTrusted = true;
@@ -129,6 +129,13 @@ TEST_F(BundleLookupTest, EntitlesThePeerByItsProgramAndGroup) {
     EXPECT_EQ(BundleLookup().entitlement(peer, "e"), Value(true));
     requireGroup("nogroup");
     EXPECT_TRUE(BundleLookup().entitlement(peer, "e").isNull());
+    auto facts = std::make_shared<ProfileFacts>();
+    facts->isTrusted = true;
+    facts->bundles.push_back({{program}, "com.example.tester", {}, {}, "nogroup", {{"e", true}}});
+    BundleLookup tester([facts] { return facts; });
+    EXPECT_TRUE(tester.entitlement(peer, "e").isNull());
+    facts->bundles[0].group = getgrgid(getgid())->gr_name;
+    EXPECT_EQ(tester.entitlement(peer, "e"), Value(true));
 
     pclose(process);
     EXPECT_FALSE(peer.runsSameProgram());

@@ -94,7 +94,7 @@ std::optional<BundleFile> BundleLookup::profileBundle(const std::string& executa
         for (const std::string& named : bundle.executables)
             if (isSameFile(named, executable))
                 return BundleFile{executable,    bundle.identifier, bundle.name,
-                                  bundle.vendor, std::nullopt,      bundle.entitlements};
+                                  bundle.vendor, bundle.group,      bundle.entitlements};
     return std::nullopt;
 }
 
