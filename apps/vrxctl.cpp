@@ -213,10 +213,12 @@ Outcome dismiss(AgentConnection& agent, const std::string& serialNumber) {
     });
 }
 
-// What the agent tells of an application. Entries that it doesn't give are left out.
+// What the agent tells of an application. Entries that it doesn't give, or that are empty, are left out.
 Outcome availability(const Value& answer, const std::string& problem) {
     Outcome outcome;
-    if (!answer["AppAvailabilityType"].isNumber()) outcome = failed(ExitCode::NoAnswer, problem, "");
+    if (!answer["AppAvailabilityType"].isNumber())
+        outcome = failed(ExitCode::NoAnswer, problem,
+                         "The agent's log says why; [store] in the device profile names the addresses that it asks.");
     outcome.document = {{"availability", answer}};
     constexpr std::array<std::pair<const char*, const char*>, 6> lines{{{"Application", "AppBundleID"},
                                                                         {"Title", "AppTitleKey"},
@@ -226,23 +228,22 @@ Outcome availability(const Value& answer, const std::string& problem) {
                                                                         {"Availability", "AppAvailablityText"}}};
     std::vector<std::vector<std::string>> rows;
     for (const auto& [label, key] : lines)
-        if (const std::string* text = answer[key].asString()) rows.push_back({label, *text});
+        if (const std::string* text = answer[key].asString(); text && !text->empty()) rows.push_back({label, *text});
     if (answer["AppAvailabilityType"] == Value(0)) rows.push_back({"Availability", "none"});
     outcome.text = table(rows);
     return outcome;
 }
 
 Outcome store(AgentConnection& agent, const std::string& bundleIdentifier) {
-    return outcomeOf(agent, agent.checkIsAvailableInStore(bundleIdentifier), [](const Value& answer) {
-        return availability(answer, "the Marketplace could not be asked; the agent's log says why");
-    });
+    return outcomeOf(agent, agent.checkIsAvailableInStore(bundleIdentifier),
+                     [](const Value& answer) { return availability(answer, "the Marketplace could not be asked"); });
 }
 
 Outcome support(AgentConnection& agent, const std::string& bundleIdentifier) {
     return outcomeOf(agent, agent.appSupportAvailability(bundleIdentifier), [](const Value& answer) {
         return availability(answer,
                             "the application is neither installed nor purchased, and the Marketplace could not be "
-                            "asked; the agent's log says why");
+                            "asked");
     });
 }
 

@@ -3,8 +3,6 @@
 #include <algorithm>
 #include <charconv>
 #include <chrono>
-#include <fstream>
-#include <iterator>
 #include <optional>
 
 #include "coverage_server/json.h"
@@ -61,25 +59,16 @@ void setTimes(Json& json, std::chrono::sys_seconds now) {
     }
 }
 
-std::optional<std::string> contentOf(const std::filesystem::path& path) {
-    std::ifstream file(path, std::ios::binary);
-    if (!file) return std::nullopt;
-    return std::string(std::istreambuf_iterator<char>(file), {});
-}
-
 }  // namespace
 
 std::string CoverageRecords::record(const std::string& serialNumber) const {
     if (folder_.empty()) return R"({"covered":true})";
-    std::filesystem::path path = folder_ / (serialNumber + ".json");
-    std::optional<std::string> content;
-    if (isFileName(serialNumber)) content = contentOf(path);
-    if (!content) content = contentOf(path = folder_ / "default.json");
-    if (!content) return "";
-    Json json = Json::parse(*content, nullptr, false);
-    if (json.is_discarded()) throw std::runtime_error(path.string() + " is not JSON");
-    setTimes(json, std::chrono::floor<std::chrono::seconds>(std::chrono::system_clock::now()));
-    return dumped(json);
+    std::optional<Json> json;
+    if (isFileName(serialNumber)) json = jsonIn(folder_ / (serialNumber + ".json"));
+    if (!json) json = jsonIn(folder_ / "default.json");
+    if (!json) return "";
+    setTimes(*json, std::chrono::floor<std::chrono::seconds>(std::chrono::system_clock::now()));
+    return dumped(*json);
 }
 
 }  // namespace vrx::coverage_server

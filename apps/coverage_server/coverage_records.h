@@ -13,7 +13,7 @@ class CoverageRecords {
 public:
     // Without a folder every serial number has one small record.
     explicit CoverageRecords(std::filesystem::path folder) : folder_(std::move(folder)) {}
-    // SERIAL.json, else default.json; empty when there is neither. Throws std::runtime_error for a file that is no
+    // SERIAL.json, else default.json; empty when there is neither. Throws std::runtime_error for a file that is not
     // JSON.
     std::string record(const std::string& serialNumber) const;
 

@@ -13,6 +13,12 @@ namespace {
 
 constexpr const char* jsonType = "application/json";
 
+constexpr std::pair<std::string_view, Endpoint> paths[] = {{coveragePath, Endpoint::Coverage},
+                                                           {serverVersionPath, Endpoint::ServerVersion},
+                                                           {tokenPath, Endpoint::Token},
+                                                           {cataloguePath, Endpoint::Catalogue},
+                                                           {purchasesPath, Endpoint::Purchases}};
+
 struct Target {
     std::optional<Endpoint> endpoint;
     bool isMoved;
@@ -21,9 +27,8 @@ struct Target {
 Target targetOf(std::string_view path) {
     const bool isMoved = path.starts_with(movedPrefix);
     if (isMoved) path.remove_prefix(movedPrefix.size());
-    if (path == coveragePath) return {Endpoint::Coverage, isMoved};
-    if (path == serverVersionPath) return {Endpoint::ServerVersion, isMoved};
-    if (path == tokenPath) return {Endpoint::Token, isMoved};
+    for (const auto& [served, endpoint] : paths)
+        if (path == served) return {endpoint, isMoved};
     return {std::nullopt, isMoved};
 }
 
@@ -73,6 +78,7 @@ CoverageService::CoverageService(const CoverageServiceSettings& settings)
       printsRequests_(settings.printsRequests),
       requiredHeaders_(settings.requiredHeaders),
       records_(settings.records),
+      store_(settings.store),
       serverVersion_(settings.serverVersion),
       tokens_(settings.tokens) {}
 
@@ -102,30 +108,30 @@ void CoverageService::serve(const httplib::Request& request, httplib::Response& 
     if (!target.endpoint) return refuse(response, 404, exchange.reason, "no such path");
     const FaultPlan plan = target.isMoved ? FaultPlan{} : faults_.take(*target.endpoint);
     exchange.fault = plan.description;
-    if (!connection.pause(plan.delay)) return connection.takeOver(0);
+    if (!wait(plan, connection)) return connection.takeOver(0);
     if (!plan.fault || plan.fault->kind->bendsAnswer) answer(*target.endpoint, request, response, exchange.reason);
     if (plan.fault) misbehave(*plan.fault, *target.endpoint, request, response, connection);
 }
 
 void CoverageService::answer(Endpoint endpoint, const httplib::Request& request, httplib::Response& response,
                              std::string& reason) {
-    if (endpoint == Endpoint::Coverage) return answerCoverage(request, response, reason);
-    if (endpoint == Endpoint::Token) return answerToken(request, response, reason);
-    if (request.method != "GET" && request.method != "HEAD")
-        return refuse(response, 405, reason, "the method is not GET");
-    serverVersion_.answer(request, response);
+    try {
+        if (endpoint == Endpoint::Coverage) return answerCoverage(request, response, reason);
+        if (endpoint == Endpoint::Token) return answerToken(request, response, reason);
+        if (request.method != "GET" && request.method != "HEAD")
+            return refuse(response, 405, reason, "the method is not GET");
+        if (endpoint == Endpoint::ServerVersion) return serverVersion_.answer(request, response);
+        answerStore(endpoint, request, response, reason);
+    } catch (const std::runtime_error& error) {  // what is to be served cannot be
+        refuse(response, 500, reason, error.what());
+    }
 }
 
 void CoverageService::answerCoverage(const httplib::Request& request, httplib::Response& response,
                                      std::string& reason) const {
     const Verdict verdict = judge(request, tokens_, requiredHeaders_);
     if (verdict.status != 200) return refuse(response, verdict.status, reason, joined(verdict.reasons));
-    std::string record;
-    try {
-        record = records_.record(verdict.serialNumber);
-    } catch (const std::runtime_error& error) {
-        return refuse(response, 500, reason, error.what());
-    }
+    const std::string record = records_.record(verdict.serialNumber);
     if (record.empty()) return refuse(response, 404, reason, "no record for this serial number, and no default.json");
     response.status = 200;
     response.set_content(record, jsonType);
@@ -139,6 +145,23 @@ void CoverageService::answerToken(const httplib::Request& request, httplib::Resp
         return refuse(response, 400, reason, "lines account=... and service=... are needed");
     response.status = 200;
     response.set_content("token=" + tokens_.renew(entries["account"], entries["service"]) + "\n", "text/plain");
+}
+
+void CoverageService::answerStore(Endpoint endpoint, const httplib::Request& request, httplib::Response& response,
+                                  std::string& reason) const {
+    const bool isCatalogue = endpoint == Endpoint::Catalogue;
+    const StoreQuestion question = isCatalogue ? catalogueQuestion(request) : purchasesQuestion(request);
+    if (!question.reasons.empty()) return refuse(response, 400, reason, joined(question.reasons));
+    const Json answer = isCatalogue ? store_.items(question) : store_.purchases(question);
+    response.status = 200;
+    response.set_content(dumped(answer), jsonType);
+}
+
+bool CoverageService::wait(const FaultPlan& plan, Connection& connection) const {
+    constexpr Milliseconds beforeNextLook(10);
+    bool isThere = connection.pause(plan.delay);
+    while (isThere && faults_.holds(plan)) isThere = connection.pause(beforeNextLook);
+    return isThere;
 }
 
 void CoverageService::answered(const httplib::Request& request, const httplib::Response& response,

@@ -1,4 +1,5 @@
-// The served port: coverage, server-version document and token renewal, each with the faults that are asked for.
+// The served port: coverage, server-version document, token renewal, the store's catalogue and purchases, each with the
+// faults that are asked for.
 #pragma once
 
 #include <chrono>
@@ -12,6 +13,7 @@
 #include "coverage_server/http_server.h"
 #include "coverage_server/request_log.h"
 #include "coverage_server/server_version_document.h"
+#include "coverage_server/store_file.h"
 #include "coverage_server/tokens.h"
 
 namespace vrx::coverage_server {
@@ -19,11 +21,14 @@ namespace vrx::coverage_server {
 inline constexpr std::string_view coveragePath = "/api/v2/coverage/summary";
 inline constexpr std::string_view serverVersionPath = "/library/ORVANE/asset/vrxV2.plist";
 inline constexpr std::string_view tokenPath = "/token/renew";
+inline constexpr std::string_view cataloguePath = "/store/lookup";
+inline constexpr std::string_view purchasesPath = "/store/purchases";
 // Under this prefix everything is served once more, without faults: where redirects can lead to.
 inline constexpr std::string_view movedPrefix = "/moved";
 
 struct CoverageServiceSettings {
     std::filesystem::path records;
+    std::filesystem::path store;
     std::vector<std::string> tokens;
     std::vector<std::string> requiredHeaders = defaultRequiredHeaders;
     ServerVersionSettings serverVersion;
@@ -52,12 +57,17 @@ private:
     void answer(Endpoint endpoint, const httplib::Request& request, httplib::Response& response, std::string& reason);
     void answerCoverage(const httplib::Request& request, httplib::Response& response, std::string& reason) const;
     void answerToken(const httplib::Request& request, httplib::Response& response, std::string& reason);
+    void answerStore(Endpoint endpoint, const httplib::Request& request, httplib::Response& response,
+                     std::string& reason) const;
+    // False when the client has gone, or the server is ending, before the plan's waiting is over.
+    bool wait(const FaultPlan& plan, Connection& connection) const;
     void print(const std::string& line) const;
 
     const bool isQuiet_;
     const bool printsRequests_;
     const std::vector<std::string> requiredHeaders_;
     const CoverageRecords records_;
+    const StoreFile store_;
     ServerVersionDocument serverVersion_;
     Tokens tokens_;
     FaultList faults_;

@@ -12,6 +12,8 @@ namespace {
 constexpr std::pair<Endpoint, std::string_view> endpoints[] = {{Endpoint::Coverage, "coverage"},
                                                                {Endpoint::ServerVersion, "server-version"},
                                                                {Endpoint::Token, "token"},
+                                                               {Endpoint::Catalogue, "catalogue"},
+                                                               {Endpoint::Purchases, "purchases"},
                                                                {Endpoint::Connection, "connection"},
                                                                {Endpoint::Any, "any"}};
 
@@ -66,11 +68,16 @@ void setValue(Fault& fault, std::optional<std::string> value) {
     }
 }
 
+bool holdsNulls(Endpoint endpoint) {
+    return endpoint == Endpoint::Coverage || endpoint == Endpoint::Catalogue || endpoint == Endpoint::Purchases;
+}
+
 Fault makeFault(std::string_view endpoint, std::string_view kind, std::optional<std::string> value) {
     Fault fault;
     const auto* found = std::ranges::find(endpoints, endpoint, &std::pair<Endpoint, std::string_view>::second);
     if (found == std::end(endpoints))
-        refuse("no such endpoint: " + std::string(endpoint) + " (coverage, server-version, token, connection, any)");
+        refuse("no such endpoint: " + std::string(endpoint) +
+               " (coverage, server-version, token, catalogue, purchases, connection, any)");
     fault.endpoint = found->first;
     const auto& kinds = faultKinds();
     const auto info = std::ranges::find(kinds, kind, &FaultKindInfo::name);
@@ -79,8 +86,8 @@ Fault makeFault(std::string_view endpoint, std::string_view kind, std::optional<
     if (fault.endpoint == Endpoint::Connection && !info->suitsConnection)
         refuse(std::string(kind) +
                " needs a request; a connection can only be met by delay, close, reset, hang, not-http");
-    if (info->kind == FaultKind::Nulls && fault.endpoint != Endpoint::Coverage)
-        refuse("nulls is for coverage only: no other answer can hold one");
+    if (info->kind == FaultKind::Nulls && !holdsNulls(fault.endpoint))
+        refuse("nulls is for coverage, catalogue and purchases only: no other answer can hold one");
     setValue(fault, std::move(value));
     return fault;
 }
@@ -107,6 +114,7 @@ const std::vector<FaultKindInfo>& faultKinds() {
     static const std::vector<FaultKindInfo> kinds = {
         {Status, "status", FaultValue::Status, "none", false, false, "answers with this status and a JSON reason"},
         {Delay, "delay", FaultValue::Duration, "none", true, true, "waits first; the next fault applies as well"},
+        {Hold, "hold", FaultValue::None, "", true, false, "the same, until the fault is removed"},
         {Drop, "drop", FaultValue::None, "", true, false, "sends head and half of the body, then ends the connection"},
         {Reset, "reset", FaultValue::None, "", false, true, "resets the connection instead of answering"},
         {Close, "close", FaultValue::None, "", false, true, "closes the connection instead of answering"},
@@ -116,7 +124,7 @@ const std::vector<FaultKindInfo>& faultKinds() {
         {NotJson, "not-json", FaultValue::None, "", false, false, "answers 200 with an HTML page of a sign-in portal"},
         {Array, "array", FaultValue::None, "", true, false, "answers with an array as the document's root"},
         {Nulls, "nulls", FaultValue::Text, "", true, false,
-         "makes null of every member of the record, or of the named"},
+         "makes null of every member of the record, or of the store's entries, or of the named"},
         {Body, "body", FaultValue::Text, "none", false, false, "answers 200 with this body"},
         {Empty, "empty", FaultValue::None, "", false, false, "answers 200 with an empty body"},
         {Large, "large", FaultValue::Size, "100MiB", false, false, "answers 200 with a valid document of this size"},
@@ -199,12 +207,20 @@ FaultPlan FaultList::take(Endpoint endpoint) {
         if (!fault.value.empty()) plan.description += "=" + fault.value;
         if (fault.kind->kind == FaultKind::Delay) {
             plan.delay += fault.time;
+        } else if (fault.kind->kind == FaultKind::Hold) {
+            plan.holds.push_back(fault.id);
         } else {
             plan.fault = fault;
             break;
         }
     }
     return plan;
+}
+
+bool FaultList::holds(const FaultPlan& plan) const {
+    std::lock_guard lock(mutex_);
+    return std::ranges::any_of(faults_,
+                               [&](const Fault& fault) { return std::ranges::count(plan.holds, fault.id) > 0; });
 }
 
 Json FaultList::json() const {

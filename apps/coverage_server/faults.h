@@ -14,12 +14,13 @@
 
 namespace vrx::coverage_server {
 
-enum class Endpoint { Coverage, ServerVersion, Token, Connection, Any };
+enum class Endpoint { Coverage, ServerVersion, Token, Catalogue, Purchases, Connection, Any };
 std::string_view nameOf(Endpoint endpoint);
 
 enum class FaultKind {
     Status,
     Delay,
+    Hold,
     Drop,
     Reset,
     Close,
@@ -74,6 +75,7 @@ Fault parseFault(std::string_view spec);
 // What happens to one request, or to one connection: waiting, then at most one thing more.
 struct FaultPlan {
     std::chrono::milliseconds delay{0};
+    std::vector<std::uint64_t> holds;  // the ids of faults whose removal it waits for
     std::optional<Fault> fault;
     std::string description;  // empty when nothing happens
 };
@@ -84,9 +86,11 @@ public:
     std::uint64_t add(Fault fault);
     bool remove(std::uint64_t id);
     void clear();
-    // In the order in which they were added: every delay that applies, and the first other fault that does. A fault
-    // counts a request as passed, or as its own, only when no earlier fault but a delay has taken it.
+    // In the order in which they were added: every delay and hold that applies, and the first other fault that does. A
+    // fault counts a request as passed, or as its own, only when no earlier one of these others has taken it.
     FaultPlan take(Endpoint endpoint);
+    // Whether a fault that the plan waits for is still there.
+    bool holds(const FaultPlan& plan) const;
     Json json() const;  // an id and a description each
 
 private:

@@ -1,4 +1,4 @@
-// A coverage server and CDN for development and tests, on loopback only.
+// A coverage server, CDN and store for development and tests, on loopback only.
 #include <pthread.h>
 #include <signal.h>
 
@@ -11,6 +11,7 @@
 #include "coverage_server/control_service.h"
 #include "coverage_server/coverage_service.h"
 #include "coverage_server/http_server.h"
+#include "manual.h"
 
 using namespace vrx::coverage_server;
 
@@ -39,12 +40,19 @@ std::string footer() {
         "  POST /token/renew                        lines account=... and service=... -> a line token=...; the old "
         "token,\n"
         "                                           and those given at start, are no longer valid\n"
+        "  GET  /store/lookup                       the catalogue's items for bundle=..., given profile=lockup, one of "
+        "the\n"
+        "                                           bundles as caller, and locale\n"
+        "  GET  /store/purchases                    what account=NUMBER has bought of bundle=...; both 400 with "
+        "{\"reason\"}\n"
+        "                                           for a question that is not like this\n"
         "  /moved/...                               the same once more, without faults\n"
         "\nFaults: ENDPOINT:KIND[=VALUE][,count=N][,skip=N][,code=N]\n"
-        "  ENDPOINT is coverage, server-version, token, any, or connection (delay, close, reset, hang, not-http; "
-        "before\n"
-        "  TLS). Without count a fault happens to every request; skip lets so many pass first. A request takes every\n"
-        "  delay and the first other fault that applies to it, in the order in which they were given. Examples:\n"
+        "  ENDPOINT is coverage, server-version, token, catalogue, purchases, any, or connection (delay, close, "
+        "reset,\n"
+        "  hang, not-http; before TLS). Without count a fault happens to every request; skip lets so many pass first.\n"
+        "  A request takes every delay and hold, and the first other fault that applies to it, in the order in which\n"
+        "  they were given. Examples:\n"
         "    coverage:status=401,count=2     server-version:delay=200ms     any:bomb=2GiB,skip=1,count=1\n\n";
     for (const FaultKindInfo& kind : faultKinds()) {
         std::string name(kind.name);
@@ -68,9 +76,11 @@ std::string footer() {
 
 // The exit code when there is nothing more to do.
 std::optional<int> parse(int argc, char** argv, Options& options) {
-    CLI::App app("A coverage server and CDN for development and tests. Listens on 127.0.0.1 only.");
+    CLI::App app("A coverage server, CDN and store for development and tests. Listens on 127.0.0.1 only.",
+                 "vrx-coverage-server");
     app.footer(footer());
     app.set_version_flag("--version", VRX_VERSION);
+    vrx::apps::addManualOption(app);
     const CLI::Range ports(0, 65535);
     ServerVersionSettings& serverVersion = options.service.serverVersion;
     bool noEtag = false, noLastModified = false, noConditional = false;
@@ -88,6 +98,10 @@ std::optional<int> parse(int argc, char** argv, Options& options) {
                    "Folder of records: SERIAL.json, else default.json, read for each request. Strings such as @now+30d "
                    "or @now-12h:ms become epoch numbers")
         ->check(CLI::ExistingDirectory);
+    app.add_option("--store", options.service.store,
+                   "File of the store: {\"items\": [...], \"purchases\": [...]}, each with the bundleIdentifier by "
+                   "which it is found, read for each request (a support app is offered)")
+        ->check(CLI::ExistingFile);
     app.add_option("--token", options.service.tokens, "A valid token, repeatable (development-token)")
         ->allow_extra_args(false);
     app.add_option("--require-header", options.service.requiredHeaders,

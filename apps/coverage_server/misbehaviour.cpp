@@ -45,7 +45,10 @@ Padded paddedDocument(Endpoint endpoint) {
                     "<dict><key>LowServerVersion</key><integer>2</integer><key>HighServerVersion</key>"
                     "<integer>3</integer><key>Padding</key><string>",
                 "</string></dict></plist>\n"};
-    return {R"({"covered":true,"padding":")", R"("})"};
+    std::string begin = R"({"covered":true)";
+    if (endpoint == Endpoint::Catalogue) begin = R"({"items":[])";
+    if (endpoint == Endpoint::Purchases) begin = R"({"purchases":[])";
+    return {begin + R"(,"padding":")", R"("})"};
 }
 
 void sendLarge(std::uint64_t size, Endpoint endpoint, Connection& connection) {
@@ -178,13 +181,22 @@ void bend(httplib::Response& response, const std::string& body) {
     if (!cacheControl.empty()) response.set_header("Cache-Control", cacheControl);
 }
 
-std::string withNulls(const std::string& record, const std::string& name) {
-    Json json = Json::parse(record, nullptr, false);
-    if (!json.is_object()) return record;
+void setNulls(Json& object, const std::string& name) {
+    if (!object.is_object()) return;
     if (!name.empty())
-        json[name] = nullptr;
+        object[name] = nullptr;
     else
-        for (auto& member : json) member = nullptr;
+        for (Json& member : object) member = nullptr;
+}
+
+std::string withNulls(Endpoint endpoint, const std::string& body, const std::string& name) {
+    Json json = Json::parse(body, nullptr, false);
+    if (json.is_discarded()) return body;
+    if (endpoint == Endpoint::Coverage)
+        setNulls(json, name);
+    else  // the store's answer: one list
+        for (Json& list : json)
+            for (Json& entry : list) setNulls(entry, name);
     return dumped(json);
 }
 
@@ -219,7 +231,8 @@ void misbehave(const Fault& fault, Endpoint endpoint, const httplib::Request& re
             answer(response, R"({"reason":"as the fault wants"})", "application/json");
             response.status = static_cast<int>(fault.number);
             return;
-        case FaultKind::Delay: return;
+        case FaultKind::Delay:
+        case FaultKind::Hold: return;
         case FaultKind::Drop:
             sendWithLength(response, body.size(), std::string_view(body).substr(0, body.size() / 2), connection);
             return connection.endAbruptly(false);
@@ -233,7 +246,7 @@ void misbehave(const Fault& fault, Endpoint endpoint, const httplib::Request& re
                           "text/html");
         case FaultKind::Array:
             return bend(response, endpoint == Endpoint::ServerVersion ? arrayLike(body) : "[" + body + "]");
-        case FaultKind::Nulls: return bend(response, withNulls(body, fault.value));
+        case FaultKind::Nulls: return bend(response, withNulls(endpoint, body, fault.value));
         case FaultKind::Body: return answer(response, fault.value, mediaType(endpoint));
         case FaultKind::Empty: return answer(response, "", mediaType(endpoint));
         case FaultKind::Large: return sendLarge(fault.number, endpoint, connection);
