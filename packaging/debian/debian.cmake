@@ -1,0 +1,59 @@
+# The Debian packages: cpack --preset release. vrxagent is what a device gets, with all that an application for it is built
+# from; vrx-coverage-server is for who develops and tests.
+file(STRINGS debian/changelog latest LIMIT_COUNT 1)
+if(NOT latest MATCHES "^vrxagent \\(${CMAKE_PROJECT_VERSION}\\) ")
+    message(FATAL_ERROR "packaging/debian/changelog does not begin with version ${CMAKE_PROJECT_VERSION}: ${latest}")
+endif()
+set(changelog ${CMAKE_CURRENT_BINARY_DIR}/changelog.gz)
+add_custom_command(OUTPUT ${changelog} VERBATIM DEPENDS debian/changelog
+    COMMAND gzip -9n < ${CMAKE_CURRENT_SOURCE_DIR}/debian/changelog > ${changelog})
+add_custom_target(debian_changelog ALL DEPENDS ${changelog})
+install(FILES debian/copyright ${changelog} DESTINATION share/doc/vrxagent)
+install(FILES debian/copyright ${changelog} DESTINATION share/doc/vrx-coverage-server COMPONENT server)
+
+set(CPACK_GENERATOR DEB)
+set(CPACK_DEB_COMPONENT_INSTALL ON)
+set(CPACK_COMPONENTS_ALL agent server)
+set(CPACK_COMPONENTS_GROUPING IGNORE)
+set(CPACK_PACKAGING_INSTALL_PREFIX /usr)
+set(CPACK_STRIP_FILES ON)
+set(CPACK_INSTALL_DEFAULT_DIRECTORY_PERMISSIONS
+    OWNER_READ OWNER_WRITE OWNER_EXECUTE GROUP_READ GROUP_EXECUTE WORLD_READ WORLD_EXECUTE)
+
+set(CPACK_PACKAGE_CONTACT "The vrxagent authors <vrxagent@orvane.example>")
+set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
+set(CPACK_DEBIAN_PACKAGE_PRIORITY optional)
+set(CPACK_DEBIAN_PACKAGE_CONTROL_STRICT_PERMISSION ON)
+set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS ON)
+set(CPACK_DEBIAN_COMPRESSION_TYPE xz)
+
+set(CPACK_DEBIAN_AGENT_PACKAGE_NAME vrxagent)
+set(CPACK_DEBIAN_AGENT_PACKAGE_SECTION utils)
+set(CPACK_COMPONENT_AGENT_DESCRIPTION "keeps track of the hardware coverage of a device
+A background agent that fetches the coverage records of this device and of the
+watches paired with it, keeps them, answers entitled applications over a Unix
+socket, and has the settings application show what a user may want to do.
+.
+Contains the agent, the tools vrxctl and vrxhost, and the client library with
+which applications ask the agent.")
+# The libraries that are opened only when they are needed, whom no program names; the rest dpkg-shlibdeps finds.
+string(REGEX MATCH "^[0-9]+" icu_version "${ICU_icu-uc_VERSION}")
+string(JOIN ", " CPACK_DEBIAN_AGENT_PACKAGE_DEPENDS
+    "libcurl4"
+    "libexpat1"
+    "libicu${icu_version}"
+    "systemd | systemd-standalone-sysusers | systemd-sysusers")  # for the postinst
+set(CPACK_DEBIAN_AGENT_PACKAGE_RECOMMENDS "ca-certificates")
+set(CPACK_DEBIAN_AGENT_PACKAGE_SUGGESTS "libsystemd-dev, vrx-coverage-server")  # to link with the client library; to test
+foreach(script postinst prerm postrm)
+    list(APPEND CPACK_DEBIAN_AGENT_PACKAGE_CONTROL_EXTRA ${CMAKE_CURRENT_SOURCE_DIR}/debian/${script})
+endforeach()
+
+set(CPACK_DEBIAN_SERVER_PACKAGE_NAME vrx-coverage-server)
+set(CPACK_DEBIAN_SERVER_PACKAGE_SECTION devel)
+set(CPACK_DEBIAN_SERVER_PACKAGE_SOURCE vrxagent)
+set(CPACK_COMPONENT_SERVER_DESCRIPTION "coverage server for the development of vrxagent
+Serves coverage records on loopback, judges the requests that vrxagent makes
+for them, shows them, and misbehaves as it is told to.")
+
+include(CPack)
