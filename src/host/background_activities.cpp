@@ -185,7 +185,8 @@ bool BackgroundActivities::fireDue() {
     // The boot activity takes up what was scheduled before the boot, in its own way: until it has, that is held.
     const std::string boot = platform::vendorIdentifier(platform::bootActivityRemainder);
     const std::string upgrade = platform::vendorIdentifier(platform::upgradeActivityRemainder);
-    std::ranges::stable_partition(activities, [&](const auto& activity) { return activity.identifier == boot; });
+    std::stable_partition(activities.begin(), activities.end(),
+                          [&](const auto& activity) { return activity.identifier == boot; });
 
     const Moment now = conditions.now();
     std::optional<Duration> next;
