@@ -63,7 +63,10 @@ ServerBus::~ServerBus() {
 ServerBus::Step ServerBus::step() {
     if (state_ >= 0) {
         const Incoming incoming = examineIncoming();
+        // sd-bus would read what has come since it was looked for.
+        if (incoming == Incoming::Nothing && isDrained_ && !hasQueued()) return Step::Idle;
         state_ = incoming == Incoming::Refused ? -EACCES : sd_bus_process(bus_, nullptr);
+        isDrained_ = isDrained_ || (state_ == 0 && isAuthenticated());
     }
     if (state_ < 0 || sd_bus_is_open(bus_) <= 0) return Step::Ended;
     return state_ > 0 ? Step::Progress : Step::Idle;
@@ -83,7 +86,8 @@ ServerBus::Incoming ServerBus::examineIncoming() const {
     peeked.msg_control = control.data();
     peeked.msg_controllen = control.size();
     const ssize_t size = recvmsg(socket_, &peeked, MSG_PEEK | MSG_DONTWAIT | MSG_CMSG_CLOEXEC);
-    if (size <= 0) return Incoming::Nothing;
+    if (size < 0 && errno == EAGAIN) return Incoming::Nothing;
+    if (size <= 0) return Incoming::End;
     if (size == static_cast<ssize_t>(header.size()) && beginsLongMessage(header)) return Incoming::Refused;
     for (cmsghdr* part = CMSG_FIRSTHDR(&peeked); part; part = CMSG_NXTHDR(&peeked, part)) {
         if (part->cmsg_level != SOL_SOCKET || part->cmsg_type != SCM_CREDENTIALS) continue;
@@ -92,6 +96,12 @@ ServerBus::Incoming ServerBus::examineIncoming() const {
         return writer.pid == peer_ ? Incoming::Admitted : Incoming::Refused;
     }
     return Incoming::Refused;
+}
+
+bool ServerBus::hasQueued() const {
+    std::uint64_t read = 0;
+    sd_bus_get_n_queued_read(bus_, &read);
+    return read + unsentMessages() > 0;
 }
 
 bool ServerBus::isAuthenticated() const {

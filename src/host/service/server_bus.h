@@ -40,13 +40,15 @@ public:
     sd_bus* bus() const { return bus_; }
 
 private:
-    enum class Incoming { Nothing, Admitted, Refused };
+    enum class Incoming { Nothing, Admitted, Refused, End };
     Incoming examineIncoming() const;
+    bool hasQueued() const;
 
     sd_bus* bus_ = nullptr;
     int socket_;
     const pid_t peer_;
-    int state_ = 0;  // a negative errno once the connection is over
+    int state_ = 0;           // a negative errno once the connection is over
+    bool isDrained_ = false;  // sd-bus has handed out what came together with the end of the authentication
 };
 
 }  // namespace vrx::host
