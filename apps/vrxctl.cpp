@@ -117,8 +117,7 @@ const char* adviceFor(Failure::Refusal refusal) {
     switch (refusal) {
         case Failure::Refusal::Entitlement:
             return "A bundle.toml in the program's folder, or above, grants it, if nobody but root and the agent's "
-                   "user "
-                   "can write there; vrxhost doctor checks that for vrxctl.";
+                   "user can write there; vrxhost doctor checks that for vrxctl.";
         case Failure::Refusal::Limit: return "Try again once fewer programs ask at a time.";
         case Failure::Refusal::Argument: break;
     }

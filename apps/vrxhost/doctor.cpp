@@ -147,8 +147,10 @@ Check Examination::database() {
     std::error_code ignored;
     if (!std::filesystem::exists(view_.home() + "/host.db", ignored))
         return problem("there is none", "Start an agent, which makes it.", ExitCode::NotReachable);
-    if (const Outcome failure = databaseFailure(*error, ""); failure.code == ExitCode::TimedOut)
+    if (isHeldByAnother(*error)) {
+        const Outcome failure = databaseFailure(*error, "");
         return problem(failure.problem, failure.advice, failure.code);
+    }
     return problem(error->text,
                    "An agent takes over one of an older release, and sets a damaged one aside and begins afresh; one "
                    "of a newer release it leaves alone: use that release.");

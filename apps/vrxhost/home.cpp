@@ -35,8 +35,12 @@ std::optional<Outcome> missingDatabase(const std::string& home) {
                                   : "Name the agent's home with --home.");
 }
 
+bool isHeldByAnother(const platform::Error& error) {
+    return (error.code & 0xff) == SQLITE_BUSY;
+}
+
 Outcome databaseFailure(const platform::Error& error, const char* kind) {
-    if ((error.code & 0xff) == SQLITE_BUSY)
+    if (isHeldByAnother(error))
         return failed(ExitCode::TimedOut, error.text,
                       "Another process holds it: fuser tells which have the file open. Try again once it is done.");
     return failed(ExitCode::NoAnswer, error.text, "vrxhost doctor tells what is wrong, and what to do.", kind);

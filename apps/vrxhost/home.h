@@ -58,6 +58,8 @@ Outcome notReachable(std::string problem);
 
 // When the home has no database that this user can get at.
 std::optional<Outcome> missingDatabase(const std::string& home);
+// Whether an operation on the database failed because another process has held it for long.
+bool isHeldByAnother(const platform::Error& error);
 // When there is one that cannot be used; the kind is the one of an error other than a lock that is held for long.
 Outcome databaseFailure(const platform::Error& error, const char* kind);
 

@@ -85,7 +85,7 @@ HomeWatch::Wake HomeWatch::letWritersFinish() {
     pollfd ended{signals_, POLLIN, 0};
     while (true) {
         const platform::MaybeError error = home_.database().write([](host::Connection&) {});
-        if (!error || (error->code & 0xff) != SQLITE_BUSY) return Wake::Look;
+        if (!error || !isHeldByAnother(*error)) return Wake::Look;
         if (poll(&ended, 1, 0) > 0) return Wake::End;
     }
 }

@@ -182,17 +182,17 @@ bool BackgroundActivities::fireDue() {
         around_.database.read([&](Connection& connection) { activities = ActivityRegistry(connection).scheduled(); });
     if (error) return failed(*error);
 
-    // The boot activity takes up what was scheduled before the boot, in its own way: until it has, that is held.
+    // So that the boot activity runs by the time that those are looked at which it holds.
+    std::stable_partition(activities.begin(), activities.end(), [](const ScheduledActivity& activity) {
+        return !platform::waitsForBootActivity(activity.identifier);
+    });
     const std::string boot = platform::vendorIdentifier(platform::bootActivityRemainder);
-    const std::string upgrade = platform::vendorIdentifier(platform::upgradeActivityRemainder);
-    std::stable_partition(activities.begin(), activities.end(),
-                          [&](const auto& activity) { return activity.identifier == boot; });
 
     const Moment now = conditions.now();
     std::optional<Duration> next;
     bool isWaitingForNetwork = false;
     for (const ScheduledActivity& activity : activities) {
-        const bool isHeld = isRunning(boot) && activity.identifier != upgrade;
+        const bool isHeld = isRunning(boot) && platform::waitsForBootActivity(activity.identifier);
         if (isHeld || isRunning(activity.identifier)) continue;  // the end of that run comes here again
         const bool isDue = timeLeft(activity.due, now) == Duration(0);
         const FiringDecision decision =

@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <iterator>
 
+#include "platform/vendor.h"
+
 namespace vrx::platform {
 
 namespace {
@@ -48,6 +50,11 @@ Duration retryDelay(int deferrals) {
     constexpr double seconds[] = {1, 60, 300, 600, 1200, 2400, 3600};
     const int last = static_cast<int>(std::size(seconds)) - 1;
     return Duration(seconds[std::clamp(deferrals - 1, 0, last)]);
+}
+
+bool waitsForBootActivity(std::string_view identifier) {
+    return identifier != vendorIdentifier(bootActivityRemainder) &&
+           identifier != vendorIdentifier(upgradeActivityRemainder);
 }
 
 FiringDecision decideFiring(const DueTime& due, const ActivityCriteria& criteria, const Moment& now,

@@ -4,6 +4,7 @@
 
 #include <optional>
 #include <string>
+#include <string_view>
 
 #include "platform/background_activity_scheduler.h"
 #include "platform/date.h"
@@ -50,6 +51,10 @@ DueTime dueTime(const ActivityCriteria& criteria, Duration interval, const Momen
 // From an activity's result to the next attempt, after so many deferred results in a row: soon at first, hourly at
 // last.
 Duration retryDelay(int deferrals);
+
+// Whether an activity is held until the boot activity, once a boot, has taken up what was scheduled before: all are but
+// those that the system fires on its own.
+bool waitsForBootActivity(std::string_view identifier);
 
 // Whether an activity that is registered fires at a moment.
 struct FiringDecision {

@@ -101,8 +101,7 @@ void BackgroundActivities::considerLater(const std::string& identifier, Duration
 // Until the boot activity has taken up what was scheduled before the boot.
 bool BackgroundActivities::isHeldForBoot(const std::string& identifier) {
     const std::string boot = platform::vendorIdentifier(platform::bootActivityRemainder);
-    const std::string upgrade = platform::vendorIdentifier(platform::upgradeActivityRemainder);
-    return identifier != boot && identifier != upgrade && rows_.contains(boot) && attachments_[boot].handler;
+    return platform::waitsForBootActivity(identifier) && rows_.contains(boot) && attachments_[boot].handler;
 }
 
 // Asked whenever something has changed and when time has come, and also when neither is so any more.

@@ -5,8 +5,8 @@
 // An activity fires a second after its delay at the earliest, once there is network if it needs any; while the system
 // asks for deferral, its grace period is waited for. It is never fired while a run of it has not handed back its
 // result, and no sooner than the minimum interval after a run that registered it itself. The system itself fires the
-// upgrade activity at the first start of each version of the agent, and the boot activity once a boot,
-// before all that was scheduled.
+// upgrade activity at the first start of each version of the agent, and the boot activity once a boot, before all that
+// was scheduled.
 #pragma once
 
 #include <map>

@@ -2,8 +2,8 @@
 // root means nothing. docs/formats.md has the whole description. In short:
 //
 //     boolean b, integer x, double d, string s, array av, dictionary a{sv}
-//     date                            (d), seconds since 1970
-//     string that D-Bus cannot carry  ay, its bytes
+//     date                            (sd), a tag and seconds since 1970
+//     string that D-Bus cannot carry  (say), a tag and its bytes
 //     such a key                      "$x" and its bytes in hexadecimal
 //
 // Nulls and data are left out. A key that begins with a single "$" is the archive's or the encoding's own: the archive

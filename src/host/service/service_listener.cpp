@@ -71,9 +71,9 @@ private:
     }
 
     void removeEnded() {
-        std::erase_if(connections_, [](auto& connection) { return connection->hasEnded(); });
+        const auto ended = std::erase_if(connections_, [](auto& connection) { return connection->hasEnded(); });
         // What serving took goes back to the system: it may be long until the next client comes.
-        if (connections_.empty()) malloc_trim(0);
+        if (ended > 0 && connections_.empty()) malloc_trim(0);
     }
 
     bool hasUnread() const {
