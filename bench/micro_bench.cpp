@@ -1,19 +1,19 @@
 // How long parts of the agent take, each on its own.
 #include <benchmark/benchmark.h>
 
-#include "coverage/warranty.h"
-#include "devices/device_info.h"
-#include "host/host.h"
-#include "platform/defaults_store.h"
-#include "platform/files.h"
-#include "platform/json.h"
-#include "platform/property_list.h"
-#include "platform/sha256_hash.h"
-#include "scheduling/post_date.h"
-#include "scheduling/refresh_date.h"
-#include "service/agent.h"
-#include "service/register_defaults.h"
-#include "sim/host.h"
+#include "vrx/coverage/records/warranty.h"
+#include "vrx/devices/records/device_info.h"
+#include "vrx/host/host.h"
+#include "vrx/platform/defaults_store.h"
+#include "vrx/platform/files.h"
+#include "vrx/platform/json.h"
+#include "vrx/platform/property_list.h"
+#include "vrx/platform/sha256_hash.h"
+#include "vrx/scheduling/post_date.h"
+#include "vrx/scheduling/refresh_date.h"
+#include "vrx/service/agent.h"
+#include "vrx/service/register_defaults.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {

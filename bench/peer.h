@@ -10,7 +10,7 @@
 #include <cstring>
 #include <string>
 
-#include "wire/names.h"
+#include "vrx/wire/names.h"
 
 namespace vrx::bench {
 

@@ -3,9 +3,9 @@
 #include <cmath>
 #include <cstdlib>
 
-#include "host/http_cache.h"
-#include "host/http_cache_rules.h"
-#include "host/text.h"
+#include "vrx/host/base/text.h"
+#include "vrx/host/http/http_cache.h"
+#include "vrx/host/http/http_cache_rules.h"
 
 using namespace vrx;
 

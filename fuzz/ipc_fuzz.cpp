@@ -9,14 +9,14 @@
 #include <cstring>
 #include <string>
 
-#include "codec/keyed_archive.h"
-#include "devices/device_info.h"
-#include "host/main_loop.h"
-#include "host/process_lifecycle.h"
-#include "host/service/client_session.h"
-#include "host/system_log.h"
-#include "platform/platform.h"
-#include "wire/encoding.h"
+#include "vrx/codec/core/keyed_archive.h"
+#include "vrx/devices/records/device_info.h"
+#include "vrx/host/ipc/client_session.h"
+#include "vrx/host/log/system_log.h"
+#include "vrx/host/loop/main_loop.h"
+#include "vrx/host/loop/process_lifecycle.h"
+#include "vrx/platform/platform.h"
+#include "vrx/wire/encoding.h"
 
 using namespace vrx;
 

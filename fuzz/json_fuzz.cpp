@@ -1,7 +1,7 @@
 // Whatever parses is written and read back equal, in every layout.
 #include <cstdlib>
 
-#include "codec/json.h"
+#include "vrx/codec/json.h"
 
 using namespace vrx;
 

@@ -1,9 +1,9 @@
 // A document, taken once for what a record holds and once for the archive that a peer sends.
 #include <cstdlib>
 
-#include "codec/json.h"
-#include "codec/keyed_archive.h"
-#include "codec/property_list.h"
+#include "vrx/codec/core/keyed_archive.h"
+#include "vrx/codec/json.h"
+#include "vrx/codec/property_list.h"
 
 using namespace vrx;
 using platform::AllowedKinds;

@@ -2,8 +2,8 @@
 // it gives the same document. Documents are compared because not every value equals itself.
 #include <cstdlib>
 
-#include "codec/property_list.h"
-#include "platform/limits.h"
+#include "vrx/codec/property_list.h"
+#include "vrx/platform/limits.h"
 
 using namespace vrx;
 using platform::PropertyListFormat;

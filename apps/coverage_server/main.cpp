@@ -7,11 +7,11 @@
 #include <exception>
 #include <optional>
 
+#include "common/manual.h"
 #include "coverage_server/certificate.h"
 #include "coverage_server/control_service.h"
 #include "coverage_server/coverage_service.h"
 #include "coverage_server/http_server.h"
-#include "manual.h"
 
 using namespace vrx::coverage_server;
 

@@ -1,9 +1,9 @@
 // vrxhost activities: what the agent has scheduled, when it falls due, and how it went the last time.
-#include "agent_activities.h"
-#include "home.h"
-#include "host/home_lock.h"
-#include "platform/text.h"
-#include "verbs.h"
+#include "vrx/host/home/home_lock.h"
+#include "vrx/platform/text.h"
+#include "vrxhost/agent_activities.h"
+#include "vrxhost/home.h"
+#include "vrxhost/verbs.h"
 
 namespace vrx::apps {
 

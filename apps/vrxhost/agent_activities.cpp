@@ -1,16 +1,16 @@
-#include "agent_activities.h"
+#include "vrxhost/agent_activities.h"
 
 #include <algorithm>
 #include <array>
 #include <memory>
 
-#include "host/machine_conditions.h"
-#include "platform/vendor.h"
-#include "scheduling/follow_up_post.h"
-#include "scheduling/follow_up_refresh.h"
-#include "scheduling/outreach_activity.h"
-#include "scheduling/scheduler.h"
-#include "scheduling/start_up_activities.h"
+#include "vrx/host/activities/machine_conditions.h"
+#include "vrx/platform/vendor.h"
+#include "vrx/scheduling/follow_up_post.h"
+#include "vrx/scheduling/follow_up_refresh.h"
+#include "vrx/scheduling/outreach_activity.h"
+#include "vrx/scheduling/scheduler.h"
+#include "vrx/scheduling/start_up_activities.h"
 
 namespace vrx::apps {
 

@@ -6,8 +6,8 @@
 #include <string_view>
 #include <vector>
 
-#include "agent_view.h"
-#include "host/activity_registry.h"
+#include "vrx/host/activities/activity_registry.h"
+#include "vrxhost/agent_view.h"
 
 namespace vrx::apps {
 

@@ -1,10 +1,10 @@
-#include "agent_view.h"
+#include "vrxhost/agent_view.h"
 
 #include <utility>
 
-#include "home.h"
-#include "host/host_facts.h"
-#include "service/register_defaults.h"
+#include "vrx/host/home/host_facts.h"
+#include "vrx/service/register_defaults.h"
+#include "vrxhost/home.h"
 
 namespace vrx::apps {
 

@@ -11,20 +11,20 @@
 #include <string>
 #include <vector>
 
-#include "codec/codec.h"
-#include "command_line.h"
-#include "host/account_store.h"
-#include "host/clock.h"
-#include "host/database.h"
-#include "host/defaults_store.h"
-#include "host/device_profile.h"
-#include "host/files.h"
-#include "host/follow_up_controller.h"
-#include "host/telephony_network_info.h"
-#include "platform/locale.h"
-#include "platform/log.h"
-#include "platform/platform.h"
-#include "wire/locations.h"
+#include "common/command_line.h"
+#include "vrx/codec/codec.h"
+#include "vrx/host/account/account_store.h"
+#include "vrx/host/base/files.h"
+#include "vrx/host/home/database.h"
+#include "vrx/host/home/defaults_store.h"
+#include "vrx/host/home/follow_up_controller.h"
+#include "vrx/host/profile/clock.h"
+#include "vrx/host/profile/device_profile.h"
+#include "vrx/host/profile/telephony_network_info.h"
+#include "vrx/platform/locale.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/platform.h"
+#include "vrx/wire/locations.h"
 
 namespace vrx::apps {
 

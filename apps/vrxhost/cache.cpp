@@ -1,13 +1,13 @@
 // vrxhost cache: what is cached for a serial number, and whether it is valid.
 #include <filesystem>
 
-#include "codec/property_list.h"
-#include "coverage/cache_metadata.h"
-#include "coverage/warranty.h"
-#include "home.h"
-#include "host/device_profile.h"
-#include "platform/text.h"
-#include "verbs.h"
+#include "vrx/codec/property_list.h"
+#include "vrx/coverage/cache_metadata.h"
+#include "vrx/coverage/records/warranty.h"
+#include "vrx/host/profile/device_profile.h"
+#include "vrx/platform/text.h"
+#include "vrxhost/home.h"
+#include "vrxhost/verbs.h"
 
 namespace vrx::apps {
 

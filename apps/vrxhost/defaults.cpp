@@ -1,9 +1,9 @@
 // vrxhost defaults: the agent's settings.
-#include "codec/iso_date.h"
-#include "codec/json.h"
-#include "codec/property_list.h"
-#include "home.h"
-#include "verbs.h"
+#include "vrx/codec/iso_date.h"
+#include "vrx/codec/json.h"
+#include "vrx/codec/property_list.h"
+#include "vrxhost/home.h"
+#include "vrxhost/verbs.h"
 
 namespace vrx::apps {
 

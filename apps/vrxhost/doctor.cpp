@@ -10,19 +10,19 @@
 #include <filesystem>
 #include <fstream>
 
-#include "agent_activities.h"
-#include "agent_view.h"
-#include "home.h"
-#include "host/home_lock.h"
-#include "host/network_routes.h"
-#include "host/service/bundle_lookup.h"
-#include "host/service/descriptor.h"
-#include "platform/defaults_store.h"
-#include "platform/settings_keys.h"
-#include "platform/text.h"
-#include "platform/vendor.h"
-#include "reachability.h"
-#include "verbs.h"
+#include "vrx/host/activities/network_routes.h"
+#include "vrx/host/base/descriptor.h"
+#include "vrx/host/home/home_lock.h"
+#include "vrx/host/ipc/bundle_lookup.h"
+#include "vrx/platform/defaults_store.h"
+#include "vrx/platform/settings_keys.h"
+#include "vrx/platform/text.h"
+#include "vrx/platform/vendor.h"
+#include "vrxhost/agent_activities.h"
+#include "vrxhost/agent_view.h"
+#include "vrxhost/home.h"
+#include "vrxhost/reachability.h"
+#include "vrxhost/verbs.h"
 
 namespace vrx::apps {
 

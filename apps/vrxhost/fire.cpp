@@ -3,13 +3,13 @@
 #include <memory>
 #include <thread>
 
-#include "agent_activities.h"
-#include "home.h"
-#include "host/activity_requests.h"
-#include "host/home_lock.h"
-#include "platform/text.h"
-#include "scheduling/scheduler.h"
-#include "verbs.h"
+#include "vrx/host/activities/activity_requests.h"
+#include "vrx/host/home/home_lock.h"
+#include "vrx/platform/text.h"
+#include "vrx/scheduling/scheduler.h"
+#include "vrxhost/agent_activities.h"
+#include "vrxhost/home.h"
+#include "vrxhost/verbs.h"
 
 namespace vrx::apps {
 

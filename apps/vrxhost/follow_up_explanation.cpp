@@ -1,4 +1,4 @@
-#include "follow_up_explanation.h"
+#include "vrxhost/follow_up_explanation.h"
 
 #include <algorithm>
 

@@ -6,9 +6,9 @@
 #include <optional>
 #include <string>
 
-#include "followup/follow_up_rules.h"
-#include "platform/date.h"
-#include "service/cached_record.h"
+#include "vrx/followup/follow_up_rules.h"
+#include "vrx/platform/date.h"
+#include "vrx/service/cached_record.h"
 
 namespace vrx::apps {
 

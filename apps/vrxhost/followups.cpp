@@ -6,18 +6,18 @@
 #include <cstdio>
 #include <system_error>
 
-#include "codec/iso_date.h"
-#include "codec/json.h"
-#include "followup/follow_up_content.h"
-#include "home.h"
-#include "home_watch.h"
-#include "host/clock.h"
-#include "host/device_profile.h"
-#include "host/follow_up_document.h"
-#include "platform/number_text.h"
-#include "platform/settings_keys.h"
-#include "platform/text.h"
-#include "verbs.h"
+#include "vrx/codec/iso_date.h"
+#include "vrx/codec/json.h"
+#include "vrx/followup/follow_up_content.h"
+#include "vrx/host/home/follow_up_document.h"
+#include "vrx/host/profile/clock.h"
+#include "vrx/host/profile/device_profile.h"
+#include "vrx/platform/number_text.h"
+#include "vrx/platform/settings_keys.h"
+#include "vrx/platform/text.h"
+#include "vrxhost/home.h"
+#include "vrxhost/home_watch.h"
+#include "vrxhost/verbs.h"
 
 namespace vrx::apps {
 

@@ -1,12 +1,12 @@
-#include "home.h"
+#include "vrxhost/home.h"
 
 #include <sys/stat.h>
 
 #include <cerrno>
 #include <cstring>
 
-#include "host/host_facts.h"
-#include "service/register_defaults.h"
+#include "vrx/host/home/host_facts.h"
+#include "vrx/service/register_defaults.h"
 
 namespace vrx::apps {
 

@@ -5,15 +5,15 @@
 #include <optional>
 #include <string>
 
-#include "codec/codec.h"
-#include "command_line.h"
-#include "host/database.h"
-#include "host/defaults_store.h"
-#include "host/files.h"
-#include "host/follow_up_controller.h"
-#include "host/system_log.h"
-#include "platform/platform.h"
-#include "wire/locations.h"
+#include "common/command_line.h"
+#include "vrx/codec/codec.h"
+#include "vrx/host/base/files.h"
+#include "vrx/host/home/database.h"
+#include "vrx/host/home/defaults_store.h"
+#include "vrx/host/home/follow_up_controller.h"
+#include "vrx/host/log/system_log.h"
+#include "vrx/platform/platform.h"
+#include "vrx/wire/locations.h"
 
 namespace vrx::apps {
 

@@ -1,4 +1,4 @@
-#include "home_watch.h"
+#include "vrxhost/home_watch.h"
 
 #include <poll.h>
 #include <sys/inotify.h>
@@ -13,7 +13,7 @@
 #include <filesystem>
 #include <system_error>
 
-#include "platform/number_text.h"
+#include "vrx/platform/number_text.h"
 
 namespace vrx::apps {
 

@@ -4,8 +4,8 @@
 
 #include <string>
 
-#include "home.h"
-#include "platform/date.h"
+#include "vrx/platform/date.h"
+#include "vrxhost/home.h"
 
 namespace vrx::apps {
 

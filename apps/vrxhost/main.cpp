@@ -1,6 +1,6 @@
 // vrxhost: looks into the agent's home beside the agent, explains what it finds, changes settings and fires activities,
 // for testers.
-#include "verbs.h"
+#include "vrxhost/verbs.h"
 
 int main(int argc, char** argv) {
     using namespace vrx::apps;

@@ -1,11 +1,11 @@
-#include "reachability.h"
+#include "vrxhost/reachability.h"
 
-#include "host/http.h"
-#include "host/main_loop.h"
-#include "host/queues.h"
-#include "platform/clock.h"
-#include "platform/settings_keys.h"
-#include "serverversion/server_version_utilities.h"
+#include "vrx/host/http/http.h"
+#include "vrx/host/loop/main_loop.h"
+#include "vrx/host/loop/queues.h"
+#include "vrx/platform/clock.h"
+#include "vrx/platform/settings_keys.h"
+#include "vrx/serverversion/server_version_utilities.h"
 
 namespace vrx::apps {
 

@@ -5,9 +5,9 @@
 #include <string>
 #include <vector>
 
-#include "agent_view.h"
-#include "platform/date.h"
-#include "platform/http_request.h"
+#include "vrx/platform/date.h"
+#include "vrx/platform/http_request.h"
+#include "vrxhost/agent_view.h"
 
 namespace vrx::apps {
 

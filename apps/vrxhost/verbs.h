@@ -2,8 +2,8 @@
 // what the options for all verbs say, and must outlive it.
 #pragma once
 
-#include "command_line.h"
-#include "wire/locations.h"
+#include "common/command_line.h"
+#include "vrx/wire/locations.h"
 
 namespace vrx::apps {
 

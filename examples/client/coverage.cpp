@@ -1,5 +1,5 @@
 // Shows the coverage of this device: what an application begins with that asks the agent.
-#include <client/agent_connection.h>
+#include <vrx/client/agent_connection.h>
 
 #include <algorithm>
 #include <cstdio>

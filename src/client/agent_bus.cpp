@@ -1,4 +1,4 @@
-#include "client/agent_bus.h"
+#include "vrx/client/agent_bus.h"
 
 #include <sys/socket.h>
 #include <sys/time.h>
@@ -9,8 +9,8 @@
 #include <cerrno>
 #include <cstring>
 
-#include "wire/encoding.h"
-#include "wire/message.h"
+#include "vrx/wire/encoding.h"
+#include "vrx/wire/message.h"
 
 namespace vrx::client {
 

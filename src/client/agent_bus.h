@@ -7,10 +7,10 @@
 #include <string>
 #include <variant>
 
-#include "client/agent_connection.h"
-#include "platform/error.h"
-#include "platform/value.h"
-#include "wire/names.h"
+#include "vrx/client/agent_connection.h"
+#include "vrx/platform/error.h"
+#include "vrx/platform/value.h"
+#include "vrx/wire/names.h"
 
 namespace vrx::client {
 

@@ -1,10 +1,10 @@
-#include "client/agent_connection.h"
+#include "vrx/client/agent_connection.h"
 
-#include "client/bus_pool.h"
-#include "client/local_platform.h"
-#include "client/workers.h"
-#include "codec/keyed_archive.h"
-#include "wire/locations.h"
+#include "vrx/client/bus_pool.h"
+#include "vrx/client/local_platform.h"
+#include "vrx/client/workers.h"
+#include "vrx/codec/core/keyed_archive.h"
+#include "vrx/wire/locations.h"
 
 namespace vrx::client {
 

@@ -32,10 +32,10 @@
 #include <utility>
 #include <variant>
 
-#include "coverage/warranty.h"
-#include "devices/device.h"
-#include "devices/device_info.h"
-#include "protocols/agent_protocol.h"
+#include "vrx/coverage/records/warranty.h"
+#include "vrx/devices/records/device.h"
+#include "vrx/devices/records/device_info.h"
+#include "vrx/protocols/agent_protocol.h"
 
 namespace vrx::client {
 

@@ -1,4 +1,4 @@
-#include "client/bus_pool.h"
+#include "vrx/client/bus_pool.h"
 
 #include <cerrno>
 

@@ -7,7 +7,7 @@
 #include <mutex>
 #include <string>
 
-#include "client/agent_bus.h"
+#include "vrx/client/agent_bus.h"
 
 namespace vrx::client {
 

@@ -1,4 +1,4 @@
-#include "client/local_platform.h"
+#include "vrx/client/local_platform.h"
 
 #include <chrono>
 #include <cstdlib>
@@ -6,13 +6,13 @@
 #include <mutex>
 #include <string>
 
-#include "codec/number_format.h"
-#include "platform/clock.h"
-#include "platform/defaults_store.h"
-#include "platform/locale.h"
-#include "platform/log.h"
-#include "platform/platform.h"
-#include "platform/settings_keys.h"
+#include "vrx/codec/core/number_format.h"
+#include "vrx/platform/clock.h"
+#include "vrx/platform/defaults_store.h"
+#include "vrx/platform/locale.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/settings_keys.h"
 
 namespace vrx::client {
 

@@ -1,4 +1,4 @@
-#include "client/workers.h"
+#include "vrx/client/workers.h"
 
 namespace vrx::client {
 

@@ -7,7 +7,7 @@
 #include <thread>
 #include <vector>
 
-#include "platform/task.h"
+#include "vrx/platform/task.h"
 
 namespace vrx::client {
 

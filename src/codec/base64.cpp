@@ -1,4 +1,4 @@
-#include "codec/base64.h"
+#include "vrx/codec/base64.h"
 
 #include <algorithm>
 #include <cstdint>

@@ -5,7 +5,7 @@
 #include <string>
 #include <string_view>
 
-#include "platform/value.h"
+#include "vrx/platform/value.h"
 
 namespace vrx::codec {
 

@@ -5,8 +5,8 @@
 // number.
 #pragma once
 
-#include "platform/error.h"
-#include "platform/value.h"
+#include "vrx/platform/error.h"
+#include "vrx/platform/value.h"
 
 namespace vrx::codec {
 

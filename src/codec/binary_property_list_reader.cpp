@@ -5,11 +5,11 @@
 #include <string>
 #include <unordered_map>
 
-#include "codec/binary_property_list.h"
-#include "codec/binary_property_list_format.h"
-#include "codec/property_list_error.h"
-#include "codec/unicode.h"
-#include "platform/limits.h"
+#include "vrx/codec/binary_property_list.h"
+#include "vrx/codec/binary_property_list_format.h"
+#include "vrx/codec/core/unicode.h"
+#include "vrx/codec/property_list_error.h"
+#include "vrx/platform/limits.h"
 
 namespace vrx::codec {
 

@@ -4,10 +4,10 @@
 #include <unordered_map>
 #include <vector>
 
-#include "codec/binary_property_list.h"
-#include "codec/binary_property_list_format.h"
-#include "codec/property_list_error.h"
-#include "codec/unicode.h"
+#include "vrx/codec/binary_property_list.h"
+#include "vrx/codec/binary_property_list_format.h"
+#include "vrx/codec/core/unicode.h"
+#include "vrx/codec/property_list_error.h"
 
 namespace vrx::codec {
 

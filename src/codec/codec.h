@@ -1,12 +1,12 @@
 // The codecs as facilities of a platform, the same on every host. Any thread may use them.
 #pragma once
 
-#include "codec/digest.h"
-#include "codec/json.h"
-#include "codec/property_list.h"
-#include "platform/digest.h"
-#include "platform/json.h"
-#include "platform/property_list.h"
+#include "vrx/codec/digest.h"
+#include "vrx/codec/json.h"
+#include "vrx/codec/property_list.h"
+#include "vrx/platform/digest.h"
+#include "vrx/platform/json.h"
+#include "vrx/platform/property_list.h"
 
 namespace vrx::codec {
 

@@ -1,4 +1,4 @@
-#include "codec/digest.h"
+#include "vrx/codec/digest.h"
 
 #include <sha2.h>
 

@@ -1,4 +1,4 @@
-#include "codec/iso_date.h"
+#include "vrx/codec/iso_date.h"
 
 #include <algorithm>
 #include <chrono>

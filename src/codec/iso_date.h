@@ -5,7 +5,7 @@
 #include <string>
 #include <string_view>
 
-#include "platform/date.h"
+#include "vrx/platform/date.h"
 
 namespace vrx::codec {
 

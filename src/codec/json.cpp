@@ -1,4 +1,4 @@
-#include "codec/json.h"
+#include "vrx/codec/json.h"
 
 #include <cerrno>
 #include <charconv>
@@ -6,12 +6,12 @@
 #include <iterator>
 #include <nlohmann/json.hpp>
 
-#include "codec/base64.h"
-#include "codec/iso_date.h"
-#include "codec/unicode.h"
-#include "codec/value_builder.h"
-#include "platform/limits.h"
-#include "platform/text.h"
+#include "vrx/codec/base64.h"
+#include "vrx/codec/core/unicode.h"
+#include "vrx/codec/iso_date.h"
+#include "vrx/codec/value_builder.h"
+#include "vrx/platform/limits.h"
+#include "vrx/platform/text.h"
 
 namespace vrx::codec {
 

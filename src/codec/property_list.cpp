@@ -1,9 +1,9 @@
-#include "codec/property_list.h"
+#include "vrx/codec/property_list.h"
 
-#include "codec/binary_property_list.h"
-#include "codec/property_list_error.h"
-#include "codec/xml_property_list.h"
-#include "platform/limits.h"
+#include "vrx/codec/binary_property_list.h"
+#include "vrx/codec/property_list_error.h"
+#include "vrx/codec/xml_property_list.h"
+#include "vrx/platform/limits.h"
 
 namespace vrx::codec {
 

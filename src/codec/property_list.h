@@ -1,9 +1,9 @@
 // Property-list documents as values, in both forms: XML, and the binary one, "bplist00". Any thread may call.
 #pragma once
 
-#include "platform/error.h"
-#include "platform/property_list.h"
-#include "platform/value.h"
+#include "vrx/platform/error.h"
+#include "vrx/platform/property_list.h"
+#include "vrx/platform/value.h"
 
 namespace vrx::codec {
 

@@ -4,7 +4,7 @@
 #include <cerrno>
 #include <string>
 
-#include "platform/error.h"
+#include "vrx/platform/error.h"
 
 namespace vrx::codec {
 

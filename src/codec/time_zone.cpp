@@ -1,10 +1,10 @@
-#include "codec/time_zone.h"
+#include "vrx/codec/time_zone.h"
 
 #include <unicode/ucal.h>
 
 #include <cmath>
 
-#include "codec/icu.h"
+#include "vrx/codec/core/icu.h"
 
 namespace vrx::codec {
 

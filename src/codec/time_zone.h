@@ -5,7 +5,7 @@
 #include <optional>
 #include <string>
 
-#include "platform/date.h"
+#include "vrx/platform/date.h"
 
 namespace vrx::codec {
 

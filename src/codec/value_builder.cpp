@@ -1,6 +1,6 @@
-#include "codec/value_builder.h"
+#include "vrx/codec/value_builder.h"
 
-#include "platform/limits.h"
+#include "vrx/platform/limits.h"
 
 namespace vrx::codec {
 

@@ -6,7 +6,7 @@
 #include <string>
 #include <vector>
 
-#include "platform/value.h"
+#include "vrx/platform/value.h"
 
 namespace vrx::codec {
 

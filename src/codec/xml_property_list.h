@@ -1,8 +1,8 @@
 // The XML form of property lists; what both forms have in common is in property_list.h. Any thread may call.
 #pragma once
 
-#include "platform/error.h"
-#include "platform/value.h"
+#include "vrx/platform/error.h"
+#include "vrx/platform/value.h"
 
 namespace vrx::codec {
 

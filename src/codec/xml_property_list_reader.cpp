@@ -5,12 +5,12 @@
 #include <memory>
 #include <optional>
 
-#include "codec/base64.h"
-#include "codec/iso_date.h"
-#include "codec/lazy_library.h"
-#include "codec/property_list_error.h"
-#include "codec/value_builder.h"
-#include "codec/xml_property_list.h"
+#include "vrx/codec/base64.h"
+#include "vrx/codec/core/lazy_library.h"
+#include "vrx/codec/iso_date.h"
+#include "vrx/codec/property_list_error.h"
+#include "vrx/codec/value_builder.h"
+#include "vrx/codec/xml_property_list.h"
 
 namespace vrx::codec {
 

@@ -2,11 +2,11 @@
 #include <cmath>
 #include <string>
 
-#include "codec/base64.h"
-#include "codec/iso_date.h"
-#include "codec/property_list_error.h"
-#include "codec/unicode.h"
-#include "codec/xml_property_list.h"
+#include "vrx/codec/base64.h"
+#include "vrx/codec/core/unicode.h"
+#include "vrx/codec/iso_date.h"
+#include "vrx/codec/property_list_error.h"
+#include "vrx/codec/xml_property_list.h"
 
 namespace vrx::codec {
 

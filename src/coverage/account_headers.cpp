@@ -1,4 +1,4 @@
-#include "coverage/account_headers.h"
+#include "vrx/coverage/account_headers.h"
 
 #include <algorithm>
 #include <chrono>
@@ -6,19 +6,19 @@
 #include <set>
 #include <string_view>
 
-#include "platform/clock.h"
-#include "platform/defaults_store.h"
-#include "platform/device_properties.h"
-#include "platform/json.h"
-#include "platform/locale.h"
-#include "platform/number_text.h"
-#include "platform/platform.h"
-#include "platform/queue.h"
-#include "platform/text.h"
-#include "platform/utf8.h"
-#include "platform/uuid.h"
-#include "platform/value.h"
-#include "platform/vendor.h"
+#include "vrx/platform/clock.h"
+#include "vrx/platform/defaults_store.h"
+#include "vrx/platform/device_properties.h"
+#include "vrx/platform/json.h"
+#include "vrx/platform/locale.h"
+#include "vrx/platform/number_text.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/queue.h"
+#include "vrx/platform/text.h"
+#include "vrx/platform/utf8.h"
+#include "vrx/platform/uuid.h"
+#include "vrx/platform/value.h"
+#include "vrx/platform/vendor.h"
 
 namespace vrx {
 

@@ -6,9 +6,9 @@
 #include <optional>
 #include <string>
 
-#include "platform/account_store.h"
-#include "platform/http_request.h"
-#include "platform/log.h"
+#include "vrx/platform/account_store.h"
+#include "vrx/platform/http_request.h"
+#include "vrx/platform/log.h"
 
 namespace vrx {
 

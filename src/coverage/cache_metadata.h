@@ -5,8 +5,8 @@
 #include <string>
 #include <string_view>
 
-#include "platform/sha256_hash.h"
-#include "platform/text.h"
+#include "vrx/platform/sha256_hash.h"
+#include "vrx/platform/text.h"
 
 namespace vrx {
 

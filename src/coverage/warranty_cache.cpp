@@ -1,14 +1,14 @@
 // The cache operations of VRXWarranty: a property-list file for each serial number, holding the coverage dictionary and
 // nothing else.
 
-#include "coverage/cache_metadata.h"
-#include "coverage/warranty.h"
-#include "platform/defaults_store.h"
-#include "platform/files.h"
-#include "platform/log.h"
-#include "platform/platform.h"
-#include "platform/property_list.h"
-#include "platform/vendor.h"
+#include "vrx/coverage/cache_metadata.h"
+#include "vrx/coverage/records/warranty.h"
+#include "vrx/platform/defaults_store.h"
+#include "vrx/platform/files.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/property_list.h"
+#include "vrx/platform/vendor.h"
 
 namespace vrx {
 

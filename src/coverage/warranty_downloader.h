@@ -8,9 +8,9 @@
 #include <optional>
 #include <string>
 
-#include "platform/task.h"
-#include "platform/url.h"
-#include "platform/value.h"
+#include "vrx/platform/task.h"
+#include "vrx/platform/url.h"
+#include "vrx/platform/value.h"
 
 namespace vrx {
 

@@ -1,17 +1,17 @@
-#include "devices/devices_manager.h"
+#include "vrx/devices/devices_manager.h"
 
 #include <utility>
 
-#include "devices/device.h"
-#include "devices/utilities.h"
-#include "platform/clock.h"
-#include "platform/defaults_store.h"
-#include "platform/device_properties.h"
-#include "platform/log.h"
-#include "platform/platform.h"
-#include "platform/settings_keys.h"
-#include "platform/text.h"
-#include "serverversion/server_version_utilities.h"
+#include "vrx/devices/records/device.h"
+#include "vrx/devices/utilities.h"
+#include "vrx/platform/clock.h"
+#include "vrx/platform/defaults_store.h"
+#include "vrx/platform/device_properties.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/settings_keys.h"
+#include "vrx/platform/text.h"
+#include "vrx/serverversion/server_version_utilities.h"
 
 namespace vrx {
 

@@ -6,8 +6,8 @@
 #include <memory>
 #include <vector>
 
-#include "platform/paired_device_registry.h"
-#include "protocols/agent_device_provider.h"
+#include "vrx/platform/paired_device_registry.h"
+#include "vrx/protocols/agent_device_provider.h"
 
 namespace vrx {
 

@@ -1,13 +1,13 @@
-#include "devices/paired_devices_monitor.h"
+#include "vrx/devices/paired_devices_monitor.h"
 
 #include <utility>
 
-#include "platform/log.h"
-#include "platform/notification_center.h"
-#include "platform/platform.h"
-#include "platform/process_lifecycle.h"
-#include "platform/queue.h"
-#include "platform/vendor.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/notification_center.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/process_lifecycle.h"
+#include "vrx/platform/queue.h"
+#include "vrx/platform/vendor.h"
 
 namespace vrx {
 

@@ -9,8 +9,8 @@
 #include <memory>
 #include <optional>
 
-#include "platform/date.h"
-#include "protocols/agent_protocol.h"
+#include "vrx/platform/date.h"
+#include "vrx/protocols/agent_protocol.h"
 
 namespace vrx {
 

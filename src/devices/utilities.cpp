@@ -1,7 +1,7 @@
-#include "devices/utilities.h"
+#include "vrx/devices/utilities.h"
 
-#include "platform/device_properties.h"
-#include "platform/platform.h"
+#include "vrx/platform/device_properties.h"
+#include "vrx/platform/platform.h"
 
 namespace vrx {
 

@@ -1,10 +1,10 @@
-#include "followup/default_follow_up_provider.h"
+#include "vrx/followup/default_follow_up_provider.h"
 
 #include <memory>
 #include <utility>
 
-#include "followup/follow_up_content.h"
-#include "platform/platform.h"
+#include "vrx/followup/follow_up_content.h"
+#include "vrx/platform/platform.h"
 
 namespace vrx {
 

@@ -2,7 +2,7 @@
 // changes no answer and logs nothing.
 #pragma once
 
-#include "followup/follow_up_provider.h"
+#include "vrx/followup/follow_up_provider.h"
 
 namespace vrx {
 

@@ -1,20 +1,20 @@
-#include "followup/follow_up.h"
+#include "vrx/followup/follow_up.h"
 
 #include <map>
 #include <set>
 #include <utility>
 
-#include "devices/device_info.h"
-#include "followup/default_follow_up_provider.h"
-#include "followup/follow_up_content.h"
-#include "followup/follow_up_rules.h"
-#include "followup/serial_number_hashes.h"
-#include "platform/clock.h"
-#include "platform/defaults_store.h"
-#include "platform/log.h"
-#include "platform/platform.h"
-#include "platform/settings_keys.h"
-#include "platform/sha256_hash.h"
+#include "vrx/devices/records/device_info.h"
+#include "vrx/followup/default_follow_up_provider.h"
+#include "vrx/followup/follow_up_content.h"
+#include "vrx/followup/follow_up_rules.h"
+#include "vrx/followup/serial_number_hashes.h"
+#include "vrx/platform/clock.h"
+#include "vrx/platform/defaults_store.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/settings_keys.h"
+#include "vrx/platform/sha256_hash.h"
 
 namespace vrx {
 

@@ -8,8 +8,8 @@
 #include <string>
 #include <vector>
 
-#include "followup/follow_up_provider.h"
-#include "protocols/agent_collaborators.h"
+#include "vrx/followup/follow_up_provider.h"
+#include "vrx/protocols/agent_collaborators.h"
 
 namespace vrx {
 

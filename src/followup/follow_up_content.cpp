@@ -1,11 +1,11 @@
-#include "followup/follow_up_content.h"
+#include "vrx/followup/follow_up_content.h"
 
 #include <utility>
 
-#include "devices/device_info.h"
-#include "platform/clock.h"
-#include "platform/sha256_hash.h"
-#include "platform/vendor.h"
+#include "vrx/devices/records/device_info.h"
+#include "vrx/platform/clock.h"
+#include "vrx/platform/sha256_hash.h"
+#include "vrx/platform/vendor.h"
 
 namespace vrx {
 

@@ -5,7 +5,7 @@
 #include <string>
 #include <string_view>
 
-#include "platform/follow_up_controller.h"
+#include "vrx/platform/follow_up_controller.h"
 
 namespace vrx::platform {
 class Clock;

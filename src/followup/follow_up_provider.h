@@ -5,8 +5,8 @@
 #include <string>
 #include <vector>
 
-#include "platform/error.h"
-#include "platform/follow_up_controller.h"
+#include "vrx/platform/error.h"
+#include "vrx/platform/follow_up_controller.h"
 
 namespace vrx {
 

@@ -1,7 +1,7 @@
-#include "followup/follow_up_rules.h"
+#include "vrx/followup/follow_up_rules.h"
 
-#include "devices/device_info.h"
-#include "platform/clock.h"
+#include "vrx/devices/records/device_info.h"
+#include "vrx/platform/clock.h"
 
 namespace vrx {
 

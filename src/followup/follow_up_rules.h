@@ -6,7 +6,7 @@
 #include <cstdint>
 #include <optional>
 
-#include "platform/date.h"
+#include "vrx/platform/date.h"
 
 namespace vrx::platform {
 class Clock;

@@ -1,11 +1,11 @@
-#include "followup/serial_number_hashes.h"
+#include "vrx/followup/serial_number_hashes.h"
 
 #include <algorithm>
 #include <utility>
 
-#include "platform/defaults_store.h"
-#include "platform/platform.h"
-#include "platform/sha256_hash.h"
+#include "vrx/platform/defaults_store.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/sha256_hash.h"
 
 namespace vrx {
 

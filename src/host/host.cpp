@@ -1,10 +1,10 @@
-#include "host/host.h"
+#include "vrx/host/host.h"
 
 #include <unistd.h>
 
 #include <filesystem>
 
-#include "host/host_facts.h"
+#include "vrx/host/home/host_facts.h"
 
 namespace vrx::host {
 

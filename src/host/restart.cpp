@@ -1,4 +1,4 @@
-#include "host/restart.h"
+#include "vrx/host/restart.h"
 
 #include <fcntl.h>
 #include <systemd/sd-daemon.h>

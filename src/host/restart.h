@@ -5,8 +5,8 @@
 
 #include <string>
 
-#include "host/service/descriptor.h"
-#include "host/service/listening_socket.h"
+#include "vrx/host/base/descriptor.h"
+#include "vrx/host/ipc/listening_socket.h"
 
 namespace vrx::host {
 

@@ -8,9 +8,9 @@
 #include <string_view>
 #include <vector>
 
-#include "platform/error.h"
-#include "platform/http_request.h"
-#include "platform/task.h"
+#include "vrx/platform/error.h"
+#include "vrx/platform/http_request.h"
+#include "vrx/platform/task.h"
 
 namespace vrx::platform {
 

@@ -1,9 +1,9 @@
-#include "platform/activity_timing.h"
+#include "vrx/platform/activity_timing.h"
 
 #include <algorithm>
 #include <iterator>
 
-#include "platform/vendor.h"
+#include "vrx/platform/vendor.h"
 
 namespace vrx::platform {
 

@@ -6,8 +6,8 @@
 #include <string>
 #include <string_view>
 
-#include "platform/background_activity_scheduler.h"
-#include "platform/date.h"
+#include "vrx/platform/background_activity_scheduler.h"
+#include "vrx/platform/date.h"
 
 namespace vrx::platform {
 

@@ -1,6 +1,6 @@
-#include "platform/background_activity_scheduler.h"
+#include "vrx/platform/background_activity_scheduler.h"
 
-#include "platform/platform.h"
+#include "vrx/platform/platform.h"
 
 namespace vrx::platform {
 

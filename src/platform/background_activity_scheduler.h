@@ -9,7 +9,7 @@
 #include <string_view>
 #include <utility>
 
-#include "platform/task.h"
+#include "vrx/platform/task.h"
 
 namespace vrx::platform {
 

@@ -3,7 +3,7 @@
 
 #include <chrono>
 
-#include "platform/date.h"
+#include "vrx/platform/date.h"
 
 namespace vrx::platform {
 

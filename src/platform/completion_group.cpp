@@ -1,4 +1,4 @@
-#include "platform/completion_group.h"
+#include "vrx/platform/completion_group.h"
 
 #include <cassert>
 

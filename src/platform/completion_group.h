@@ -6,7 +6,7 @@
 #include <utility>
 #include <vector>
 
-#include "platform/queue.h"
+#include "vrx/platform/queue.h"
 
 namespace vrx::platform {
 

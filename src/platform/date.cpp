@@ -1,4 +1,4 @@
-#include "platform/date.h"
+#include "vrx/platform/date.h"
 
 #include <cmath>
 #include <cstdint>

@@ -1,6 +1,6 @@
-#include "platform/defaults_store.h"
+#include "vrx/platform/defaults_store.h"
 
-#include "platform/number_text.h"
+#include "vrx/platform/number_text.h"
 
 namespace vrx::platform {
 

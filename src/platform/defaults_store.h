@@ -9,7 +9,7 @@
 #include <string>
 #include <string_view>
 
-#include "platform/value.h"
+#include "vrx/platform/value.h"
 
 namespace vrx::platform {
 

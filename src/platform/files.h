@@ -3,8 +3,8 @@
 
 #include <string>
 
-#include "platform/error.h"
-#include "platform/value.h"
+#include "vrx/platform/error.h"
+#include "vrx/platform/value.h"
 
 namespace vrx::platform {
 

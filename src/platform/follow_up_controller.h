@@ -9,9 +9,9 @@
 #include <string_view>
 #include <vector>
 
-#include "platform/date.h"
-#include "platform/error.h"
-#include "platform/value.h"
+#include "vrx/platform/date.h"
+#include "vrx/platform/error.h"
+#include "vrx/platform/value.h"
 
 namespace vrx::platform {
 

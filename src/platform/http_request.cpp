@@ -1,4 +1,4 @@
-#include "platform/http_request.h"
+#include "vrx/platform/http_request.h"
 
 #include <algorithm>
 

@@ -5,10 +5,10 @@
 #include <optional>
 #include <string>
 
-#include "platform/date.h"
-#include "platform/error.h"
-#include "platform/task.h"
-#include "platform/value.h"
+#include "vrx/platform/date.h"
+#include "vrx/platform/error.h"
+#include "vrx/platform/task.h"
+#include "vrx/platform/value.h"
 
 namespace vrx::platform {
 

@@ -4,8 +4,8 @@
 #include <string>
 #include <string_view>
 
-#include "platform/error.h"
-#include "platform/value.h"
+#include "vrx/platform/error.h"
+#include "vrx/platform/value.h"
 
 namespace vrx::platform {
 

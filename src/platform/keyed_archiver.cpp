@@ -1,4 +1,4 @@
-#include "platform/keyed_archiver.h"
+#include "vrx/platform/keyed_archiver.h"
 
 #include <algorithm>
 

@@ -8,7 +8,7 @@
 #include <memory>
 #include <string_view>
 
-#include "platform/value.h"
+#include "vrx/platform/value.h"
 
 namespace vrx::platform {
 

@@ -1,8 +1,8 @@
-#include "platform/log.h"
+#include "vrx/platform/log.h"
 
 #include <cstdio>
 
-#include "platform/platform.h"
+#include "vrx/platform/platform.h"
 
 namespace vrx::platform {
 

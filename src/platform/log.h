@@ -11,7 +11,7 @@
 #include <type_traits>
 #include <vector>
 
-#include "platform/text.h"
+#include "vrx/platform/text.h"
 
 namespace vrx::platform {
 

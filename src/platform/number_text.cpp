@@ -1,4 +1,4 @@
-#include "platform/number_text.h"
+#include "vrx/platform/number_text.h"
 
 #include <algorithm>
 #include <charconv>

@@ -4,7 +4,7 @@
 #include <cstdint>
 #include <string_view>
 
-#include "platform/value.h"
+#include "vrx/platform/value.h"
 
 namespace vrx::platform {
 

@@ -5,7 +5,7 @@
 #include <string>
 #include <vector>
 
-#include "platform/date.h"
+#include "vrx/platform/date.h"
 
 namespace vrx::platform {
 

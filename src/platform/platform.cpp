@@ -1,4 +1,4 @@
-#include "platform/platform.h"
+#include "vrx/platform/platform.h"
 
 #include <atomic>
 #include <cstdio>

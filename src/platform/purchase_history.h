@@ -6,7 +6,7 @@
 #include <string>
 #include <vector>
 
-#include "platform/task.h"
+#include "vrx/platform/task.h"
 
 namespace vrx::platform {
 

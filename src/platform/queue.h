@@ -4,8 +4,8 @@
 #include <memory>
 #include <string>
 
-#include "platform/date.h"
-#include "platform/task.h"
+#include "vrx/platform/date.h"
+#include "vrx/platform/task.h"
 
 namespace vrx::platform {
 

@@ -7,7 +7,7 @@
 #include <string>
 #include <string_view>
 
-#include "platform/value.h"
+#include "vrx/platform/value.h"
 
 namespace vrx {
 class VRXAgentProtocol;

@@ -1,7 +1,7 @@
-#include "platform/sha256_hash.h"
+#include "vrx/platform/sha256_hash.h"
 
-#include "platform/digest.h"
-#include "platform/platform.h"
+#include "vrx/platform/digest.h"
+#include "vrx/platform/platform.h"
 
 namespace vrx::platform {
 

@@ -7,8 +7,8 @@
 #include <string>
 #include <vector>
 
-#include "platform/error.h"
-#include "platform/task.h"
+#include "vrx/platform/error.h"
+#include "vrx/platform/task.h"
 
 namespace vrx::platform {
 

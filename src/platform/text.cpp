@@ -1,9 +1,9 @@
-#include "platform/text.h"
+#include "vrx/platform/text.h"
 
 #include <charconv>
 #include <cstdio>
 
-#include "platform/error.h"
+#include "vrx/platform/error.h"
 
 namespace vrx::platform {
 

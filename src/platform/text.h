@@ -13,7 +13,7 @@
 #include <string_view>
 #include <vector>
 
-#include "platform/date.h"
+#include "vrx/platform/date.h"
 
 namespace vrx::platform {
 

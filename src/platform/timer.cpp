@@ -1,4 +1,4 @@
-#include "platform/timer.h"
+#include "vrx/platform/timer.h"
 
 #include <algorithm>
 #include <utility>

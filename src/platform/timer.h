@@ -6,7 +6,7 @@
 #include <memory>
 #include <mutex>
 
-#include "platform/queue.h"
+#include "vrx/platform/queue.h"
 
 namespace vrx::platform {
 

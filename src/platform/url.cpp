@@ -1,4 +1,4 @@
-#include "platform/url.h"
+#include "vrx/platform/url.h"
 
 #include <algorithm>
 

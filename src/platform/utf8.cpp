@@ -1,4 +1,4 @@
-#include "platform/utf8.h"
+#include "vrx/platform/utf8.h"
 
 namespace vrx::platform {
 

@@ -1,10 +1,10 @@
-#include "platform/value.h"
+#include "vrx/platform/value.h"
 
 #include <algorithm>
 #include <cmath>
 #include <limits>
 
-#include "platform/text.h"
+#include "vrx/platform/text.h"
 
 namespace vrx::platform {
 

@@ -14,7 +14,7 @@
 #include <variant>
 #include <vector>
 
-#include "platform/date.h"
+#include "vrx/platform/date.h"
 
 namespace vrx::platform {
 

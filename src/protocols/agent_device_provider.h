@@ -5,7 +5,7 @@
 #include <memory>
 #include <string>
 
-#include "protocols/forward.h"
+#include "vrx/protocols/forward.h"
 
 namespace vrx {
 

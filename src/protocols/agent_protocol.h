@@ -6,9 +6,9 @@
 #include <optional>
 #include <string>
 
-#include "platform/task.h"
-#include "platform/value.h"
-#include "protocols/forward.h"
+#include "vrx/platform/task.h"
+#include "vrx/platform/value.h"
+#include "vrx/protocols/forward.h"
 
 namespace vrx {
 

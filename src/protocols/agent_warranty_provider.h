@@ -6,10 +6,10 @@
 #include <optional>
 #include <string>
 
-#include "platform/date.h"
-#include "platform/task.h"
-#include "platform/value.h"
-#include "protocols/forward.h"
+#include "vrx/platform/date.h"
+#include "vrx/platform/task.h"
+#include "vrx/platform/value.h"
+#include "vrx/protocols/forward.h"
 
 namespace vrx {
 

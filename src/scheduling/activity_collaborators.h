@@ -4,8 +4,8 @@
 #include <functional>
 #include <memory>
 
-#include "protocols/agent_collaborators.h"
-#include "protocols/agent_protocol.h"
+#include "vrx/protocols/agent_collaborators.h"
+#include "vrx/protocols/agent_protocol.h"
 
 namespace vrx {
 

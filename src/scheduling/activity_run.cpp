@@ -1,8 +1,8 @@
-#include "scheduling/activity_run.h"
+#include "vrx/scheduling/activity_run.h"
 
-#include "platform/platform.h"
-#include "platform/queue.h"
-#include "scheduling/scheduler.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/queue.h"
+#include "vrx/scheduling/scheduler.h"
 
 namespace vrx {
 

@@ -7,8 +7,8 @@
 #include <mutex>
 #include <utility>
 
-#include "platform/timer.h"
-#include "scheduling/scheduler_activity_delegate.h"
+#include "vrx/platform/timer.h"
+#include "vrx/scheduling/scheduler_activity_delegate.h"
 
 namespace vrx {
 

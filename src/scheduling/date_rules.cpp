@@ -1,6 +1,6 @@
-#include "scheduling/date_rules.h"
+#include "vrx/scheduling/date_rules.h"
 
-#include "devices/device_info.h"
+#include "vrx/devices/records/device_info.h"
 
 namespace vrx {
 

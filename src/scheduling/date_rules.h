@@ -4,7 +4,7 @@
 
 #include <optional>
 
-#include "platform/date.h"
+#include "vrx/platform/date.h"
 
 namespace vrx {
 

@@ -1,16 +1,16 @@
-#include "scheduling/follow_up_post.h"
+#include "vrx/scheduling/follow_up_post.h"
 
 #include <utility>
 
-#include "devices/device_info.h"
-#include "platform/clock.h"
-#include "platform/log.h"
-#include "platform/platform.h"
-#include "platform/queue.h"
-#include "platform/vendor.h"
-#include "scheduling/follow_up_refresh.h"
-#include "scheduling/post_date.h"
-#include "scheduling/scheduler.h"
+#include "vrx/devices/records/device_info.h"
+#include "vrx/platform/clock.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/queue.h"
+#include "vrx/platform/vendor.h"
+#include "vrx/scheduling/follow_up_refresh.h"
+#include "vrx/scheduling/post_date.h"
+#include "vrx/scheduling/scheduler.h"
 
 namespace vrx {
 

@@ -6,12 +6,12 @@
 #include <memory>
 #include <optional>
 
-#include "platform/date.h"
-#include "platform/property.h"
-#include "platform/timer.h"
-#include "scheduling/activity_collaborators.h"
-#include "scheduling/activity_run.h"
-#include "scheduling/scheduler_activity_delegate.h"
+#include "vrx/platform/date.h"
+#include "vrx/platform/property.h"
+#include "vrx/platform/timer.h"
+#include "vrx/scheduling/activity_collaborators.h"
+#include "vrx/scheduling/activity_run.h"
+#include "vrx/scheduling/scheduler_activity_delegate.h"
 
 namespace vrx {
 

@@ -1,14 +1,14 @@
-#include "scheduling/follow_up_refresh.h"
+#include "vrx/scheduling/follow_up_refresh.h"
 
 #include <utility>
 
-#include "devices/device_info.h"
-#include "platform/clock.h"
-#include "platform/log.h"
-#include "platform/platform.h"
-#include "platform/vendor.h"
-#include "scheduling/refresh_date.h"
-#include "scheduling/scheduler.h"
+#include "vrx/devices/records/device_info.h"
+#include "vrx/platform/clock.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/vendor.h"
+#include "vrx/scheduling/refresh_date.h"
+#include "vrx/scheduling/scheduler.h"
 
 namespace vrx {
 

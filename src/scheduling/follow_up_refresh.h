@@ -5,9 +5,9 @@
 #include <memory>
 #include <optional>
 
-#include "platform/date.h"
-#include "scheduling/activity_collaborators.h"
-#include "scheduling/scheduler_activity_delegate.h"
+#include "vrx/platform/date.h"
+#include "vrx/scheduling/activity_collaborators.h"
+#include "vrx/scheduling/scheduler_activity_delegate.h"
 
 namespace vrx {
 

@@ -1,23 +1,23 @@
-#include "scheduling/outreach_activity.h"
+#include "vrx/scheduling/outreach_activity.h"
 
 #include <algorithm>
 #include <mutex>
 #include <optional>
 #include <utility>
 
-#include "coverage/warranty.h"
-#include "coverage/warranty_downloader.h"
-#include "devices/device.h"
-#include "devices/devices_manager.h"
-#include "platform/completion_group.h"
-#include "platform/log.h"
-#include "platform/platform.h"
-#include "platform/queue.h"
-#include "platform/telephony_network_info.h"
-#include "platform/vendor.h"
-#include "scheduling/activity_run.h"
-#include "scheduling/follow_up_post.h"
-#include "scheduling/scheduler.h"
+#include "vrx/coverage/records/warranty.h"
+#include "vrx/coverage/warranty_downloader.h"
+#include "vrx/devices/devices_manager.h"
+#include "vrx/devices/records/device.h"
+#include "vrx/platform/completion_group.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/queue.h"
+#include "vrx/platform/telephony_network_info.h"
+#include "vrx/platform/vendor.h"
+#include "vrx/scheduling/activity_run.h"
+#include "vrx/scheduling/follow_up_post.h"
+#include "vrx/scheduling/scheduler.h"
 
 namespace vrx {
 

@@ -6,10 +6,10 @@
 #include <atomic>
 #include <memory>
 
-#include "platform/property.h"
-#include "platform/timer.h"
-#include "scheduling/activity_collaborators.h"
-#include "scheduling/scheduler_activity_delegate.h"
+#include "vrx/platform/property.h"
+#include "vrx/platform/timer.h"
+#include "vrx/scheduling/activity_collaborators.h"
+#include "vrx/scheduling/scheduler_activity_delegate.h"
 
 namespace vrx {
 

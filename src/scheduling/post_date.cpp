@@ -1,12 +1,12 @@
-#include "scheduling/post_date.h"
+#include "vrx/scheduling/post_date.h"
 
-#include "devices/device_info.h"
-#include "followup/serial_number_hashes.h"
-#include "platform/defaults_store.h"
-#include "platform/platform.h"
-#include "platform/settings_keys.h"
-#include "platform/sha256_hash.h"
-#include "scheduling/date_rules.h"
+#include "vrx/devices/records/device_info.h"
+#include "vrx/followup/serial_number_hashes.h"
+#include "vrx/platform/defaults_store.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/settings_keys.h"
+#include "vrx/platform/sha256_hash.h"
+#include "vrx/scheduling/date_rules.h"
 
 namespace vrx {
 

@@ -6,8 +6,8 @@
 #include <set>
 #include <string>
 
-#include "platform/date.h"
-#include "protocols/forward.h"
+#include "vrx/platform/date.h"
+#include "vrx/protocols/forward.h"
 
 namespace vrx {
 

@@ -1,10 +1,10 @@
-#include "scheduling/refresh_date.h"
+#include "vrx/scheduling/refresh_date.h"
 
-#include "devices/device_info.h"
-#include "platform/defaults_store.h"
-#include "platform/platform.h"
-#include "platform/settings_keys.h"
-#include "scheduling/date_rules.h"
+#include "vrx/devices/records/device_info.h"
+#include "vrx/platform/defaults_store.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/settings_keys.h"
+#include "vrx/scheduling/date_rules.h"
 
 namespace vrx {
 

@@ -5,8 +5,8 @@
 
 #include <optional>
 
-#include "platform/date.h"
-#include "protocols/forward.h"
+#include "vrx/platform/date.h"
+#include "vrx/protocols/forward.h"
 
 namespace vrx {
 

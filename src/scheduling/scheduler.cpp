@@ -1,15 +1,15 @@
-#include "scheduling/scheduler.h"
+#include "vrx/scheduling/scheduler.h"
 
 #include <algorithm>
 #include <cstdint>
 #include <string>
 #include <utility>
 
-#include "platform/clock.h"
-#include "platform/defaults_store.h"
-#include "platform/log.h"
-#include "platform/platform.h"
-#include "platform/queue.h"
+#include "vrx/platform/clock.h"
+#include "vrx/platform/defaults_store.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/queue.h"
 
 namespace vrx {
 

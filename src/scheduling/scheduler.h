@@ -8,10 +8,10 @@
 #include <optional>
 #include <string>
 
-#include "platform/background_activity_scheduler.h"
-#include "platform/date.h"
-#include "platform/property.h"
-#include "scheduling/scheduler_activity_delegate.h"
+#include "vrx/platform/background_activity_scheduler.h"
+#include "vrx/platform/date.h"
+#include "vrx/platform/property.h"
+#include "vrx/scheduling/scheduler_activity_delegate.h"
 
 namespace vrx {
 

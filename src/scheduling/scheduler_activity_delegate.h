@@ -4,9 +4,9 @@
 #include <memory>
 #include <string>
 
-#include "platform/background_activity_scheduler.h"
-#include "platform/property.h"
-#include "platform/task.h"
+#include "vrx/platform/background_activity_scheduler.h"
+#include "vrx/platform/property.h"
+#include "vrx/platform/task.h"
 
 namespace vrx {
 

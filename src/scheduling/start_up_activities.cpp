@@ -1,16 +1,16 @@
-#include "scheduling/start_up_activities.h"
+#include "vrx/scheduling/start_up_activities.h"
 
 #include <utility>
 
-#include "platform/clock.h"
-#include "platform/defaults_store.h"
-#include "platform/log.h"
-#include "platform/platform.h"
-#include "platform/settings_keys.h"
-#include "platform/vendor.h"
-#include "scheduling/follow_up_refresh.h"
-#include "scheduling/outreach_activity.h"
-#include "scheduling/scheduler.h"
+#include "vrx/platform/clock.h"
+#include "vrx/platform/defaults_store.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/settings_keys.h"
+#include "vrx/platform/vendor.h"
+#include "vrx/scheduling/follow_up_refresh.h"
+#include "vrx/scheduling/outreach_activity.h"
+#include "vrx/scheduling/scheduler.h"
 
 namespace vrx {
 

@@ -2,8 +2,8 @@
 // up after each boot what was scheduled before it. No state; both always finish. Any thread may use them.
 #pragma once
 
-#include "scheduling/activity_collaborators.h"
-#include "scheduling/scheduler_activity_delegate.h"
+#include "vrx/scheduling/activity_collaborators.h"
+#include "vrx/scheduling/scheduler_activity_delegate.h"
 
 namespace vrx {
 

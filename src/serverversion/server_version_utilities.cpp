@@ -1,17 +1,17 @@
-#include "serverversion/server_version_utilities.h"
+#include "vrx/serverversion/server_version_utilities.h"
 
 #include <algorithm>
 #include <cmath>
 #include <iterator>
 
-#include "platform/defaults_store.h"
-#include "platform/http_request.h"
-#include "platform/log.h"
-#include "platform/number_text.h"
-#include "platform/platform.h"
-#include "platform/property_list.h"
-#include "platform/settings_keys.h"
-#include "platform/text.h"
+#include "vrx/platform/defaults_store.h"
+#include "vrx/platform/http_request.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/number_text.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/property_list.h"
+#include "vrx/platform/settings_keys.h"
+#include "vrx/platform/text.h"
 
 namespace vrx {
 

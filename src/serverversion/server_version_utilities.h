@@ -9,8 +9,8 @@
 #include <string>
 #include <string_view>
 
-#include "platform/task.h"
-#include "platform/value.h"
+#include "vrx/platform/task.h"
+#include "vrx/platform/value.h"
 
 namespace vrx {
 

@@ -1,20 +1,20 @@
-#include "service/agent.h"
+#include "vrx/service/agent.h"
 
 #include <mutex>
 #include <utility>
 
-#include "coverage/warranty.h"
-#include "devices/device.h"
-#include "devices/device_info.h"
-#include "devices/devices_manager.h"
-#include "devices/utilities.h"
-#include "platform/defaults_store.h"
-#include "platform/log.h"
-#include "platform/platform.h"
-#include "platform/settings_keys.h"
-#include "platform/vendor.h"
-#include "serverversion/server_version_utilities.h"
-#include "service/default_warranty_provider.h"
+#include "vrx/coverage/records/warranty.h"
+#include "vrx/devices/devices_manager.h"
+#include "vrx/devices/records/device.h"
+#include "vrx/devices/records/device_info.h"
+#include "vrx/devices/utilities.h"
+#include "vrx/platform/defaults_store.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/settings_keys.h"
+#include "vrx/platform/vendor.h"
+#include "vrx/serverversion/server_version_utilities.h"
+#include "vrx/service/default_warranty_provider.h"
 
 namespace vrx {
 

@@ -7,13 +7,13 @@
 #include <optional>
 #include <string>
 
-#include "platform/completion_group.h"
-#include "platform/property.h"
-#include "platform/queue.h"
-#include "protocols/agent_collaborators.h"
-#include "protocols/agent_device_provider.h"
-#include "protocols/agent_protocol.h"
-#include "protocols/agent_warranty_provider.h"
+#include "vrx/platform/completion_group.h"
+#include "vrx/platform/property.h"
+#include "vrx/platform/queue.h"
+#include "vrx/protocols/agent_collaborators.h"
+#include "vrx/protocols/agent_device_provider.h"
+#include "vrx/protocols/agent_protocol.h"
+#include "vrx/protocols/agent_warranty_provider.h"
 
 namespace vrx {
 

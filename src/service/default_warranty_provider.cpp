@@ -1,17 +1,17 @@
-#include "service/default_warranty_provider.h"
+#include "vrx/service/default_warranty_provider.h"
 
 #include <algorithm>
 #include <cstdint>
 #include <utility>
 
-#include "coverage/cache_metadata.h"
-#include "coverage/warranty.h"
-#include "coverage/warranty_downloader.h"
-#include "platform/account_store.h"
-#include "platform/defaults_store.h"
-#include "platform/log.h"
-#include "platform/platform.h"
-#include "platform/settings_keys.h"
+#include "vrx/coverage/cache_metadata.h"
+#include "vrx/coverage/records/warranty.h"
+#include "vrx/coverage/warranty_downloader.h"
+#include "vrx/platform/account_store.h"
+#include "vrx/platform/defaults_store.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/settings_keys.h"
 
 namespace vrx {
 

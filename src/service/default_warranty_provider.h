@@ -4,8 +4,8 @@
 
 #include <string>
 
-#include "protocols/agent_collaborators.h"
-#include "protocols/agent_warranty_provider.h"
+#include "vrx/protocols/agent_collaborators.h"
+#include "vrx/protocols/agent_warranty_provider.h"
 
 namespace vrx {
 

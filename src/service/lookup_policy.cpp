@@ -2,14 +2,14 @@
 
 #include <utility>
 
-#include "coverage/cache_metadata.h"
-#include "coverage/warranty.h"
-#include "platform/clock.h"
-#include "platform/locale.h"
-#include "platform/log.h"
-#include "platform/platform.h"
-#include "service/agent.h"
-#include "service/cached_record.h"
+#include "vrx/coverage/cache_metadata.h"
+#include "vrx/coverage/records/warranty.h"
+#include "vrx/platform/clock.h"
+#include "vrx/platform/locale.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/platform.h"
+#include "vrx/service/agent.h"
+#include "vrx/service/cached_record.h"
 
 namespace vrx {
 

@@ -2,10 +2,10 @@
 
 #include <utility>
 
-#include "coverage/warranty.h"
-#include "devices/device.h"
-#include "devices/device_info.h"
-#include "service/agent.h"
+#include "vrx/coverage/records/warranty.h"
+#include "vrx/devices/records/device.h"
+#include "vrx/devices/records/device_info.h"
+#include "vrx/service/agent.h"
 
 namespace vrx {
 

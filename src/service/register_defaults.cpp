@@ -1,7 +1,7 @@
-#include "service/register_defaults.h"
+#include "vrx/service/register_defaults.h"
 
-#include "platform/defaults_store.h"
-#include "platform/settings_keys.h"
+#include "vrx/platform/defaults_store.h"
+#include "vrx/platform/settings_keys.h"
 
 namespace vrx {
 

@@ -1,13 +1,13 @@
-#include "service/service_delegate.h"
+#include "vrx/service/service_delegate.h"
 
 #include <array>
 #include <string>
 
-#include "platform/log.h"
-#include "platform/platform.h"
-#include "platform/utf8.h"
-#include "platform/vendor.h"
-#include "service/agent.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/utf8.h"
+#include "vrx/platform/vendor.h"
+#include "vrx/service/agent.h"
 
 namespace vrx {
 

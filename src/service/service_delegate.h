@@ -5,9 +5,9 @@
 #include <cstdint>
 #include <optional>
 
-#include "platform/bundle_lookup.h"
-#include "platform/service_listener.h"
-#include "protocols/agent_collaborators.h"
+#include "vrx/platform/bundle_lookup.h"
+#include "vrx/platform/service_listener.h"
+#include "vrx/protocols/agent_collaborators.h"
 
 namespace vrx {
 

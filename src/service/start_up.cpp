@@ -1,22 +1,22 @@
-#include "service/start_up.h"
+#include "vrx/service/start_up.h"
 
 #include <string>
 #include <utility>
 
-#include "devices/locale_monitor.h"
-#include "devices/paired_devices_monitor.h"
-#include "followup/follow_up.h"
-#include "platform/log.h"
-#include "platform/platform.h"
-#include "platform/vendor.h"
-#include "scheduling/follow_up_post.h"
-#include "scheduling/follow_up_refresh.h"
-#include "scheduling/outreach_activity.h"
-#include "scheduling/scheduler.h"
-#include "scheduling/start_up_activities.h"
-#include "service/agent.h"
-#include "service/register_defaults.h"
-#include "support/orvane_support_manager.h"
+#include "vrx/devices/locale_monitor.h"
+#include "vrx/devices/paired_devices_monitor.h"
+#include "vrx/followup/follow_up.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/vendor.h"
+#include "vrx/scheduling/follow_up_post.h"
+#include "vrx/scheduling/follow_up_refresh.h"
+#include "vrx/scheduling/outreach_activity.h"
+#include "vrx/scheduling/scheduler.h"
+#include "vrx/scheduling/start_up_activities.h"
+#include "vrx/service/agent.h"
+#include "vrx/service/register_defaults.h"
+#include "vrx/support/orvane_support_manager.h"
 
 namespace vrx {
 

@@ -6,10 +6,10 @@
 #include <memory>
 #include <optional>
 
-#include "platform/service_listener.h"
-#include "protocols/agent_collaborators.h"
-#include "scheduling/activity_collaborators.h"
-#include "service/service_delegate.h"
+#include "vrx/platform/service_listener.h"
+#include "vrx/protocols/agent_collaborators.h"
+#include "vrx/scheduling/activity_collaborators.h"
+#include "vrx/service/service_delegate.h"
 
 namespace vrx {
 

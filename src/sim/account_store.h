@@ -9,8 +9,8 @@
 #include <string_view>
 #include <vector>
 
-#include "platform/account_store.h"
-#include "platform/queue.h"
+#include "vrx/platform/account_store.h"
+#include "vrx/platform/queue.h"
 
 namespace vrx::sim {
 

@@ -1,10 +1,10 @@
-#include "sim/background_activities.h"
+#include "vrx/sim/background_activities.h"
 
 #include <algorithm>
 #include <utility>
 
-#include "platform/task.h"
-#include "platform/vendor.h"
+#include "vrx/platform/task.h"
+#include "vrx/platform/vendor.h"
 
 namespace vrx::sim {
 

@@ -15,10 +15,10 @@
 #include <string>
 #include <vector>
 
-#include "platform/activity_timing.h"
-#include "platform/background_activity_scheduler.h"
-#include "sim/clock.h"
-#include "sim/queues.h"
+#include "vrx/platform/activity_timing.h"
+#include "vrx/platform/background_activity_scheduler.h"
+#include "vrx/sim/clock.h"
+#include "vrx/sim/queues.h"
 
 namespace vrx::sim {
 

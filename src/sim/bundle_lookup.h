@@ -4,7 +4,7 @@
 #include <algorithm>
 #include <map>
 
-#include "platform/bundle_lookup.h"
+#include "vrx/platform/bundle_lookup.h"
 
 namespace vrx::sim {
 

@@ -3,7 +3,7 @@
 
 #include <algorithm>
 
-#include "platform/clock.h"
+#include "vrx/platform/clock.h"
 
 namespace vrx::sim {
 

@@ -1,10 +1,10 @@
-#include "sim/defaults_store.h"
+#include "vrx/sim/defaults_store.h"
 
 #include <cerrno>
 #include <utility>
 
-#include "codec/property_list.h"
-#include "platform/log.h"
+#include "vrx/codec/property_list.h"
+#include "vrx/platform/log.h"
 
 namespace vrx::sim {
 

@@ -4,9 +4,9 @@
 #include <string>
 #include <vector>
 
-#include "platform/defaults_store.h"
-#include "platform/error.h"
-#include "sim/failures.h"
+#include "vrx/platform/defaults_store.h"
+#include "vrx/platform/error.h"
+#include "vrx/sim/failures.h"
 
 namespace vrx::sim {
 

@@ -8,9 +8,9 @@
 #include <utility>
 #include <vector>
 
-#include "platform/device_properties.h"
-#include "platform/paired_device_registry.h"
-#include "platform/telephony_network_info.h"
+#include "vrx/platform/device_properties.h"
+#include "vrx/platform/paired_device_registry.h"
+#include "vrx/platform/telephony_network_info.h"
 
 namespace vrx::sim {
 

@@ -1,4 +1,4 @@
-#include "sim/failures.h"
+#include "vrx/sim/failures.h"
 
 #include <cstdio>
 #include <cstdlib>

@@ -1,4 +1,4 @@
-#include "sim/fiber.h"
+#include "vrx/sim/fiber.h"
 
 #include <sys/mman.h>
 #include <unistd.h>

@@ -6,7 +6,7 @@
 
 #include <cstddef>
 
-#include "platform/task.h"
+#include "vrx/platform/task.h"
 
 namespace vrx::sim {
 

@@ -1,9 +1,9 @@
-#include "sim/files.h"
+#include "vrx/sim/files.h"
 
 #include <cerrno>
 #include <cstring>
 
-#include "platform/limits.h"
+#include "vrx/platform/limits.h"
 
 namespace vrx::sim {
 

@@ -9,7 +9,7 @@
 #include <string_view>
 #include <vector>
 
-#include "platform/files.h"
+#include "vrx/platform/files.h"
 
 namespace vrx::sim {
 

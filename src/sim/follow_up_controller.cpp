@@ -1,10 +1,10 @@
-#include "sim/follow_up_controller.h"
+#include "vrx/sim/follow_up_controller.h"
 
 #include <algorithm>
 #include <cerrno>
 #include <utility>
 
-#include "codec/property_list.h"
+#include "vrx/codec/property_list.h"
 
 namespace vrx::sim {
 

@@ -7,8 +7,8 @@
 #include <string>
 #include <vector>
 
-#include "platform/follow_up_controller.h"
-#include "platform/vendor.h"
+#include "vrx/platform/follow_up_controller.h"
+#include "vrx/platform/vendor.h"
 
 namespace vrx::sim {
 

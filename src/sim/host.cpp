@@ -1,4 +1,4 @@
-#include "sim/host.h"
+#include "vrx/sim/host.h"
 
 namespace vrx::sim {
 

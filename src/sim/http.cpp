@@ -1,9 +1,9 @@
-#include "sim/http.h"
+#include "vrx/sim/http.h"
 
 #include <limits>
 #include <utility>
 
-#include "platform/url.h"
+#include "vrx/platform/url.h"
 
 namespace vrx::sim {
 

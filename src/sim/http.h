@@ -11,10 +11,10 @@
 #include <string_view>
 #include <vector>
 
-#include "platform/http_request.h"
-#include "sim/clock.h"
-#include "sim/files.h"
-#include "sim/queues.h"
+#include "vrx/platform/http_request.h"
+#include "vrx/sim/clock.h"
+#include "vrx/sim/files.h"
+#include "vrx/sim/queues.h"
 
 namespace vrx::sim {
 

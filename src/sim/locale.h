@@ -1,8 +1,8 @@
 // The user's language, set by the test.
 #pragma once
 
-#include "codec/number_format.h"
-#include "platform/locale.h"
+#include "vrx/codec/core/number_format.h"
+#include "vrx/platform/locale.h"
 
 namespace vrx::sim {
 

@@ -1,9 +1,9 @@
-#include "sim/notification_center.h"
+#include "vrx/sim/notification_center.h"
 
 #include <utility>
 
-#include "platform/queue.h"
-#include "platform/vendor.h"
+#include "vrx/platform/queue.h"
+#include "vrx/platform/vendor.h"
 
 namespace vrx::sim {
 

@@ -6,7 +6,7 @@
 #include <set>
 #include <string>
 
-#include "platform/notification_center.h"
+#include "vrx/platform/notification_center.h"
 
 namespace vrx::sim {
 

@@ -1,8 +1,8 @@
-#include "sim/process.h"
+#include "vrx/sim/process.h"
 
 #include <utility>
 
-#include "platform/task.h"
+#include "vrx/platform/task.h"
 
 namespace vrx::sim {
 

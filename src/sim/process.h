@@ -11,11 +11,11 @@
 #include <memory>
 #include <string>
 
-#include "platform/process_lifecycle.h"
-#include "sim/background_activities.h"
-#include "sim/defaults_store.h"
-#include "sim/notification_center.h"
-#include "sim/queues.h"
+#include "vrx/platform/process_lifecycle.h"
+#include "vrx/sim/background_activities.h"
+#include "vrx/sim/defaults_store.h"
+#include "vrx/sim/notification_center.h"
+#include "vrx/sim/queues.h"
 
 namespace vrx::sim {
 

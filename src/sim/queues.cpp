@@ -1,9 +1,9 @@
-#include "sim/queues.h"
+#include "vrx/sim/queues.h"
 
 #include <algorithm>
 #include <cassert>
 
-#include "platform/text.h"
+#include "vrx/platform/text.h"
 
 namespace vrx::sim {
 

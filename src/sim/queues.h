@@ -18,10 +18,10 @@
 #include <utility>
 #include <vector>
 
-#include "platform/queue.h"
-#include "sim/clock.h"
-#include "sim/failures.h"
-#include "sim/fiber.h"
+#include "vrx/platform/queue.h"
+#include "vrx/sim/clock.h"
+#include "vrx/sim/failures.h"
+#include "vrx/sim/fiber.h"
 
 namespace vrx::sim {
 

@@ -1,4 +1,4 @@
-#include "sim/service_listener.h"
+#include "vrx/sim/service_listener.h"
 
 #include <utility>
 

@@ -7,10 +7,10 @@
 #include <string>
 #include <vector>
 
-#include "platform/queue.h"
-#include "platform/service_listener.h"
-#include "protocols/agent_protocol.h"
-#include "sim/failures.h"
+#include "vrx/platform/queue.h"
+#include "vrx/platform/service_listener.h"
+#include "vrx/protocols/agent_protocol.h"
+#include "vrx/sim/failures.h"
 
 namespace vrx::sim {
 

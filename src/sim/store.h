@@ -9,11 +9,11 @@
 #include <string_view>
 #include <vector>
 
-#include "platform/installed_apps.h"
-#include "platform/localized_strings.h"
-#include "platform/purchase_history.h"
-#include "platform/queue.h"
-#include "platform/store.h"
+#include "vrx/platform/installed_apps.h"
+#include "vrx/platform/localized_strings.h"
+#include "vrx/platform/purchase_history.h"
+#include "vrx/platform/queue.h"
+#include "vrx/platform/store.h"
 
 namespace vrx::sim {
 

@@ -1,4 +1,4 @@
-#include "sim/system_log.h"
+#include "vrx/sim/system_log.h"
 
 #include <algorithm>
 

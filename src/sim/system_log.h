@@ -5,7 +5,7 @@
 #include <string_view>
 #include <vector>
 
-#include "platform/log.h"
+#include "vrx/platform/log.h"
 
 namespace vrx::sim {
 

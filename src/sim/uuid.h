@@ -4,7 +4,7 @@
 #include <array>
 #include <cstdio>
 
-#include "platform/uuid.h"
+#include "vrx/platform/uuid.h"
 
 namespace vrx::sim {
 

@@ -1,19 +1,19 @@
-#include "support/orvane_support_manager.h"
+#include "vrx/support/orvane_support_manager.h"
 
 #include <mutex>
 #include <optional>
 #include <utility>
 #include <vector>
 
-#include "platform/account_store.h"
-#include "platform/defaults_store.h"
-#include "platform/installed_apps.h"
-#include "platform/localized_strings.h"
-#include "platform/log.h"
-#include "platform/platform.h"
-#include "platform/purchase_history.h"
-#include "platform/queue.h"
-#include "platform/store.h"
+#include "vrx/platform/account_store.h"
+#include "vrx/platform/defaults_store.h"
+#include "vrx/platform/installed_apps.h"
+#include "vrx/platform/localized_strings.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/platform.h"
+#include "vrx/platform/purchase_history.h"
+#include "vrx/platform/queue.h"
+#include "vrx/platform/store.h"
 
 namespace vrx {
 

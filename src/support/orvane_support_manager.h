@@ -7,9 +7,9 @@
 
 #include <string>
 
-#include "platform/task.h"
-#include "platform/value.h"
-#include "protocols/agent_collaborators.h"
+#include "vrx/platform/task.h"
+#include "vrx/platform/value.h"
+#include "vrx/protocols/agent_collaborators.h"
 
 namespace vrx {
 

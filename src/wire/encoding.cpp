@@ -1,4 +1,4 @@
-#include "wire/encoding.h"
+#include "vrx/wire/encoding.h"
 
 #include <cerrno>
 #include <cstring>
@@ -6,7 +6,7 @@
 #include <string>
 #include <utility>
 
-#include "codec/unicode.h"
+#include "vrx/codec/core/unicode.h"
 
 namespace vrx::wire {
 

@@ -14,9 +14,9 @@
 
 #include <string_view>
 
-#include "platform/error.h"
-#include "platform/limits.h"
-#include "platform/value.h"
+#include "vrx/platform/error.h"
+#include "vrx/platform/limits.h"
+#include "vrx/platform/value.h"
 
 namespace vrx::wire {
 

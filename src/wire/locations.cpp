@@ -1,4 +1,4 @@
-#include "wire/locations.h"
+#include "vrx/wire/locations.h"
 
 #include <pwd.h>
 #include <unistd.h>
@@ -6,7 +6,7 @@
 #include <array>
 #include <cstdlib>
 
-#include "wire/names.h"
+#include "vrx/wire/names.h"
 
 namespace vrx::wire {
 

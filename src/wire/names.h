@@ -5,7 +5,7 @@
 #include <array>
 #include <string_view>
 
-#include "platform/vendor.h"
+#include "vrx/platform/vendor.h"
 
 namespace vrx::wire {
 

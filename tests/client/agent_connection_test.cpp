@@ -1,4 +1,4 @@
-#include "client/agent_connection.h"
+#include "vrx/client/agent_connection.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

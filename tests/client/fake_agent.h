@@ -11,13 +11,13 @@
 #include <optional>
 #include <thread>
 
-#include "client/agent_connection.h"
-#include "host/main_loop.h"
-#include "host/service/service_listener.h"
-#include "host/system_log.h"
-#include "platform/limits.h"
-#include "platform/platform.h"
-#include "wire/names.h"
+#include "vrx/client/agent_connection.h"
+#include "vrx/host/ipc/service_listener.h"
+#include "vrx/host/log/system_log.h"
+#include "vrx/host/loop/main_loop.h"
+#include "vrx/platform/limits.h"
+#include "vrx/platform/platform.h"
+#include "vrx/wire/names.h"
 
 namespace vrx::test {
 

@@ -1,11 +1,11 @@
 // JSON: what is read and refused, where an error says it lies, and the two ways of writing.
-#include "codec/json.h"
+#include "vrx/codec/json.h"
 
 #include <gtest/gtest.h>
 
 #include <limits>
 
-#include "platform/limits.h"
+#include "vrx/platform/limits.h"
 
 namespace vrx::codec {
 namespace {

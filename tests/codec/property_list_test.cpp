@@ -1,5 +1,5 @@
 // Property lists: round trips in both forms, hostile documents, limits, exchange with another implementation.
-#include "codec/property_list.h"
+#include "vrx/codec/property_list.h"
 
 #include <gtest/gtest.h>
 #include <stdlib.h>
@@ -9,7 +9,7 @@
 #include <fstream>
 #include <limits>
 
-#include "platform/limits.h"
+#include "vrx/platform/limits.h"
 
 namespace vrx::codec {
 namespace {

@@ -4,8 +4,8 @@
 #include <cstdlib>
 #include <thread>
 
-#include "codec/digest.h"
-#include "codec/number_format.h"
+#include "vrx/codec/core/number_format.h"
+#include "vrx/codec/digest.h"
 
 namespace vrx::codec {
 namespace {

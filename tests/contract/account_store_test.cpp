@@ -1,12 +1,12 @@
 // What every host's account store does, simulated or real. The real one renews by a helper that is a line of shell.
-#include "platform/account_store.h"
+#include "vrx/platform/account_store.h"
 
 #include <gtest/gtest.h>
 
-#include "host/account_store.h"
-#include "host/queues.h"
 #include "host/support.h"
-#include "sim/host.h"
+#include "vrx/host/account/account_store.h"
+#include "vrx/host/loop/queues.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {

@@ -1,13 +1,13 @@
 // What every registry of background activities does, simulated or real. Times are seconds since the test began.
-#include "platform/background_activity_scheduler.h"
+#include "vrx/platform/background_activity_scheduler.h"
 
 #include <gmock/gmock.h>
 
 #include <chrono>
 
-#include "host/real_activities.h"
-#include "platform/activity_timing.h"
-#include "sim/host.h"
+#include "host/activities/real_activities.h"
+#include "vrx/platform/activity_timing.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {

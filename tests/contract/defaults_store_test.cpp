@@ -1,14 +1,14 @@
 // What every store of settings does, simulated or real.
-#include "platform/defaults_store.h"
+#include "vrx/platform/defaults_store.h"
 
 #include <gmock/gmock.h>
 
 #include <cmath>
 #include <limits>
 
-#include "host/defaults_store.h"
 #include "host/support.h"
-#include "sim/host.h"
+#include "vrx/host/home/defaults_store.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {

@@ -1,12 +1,12 @@
 // What the files of every host do, simulated or real.
-#include "platform/files.h"
+#include "vrx/platform/files.h"
 
 #include <gtest/gtest.h>
 
-#include "host/files.h"
 #include "host/support.h"
-#include "platform/limits.h"
-#include "sim/files.h"
+#include "vrx/host/base/files.h"
+#include "vrx/platform/limits.h"
+#include "vrx/sim/files.h"
 
 namespace vrx {
 namespace {

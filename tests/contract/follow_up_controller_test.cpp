@@ -1,11 +1,11 @@
 // What every follow-up service does, simulated or real.
-#include "platform/follow_up_controller.h"
+#include "vrx/platform/follow_up_controller.h"
 
 #include <gmock/gmock.h>
 
-#include "host/follow_up_controller.h"
 #include "host/support.h"
-#include "sim/host.h"
+#include "vrx/host/home/follow_up_controller.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {

@@ -3,13 +3,13 @@
 
 #include <map>
 
-#include "host/clock.h"
-#include "host/http.h"
-#include "host/loopback_server.h"
-#include "host/queues.h"
+#include "host/http/loopback_server.h"
 #include "host/support.h"
-#include "platform/url.h"
-#include "sim/host.h"
+#include "vrx/host/http/http.h"
+#include "vrx/host/loop/queues.h"
+#include "vrx/host/profile/clock.h"
+#include "vrx/platform/url.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {

@@ -1,15 +1,15 @@
 // What the queues of every host do, simulated or real. The real ones run on threads; nothing here waits for time to
 // pass but for the shortest of timers.
-#include "platform/queue.h"
+#include "vrx/platform/queue.h"
 
 #include <gmock/gmock.h>
 
 #include <chrono>
 #include <mutex>
 
-#include "host/queues.h"
 #include "host/support.h"
-#include "sim/host.h"
+#include "vrx/host/loop/queues.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {

@@ -1,9 +1,9 @@
 // What a request to the coverage server carries, and what becomes of it without account or token.
-#include "coverage/account_headers.h"
+#include "vrx/coverage/account_headers.h"
 
 #include <gtest/gtest.h>
 
-#include "sim/host.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {

@@ -3,9 +3,9 @@
 
 #include <cerrno>
 
-#include "coverage/cache_metadata.h"
-#include "coverage/warranty.h"
-#include "sim/host.h"
+#include "vrx/coverage/cache_metadata.h"
+#include "vrx/coverage/records/warranty.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {

@@ -1,12 +1,12 @@
 // Downloads from a coverage file and from a server, and what they leave in the cache.
-#include "coverage/warranty_downloader.h"
+#include "vrx/coverage/warranty_downloader.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
-#include "coverage/cache_metadata.h"
-#include "coverage/warranty.h"
-#include "sim/host.h"
+#include "vrx/coverage/cache_metadata.h"
+#include "vrx/coverage/records/warranty.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {

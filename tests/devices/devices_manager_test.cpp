@@ -1,10 +1,10 @@
 // The inventory of this device and its watches.
-#include "devices/devices_manager.h"
+#include "vrx/devices/devices_manager.h"
 
 #include <gtest/gtest.h>
 
-#include "devices/device.h"
-#include "sim/host.h"
+#include "vrx/devices/records/device.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {

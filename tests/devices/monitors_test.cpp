@@ -1,9 +1,9 @@
 // What a change of paired devices or of the language starts, on a whole agent.
 #include <gmock/gmock.h>
 
-#include "devices/locale_monitor.h"
-#include "followup/follow_up.h"
 #include "scheduling/agent_world.h"
+#include "vrx/devices/locale_monitor.h"
+#include "vrx/followup/follow_up.h"
 
 namespace vrx {
 namespace {

@@ -7,7 +7,7 @@
 #include <csignal>
 #include <filesystem>
 
-#include "programs.h"
+#include "end_to_end/programs.h"
 
 namespace vrx::end_to_end {
 namespace {

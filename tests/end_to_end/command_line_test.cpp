@@ -11,9 +11,9 @@
 #include <filesystem>
 #include <sstream>
 
-#include "host/database.h"
-#include "host/home_lock.h"
-#include "programs.h"
+#include "end_to_end/programs.h"
+#include "vrx/host/home/database.h"
+#include "vrx/host/home/home_lock.h"
 
 namespace vrx::end_to_end {
 namespace {

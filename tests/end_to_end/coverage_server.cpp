@@ -1,4 +1,4 @@
-#include "coverage_server.h"
+#include "end_to_end/coverage_server.h"
 
 #include <arpa/inet.h>
 #include <fcntl.h>
@@ -8,7 +8,7 @@
 #include <array>
 #include <cstdio>
 
-#include "codec/json.h"
+#include "vrx/codec/json.h"
 
 namespace vrx::end_to_end {
 

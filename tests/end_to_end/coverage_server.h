@@ -1,7 +1,7 @@
 // The development coverage server as a process, told what to do and asked what it saw over its control address.
 #pragma once
 
-#include "programs.h"
+#include "end_to_end/programs.h"
 
 namespace vrx::end_to_end {
 

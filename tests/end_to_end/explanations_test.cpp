@@ -4,8 +4,8 @@
 #include <chrono>
 #include <filesystem>
 
-#include "codec/json.h"
-#include "programs.h"
+#include "end_to_end/programs.h"
+#include "vrx/codec/json.h"
 
 namespace vrx::end_to_end {
 namespace {

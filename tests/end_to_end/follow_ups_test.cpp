@@ -6,8 +6,8 @@
 #include <filesystem>
 #include <fstream>
 
-#include "codec/json.h"
-#include "programs.h"
+#include "end_to_end/programs.h"
+#include "vrx/codec/json.h"
 
 namespace vrx::end_to_end {
 namespace {

@@ -11,15 +11,15 @@
 #include <future>
 #include <thread>
 
-#include "client/agent_connection.h"
-#include "codec/json.h"
-#include "coverage/cache_metadata.h"
-#include "coverage_server.h"
-#include "host/host.h"
-#include "host/service/bundle_lookup.h"
-#include "host/service/service_listener.h"
-#include "platform/defaults_store.h"
-#include "service/start_up.h"
+#include "end_to_end/coverage_server.h"
+#include "vrx/client/agent_connection.h"
+#include "vrx/codec/json.h"
+#include "vrx/coverage/cache_metadata.h"
+#include "vrx/host/host.h"
+#include "vrx/host/ipc/bundle_lookup.h"
+#include "vrx/host/ipc/service_listener.h"
+#include "vrx/platform/defaults_store.h"
+#include "vrx/service/start_up.h"
 
 namespace vrx::end_to_end {
 namespace {

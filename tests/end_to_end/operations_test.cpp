@@ -10,9 +10,9 @@
 #include <future>
 #include <thread>
 
-#include "client/agent_connection.h"
-#include "host/service/descriptor.h"
-#include "programs.h"
+#include "end_to_end/programs.h"
+#include "vrx/client/agent_connection.h"
+#include "vrx/host/base/descriptor.h"
 
 namespace vrx::end_to_end {
 namespace {

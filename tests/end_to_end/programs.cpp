@@ -1,4 +1,4 @@
-#include "programs.h"
+#include "end_to_end/programs.h"
 
 #include <arpa/inet.h>
 #include <fcntl.h>
@@ -16,7 +16,7 @@
 #include <filesystem>
 #include <fstream>
 
-#include "codec/json.h"
+#include "vrx/codec/json.h"
 
 extern char** environ;
 

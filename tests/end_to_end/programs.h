@@ -10,7 +10,7 @@
 #include <string>
 #include <vector>
 
-#include "platform/value.h"
+#include "vrx/platform/value.h"
 
 namespace vrx::end_to_end {
 

@@ -6,8 +6,8 @@
 #include <filesystem>
 #include <regex>
 
-#include "codec/json.h"
-#include "coverage_server.h"
+#include "end_to_end/coverage_server.h"
+#include "vrx/codec/json.h"
 
 namespace vrx::end_to_end {
 namespace {

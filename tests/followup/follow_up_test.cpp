@@ -1,13 +1,13 @@
 // Follow-ups as they are decided, filled, posted, refreshed, dismissed and migrated, on the simulated service.
-#include "followup/follow_up.h"
+#include "vrx/followup/follow_up.h"
 
 #include <gmock/gmock.h>
 
-#include "devices/device_info.h"
-#include "followup/follow_up_rules.h"
-#include "followup/serial_number_hashes.h"
-#include "platform/sha256_hash.h"
-#include "sim/host.h"
+#include "vrx/devices/records/device_info.h"
+#include "vrx/followup/follow_up_rules.h"
+#include "vrx/followup/serial_number_hashes.h"
+#include "vrx/platform/sha256_hash.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {

@@ -6,15 +6,15 @@
 #include <latch>
 #include <thread>
 
-#include "coverage/warranty.h"
-#include "devices/device_info.h"
-#include "followup/follow_up.h"
-#include "host/host.h"
-#include "scheduling/outreach_activity.h"
-#include "scheduling/scheduler.h"
-#include "service/agent.h"
-#include "service/register_defaults.h"
-#include "support.h"
+#include "host/support.h"
+#include "vrx/coverage/records/warranty.h"
+#include "vrx/devices/records/device_info.h"
+#include "vrx/followup/follow_up.h"
+#include "vrx/host/host.h"
+#include "vrx/scheduling/outreach_activity.h"
+#include "vrx/scheduling/scheduler.h"
+#include "vrx/service/agent.h"
+#include "vrx/service/register_defaults.h"
 
 namespace vrx::host {
 namespace {

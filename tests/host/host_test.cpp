@@ -1,4 +1,4 @@
-#include "host/host.h"
+#include "vrx/host/host.h"
 
 #include <gmock/gmock.h>
 
@@ -6,9 +6,9 @@
 #include <future>
 #include <thread>
 
-#include "host/credential_helper.h"
-#include "host/host_facts.h"
-#include "support.h"
+#include "host/support.h"
+#include "vrx/host/account/credential_helper.h"
+#include "vrx/host/home/host_facts.h"
 
 namespace vrx::host {
 namespace {

@@ -1,4 +1,4 @@
-#include "host/restart.h"
+#include "vrx/host/restart.h"
 
 #include <fcntl.h>
 #include <gmock/gmock.h>
@@ -10,8 +10,8 @@
 #include <filesystem>
 
 #include "client/raw_client.h"
-#include "host/home_lock.h"
-#include "support.h"
+#include "host/support.h"
+#include "vrx/host/home/home_lock.h"
 
 namespace vrx::host {
 namespace {

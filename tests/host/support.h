@@ -12,10 +12,10 @@
 #include <string>
 #include <vector>
 
-#include "codec/codec.h"
-#include "platform/clock.h"
-#include "platform/log.h"
-#include "platform/platform.h"
+#include "vrx/codec/codec.h"
+#include "vrx/platform/clock.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/platform.h"
 
 namespace vrx::host {
 

@@ -1,5 +1,5 @@
 // Callbacks that are called exactly once, and groups of work.
-#include "platform/task.h"
+#include "vrx/platform/task.h"
 
 #include <gmock/gmock.h>
 
@@ -7,7 +7,7 @@
 #include <stdexcept>
 #include <thread>
 
-#include "platform/completion_group.h"
+#include "vrx/platform/completion_group.h"
 
 namespace vrx::platform {
 namespace {

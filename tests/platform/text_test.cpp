@@ -1,11 +1,11 @@
 // The texts that log lines are made of, and the lines.
-#include "platform/text.h"
+#include "vrx/platform/text.h"
 
 #include <gmock/gmock.h>
 
-#include "platform/sha256_hash.h"
-#include "platform/value.h"
-#include "sim/host.h"
+#include "vrx/platform/sha256_hash.h"
+#include "vrx/platform/value.h"
+#include "vrx/sim/host.h"
 
 namespace vrx::platform {
 namespace {

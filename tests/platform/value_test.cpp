@@ -1,13 +1,13 @@
 // Property values: equality, types and depth; numbers out of texts; what a decoded value may hold.
-#include "platform/value.h"
+#include "vrx/platform/value.h"
 
 #include <gtest/gtest.h>
 
 #include <cmath>
 #include <limits>
 
-#include "platform/keyed_archiver.h"
-#include "platform/number_text.h"
+#include "vrx/platform/keyed_archiver.h"
+#include "vrx/platform/number_text.h"
 
 namespace vrx::platform {
 namespace {

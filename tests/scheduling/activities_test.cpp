@@ -1,13 +1,13 @@
 // The activities one by one: what a run decides, and how it ends.
 #include <gmock/gmock.h>
 
-#include "devices/device.h"
-#include "followup/follow_up.h"
 #include "scheduling/agent_world.h"
-#include "scheduling/follow_up_post.h"
-#include "scheduling/follow_up_refresh.h"
-#include "scheduling/scheduler.h"
-#include "service/agent.h"
+#include "vrx/devices/records/device.h"
+#include "vrx/followup/follow_up.h"
+#include "vrx/scheduling/follow_up_post.h"
+#include "vrx/scheduling/follow_up_refresh.h"
+#include "vrx/scheduling/scheduler.h"
+#include "vrx/service/agent.h"
 
 namespace vrx {
 namespace {

@@ -4,9 +4,9 @@
 
 #include <gmock/gmock.h>
 
-#include "platform/vendor.h"
-#include "service/start_up.h"
-#include "sim/host.h"
+#include "vrx/platform/vendor.h"
+#include "vrx/service/start_up.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 

@@ -1,11 +1,11 @@
 // The rules for the next post and the next refresh. All times are days from now.
 #include <gtest/gtest.h>
 
-#include "devices/device_info.h"
-#include "platform/sha256_hash.h"
-#include "scheduling/post_date.h"
-#include "scheduling/refresh_date.h"
-#include "sim/host.h"
+#include "vrx/devices/records/device_info.h"
+#include "vrx/platform/sha256_hash.h"
+#include "vrx/scheduling/post_date.h"
+#include "vrx/scheduling/refresh_date.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {

@@ -1,9 +1,9 @@
 // The scheduler: what it registers with the system, and what a firing does.
-#include "scheduling/scheduler.h"
+#include "vrx/scheduling/scheduler.h"
 
 #include <gmock/gmock.h>
 
-#include "sim/host.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {

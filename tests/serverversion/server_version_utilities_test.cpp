@@ -1,9 +1,9 @@
 // Which protocol versions client and server share, wherever the server's come from.
-#include "serverversion/server_version_utilities.h"
+#include "vrx/serverversion/server_version_utilities.h"
 
 #include <gtest/gtest.h>
 
-#include "sim/host.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {

@@ -1,13 +1,13 @@
 // The requests of clients, on an agent with its default providers, and the check of who may make them.
-#include "service/agent.h"
+#include "vrx/service/agent.h"
 
 #include <gtest/gtest.h>
 
-#include "coverage/warranty.h"
-#include "devices/device_info.h"
-#include "service/register_defaults.h"
-#include "service/start_up.h"
-#include "sim/host.h"
+#include "vrx/coverage/records/warranty.h"
+#include "vrx/devices/records/device_info.h"
+#include "vrx/service/register_defaults.h"
+#include "vrx/service/start_up.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {

@@ -1,9 +1,9 @@
 // Which record answers a lookup: every policy against every state of the cached record.
 #include <gtest/gtest.h>
 
-#include "coverage/warranty.h"
-#include "service/agent.h"
-#include "sim/host.h"
+#include "vrx/coverage/records/warranty.h"
+#include "vrx/service/agent.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {

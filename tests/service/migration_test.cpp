@@ -1,9 +1,9 @@
 // The one-time move from the older single-device layout, at start.
 #include <gtest/gtest.h>
 
-#include "coverage/warranty.h"
-#include "service/start_up.h"
-#include "sim/host.h"
+#include "vrx/coverage/records/warranty.h"
+#include "vrx/service/start_up.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {

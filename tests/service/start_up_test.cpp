@@ -1,9 +1,9 @@
 // What start-up does, in its order, and once in the life of an installation.
-#include "service/start_up.h"
+#include "vrx/service/start_up.h"
 
 #include <gmock/gmock.h>
 
-#include "sim/host.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {

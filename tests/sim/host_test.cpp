@@ -1,5 +1,5 @@
 // The simulated facilities: scripted answers and faults, and what is recorded of their use.
-#include "sim/host.h"
+#include "vrx/sim/host.h"
 
 #include <gmock/gmock.h>
 

@@ -1,7 +1,7 @@
 // The simulated process: what its end takes, and when it ends by itself.
 #include <gmock/gmock.h>
 
-#include "sim/host.h"
+#include "vrx/sim/host.h"
 
 namespace vrx::sim {
 namespace {

@@ -1,7 +1,7 @@
 // What a test writer relies on: order, virtual time, tasks that wait.
 #include <gmock/gmock.h>
 
-#include "sim/host.h"
+#include "vrx/sim/host.h"
 
 namespace vrx::sim {
 namespace {

@@ -1,9 +1,9 @@
 // Where an application is found, and what a client is told of it.
-#include "support/orvane_support_manager.h"
+#include "vrx/support/orvane_support_manager.h"
 
 #include <gtest/gtest.h>
 
-#include "sim/host.h"
+#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {

@@ -1,4 +1,4 @@
-#include "wire/encoding.h"
+#include "vrx/wire/encoding.h"
 
 #include <gtest/gtest.h>
 

@@ -1,4 +1,4 @@
-#include "wire/locations.h"
+#include "vrx/wire/locations.h"
 
 #include <gtest/gtest.h>
 

@@ -7,7 +7,7 @@
 
 #include <stdexcept>
 
-#include "wire/message.h"
+#include "vrx/wire/message.h"
 
 namespace vrx::test {
 

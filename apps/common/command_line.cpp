@@ -1,0 +1,206 @@
+#include "common/command_line.h"
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <cmath>
+#include <cstdio>
+#include <cstring>
+#include <filesystem>
+
+#include "common/manual.h"
+#include "vrx/codec/core/unicode.h"
+#include "vrx/codec/json.h"
+
+namespace vrx::apps {
+
+using platform::Dictionary;
+using platform::Value;
+
+namespace {
+
+// Of the document; raised when a program that reads it would have to change.
+constexpr int documentVersion = 1;
+
+const char* kindOf(ExitCode code) {
+    switch (code) {
+        case ExitCode::Done: return "done";
+        case ExitCode::NoAnswer: return "no-answer";
+        case ExitCode::Usage: return "usage";
+        case ExitCode::NotReachable: return "not-reachable";
+        case ExitCode::Refused: return "refused";
+        case ExitCode::TimedOut: return "timed-out";
+    }
+    return "";
+}
+
+// Control characters, and those that break lines or turn the direction of text.
+bool steersTerminal(char32_t character) {
+    return character < 0x20 || (character >= 0x7f && character < 0xa0) || character == 0x061c || character == 0x200e ||
+           character == 0x200f || (character >= 0x2028 && character <= 0x202e) ||
+           (character >= 0x2066 && character <= 0x2069);
+}
+
+std::string escaped(const char* format, unsigned number) {
+    std::array<char, 16> text;
+    const int size = std::snprintf(text.data(), text.size(), format, number);
+    return {text.data(), static_cast<std::size_t>(size)};
+}
+
+std::size_t characters(std::string_view text) {
+    return static_cast<std::size_t>(
+        std::count_if(text.begin(), text.end(), [](char byte) { return (byte & 0xc0) != 0x80; }));
+}
+
+bool hasFlag(int argc, const char* const* argv, const std::string& flag) {
+    return std::any_of(argv + 1, argv + argc,
+                       [&](std::string_view argument) { return argument == flag || argument == flag + "=true"; });
+}
+
+}  // namespace
+
+Outcome failed(ExitCode code, std::string problem, std::string advice, std::string kind) {
+    return {.code = code, .problem = std::move(problem), .advice = std::move(advice), .kind = std::move(kind)};
+}
+
+std::string printable(std::string_view text) {
+    std::string result;
+    while (!text.empty()) {
+        const std::string_view before = text;
+        const std::optional<char32_t> character = codec::takeCharacter(text);
+        if (!character) {
+            result += escaped("\\x%02x", static_cast<unsigned char>(text.front()));
+            text.remove_prefix(1);
+        } else if (steersTerminal(*character)) {
+            result += escaped("\\u{%x}", *character);
+        } else {
+            result += before.substr(0, before.size() - text.size());
+        }
+    }
+    return result;
+}
+
+std::string printableValue(const Value& value) {
+    if (const std::string* text = value.asString()) return printable(*text);
+    if (value.asDate() || value.isNull()) return printable(value.description());
+    return printable(codec::printedJson(value, codec::JsonLayout::OneLine));
+}
+
+std::string absolutePath(const std::string& path) {
+    std::string result = std::filesystem::absolute(path).lexically_normal();
+    while (result.size() > 1 && result.ends_with('/')) result.pop_back();
+    return result;
+}
+
+void addTimeout(CLI::App& app, double& seconds, const std::string& help) {
+    const auto check = [](const std::string& text) {
+        double number = 0;
+        const bool isNumber = CLI::detail::lexical_cast(text, number);
+        return isNumber && std::isfinite(number) && number > 0 ? "" : "'" + text + "' is no number of seconds above 0";
+    };
+    app.add_option("--timeout", seconds, help)->type_name("SECONDS")->check(check, "")->capture_default_str();
+}
+
+std::string secondsText(double seconds) {
+    return Value(seconds).description() + " s";
+}
+
+std::string table(const std::vector<std::vector<std::string>>& rows) {
+    std::vector<std::size_t> widths;
+    std::vector<std::vector<std::string>> cells;
+    for (const auto& row : rows) {
+        widths.resize(std::max(widths.size(), row.size()));
+        std::vector<std::string>& line = cells.emplace_back();
+        for (std::size_t column = 0; column < row.size(); ++column) {
+            line.push_back(printable(row[column]));
+            widths[column] = std::max(widths[column], characters(line.back()));
+        }
+    }
+    std::string result;
+    for (const auto& line : cells) {
+        for (std::size_t column = 0; column < line.size(); ++column) {
+            result += line[column];
+            if (column + 1 < line.size()) result.append(widths[column] - characters(line[column]) + 2, ' ');
+        }
+        result.erase(result.find_last_not_of(' ') + 1);
+        result += '\n';
+    }
+    return result;
+}
+
+CommandLine::CommandLine(const std::string& program, const std::string& purpose)
+    : app_(purpose, program), program_(program) {
+    app_.require_subcommand(1);
+    app_.set_version_flag("--version", program + " " VRX_VERSION);
+    app_.add_flag("--json", isJson_, "Print one JSON document instead of text")->disable_flag_override();
+    addManualOption(app_);
+    app_.footer("Exit codes: 0 done, 1 no answer, 2 usage, 3 not reachable, 4 refused, 5 timed out.");
+}
+
+CLI::App* CommandLine::add(const std::string& name, const std::string& help, Verb verb, CLI::App* group) {
+    CLI::App* app = (group ? group : &app_)->add_subcommand(name, help)->fallthrough();
+    app->callback([this, app, verb = std::move(verb)] {
+        if (app->get_subcommands().empty()) chosen_ = verb;
+    });
+    return app;
+}
+
+CLI::App* CommandLine::addGroup(const std::string& name, const std::string& help) {
+    return app_.add_subcommand(name, help)->fallthrough()->require_subcommand(1);
+}
+
+int CommandLine::run(int argc, const char* const* argv) {
+    // Also where reading ends before it comes to the flag.
+    isJson_ = hasFlag(argc, argv, "--json");
+    isWatch_ = hasFlag(argc, argv, "--watch");
+    return report(read(argc, argv));
+}
+
+Outcome CommandLine::read(int argc, const char* const* argv) {
+    try {
+        app_.parse(argc, argv);
+        return chosen_();
+    } catch (const CLI::CallForHelp&) {
+        return {.document = {{"help", app_.help()}}, .text = app_.help()};
+    } catch (const CLI::CallForVersion& version) {
+        return {.document = {{"release", VRX_VERSION}}, .text = version.what() + std::string("\n")};
+    } catch (const CLI::Success&) {  // the option has printed what it gives
+        return {.isShown = true};
+    } catch (const CLI::ParseError& error) {
+        return failed(ExitCode::Usage, error.what(), "See " + program_ + " --help.");
+    } catch (const std::exception& error) {
+        return failed(ExitCode::NoAnswer, error.what(),
+                      "Try again; what stays so is a fault of " + program_ + ", or of the machine.", "failed");
+    }
+}
+
+bool CommandLine::show(const Outcome& outcome) const {
+    if (isJson_) {
+        Dictionary document = outcome.document;
+        document["version"] = documentVersion;
+        document["ok"] = outcome.code == ExitCode::Done;
+        if (outcome.code != ExitCode::Done)
+            document["error"] = Dictionary{{"kind", outcome.kind.empty() ? kindOf(outcome.code) : outcome.kind},
+                                           {"message", outcome.problem},
+                                           {"advice", outcome.advice}};
+        const auto layout = isWatch_ ? codec::JsonLayout::OneLine : codec::JsonLayout::Indented;
+        std::puts(codec::printedJson(document, layout).c_str());
+    } else {
+        std::fputs(outcome.text.c_str(), stdout);
+    }
+    return std::fflush(stdout) == 0 && std::ferror(stdout) == 0;
+}
+
+int CommandLine::report(const Outcome& outcome) const {
+    const bool isWritten = outcome.isShown || show(outcome);
+    const int error = errno;
+    const int code = static_cast<int>(outcome.code);
+    if (!outcome.problem.empty())
+        std::fprintf(stderr, "%s: %s\n", program_.c_str(), printable(outcome.problem).c_str());
+    if (!outcome.advice.empty()) std::fprintf(stderr, "%s\n", printable(outcome.advice).c_str());
+    if (isWritten) return code;
+    std::fprintf(stderr, "%s: standard output cannot be written: %s\n", program_.c_str(), std::strerror(error));
+    return code ? code : static_cast<int>(ExitCode::NoAnswer);
+}
+
+}  // namespace vrx::apps

@@ -1,0 +1,100 @@
+// vrxagent: the agent. Serves its clients until SIGTERM or SIGINT. Once it is to start anew and nothing is under way,
+// it ends for its service manager to start it again, or, when it was started by hand, executes itself. Exit codes: 0
+// ended cleanly, 1 could not start or go on, 2 usage.
+#include <sys/prctl.h>
+#include <systemd/sd-daemon.h>
+
+#include <CLI/CLI.hpp>
+#include <cstdio>
+#include <exception>
+#include <map>
+#include <optional>
+
+#include "common/command_line.h"
+#include "common/manual.h"
+#include "vrx/host/host.h"
+#include "vrx/host/ipc/bundle_lookup.h"
+#include "vrx/host/ipc/service_listener.h"
+#include "vrx/host/restart.h"
+#include "vrx/platform/log.h"
+#include "vrx/service/start_up.h"
+#include "vrx/wire/locations.h"
+
+namespace {
+
+using vrx::host::BundleLookup;
+using vrx::host::HomeUse;
+using vrx::host::Host;
+using vrx::host::ServiceListenerFactory;
+using vrx::platform::Level;
+using vrx::platform::MaybeError;
+
+int cannotStart(const std::string& why) {
+    std::fprintf(stderr, "vrxagent: %s\n", vrx::apps::printable(why).c_str());
+    return 1;
+}
+
+// What the next program of this process takes over.
+struct HandOver {
+    vrx::host::PassedSocket socket;
+    vrx::host::Descriptor homeLock;
+};
+
+// Fills in what is to be handed over when the agent is to be executed again.
+int serve(const vrx::wire::Locations& places, Level logLevel, std::optional<HandOver>& handOver) {
+    // A capability that the service manager gave is for the agent alone, not for the programs that it starts.
+    prctl(PR_CAP_AMBIENT, PR_CAP_AMBIENT_CLEAR_ALL, 0, 0, 0);
+    Host host({.home = vrx::apps::absolutePath(places.home.path), .profile = places.profile.path}, logLevel);
+    if (MaybeError error = host.open(HomeUse::Agent)) return cannotStart(error->text);
+    BundleLookup bundles([&] { return host.profile().facts(); });
+    ServiceListenerFactory factory(host.mainLoop().event(), bundles, host.lifecycle());
+    if (MaybeError error = factory.open(places.socket.path)) return cannotStart(error->text);
+    host.setBundleLookup(&bundles);
+    host.setServiceListenerFactory(&factory);
+
+    const vrx::StartUp startUp;
+    host.start(VRX_VERSION);
+    log(Level::Default, "ready: home %@, profile %@, socket %@", host.home(), places.profile.path, places.socket.path);
+    sd_notify(0, "READY=1");
+    host.mainLoop().run();
+    const bool isToBeExecuted =
+        host.lifecycle().isEnding() && !host.mainLoop().wasStoppedBySignal() && !vrx::host::isUnderServiceManager();
+    if (isToBeExecuted)
+        handOver = {factory.release(), host.releaseHomeLock()};
+    else
+        sd_notify(0, "STOPPING=1");
+    return 0;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    const vrx::host::Restart restart;
+    CLI::App app("Keeps track of the hardware coverage of this device and its paired watches.", "vrxagent");
+    vrx::wire::LocationOverrides places;
+    Level logLevel = Level::Default;
+    const std::map<std::string, Level> levels{
+        {"debug", Level::Debug}, {"default", Level::Default}, {"error", Level::Error}};
+    app.add_option("--home", places.home, "Where settings and cached records are kept")->type_name("PATH");
+    app.add_option("--device", places.profile, "The device profile")->type_name("PATH");
+    app.add_option("--socket", places.socket, "The socket at which clients connect")->type_name("PATH");
+    app.add_option("--log-level", logLevel, "The lowest level that is logged: debug, default or error")
+        ->type_name("LEVEL")
+        ->transform(CLI::CheckedTransformer(levels).description(""));
+    app.set_version_flag("--version", "vrxagent " VRX_VERSION);
+    vrx::apps::addManualOption(app);
+    try {
+        app.parse(argc, argv);
+    } catch (const CLI::ParseError& error) {
+        return app.exit(error) == 0 ? 0 : 2;
+    }
+    try {
+        std::optional<HandOver> handOver;
+        const int code = serve(vrx::wire::findLocations(places), logLevel, handOver);
+        if (!handOver) return code;
+        restart.execute(argv, std::move(handOver->socket), std::move(handOver->homeLock));
+        return cannotStart("cannot execute the agent again");
+    } catch (const std::exception& error) {
+        return cannotStart(error.what());
+    }
+}

@@ -1,0 +1,353 @@
+// vrxctl: asks the agent, one verb for each of its operations.
+#include <charconv>
+#include <map>
+
+#include "common/command_line.h"
+#include "common/progress.h"
+#include "vrx/client/agent_connection.h"
+#include "vrx/platform/text.h"
+
+namespace vrx::apps {
+namespace {
+
+using client::AgentConnection;
+using client::Answer;
+using client::Failure;
+using platform::Array;
+using platform::Date;
+using platform::Dictionary;
+using platform::Value;
+
+template <class T>
+Value valueOf(const std::optional<T>& value) {
+    return value ? Value(*value) : Value();
+}
+
+std::string textOf(const std::optional<Date>& date) {
+    return date ? platform::describe(*date) : "unknown";
+}
+
+// For programs.
+
+Value documentOf(const VRXDevice* device) {
+    if (!device) return nullptr;
+    return Dictionary{{"name", valueOf(device->name())},
+                      {"serialNumber", valueOf(device->serialNumber())},
+                      {"activationDate", valueOf(device->activationDate())},
+                      {"deviceType", device->deviceType()},
+                      {"deviceTypeString", device->deviceTypeString()}};
+}
+
+Value derivedFrom(const VRXWarranty& record) {
+    return Dictionary{{"daysEligible", record.daysEligible()},
+                      {"qxLocalizedOfferDesc", record.qxLocalizedOfferDesc()},
+                      {"qxLocalizedOfferDetailsEligibility", record.qxLocalizedOfferDetailsEligibility()},
+                      {"coverageEndDate", valueOf(record.coverageEndDate())},
+                      {"qxOfferDisplayDate", valueOf(record.qxOfferDisplayDate())},
+                      {"qxOfferEligibleUntil", valueOf(record.qxOfferEligibleUntil())},
+                      {"qxOfferFollowupDisplayDate", valueOf(record.qxOfferFollowupDisplayDate())}};
+}
+
+Dictionary documentOf(const VRXDeviceInfo& info) {
+    const auto record = info.warranty();
+    return {{"device", documentOf(info.device().get())},
+            {"coverage", record ? record->dictionaryRepresentation() : Value()},
+            {"derived", record ? derivedFrom(*record) : Value()}};
+}
+
+// For people.
+
+std::vector<std::string> rowOf(const VRXDevice* device) {
+    if (!device) return {"(unknown)", "", "", ""};
+    return {device->name().value_or("(no name)"), device->serialNumber().value_or("(no serial number)"),
+            device->deviceTypeString(), textOf(device->activationDate())};
+}
+
+const std::vector<std::string> deviceHeading{"NAME", "SERIAL NUMBER", "TYPE", "ACTIVATED"};
+
+std::string coverageText(const VRXWarranty& record) {
+    if (!record.covered()) return "not covered";
+    return record.coverageEndDate() ? "covered until " + textOf(record.coverageEndDate()) : "covered";
+}
+
+std::string offerText(const VRXWarranty& record) {
+    if (!record.qxOfferEligible()) return "none";
+    return "until " + textOf(record.qxOfferEligibleUntil()) + ", days left: " + std::to_string(record.daysEligible());
+}
+
+// An entry of a list, whose form is the server's affair: of a dictionary the values, such as "Repairs: at no cost".
+std::string entryText(const Value& entry) {
+    const Dictionary* parts = entry.asDictionary();
+    if (!parts) return printableValue(entry);
+    std::string text;
+    for (const auto& [key, part] : *parts) text += (text.empty() ? "" : ": ") + printableValue(part);
+    return text;
+}
+
+std::string textOf(const VRXWarranty& record) {
+    std::string text;
+    auto line = [&](const std::string& name, const std::string& content) {
+        text += "  " + name + std::string(name.size() < 14 ? 14 - name.size() : 1, ' ') + content + "\n";
+    };
+    auto sent = [&](const std::string& name, const Value& value) {
+        if (!value.isNull()) line(name, printableValue(value));
+    };
+    line("Coverage", coverageText(record));
+    sent("Label", record.coverageLocalizedLabel());
+    sent("Description", record.coverageLocalizedDesc());
+    sent("Expiration", record.coverageLocalizedExpirationLabel());
+    if (const Array* details = record.coverageDetailsArray().asArray())
+        for (const Value& detail : *details) line("Detail", entryText(detail));
+    if (const Array* benefits = record.benefitDetailsArray().asArray())
+        for (const Value& benefit : *benefits) line("Benefit", entryText(benefit));
+    line("Offer", offerText(record));
+    if (record.qxOfferEligible()) {
+        sent("Offer label", record.qxLocalizedOfferLabel());
+        sent("Offer text", record.qxLocalizedOfferDesc());
+        sent("Offer period", record.qxLocalizedOfferDetailsEligibility());
+    }
+    return text;
+}
+
+// The verbs.
+
+constexpr const char* seeLog = "The agent's log says why.";
+
+const char* adviceFor(Failure::Refusal refusal) {
+    switch (refusal) {
+        case Failure::Refusal::Entitlement:
+            return "A bundle.toml in the program's folder, or above, grants it, if nobody but root and the agent's "
+                   "user can write there; vrxhost doctor checks that for vrxctl.";
+        case Failure::Refusal::Limit: return "Try again once fewer programs ask at a time.";
+        case Failure::Refusal::Argument: break;
+    }
+    return "Correct the argument; vrxctl --help tells what is wanted.";
+}
+
+// What the agent answered, shown; or why it did not.
+template <class T, class Show>
+Outcome outcomeOf(const AgentConnection& agent, const Answer<T>& answer, Show show) {
+    if (answer) return show(*answer);
+    const Failure& failure = answer.failure();
+    switch (failure.kind) {
+        case Failure::Kind::NotReachable:
+            return failed(ExitCode::NotReachable, failure.text,
+                          "Is vrxagent running with the socket " + agent.socketPath() +
+                              "? Start it: systemctl --user start vrxagent; or name its socket with --socket. vrxhost "
+                              "doctor tells what is wrong.");
+        case Failure::Kind::Refused: return failed(ExitCode::Refused, failure.text, adviceFor(failure.refusal));
+        case Failure::Kind::TimedOut:
+            return failed(ExitCode::TimedOut, failure.text + ": " + secondsText(agent.timeLimit().count()),
+                          "The agent may still do what was asked. Try again, or give it longer with --timeout; its log "
+                          "says what it does.");
+        case Failure::Kind::BadReply: break;
+    }
+    return failed(ExitCode::NoAnswer, failure.text, "Use a vrxctl of the agent's own release.", "bad-reply");
+}
+
+Outcome device(AgentConnection& agent) {
+    return outcomeOf(agent, agent.defaultDevice(), [](const std::shared_ptr<VRXDevice>& device) {
+        if (!device) return failed(ExitCode::NoAnswer, "the agent knows no device", seeLog);
+        return Outcome{.document = {{"device", documentOf(device.get())}},
+                       .text = table({deviceHeading, rowOf(device.get())})};
+    });
+}
+
+Outcome paired(AgentConnection& agent) {
+    return outcomeOf(agent, agent.pairedDevices(), [](const DeviceList& devices) {
+        Array documents;
+        std::vector<std::vector<std::string>> rows{deviceHeading};
+        for (const auto& device : devices) {
+            documents.push_back(documentOf(device.get()));
+            rows.push_back(rowOf(device.get()));
+        }
+        return Outcome{.document = {{"devices", documents}},
+                       .text = devices.empty() ? "No paired watch.\n" : table(rows)};
+    });
+}
+
+Outcome info(AgentConnection& agent, const std::optional<std::string>& serialNumber, VRXWarrantyLookupPolicy policy) {
+    const auto answer = serialNumber ? agent.getDeviceInfoForSerialNumber(*serialNumber, policy)
+                                     : agent.getDefaultDeviceInfoUsingPolicy(policy);
+    return outcomeOf(agent, answer, [&](const std::shared_ptr<VRXDeviceInfo>& info) {
+        if (!info) return failed(ExitCode::NoAnswer, "the agent gives nothing for this device", seeLog);
+        Outcome outcome{.document = documentOf(*info), .text = table({deviceHeading, rowOf(info->device().get())})};
+        if (const auto record = info->warranty()) {
+            outcome.text += textOf(*record);
+            return outcome;
+        }
+        outcome.code = ExitCode::NoAnswer;
+        outcome.problem = "there is no coverage record for this device";
+        outcome.advice = policy == VRXWarrantyLookupPolicyRefresh
+                             ? "It could not be downloaded; the agent's log says why."
+                             : "None is cached, or it is not valid any more. Try --policy refresh; where that fails, "
+                               "the agent's log says why.";
+        return outcome;
+    });
+}
+
+Outcome all(AgentConnection& agent, VRXWarrantyLookupPolicy policy, bool updateFollowUps) {
+    const auto answer = agent.getAllDeviceInfosUsingPolicy(policy, updateFollowUps);
+    return outcomeOf(agent, answer, [](const DeviceInfoList& infos) {
+        Array documents;
+        std::vector<std::vector<std::string>> rows{{"NAME", "SERIAL NUMBER", "TYPE", "COVERAGE", "OFFER"}};
+        for (const auto& info : infos) {
+            if (!info) continue;
+            documents.emplace_back(documentOf(*info));
+            std::vector<std::string>& row = rows.emplace_back(rowOf(info->device().get()));
+            const auto record = info->warranty();
+            row.back() = record ? coverageText(*record) : "no record";
+            row.push_back(record ? offerText(*record) : "");
+        }
+        return Outcome{.document = {{"devices", documents}}, .text = infos.empty() ? "No device.\n" : table(rows)};
+    });
+}
+
+Outcome outreach(AgentConnection& agent) {
+    return outcomeOf(agent, agent.scheduleOutreachWithReply(), [](bool isScheduled) {
+        if (!isScheduled)
+            return failed(ExitCode::NoAnswer, "the agent schedules no outreach",
+                          "Use a vrxctl of the agent's own release.");
+        return Outcome{
+            .document = {{"scheduled", true}},
+            .text = "An outreach begins in a second, once the network is there; vrxhost activities shows it.\n"};
+    });
+}
+
+// The agent says that it has done so, whatever became of it.
+Outcome dismiss(AgentConnection& agent, const std::string& serialNumber) {
+    return outcomeOf(agent, agent.dismissFollowUpForSerialNumber(serialNumber), [&](bool isDone) {
+        if (!isDone) return failed(ExitCode::NoAnswer, "the agent did not dismiss the follow-up", seeLog);
+        return Outcome{.document = {{"serialNumber", serialNumber}}};
+    });
+}
+
+// What the agent tells of an application. Entries that it doesn't give, or that are empty, are left out.
+Outcome availability(const Value& answer, const std::string& problem) {
+    Outcome outcome;
+    if (!answer["AppAvailabilityType"].isNumber())
+        outcome = failed(ExitCode::NoAnswer, problem,
+                         "The agent's log says why; [store] in the device profile names the addresses that it asks.");
+    outcome.document = {{"availability", answer}};
+    constexpr std::array<std::pair<const char*, const char*>, 6> lines{{{"Application", "AppBundleID"},
+                                                                        {"Title", "AppTitleKey"},
+                                                                        {"Vendor", "AppVendorName"},
+                                                                        {"Link", "AppLinkURL"},
+                                                                        {"Icon", "AppIconURL"},
+                                                                        {"Availability", "AppAvailablityText"}}};
+    std::vector<std::vector<std::string>> rows;
+    for (const auto& [label, key] : lines)
+        if (const std::string* text = answer[key].asString(); text && !text->empty()) rows.push_back({label, *text});
+    if (answer["AppAvailabilityType"] == Value(0)) rows.push_back({"Availability", "none"});
+    outcome.text = table(rows);
+    return outcome;
+}
+
+Outcome store(AgentConnection& agent, const std::string& bundleIdentifier) {
+    return outcomeOf(agent, agent.checkIsAvailableInStore(bundleIdentifier),
+                     [](const Value& answer) { return availability(answer, "the Marketplace could not be asked"); });
+}
+
+Outcome support(AgentConnection& agent, const std::string& bundleIdentifier) {
+    return outcomeOf(agent, agent.appSupportAvailability(bundleIdentifier), [](const Value& answer) {
+        return availability(answer,
+                            "the application is neither installed nor purchased, and the Marketplace could not be "
+                            "asked");
+    });
+}
+
+Outcome webUrl(AgentConnection& agent) {
+    return outcomeOf(agent, agent.readWebURLOverride(), [](const std::optional<std::string>& url) {
+        return Outcome{.document = {{"webURL", valueOf(url)}},
+                       .text = url ? printable(*url) + "\n" : "No web-flow URL is set in place of the usual one.\n"};
+    });
+}
+
+// The options.
+
+struct Options {
+    std::string socket;
+    double timeout = client::ConnectionOptions{}.timeLimit.count();
+    VRXWarrantyLookupPolicy policy = VRXWarrantyLookupPolicyDefault;
+    std::optional<std::string> serialNumber;
+    std::string bundleIdentifier;
+    bool updateFollowUps = false;
+
+    client::ConnectionOptions connection() const {
+        client::ConnectionOptions options;
+        options.socketPath = socket;
+        options.timeLimit = platform::Duration(timeout);
+        return options;
+    }
+};
+
+void addPolicy(CLI::App* verb, Options& options) {
+    auto read = [&options](const std::string& text) {
+        static const std::map<std::string, VRXWarrantyLookupPolicy> names{{"default", VRXWarrantyLookupPolicyDefault},
+                                                                          {"cached", VRXWarrantyLookupPolicyCachedOnly},
+                                                                          {"refresh", VRXWarrantyLookupPolicyRefresh}};
+        if (auto name = names.find(text); name != names.end()) {
+            options.policy = name->second;
+            return;
+        }
+        const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), options.policy);
+        if (error != std::errc() || end != text.data() + text.size())
+            throw CLI::ValidationError("--policy", "'" + text + "' is neither default, cached, refresh nor a number");
+    };
+    verb->add_option_function<std::string>("--policy", read,
+                                           "Where the record may come from: default (the cache while it is fresh), "
+                                           "cached, refresh, or a number")
+        ->type_name("POLICY");
+}
+
+int run(int argc, const char* const* argv) {
+    CommandLine line("vrxctl", "Asks the coverage agent about this device and its paired watches.");
+    Options options;
+    line.app()
+        .add_option("--socket", options.socket, "The agent's socket")
+        ->type_name("PATH")
+        ->check([](const std::string& path) { return path.empty() ? "a path is needed" : ""; }, "");
+    addTimeout(line.app(), options.timeout, "How long to wait for an answer");
+
+    auto asking = [&options](auto verb) {
+        return [&options, verb] {
+            AgentConnection agent(options.connection());
+            const Progress progress("waiting for the agent…");
+            return verb(agent);
+        };
+    };
+    line.add("device", "Shows this device", asking(device));
+    line.add("paired", "Lists the paired watches", asking(paired));
+    CLI::App* infoVerb =
+        line.add("info", "Shows a device and its coverage record",
+                 asking([&](AgentConnection& agent) { return info(agent, options.serialNumber, options.policy); }));
+    infoVerb->add_option("SERIAL", options.serialNumber, "Serial number; of this device when left out");
+    addPolicy(infoVerb, options);
+    CLI::App* allVerb =
+        line.add("all", "Lists all devices with their coverage",
+                 asking([&](AgentConnection& agent) { return all(agent, options.policy, options.updateFollowUps); }));
+    allVerb->add_flag("--update-follow-ups", options.updateFollowUps, "Bring the shown follow-ups up to date as well")
+        ->disable_flag_override();
+    addPolicy(allVerb, options);
+    line.add("dismiss", "Dismisses the follow-up of a device for good",
+             asking([&](AgentConnection& agent) { return dismiss(agent, *options.serialNumber); }))
+        ->add_option("SERIAL", options.serialNumber, "Serial number")
+        ->required();
+    line.add("outreach", "Has the agent look for offers now", asking(outreach));
+    auto addBundle = [&options](CLI::App* verb) {
+        verb->add_option("BUNDLE", options.bundleIdentifier, "The application's bundle identifier")->required();
+    };
+    addBundle(line.add("store", "Tells whether the Marketplace offers an application",
+                       asking([&](AgentConnection& agent) { return store(agent, options.bundleIdentifier); })));
+    addBundle(line.add("support", "Tells whether an application is installed, purchased or offered",
+                       asking([&](AgentConnection& agent) { return support(agent, options.bundleIdentifier); })));
+    line.add("web-url", "Shows the web-flow URL that a tester has set", asking(webUrl));
+    return line.run(argc, argv);
+}
+
+}  // namespace
+}  // namespace vrx::apps
+
+int main(int argc, char** argv) {
+    return vrx::apps::run(argc, argv);
+}

@@ -1,0 +1,44 @@
+// A device with its coverage record, either of which may be absent: what crosses the IPC boundary and reaches
+// activities and follow-ups. Shared by reference; each property is read and replaced whole, from any thread.
+#pragma once
+
+#include <memory>
+#include <string>
+
+#include "vrx/coverage/records/warranty.h"
+#include "vrx/devices/records/device.h"
+#include "vrx/platform/property.h"
+
+namespace vrx {
+
+class VRXDeviceInfo final : public platform::Archivable {
+public:
+    static constexpr std::string_view archiveClassName = "VRXDeviceInfo";
+
+    VRXDeviceInfo(std::shared_ptr<VRXDevice> device, std::shared_ptr<VRXWarranty> warranty);
+    static std::shared_ptr<VRXDeviceInfo> deviceInfoWithDevice(std::shared_ptr<VRXDevice> device,
+                                                               std::shared_ptr<VRXWarranty> warranty);
+
+    std::shared_ptr<VRXDevice> device() const { return device_.get(); }
+    void setDevice(std::shared_ptr<VRXDevice> device) { device_.set(std::move(device)); }
+    // Null, which is usual, when no record was cached or downloaded.
+    std::shared_ptr<VRXWarranty> warranty() const { return warranty_.get(); }
+    void setWarranty(std::shared_ptr<VRXWarranty> warranty) { warranty_.set(std::move(warranty)); }
+
+    // The same device object and equal records. Infos that lack a device or a record are not equal, not even to
+    // themselves: there is nothing by which to tell. An object of another class is equal only if it is this very
+    // object.
+    bool isEqual(const platform::Archivable* other) const;
+    std::string description() const;
+
+    static constexpr bool supportsSecureCoding = true;
+    std::string_view className() const override { return archiveClassName; }
+    void encodeWithCoder(platform::KeyedEncoder& coder) const override;
+    static std::shared_ptr<VRXDeviceInfo> initWithCoder(platform::KeyedDecoder& coder);
+
+private:
+    platform::Property<std::shared_ptr<VRXDevice>> device_;
+    platform::Property<std::shared_ptr<VRXWarranty>> warranty_;
+};
+
+}  // namespace vrx

@@ -1,0 +1,224 @@
+#include "vrx/host/account/credential_helper.h"
+
+#include <fcntl.h>
+#include <poll.h>
+#include <signal.h>
+#include <spawn.h>
+#include <sys/mman.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <chrono>
+#include <cstdlib>
+#include <cstring>
+
+#include "vrx/host/account/credentials.h"
+#include "vrx/host/base/descriptor.h"
+#include "vrx/host/base/files.h"
+
+namespace vrx::host {
+
+using platform::Duration;
+using platform::Error;
+using platform::MaybeError;
+using platform::Result;
+
+namespace {
+
+using SteadyClock = std::chrono::steady_clock;
+
+constexpr std::size_t answerBytes = 64 * 1024;
+
+std::string questionText(const CredentialQuestion& question) {
+    std::string text = "account=" + question.account + "\n";
+    if (question.altDSID) text += "altdsid=" + *question.altDSID + "\n";
+    return text + "service=" + question.service + "\navoid_ui=" + (question.avoidsUI ? "1" : "0") + "\n\n";
+}
+
+// A file in memory, read from its beginning: unlike a pipe it never has to be waited for, however little the helper
+// reads of it.
+Descriptor inputFile(const std::string& text) {
+    Descriptor file(memfd_create("credential-question", MFD_CLOEXEC));
+    if (file && pwrite(file.number(), text.data(), text.size(), 0) != static_cast<ssize_t>(text.size()))
+        return Descriptor();
+    return file;
+}
+
+Error cannotStart(const std::string& program, int number) {
+    return credentialError(CredentialFailure::NotStarted,
+                           "the credential helper " + program + " cannot be run: " + std::strerror(number));
+}
+
+// The helper and its process group, which end with the object.
+class Helper {
+public:
+    Helper() = default;
+    ~Helper() { end(); }
+    Helper(const Helper&) = delete;
+    Helper& operator=(const Helper&) = delete;
+
+    MaybeError start(const std::vector<std::string>& command, int input, int output);
+    int process() const { return process_.number(); }
+    // Kills what is left of the group; the helper's own status as waitpid gives it, -1 when it cannot be known.
+    int end();
+
+private:
+    pid_t identifier_ = -1;
+    Descriptor process_;
+};
+
+// The agent's threads keep signals blocked, and its descriptors are none of the helper's business.
+MaybeError Helper::start(const std::vector<std::string>& command, int input, int output) {
+    posix_spawn_file_actions_t files;
+    posix_spawn_file_actions_init(&files);
+    posix_spawn_file_actions_adddup2(&files, input, STDIN_FILENO);
+    posix_spawn_file_actions_adddup2(&files, output, STDOUT_FILENO);
+    posix_spawn_file_actions_addopen(&files, STDERR_FILENO, "/dev/null", O_WRONLY, 0);
+    posix_spawn_file_actions_addclosefrom_np(&files, STDERR_FILENO + 1);
+
+    posix_spawnattr_t attributes;
+    posix_spawnattr_init(&attributes);
+    posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETPGROUP | POSIX_SPAWN_SETSIGMASK | POSIX_SPAWN_SETSIGDEF);
+    posix_spawnattr_setpgroup(&attributes, 0);
+    sigset_t signals;
+    sigemptyset(&signals);
+    posix_spawnattr_setsigmask(&attributes, &signals);
+    sigfillset(&signals);
+    posix_spawnattr_setsigdefault(&attributes, &signals);
+
+    std::vector<std::string> settings;
+    for (const char* name : {"PATH", "HOME", "LANG"})
+        if (const char* value = std::getenv(name)) settings.push_back(std::string(name) + "=" + value);
+    auto pointers = [](const std::vector<std::string>& texts) {
+        std::vector<char*> result;
+        result.reserve(texts.size() + 1);
+        for (const std::string& text : texts) result.push_back(const_cast<char*>(text.c_str()));
+        result.push_back(nullptr);
+        return result;
+    };
+    const int result = posix_spawn(&identifier_, command[0].c_str(), &files, &attributes, pointers(command).data(),
+                                   pointers(settings).data());
+    posix_spawnattr_destroy(&attributes);
+    posix_spawn_file_actions_destroy(&files);
+    if (result != 0) {
+        identifier_ = -1;
+        return cannotStart(command[0], result);
+    }
+    process_ = openProcess(identifier_);
+    if (!process_) return cannotStart(command[0], errno);
+    return std::nullopt;
+}
+
+int Helper::end() {
+    if (identifier_ < 0) return -1;
+    // Before the helper is waited for: until then nobody else can get its number. One that runs as another user may not
+    // be killed, and is not waited for.
+    kill(-identifier_, SIGKILL);
+    const int options = kill(identifier_, SIGKILL) == 0 ? 0 : WNOHANG;
+    int status = -1;
+    pid_t ended;
+    do ended = waitpid(identifier_, &status, options);
+    while (ended < 0 && errno == EINTR);
+    identifier_ = -1;
+    return ended > 0 ? status : -1;
+}
+
+// What the helper prints, as it comes.
+class Answer {
+public:
+    explicit Answer(int file) : file_(file) { fcntl(file, F_SETFL, O_NONBLOCK); }
+
+    // Takes what is there already; false once nothing more can come.
+    bool read() {
+        while (size_ < bytes_.bytes().size()) {
+            const ssize_t count = ::read(file_, bytes_.bytes().data() + size_, bytes_.bytes().size() - size_);
+            if (count < 0 && errno == EINTR) continue;
+            if (count <= 0) return count < 0 && errno == EAGAIN;
+            size_ += static_cast<std::size_t>(count);
+        }
+        return false;
+    }
+    bool isTooLong() const { return size_ > answerBytes; }
+    std::string_view text() const { return bytes_.text().substr(0, size_); }
+
+private:
+    const int file_;
+    Secret bytes_{platform::Data(answerBytes + 1)};
+    std::size_t size_ = 0;
+};
+
+// Reads until the helper has ended. Its children may keep its output open longer than that.
+MaybeError listen(const Helper& helper, int output, Answer& answer, Duration limit, int stopFile) {
+    const SteadyClock::time_point deadline = SteadyClock::now() + std::chrono::ceil<SteadyClock::duration>(limit);
+    std::array<pollfd, 3> files{{{helper.process(), POLLIN, 0}, {stopFile, POLLIN, 0}, {output, POLLIN, 0}}};
+    while (true) {
+        const auto left = std::chrono::ceil<std::chrono::milliseconds>(deadline - SteadyClock::now()).count();
+        const int ready = left > 0 ? poll(files.data(), files.size(), static_cast<int>(left)) : 0;
+        if (ready < 0) continue;  // EINTR
+        if (ready == 0) return credentialError(CredentialFailure::TimedOut, "the credential helper took too long");
+        if (files[1].revents) return credentialError(CredentialFailure::Ended, "the agent is ending");
+        // First, what it printed before it ended.
+        if (!answer.read()) files[2].fd = -1;
+        if (answer.isTooLong())
+            return credentialError(CredentialFailure::Answer, "the credential helper printed too much");
+        if (files[0].revents) return std::nullopt;
+    }
+}
+
+MaybeError statusError(int status) {
+    std::string how;
+    if (WIFSIGNALED(status))
+        how = "was ended by signal " + std::to_string(WTERMSIG(status));
+    else if (WEXITSTATUS(status) != 0)
+        how = "failed with status " + std::to_string(WEXITSTATUS(status));
+    else
+        return std::nullopt;
+    return credentialError(CredentialFailure::Status, "the credential helper " + how);
+}
+
+}  // namespace
+
+Error credentialError(CredentialFailure failure, std::string text) {
+    return Error{"credential", static_cast<int>(failure), std::move(text)};
+}
+
+Result<Secret> askCredentialHelper(const std::vector<std::string>& command, const CredentialQuestion& question,
+                                   Duration limit, int stopFile) {
+    const Descriptor input = inputFile(questionText(question));
+    int ends[2];
+    if (!input || pipe2(ends, O_CLOEXEC) != 0) return cannotStart(command[0], errno);
+    const Descriptor output(ends[0]);
+    Descriptor itsOutput(ends[1]);
+    Helper helper;
+    if (MaybeError error = helper.start(command, input.number(), itsOutput.number())) return *error;
+    itsOutput = Descriptor();
+
+    Answer answer(output.number());
+    if (MaybeError error = listen(helper, output.number(), answer, limit, stopFile)) return *error;
+    if (MaybeError error = statusError(helper.end())) return *error;
+    Result<std::string_view> token = tokenIn(answer.text());
+    if (!token) return token.error();
+    return Secret(platform::Data(token->begin(), token->end()));
+}
+
+Result<std::string_view> tokenIn(std::string_view answer) {
+    auto wrong = [](const char* what) {
+        return credentialError(CredentialFailure::Answer, std::string("the credential helper printed ") + what);
+    };
+    std::optional<std::string_view> token;
+    while (!answer.empty()) {
+        const std::string_view line = answer.substr(0, answer.find('\n'));
+        answer.remove_prefix(std::min(line.size() + 1, answer.size()));
+        if (line.empty()) break;
+        if (line.find('=') == line.npos) return wrong("a line that is not key=value");
+        if (line.starts_with("token=")) token = line.substr(6);
+    }
+    if (!token || token->empty()) return wrong("no token");
+    if (!isToken(*token)) return wrong("a token that is too long or holds more than visible characters");
+    return *token;
+}
+
+}  // namespace vrx::host

@@ -1,0 +1,67 @@
+// The background activities in host.db: what is scheduled, and how the last run of each went. Each operation is part of
+// the caller's transaction.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "vrx/host/home/database.h"
+#include "vrx/platform/activity_timing.h"
+
+namespace vrx::host {
+
+struct ScheduledActivity {
+    std::int64_t generation = 0;  // of this registration: random, so that no other has it, in no other file either
+    std::string identifier;
+    platform::ActivityCriteria criteria;
+    platform::DueTime due;
+    int deferrals = 0;  // results in a row that were no end
+};
+
+enum class RunOutcome {
+    Finished = 1,
+    Deferred = 2,
+    Interrupted = 3,  // by the end of the process
+};
+
+struct ActivityRun {
+    std::string identifier;
+    std::int64_t generation = 0;
+    platform::Date began;
+    std::optional<platform::Date> ended{};  // none: under way, or interrupted and not noticed yet
+    std::optional<RunOutcome> outcome{};
+};
+
+class ActivityRegistry {
+public:
+    explicit ActivityRegistry(Connection& connection) : connection_(connection) {}
+
+    // In the order of their due times.
+    std::vector<ScheduledActivity> scheduled();
+    std::optional<ScheduledActivity> scheduled(std::string_view identifier);
+    // In place of an earlier one of that identifier, with a generation of its own.
+    void schedule(std::string_view identifier, const platform::ActivityCriteria& criteria,
+                  const platform::DueTime& due);
+    void postpone(std::int64_t generation, const platform::DueTime& due, int deferrals);
+    void remove(std::int64_t generation);
+
+    // The last one of each identifier.
+    std::vector<ActivityRun> runs();
+    void beginRun(std::string_view identifier, std::int64_t generation, platform::Date now);
+    void endRun(std::string_view identifier, RunOutcome outcome, platform::Date now);
+
+private:
+    Connection& connection_;
+};
+
+// For tools beside the agent.
+struct ActivityList {
+    std::vector<ScheduledActivity> scheduled;
+    std::vector<ActivityRun> runs;
+};
+platform::Result<ActivityList> listActivities(Database& database);
+
+}  // namespace vrx::host

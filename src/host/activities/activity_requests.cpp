@@ -1,0 +1,80 @@
+#include "vrx/host/activities/activity_requests.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <chrono>
+#include <thread>
+
+#include "vrx/host/home/home_lock.h"
+
+namespace vrx::host {
+
+using platform::MaybeError;
+
+namespace {
+
+// Its being closed after writing is what the agent sees.
+void touch(const std::string& path) {
+    const int file = ::open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600);
+    if (file >= 0) ::close(file);
+}
+
+void removeRequest(Database& database, std::int64_t number) {
+    database.write([&](Connection& connection) {
+        connection.statement("DELETE FROM activity_requests WHERE number = ?").bind(0, number).step();
+    });
+}
+
+std::optional<FiringAnswer> answerTo(Database& database, std::int64_t number) {
+    std::optional<FiringAnswer> answer;
+    database.read([&](Connection& connection) {
+        Statement& query = connection.statement("SELECT answer FROM activity_requests WHERE number = ?");
+        if (query.bind(0, number).step() && query.type(0) != SQLITE_NULL)
+            answer = static_cast<FiringAnswer>(query.integer(0));
+    });
+    return answer;
+}
+
+}  // namespace
+
+std::vector<FiringRequest> openRequests(Connection& connection) {
+    std::vector<FiringRequest> requests;
+    Statement& query =
+        connection.statement("SELECT number, identifier FROM activity_requests WHERE answer IS NULL ORDER BY number");
+    while (query.step()) requests.push_back({query.integer(0), std::string(query.text(1))});
+    return requests;
+}
+
+void answerRequest(Connection& connection, std::int64_t number, FiringAnswer answer) {
+    connection.statement("UPDATE activity_requests SET answer = ? WHERE number = ?")
+        .bind(0, static_cast<std::int64_t>(answer))
+        .bind(1, number)
+        .step();
+}
+
+// Without a condition SQLite would write the table's page anew, though there is nothing in it as a rule.
+void dropRequests(Connection& connection) {
+    connection.execute("DELETE FROM activity_requests WHERE true");
+}
+
+platform::Result<std::optional<FiringAnswer>> requestFiring(const std::string& home, Database& database,
+                                                            std::string_view identifier, platform::Duration limit) {
+    if (!HomeLock::isInUse(home)) return std::optional<FiringAnswer>();
+    std::int64_t number = 0;
+    const MaybeError error = database.write([&](Connection& connection) {
+        connection.statement("INSERT INTO activity_requests (identifier) VALUES (?)").bind(0, identifier).step();
+        number = connection.integer("SELECT last_insert_rowid()");
+    });
+    if (error) return *error;
+    touch(home + "/" + requestFileName);
+
+    const auto end = std::chrono::steady_clock::now() + limit;
+    std::optional<FiringAnswer> answer;
+    while (!(answer = answerTo(database, number)) && std::chrono::steady_clock::now() < end)
+        std::this_thread::sleep_for(std::chrono::milliseconds(5));
+    removeRequest(database, number);
+    return answer;
+}
+
+}  // namespace vrx::host

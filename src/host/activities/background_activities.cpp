@@ -1,0 +1,306 @@
+#include "vrx/host/activities/background_activities.h"
+
+#include <algorithm>
+#include <utility>
+
+#include "vrx/host/home/host_facts.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/vendor.h"
+
+namespace vrx::host {
+
+using platform::ActivityHandler;
+using platform::BackgroundActivityResult;
+using platform::Duration;
+using platform::Error;
+using platform::FiringDecision;
+using platform::Level;
+using platform::log;
+using platform::MaybeError;
+using platform::Moment;
+
+namespace {
+
+constexpr Duration retryAfterFailure{60.0};
+
+void carryOverAll(ActivityRegistry& registry, const Moment& now) {
+    for (const ScheduledActivity& activity : registry.scheduled()) {
+        const platform::DueTime due = carriedOver(activity.due, now);
+        if (due != activity.due) registry.postpone(activity.generation, due, activity.deferrals);
+    }
+}
+
+// What such a run registered itself in its place comes at its own time. Runs that are interrupted over and over, maybe
+// because they are what ends the process, come less and less often.
+void resumeInterrupted(ActivityRegistry& registry, const std::set<std::string, std::less<>>& running,
+                       const Moment& now) {
+    for (const ActivityRun& run : registry.runs()) {
+        if (run.ended || running.contains(run.identifier)) continue;
+        log(Level::Default, "Activity %@ was interrupted", run.identifier);
+        registry.endRun(run.identifier, RunOutcome::Interrupted, now.wall);
+        const std::optional<ScheduledActivity> activity = registry.scheduled(run.identifier);
+        if (!activity || activity->generation != run.generation) continue;
+        const int deferrals = activity->deferrals + 1;
+        registry.postpone(activity->generation, dueAfter(platform::retryDelay(deferrals), now), deferrals);
+    }
+}
+
+// What the system fires on its own. Being scheduled in the same transaction as the fact that it was, it is lost to no
+// crash.
+void scheduleOwn(Connection& connection, const std::string& agentVersion, const Moment& now) {
+    const struct {
+        std::string_view fact;
+        const std::string& value;
+        std::string_view activity;
+    } occasions[] = {{facts::agentVersion, agentVersion, platform::upgradeActivityRemainder},
+                     {facts::boot, now.boot, platform::bootActivityRemainder}};
+    for (const auto& [fact, value, activity] : occasions) {
+        if (hostFact(connection, fact) == value) continue;
+        setHostFact(connection, fact, value);
+        ActivityRegistry(connection).schedule(platform::vendorIdentifier(activity), {}, dueAfter(Duration(0), now));
+    }
+}
+
+}  // namespace
+
+void BackgroundActivities::start(std::string agentVersion) {
+    agentVersion_ = std::move(agentVersion);
+    isStarted_ = true;
+    around_.conditions.start({.wake = [this] { reconsider(); }, .wallClockSet = [this] { carryOver(); }});
+    reconsider();
+}
+
+void BackgroundActivities::schedule(const platform::ActivityRegistration& registration, ActivityHandler handler) {
+    const std::string& identifier = registration.identifier;
+    {
+        std::lock_guard lock(mutex_);
+        handlers_[identifier].swap(handler);  // the earlier one goes outside the lock: it may hold what comes here
+        if (!registration.isPreregistered) {
+            registeredByOwnRun_.erase(identifier);
+            if (registration.isByOwnRun && running_.contains(identifier)) registeredByOwnRun_.insert(identifier);
+        }
+    }
+    if (!registration.isPreregistered) {
+        const platform::ActivityCriteria criteria = registration.criteria.value_or(platform::ActivityCriteria{});
+        const Duration interval = registration.isByOwnRun ? around_.conditions.minimumInterval() : Duration(0);
+        const platform::DueTime due = dueTime(criteria, interval, around_.conditions.now());
+        store([identifier, criteria, due](Connection& connection) {
+            ActivityRegistry(connection).schedule(identifier, criteria, due);
+        });
+    }
+    around_.mainQueue.post([this] { reconsider(); });
+}
+
+bool BackgroundActivities::shouldDefer(std::string_view) const {
+    return around_.conditions.shouldDefer();
+}
+
+void BackgroundActivities::setHandlerFactory(std::function<ActivityHandler(const std::string&)> factory) {
+    {
+        std::lock_guard lock(mutex_);
+        factory_.swap(factory);
+    }
+    around_.mainQueue.post([this] { reconsider(); });
+}
+
+void BackgroundActivities::reconsider() {
+    if (!isStarted_) return;
+    if (!takeUpIfReplaced() || !answerRequests() || !fireDue())
+        around_.conditions.wakeAt(around_.conditions.now().sinceBoot + retryAfterFailure, false);
+}
+
+void BackgroundActivities::carryOver() {
+    store([now = around_.conditions.now()](Connection& connection) {
+        ActivityRegistry registry(connection);
+        carryOverAll(registry, now);
+    });
+    reconsider();
+}
+
+// Gives false, and logs the first of several failures.
+bool BackgroundActivities::failed(const Error& error) {
+    if (!isFailing_.exchange(true))
+        log(Level::Error, "No background activity is fired until this works: %@", error.text);
+    return false;
+}
+
+bool BackgroundActivities::write(const Change& change) {
+    if (const MaybeError error = around_.database.write(change)) return failed(*error);
+    isFailing_ = false;
+    return true;
+}
+
+// Stores the change after the earlier ones. False when it is kept for later.
+bool BackgroundActivities::store(Change change) {
+    std::lock_guard lock(storing_);
+    unsaved_.push_back(std::move(change));
+    return storeUnsaved();
+}
+
+bool BackgroundActivities::storeUnsaved() {
+    const bool isStored = write([this](Connection& connection) {
+        for (const Change& change : unsaved_) change(connection);
+    });
+    if (isStored) {
+        unsaved_.clear();
+        unsavedWork_.reset();
+    } else if (!unsavedWork_) {
+        unsavedWork_ = around_.lifecycle.beginWork();
+    }
+    return isStored;
+}
+
+// The registry is taken up at the start, and again when it is another file's.
+bool BackgroundActivities::takeUpIfReplaced() {
+    {
+        std::lock_guard lock(storing_);
+        if (!unsaved_.empty() && !storeUnsaved()) return false;
+    }
+    std::uint64_t opening = 0;
+    const MaybeError error =
+        around_.database.peek([&](Connection&, const Database::Stamp& stamp) { opening = stamp.opening; });
+    if (error) return failed(*error);
+    if (std::exchange(takenUp_, opening) == opening) return true;
+    std::set<std::string, std::less<>> running;
+    {
+        std::lock_guard lock(mutex_);
+        running = running_;
+    }
+    return store([running, version = agentVersion_, now = around_.conditions.now()](Connection& connection) {
+        ActivityRegistry registry(connection);
+        carryOverAll(registry, now);
+        resumeInterrupted(registry, running, now);
+        scheduleOwn(connection, version, now);
+        dropRequests(connection);
+    });
+}
+
+bool BackgroundActivities::fireDue() {
+    ActivityConditions& conditions = around_.conditions;
+    std::vector<ScheduledActivity> activities;
+    const MaybeError error =
+        around_.database.read([&](Connection& connection) { activities = ActivityRegistry(connection).scheduled(); });
+    if (error) return failed(*error);
+
+    // So that the boot activity runs by the time that those are looked at which it holds.
+    std::stable_partition(activities.begin(), activities.end(), [](const ScheduledActivity& activity) {
+        return !platform::waitsForBootActivity(activity.identifier);
+    });
+    const std::string boot = platform::vendorIdentifier(platform::bootActivityRemainder);
+
+    const Moment now = conditions.now();
+    std::optional<Duration> next;
+    bool isWaitingForNetwork = false;
+    for (const ScheduledActivity& activity : activities) {
+        const bool isHeld = isRunning(boot) && platform::waitsForBootActivity(activity.identifier);
+        if (isHeld || isRunning(activity.identifier)) continue;  // the end of that run comes here again
+        const bool isDue = timeLeft(activity.due, now) == Duration(0);
+        const FiringDecision decision =
+            decideFiring(activity.due, activity.criteria, now,
+                         isDue && activity.criteria.requiresNetwork && conditions.isNetworkAvailable(),
+                         isDue && activity.criteria.gracePeriod > 0 && conditions.shouldDefer());
+        isWaitingForNetwork |= decision.isWaitingForNetwork;
+        if (decision.askAgainIn) next = std::min(next.value_or(*decision.askAgainIn), *decision.askAgainIn);
+        if (!decision.isFired) continue;
+        const ActivityHandler handler = handlerFor(activity.identifier);
+        if (handler && !fire(activity, handler)) return false;
+    }
+    conditions.wakeAt(next ? std::optional(now.sinceBoot + *next) : std::nullopt, isWaitingForNetwork);
+    return true;
+}
+
+bool BackgroundActivities::answerRequests() {
+    std::vector<FiringRequest> requests;
+    const MaybeError error =
+        around_.database.read([&](Connection& connection) { requests = openRequests(connection); });
+    if (error) return failed(*error);
+    for (const FiringRequest& request : requests) {
+        const FiringAnswer answer = fireRequested(request.identifier);
+        if (!store([number = request.number, answer](Connection& connection) {
+                answerRequest(connection, number, answer);
+            }))
+            return false;
+    }
+    return true;
+}
+
+// As if it had fallen due and its conditions held. It keeps its due time, in case that its result is deferred.
+FiringAnswer BackgroundActivities::fireRequested(const std::string& identifier) {
+    if (isRunning(identifier)) return FiringAnswer::AlreadyRunning;
+    const ActivityHandler handler = handlerFor(identifier);
+    if (!handler) return FiringAnswer::Unknown;
+    std::optional<ScheduledActivity> activity;
+    const bool isFound = write([&](Connection& connection) {
+        ActivityRegistry registry(connection);
+        if (!registry.scheduled(identifier))
+            registry.schedule(identifier, {}, dueAfter(Duration(0), around_.conditions.now()));
+        activity = registry.scheduled(identifier);
+    });
+    return isFound && fire(*activity, handler) ? FiringAnswer::Fired : FiringAnswer::NotStored;
+}
+
+// False when it could not be stored that the run begins.
+bool BackgroundActivities::fire(const ScheduledActivity& activity, const ActivityHandler& handler) {
+    const Run run{activity.identifier, activity.generation};
+    bool isPresent = false;
+    const bool isStored = write([&](Connection& connection) {
+        ActivityRegistry registry(connection);
+        const std::optional<ScheduledActivity> present = registry.scheduled(run.identifier);
+        isPresent = present && present->generation == run.generation;
+        if (isPresent) registry.beginRun(run.identifier, run.generation, around_.conditions.now().wall);
+    });
+    if (!isStored) return false;
+    if (!isPresent) return true;  // it has just been registered anew, and will be looked at
+    {
+        std::lock_guard lock(mutex_);
+        running_.insert(run.identifier);
+    }
+    platform::OnceCallback<BackgroundActivityResult> completion =
+        [this, run, work = around_.lifecycle.beginWork()](BackgroundActivityResult result) { end(run, result); };
+    around_.workers.post([handler, completion = std::move(completion)]() mutable { handler(std::move(completion)); });
+    return true;
+}
+
+void BackgroundActivities::end(const Run& run, BackgroundActivityResult result) {
+    const bool isFinished = result == BackgroundActivityResult::Finished;
+    Duration interval{0};
+    {
+        std::lock_guard lock(mutex_);
+        if (registeredByOwnRun_.erase(run.identifier) > 0) interval = around_.conditions.minimumInterval();
+    }
+    store([run, isFinished, interval, now = around_.conditions.now()](Connection& connection) {
+        ActivityRegistry registry(connection);
+        registry.endRun(run.identifier, isFinished ? RunOutcome::Finished : RunOutcome::Deferred, now.wall);
+        const std::optional<ScheduledActivity> activity = registry.scheduled(run.identifier);
+        if (!activity) return;
+        if (activity->generation != run.generation)  // registered during the run
+            return registry.postpone(activity->generation, noSoonerThan(activity->due, interval, now), 0);
+        if (isFinished) return registry.remove(run.generation);
+        const int deferrals = activity->deferrals + 1;
+        registry.postpone(run.generation, noSoonerThan(activity->due, platform::retryDelay(deferrals), now), deferrals);
+    });
+    {
+        std::lock_guard lock(mutex_);
+        running_.erase(run.identifier);
+    }
+    around_.mainQueue.post([this] { reconsider(); });
+}
+
+// What an earlier process scheduled and this one has not checked in for gets one of the factory's.
+ActivityHandler BackgroundActivities::handlerFor(const std::string& identifier) {
+    std::function<ActivityHandler(const std::string&)> factory;
+    {
+        std::lock_guard lock(mutex_);
+        auto handler = handlers_.find(identifier);
+        if (handler != handlers_.end()) return handler->second;
+        factory = factory_;
+    }
+    return factory ? factory(identifier) : nullptr;
+}
+
+bool BackgroundActivities::isRunning(const std::string& identifier) const {
+    std::lock_guard lock(mutex_);
+    return running_.contains(identifier);
+}
+
+}  // namespace vrx::host

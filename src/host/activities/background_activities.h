@@ -1,0 +1,93 @@
+// The system's registry of background activities, in host.db: fires each on a worker when it is due, and takes up at
+// the start what earlier processes scheduled. It sleeps until the nearest one is due.
+//
+// host.db decides what fires; in memory there is only what a process has of its own, handlers and runs. So the registry
+// follows the file when it is replaced, and a run that the end of the process interrupted shows at the next start as
+// one without an end: no other agent has the home meanwhile. While the file cannot be written nothing fires, because
+// its end could not be kept either; what was to be stored is stored later, in order.
+#pragma once
+
+#include <atomic>
+#include <map>
+#include <mutex>
+#include <set>
+#include <string>
+#include <vector>
+
+#include "vrx/host/activities/activity_conditions.h"
+#include "vrx/host/activities/activity_registry.h"
+#include "vrx/host/activities/activity_requests.h"
+#include "vrx/host/home/database.h"
+#include "vrx/platform/background_activity_scheduler.h"
+#include "vrx/platform/process_lifecycle.h"
+#include "vrx/platform/queue.h"
+
+namespace vrx::host {
+
+class BackgroundActivities final : public platform::BackgroundActivities {
+public:
+    // None is owned. Handlers run on the workers.
+    struct Surroundings {
+        Database& database;
+        platform::Queue& mainQueue;
+        platform::Queue& workers;
+        ActivityConditions& conditions;
+        platform::ProcessLifecycle& lifecycle;
+    };
+    explicit BackgroundActivities(const Surroundings& surroundings) : around_(surroundings) {}
+
+    // Takes the registry up, for an agent of that version; activities fire from now on. Main thread, once, when those
+    // that start-up monitors have their handlers.
+    void start(std::string agentVersion);
+    // Looks for what fires now, and for what testers have asked: when something has changed that is not told by itself.
+    // Main thread.
+    void reconsider();
+
+    // An activity that is scheduled fires once: none repeats, and all are of background quality.
+    void schedule(const platform::ActivityRegistration& registration, platform::ActivityHandler handler) override;
+    bool shouldDefer(std::string_view identifier) const override;
+    void setHandlerFactory(std::function<platform::ActivityHandler(const std::string&)> factory) override;
+
+private:
+    using Change = std::function<void(Connection&)>;
+
+    // One firing, from its beginning to its result.
+    struct Run {
+        std::string identifier;
+        std::int64_t generation;
+    };
+
+    bool failed(const platform::Error& error);
+    bool write(const Change& change);
+    bool store(Change change);
+    bool storeUnsaved();
+    bool takeUpIfReplaced();
+    void carryOver();
+    bool answerRequests();
+    bool fireDue();
+    FiringAnswer fireRequested(const std::string& identifier);
+    bool fire(const ScheduledActivity& activity, const platform::ActivityHandler& handler);
+    void end(const Run& run, platform::BackgroundActivityResult result);
+    platform::ActivityHandler handlerFor(const std::string& identifier);
+    bool isRunning(const std::string& identifier) const;
+
+    const Surroundings around_;
+
+    // Main thread.
+    bool isStarted_ = false;
+    std::string agentVersion_;
+    std::uint64_t takenUp_ = 0;  // the opening of the database whose registry this is
+
+    mutable std::mutex mutex_;
+    std::map<std::string, platform::ActivityHandler, std::less<>> handlers_;
+    std::function<platform::ActivityHandler(const std::string&)> factory_;
+    std::set<std::string, std::less<>> running_;
+    std::set<std::string, std::less<>> registeredByOwnRun_;  // of those running
+
+    std::atomic<bool> isFailing_ = false;  // the database, since it was last logged
+    std::mutex storing_;                   // taken before the database
+    std::vector<Change> unsaved_;
+    platform::WorkInFlight unsavedWork_;  // while there are any
+};
+
+}  // namespace vrx::host

@@ -1,0 +1,94 @@
+#include "vrx/host/activities/machine_conditions.h"
+
+#include <sys/timerfd.h>
+#include <systemd/sd-id128.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <limits>
+
+#include "vrx/host/activities/power_supply.h"
+
+namespace vrx::host {
+
+using platform::Duration;
+using platform::Moment;
+
+namespace {
+
+// Where the kernel doesn't tell which boot this is, each process takes itself for one: what is left of a delay is then
+// told by the wall clock.
+std::string bootIdentifier() {
+    sd_id128_t identifier;
+    if (sd_id128_get_boot(&identifier) < 0) sd_id128_randomize(&identifier);
+    std::array<char, SD_ID128_STRING_MAX> text;
+    return sd_id128_to_string(identifier, text.data());
+}
+
+}  // namespace
+
+Moment presentMoment() {
+    static const std::string boot = bootIdentifier();
+    return {boot, bootTime(), std::chrono::system_clock::now()};
+}
+
+Duration minimumInterval(const DeviceProfile& profile) {
+    return std::min(profile.facts()->minimumInterval.value_or(platform::minimumInterval), platform::minimumInterval);
+}
+
+bool MachineConditions::shouldDefer() const {
+    const std::optional<bool> override = profile_.facts()->shouldDefer;
+    return override ? *override : isOnLowBattery();
+}
+
+Duration MachineConditions::minimumInterval() const {
+    return host::minimumInterval(profile_);
+}
+
+void MachineConditions::start(Calls calls) {
+    calls_ = std::move(calls);
+    timer_ = addBootTimer(loop_, onTimer, this);
+    wallClock_ = Descriptor(timerfd_create(CLOCK_REALTIME, TFD_CLOEXEC | TFD_NONBLOCK));
+    if (!wallClock_) throw std::system_error(errno, std::generic_category(), "wall clock");
+    watchWallClock();
+    wallClockSource_ = addReadSource(loop_, wallClock_.number(), onWallClockSet, this);
+}
+
+bool MachineConditions::isNetworkAvailable() {
+    const std::optional<bool> override = profile_.facts()->networkAvailable;
+    return override ? *override : routes_.hasDefaultRoute();
+}
+
+void MachineConditions::wakeAt(std::optional<Duration> sinceBoot, bool whenNetworkChanges) {
+    const bool isNewlyReported = whenNetworkChanges && !isNetworkReported_;
+    isNetworkReported_ = whenNetworkChanges;
+    routes_.setReporting(whenNetworkChanges);
+    // It may have come between the question and the reports.
+    if (isNewlyReported && isNetworkAvailable()) sinceBoot = Duration(0);
+    sinceBoot ? armTimer(timer_, *sinceBoot) : disarmTimer(timer_);
+}
+
+// A timer that never ends, but tells when the clock that it runs on is set.
+void MachineConditions::watchWallClock() const {
+    constexpr std::time_t farAhead = std::numeric_limits<std::int32_t>::max();
+    itimerspec end{};
+    end.it_value.tv_sec = std::time(nullptr) + farAhead;
+    timerfd_settime(wallClock_.number(), TFD_TIMER_ABSTIME | TFD_TIMER_CANCEL_ON_SET, &end, nullptr);
+}
+
+int MachineConditions::onTimer(sd_event_source*, std::uint64_t, void* self) {
+    static_cast<MachineConditions*>(self)->calls_.wake();
+    return 0;
+}
+
+int MachineConditions::onWallClockSet(sd_event_source*, int file, std::uint32_t, void* userdata) {
+    auto& self = *static_cast<MachineConditions*>(userdata);
+    std::uint64_t count;
+    [[maybe_unused]] const ssize_t size = read(file, &count, sizeof count);
+    self.watchWallClock();
+    self.calls_.wallClockSet();
+    return 0;
+}
+
+}  // namespace vrx::host

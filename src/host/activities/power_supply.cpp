@@ -1,0 +1,46 @@
+#include "vrx/host/activities/power_supply.h"
+
+#include <cstdlib>
+#include <filesystem>
+
+#include "vrx/host/base/files.h"
+
+namespace vrx::host {
+
+namespace {
+
+constexpr int lowPercentage = 20;
+
+std::string attribute(const std::filesystem::path& supply, const char* name) {
+    const auto file = readFile((supply / name).string());
+    if (!file) return "";
+    std::string text(file->bytes.begin(), file->bytes.end());
+    return text.substr(0, text.find('\n'));
+}
+
+bool isLow(const std::filesystem::path& battery) {
+    const std::string level = attribute(battery, "capacity_level");
+    if (level == "Critical" || level == "Low") return true;
+    const std::string percentage = attribute(battery, "capacity");
+    return !percentage.empty() && std::atoi(percentage.c_str()) <= lowPercentage;
+}
+
+}  // namespace
+
+// Batteries of mice and the like are of the scope "Device".
+bool isOnLowBattery(const std::string& root) {
+    bool hasBattery = false;
+    std::error_code none;
+    for (const auto& supply : std::filesystem::directory_iterator(root + "/sys/class/power_supply", none)) {
+        if (attribute(supply, "scope") == "Device") continue;
+        if (attribute(supply, "type") == "Battery") {
+            if (attribute(supply, "status") != "Discharging" || !isLow(supply)) return false;
+            hasBattery = true;
+        } else if (const std::string online = attribute(supply, "online"); !online.empty() && online != "0") {
+            return false;
+        }
+    }
+    return hasBattery;
+}
+
+}  // namespace vrx::host

@@ -1,0 +1,27 @@
+#include "vrx/host/base/text.h"
+
+#include <algorithm>
+
+namespace vrx::host {
+
+std::string_view trimmed(std::string_view text) {
+    constexpr std::string_view blanks = " \t\r\n";
+    const std::size_t begin = text.find_first_not_of(blanks);
+    if (begin == text.npos) return {};
+    return text.substr(begin, text.find_last_not_of(blanks) + 1 - begin);
+}
+
+bool isOneLine(std::string_view text) {
+    return std::ranges::none_of(text, [](char c) { return (c >= 0 && c < ' ') || c == '\x7f'; });
+}
+
+bool isHeaderName(std::string_view text) {
+    constexpr std::string_view marks = "!#$%&'*+-.^_`|~";
+    auto isNameCharacter = [&](char c) {
+        return (c >= '0' && c <= '9') || (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') ||
+               marks.find(c) != marks.npos;
+    };
+    return !text.empty() && std::ranges::all_of(text, isNameCharacter);
+}
+
+}  // namespace vrx::host

@@ -1,0 +1,468 @@
+#include "vrx/host/home/database.h"
+
+#include <fcntl.h>
+#include <sys/file.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <cstring>
+#include <ctime>
+#include <thread>
+
+#include "vrx/host/base/files.h"
+#include "vrx/platform/log.h"
+
+namespace vrx::host {
+
+using platform::Error;
+using platform::Level;
+using platform::MaybeError;
+
+namespace {
+
+constexpr const char* steps[] = {
+    // The agent's settings: a number or a text as itself, anything else as a binary property list.
+    "CREATE TABLE defaults (key TEXT PRIMARY KEY, value NOT NULL) WITHOUT ROWID",
+    // Follow-ups, in the order of their first posting: the item as a binary property list.
+    "CREATE TABLE follow_ups (position INTEGER PRIMARY KEY, client TEXT NOT NULL, identifier TEXT NOT NULL, "
+    "item NOT NULL, UNIQUE (client, identifier))",
+    // Facts that the host keeps from one process to the next. The background activities that are scheduled, the last
+    // run of each, and what testers ask the agent to fire.
+    "CREATE TABLE host_facts (name TEXT PRIMARY KEY, value TEXT NOT NULL) WITHOUT ROWID;"
+    "CREATE TABLE activities ("
+    "    generation INTEGER PRIMARY KEY, identifier TEXT NOT NULL UNIQUE,"
+    "    delay INTEGER NOT NULL, grace_period INTEGER NOT NULL, requires_network INTEGER NOT NULL,"
+    "    due_boot TEXT NOT NULL, due_since_boot REAL NOT NULL, due_wall REAL NOT NULL, wait REAL NOT NULL,"
+    "    is_carried_over INTEGER NOT NULL, deferrals INTEGER NOT NULL);"
+    "CREATE TABLE activity_runs ("
+    "    identifier TEXT PRIMARY KEY, generation INTEGER NOT NULL, began REAL NOT NULL, ended REAL, outcome INTEGER"
+    ") WITHOUT ROWID;"
+    "CREATE TABLE activity_requests ("
+    "    number INTEGER PRIMARY KEY AUTOINCREMENT, identifier TEXT NOT NULL, answer INTEGER)",
+};
+
+void check(int result, sqlite3* connection) {
+    if (result == SQLITE_OK) return;
+    throw DatabaseError(result, connection ? sqlite3_errmsg(connection) : sqlite3_errstr(result));
+}
+
+bool isDamage(const DatabaseError& error) {
+    const int primary = error.code & 0xff;
+    return primary == SQLITE_CORRUPT || primary == SQLITE_NOTADB;
+}
+
+std::string timeSuffix() {
+    const std::time_t now = std::time(nullptr);
+    std::tm fields{};
+    gmtime_r(&now, &fields);
+    std::array<char, 32> text;
+    return {text.data(), std::strftime(text.data(), text.size(), "%Y%m%dT%H%M%SZ", &fields)};
+}
+
+// Which file a name stands for.
+struct FileIdentity {
+    dev_t device = 0;
+    ino_t inode = 0;
+    bool operator==(const FileIdentity&) const = default;
+    explicit operator bool() const { return inode != 0; }
+
+    // None when the name stands for nothing.
+    static FileIdentity of(const std::string& path) {
+        struct stat status;
+        if (stat(path.c_str(), &status) != 0) return {};
+        return {status.st_dev, status.st_ino};
+    }
+};
+
+// Held while the database is opened: of several processes that find it damaged, one sets it aside and the others find
+// the fresh one.
+class FolderLock {
+public:
+    FolderLock(const std::string& folder, std::chrono::milliseconds limit)
+        : file_(::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC)) {
+        if (file_ < 0) throw DatabaseError(SQLITE_CANTOPEN, systemError("open", folder, errno).text);
+        const auto end = std::chrono::steady_clock::now() + limit;
+        while (flock(file_, LOCK_EX | LOCK_NB) != 0) {
+            if (std::chrono::steady_clock::now() < end) {
+                std::this_thread::sleep_for(std::chrono::milliseconds(2));
+                continue;
+            }
+            ::close(file_);
+            throw DatabaseError(SQLITE_BUSY, "another process keeps " + folder + " locked");
+        }
+    }
+    ~FolderLock() { ::close(file_); }
+    FolderLock(const FolderLock&) = delete;
+    FolderLock& operator=(const FolderLock&) = delete;
+
+private:
+    int file_;
+};
+
+// The whole database is some ten pages. As it comes, SQLite would set aside, and touch, room for twenty pages and for
+// the statements of a busy server, for each connection.
+bool configure() {
+    return sqlite3_config(SQLITE_CONFIG_PAGECACHE, nullptr, 0, 0) == SQLITE_OK &&
+           sqlite3_config(SQLITE_CONFIG_LOOKASIDE, 512, 16) == SQLITE_OK;
+}
+
+// SQLite would make the file readable for others; what it makes beside it has the file's own mode.
+void createPrivately(const std::string& path) {
+    int file = ::open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600);
+    if (file >= 0)
+        ::close(file);
+    else if (errno != EEXIST)
+        throw DatabaseError(SQLITE_CANTOPEN, systemError("create", path, errno).text);
+}
+
+// For looking: where a log lies beside the database, the index of the two is only read, or made in memory when nobody
+// keeps it; where none does, no index is needed.
+std::string lookingUri(const std::string& path) {
+    std::string uri = "file:";
+    for (const char character : path) {
+        if (character == '%' || character == '?' || character == '#')
+            uri.append(character == '%' ? "%25" : character == '?' ? "%3f" : "%23");
+        else
+            uri.push_back(character);
+    }
+    return uri + (FileIdentity::of(path + "-wal") ? "?readonly_shm=1" : "?immutable=1");
+}
+
+}  // namespace
+
+const Database::Schema Database::currentSchema = steps;
+
+Statement::Statement(sqlite3* connection, const char* sql) : connection_(connection) {
+    check(sqlite3_prepare_v3(connection, sql, -1, SQLITE_PREPARE_PERSISTENT, &statement_, nullptr), connection);
+}
+
+Statement& Statement::bind(int parameter, std::string_view text) {
+    // An absent pointer would bind null.
+    check(sqlite3_bind_text64(statement_, parameter + 1, text.data() ? text.data() : "", text.size(), SQLITE_TRANSIENT,
+                              SQLITE_UTF8),
+          connection_);
+    return *this;
+}
+
+Statement& Statement::bind(int parameter, std::int64_t number) {
+    check(sqlite3_bind_int64(statement_, parameter + 1, number), connection_);
+    return *this;
+}
+
+Statement& Statement::bind(int parameter, double number) {
+    check(sqlite3_bind_double(statement_, parameter + 1, number), connection_);
+    return *this;
+}
+
+Statement& Statement::bind(int parameter, const platform::Data& bytes) {
+    const void* start = bytes.empty() ? static_cast<const void*>("") : bytes.data();
+    check(sqlite3_bind_blob64(statement_, parameter + 1, start, bytes.size(), SQLITE_TRANSIENT), connection_);
+    return *this;
+}
+
+Statement& Statement::bind(int parameter, std::nullptr_t) {
+    check(sqlite3_bind_null(statement_, parameter + 1), connection_);
+    return *this;
+}
+
+bool Statement::step() {
+    const int result = sqlite3_step(statement_);
+    if (result == SQLITE_ROW) return true;
+    if (result != SQLITE_DONE) check(result, connection_);
+    return false;
+}
+
+void Statement::reset() {
+    sqlite3_reset(statement_);
+    sqlite3_clear_bindings(statement_);
+}
+
+std::string_view Statement::text(int column) const {
+    const auto* start = reinterpret_cast<const char*>(sqlite3_column_text(statement_, column));
+    return {start ? start : "", static_cast<std::size_t>(sqlite3_column_bytes(statement_, column))};
+}
+
+std::span<const std::uint8_t> Statement::bytes(int column) const {
+    const auto* start = static_cast<const std::uint8_t*>(sqlite3_column_blob(statement_, column));
+    return {start, start ? static_cast<std::size_t>(sqlite3_column_bytes(statement_, column)) : 0};
+}
+
+Connection::Connection(const std::string& path, std::chrono::milliseconds busyLimit, bool isLooking) {
+    static const bool isConfigured = configure();
+    static_cast<void>(isConfigured);
+    const int flags = isLooking ? SQLITE_OPEN_READONLY | SQLITE_OPEN_URI : SQLITE_OPEN_READWRITE;
+    const int result = sqlite3_open_v2((isLooking ? lookingUri(path) : path).c_str(), &connection_,
+                                       flags | SQLITE_OPEN_NOMUTEX, nullptr);
+    try {
+        check(result, connection_);
+        sqlite3_extended_result_codes(connection_, 1);
+        keepLogAtClose(true);
+        sqlite3_busy_timeout(connection_, static_cast<int>(busyLimit.count()));
+        execute("PRAGMA synchronous = FULL");
+    } catch (...) {
+        sqlite3_close(connection_);
+        throw;
+    }
+}
+
+Connection::~Connection() {
+    statements_.clear();
+    sqlite3_close(connection_);
+}
+
+void Connection::keepLogAtClose(bool keep) {
+    sqlite3_db_config(connection_, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, keep ? 1 : 0, nullptr);
+}
+
+void Connection::execute(const char* sql) {
+    check(sqlite3_exec(connection_, sql, nullptr, nullptr, nullptr), connection_);
+}
+
+Statement& Connection::statement(const char* sql) {
+    std::unique_ptr<Statement>& statement = statements_[sql];
+    if (!statement)
+        statement = std::make_unique<Statement>(connection_, sql);
+    else
+        statement->reset();
+    return *statement;
+}
+
+std::int64_t Connection::integer(const char* sql) {
+    Statement& query = statement(sql);
+    const std::int64_t result = query.step() ? query.integer(0) : 0;
+    query.reset();
+    return result;
+}
+
+void Connection::checkSoundness() {
+    Statement check(connection_, "PRAGMA quick_check(1)");
+    if (!check.step() || check.text(0) != "ok") throw DatabaseError(SQLITE_CORRUPT, std::string(check.text(0)));
+}
+
+void Connection::endStatements() {
+    for (sqlite3_stmt* used = sqlite3_next_stmt(connection_, nullptr); used;
+         used = sqlite3_next_stmt(connection_, used))
+        if (sqlite3_stmt_busy(used)) sqlite3_reset(used);
+}
+
+// Both the shared-memory method and the header's place and size, 48 bytes at the beginning, are part of SQLite's
+// published interfaces and formats; SQLite itself compares the header to tell whether its cache is current.
+void Connection::findIndexHeader() {
+    constexpr int regionBytes = 32768;
+    integer("PRAGMA user_version");  // a read is what makes it map the index
+    sqlite3_file* file = nullptr;
+    void volatile* region = nullptr;
+    check(sqlite3_file_control(connection_, "main", SQLITE_FCNTL_FILE_POINTER, &file), connection_);
+    if (file->pMethods->iVersion >= 2) file->pMethods->xShmMap(file, 0, regionBytes, 0, &region);
+    indexHeader_ = static_cast<const std::uint32_t*>(const_cast<void*>(region));
+}
+
+Connection::CommitMark Connection::commitMark() {
+    CommitMark mark{};
+    if (!indexHeader_) {  // a file system without shared memory
+        mark[0] = static_cast<std::uint32_t>(integer("PRAGMA data_version"));
+        return mark;
+    }
+    // Another process may be writing it: a mixture of old and new equals neither.
+    for (std::size_t i = 0; i < mark.size(); ++i) mark[i] = __atomic_load_n(indexHeader_ + i, __ATOMIC_ACQUIRE);
+    return mark;
+}
+
+// The connections of one opening. Reading has one of its own, so that it does not wait while a write waits.
+struct Database::Opening {
+    Opening(const std::string& path, std::chrono::milliseconds busyLimit) : path(path), busyLimit(busyLimit) {}
+
+    ~Opening() {
+        // Closing the last connection takes the -wal file away by its name, which is not ours any more when another
+        // database has come to stand there.
+        if (FileIdentity::of(path) == file) return;
+        for (auto* connection : {&writer, &reader})
+            if (*connection) (*connection)->keepLogAtClose(true);
+    }
+
+    // The database is sound: it is opened for reading, too, and is tidied up when it is closed.
+    void passed() {
+        reader.emplace(path, busyLimit);
+        reader->findIndexHeader();
+        for (auto* connection : {&writer, &reader}) (*connection)->keepLogAtClose(false);
+        file = FileIdentity::of(path);
+        wal = FileIdentity::of(path + "-wal");
+        shm = FileIdentity::of(path + "-shm");
+    }
+
+    const std::string path;
+    const std::chrono::milliseconds busyLimit;
+    std::optional<Connection> writer;  // none for looking
+    std::optional<Connection> reader;
+    FileIdentity file, wal, shm;
+    std::uint64_t number = 0;
+};
+
+Database::Database(std::string path, Schema schema, std::chrono::milliseconds busyLimit, bool isLooking)
+    : path_(std::move(path)), schema_(schema), busyLimit_(busyLimit), isLooking_(isLooking) {}
+
+Database::~Database() = default;
+
+MaybeError Database::open() {
+    MaybeError error;
+    opening(error);
+    return error;
+}
+
+std::shared_ptr<Database::Opening> Database::opening(MaybeError& error) {
+    std::lock_guard lock(mutex_);
+    if (opening_ && FileIdentity::of(path_) == opening_->file) return opening_;
+    try {
+        const FolderLock folder(path_.substr(0, path_.rfind('/') + 1), busyLimit_);
+        if (opening_) leaveReplacedFile();
+        opening_ = openChecked();
+        opening_->number = ++openings_;
+        lastFailure_.clear();
+        return opening_;
+    } catch (const DatabaseError& failure) {
+        error = Error{"database", failure.code, "cannot open " + path_ + ": " + failure.what()};
+        if (std::exchange(lastFailure_, error->text) != error->text) log(Level::Error, "%@", error->text);
+        return nullptr;
+    }
+}
+
+// What stands beside the replaced file belongs to it, unless it came with the new one, which would take it for its own.
+void Database::leaveReplacedFile() {
+    log(Level::Error, "%@ was replaced and is opened again", path_);
+    const std::string aside = freeAsideName("replaced");
+    if (FileIdentity::of(path_ + "-wal") == opening_->wal) moveAside(aside, "-wal");
+    if (FileIdentity::of(path_ + "-shm") == opening_->shm) moveAside(aside, "-shm");
+    opening_.reset();
+}
+
+std::shared_ptr<Database::Opening> Database::openChecked() {
+    if (isLooking_) return openToLook();
+    try {
+        return openOnce();
+    } catch (const DatabaseError& error) {
+        if (!isDamage(error)) throw;
+        const std::string aside = freeAsideName("damaged");
+        for (const char* suffix : {"-wal", "-shm", ""}) moveAside(aside, suffix);
+        log(Level::Error, "%@ is damaged (%@); it was set aside as %@ and a new one is made", path_, error.what(),
+            aside);
+        return openOnce();
+    }
+}
+
+std::shared_ptr<Database::Opening> Database::openOnce() const {
+    createPrivately(path_);
+    auto opening = std::make_shared<Opening>(path_, busyLimit_);
+    Connection& writer = opening->writer.emplace(path_, busyLimit_);
+    writer.execute("PRAGMA journal_mode = WAL");
+    writer.checkSoundness();
+    migrate(writer);
+    opening->passed();
+    return opening;
+}
+
+std::shared_ptr<Database::Opening> Database::openToLook() const {
+    auto opening = std::make_shared<Opening>(path_, busyLimit_);
+    Connection& reader = opening->reader.emplace(path_, busyLimit_, true);
+    reader.checkSoundness();
+    if (checkedVersion(reader) < static_cast<std::int64_t>(schema_.size()))
+        throw DatabaseError(SQLITE_ERROR,
+                            "it was made by an older version of the program, and the agent has not taken it over yet");
+    opening->file = FileIdentity::of(path_);
+    return opening;
+}
+
+std::int64_t Database::checkedVersion(Connection& connection) const {
+    const auto newest = static_cast<std::int64_t>(schema_.size());
+    const std::int64_t version = connection.integer("PRAGMA user_version");
+    if (version <= newest && version >= 0) return version;
+    throw DatabaseError(SQLITE_ERROR, "it was made by a newer version of the program (schema " +
+                                          std::to_string(version) + "; this one knows " + std::to_string(newest) + ")");
+}
+
+void Database::migrate(Connection& writer) const {
+    const auto newest = static_cast<std::int64_t>(schema_.size());
+    if (checkedVersion(writer) == newest) return;  // without waiting for a writer
+    writer.execute("BEGIN IMMEDIATE");
+    const std::int64_t version = checkedVersion(writer);
+    for (std::int64_t step = version; step < newest; ++step) writer.execute(schema_[static_cast<std::size_t>(step)]);
+    if (version < newest) writer.execute(("PRAGMA user_version = " + std::to_string(newest)).c_str());
+    writer.execute("COMMIT");
+}
+
+std::string Database::freeAsideName(const std::string& reason) const {
+    const std::string name = path_ + "." + reason + "-" + timeSuffix();
+    auto isTaken = [](const std::string& candidate) {
+        for (const char* suffix : {"", "-wal", "-shm"})
+            if (FileIdentity::of(candidate + suffix)) return true;
+        return false;
+    };
+    std::string candidate = name;
+    for (int number = 2; isTaken(candidate); ++number) candidate = name + "-" + std::to_string(number);
+    return candidate;
+}
+
+void Database::moveAside(const std::string& asideName, const char* suffix) const {
+    const std::string from = path_ + suffix;
+    if (::rename(from.c_str(), (asideName + suffix).c_str()) != 0 && errno != ENOENT)
+        throw DatabaseError(SQLITE_CANTOPEN, systemError("set aside", from, errno).text);
+}
+
+// Damage that shows only in use: the next operation opens the database again, and examines it.
+Error Database::failed(const std::shared_ptr<Opening>& opening, const DatabaseError& error) {
+    if (isDamage(error)) {
+        std::lock_guard lock(mutex_);
+        if (opening_ == opening) opening_.reset();
+    }
+    return Error{"database", error.code, path_ + ": " + error.what()};
+}
+
+MaybeError Database::transaction(Connection& connection, const std::shared_ptr<Opening>& opening, const char* begin,
+                                 const std::function<void(Connection&)>& body) {
+    try {
+        connection.execute(begin);
+        body(connection);
+        connection.endStatements();
+        connection.execute("COMMIT");
+        return std::nullopt;
+    } catch (const DatabaseError& error) {
+        connection.endStatements();
+        // Some failures have undone the transaction already.
+        if (!sqlite3_get_autocommit(connection.connection_))
+            sqlite3_exec(connection.connection_, "ROLLBACK", nullptr, nullptr, nullptr);
+        return failed(opening, error);
+    }
+}
+
+MaybeError Database::read(const std::function<void(Connection&)>& body) {
+    std::lock_guard lock(reading_);
+    MaybeError error;
+    std::shared_ptr<Opening> current = opening(error);
+    return current ? transaction(*current->reader, current, "BEGIN", body) : error;
+}
+
+MaybeError Database::write(const std::function<void(Connection&)>& body) {
+    std::lock_guard lock(writing_);
+    MaybeError error;
+    std::shared_ptr<Opening> current = opening(error);
+    if (current && !current->writer) error = Error{"database", SQLITE_READONLY, path_ + ": is only looked at"};
+    return error ? error : transaction(*current->writer, current, "BEGIN IMMEDIATE", body);
+}
+
+MaybeError Database::peek(const std::function<void(Connection&, const Stamp&)>& body) {
+    std::lock_guard lock(reading_);
+    MaybeError error;
+    std::shared_ptr<Opening> current = opening(error);
+    if (!current) return error;
+    Connection& reader = *current->reader;
+    try {
+        body(reader, Stamp{current->number, reader.commitMark()});
+        reader.endStatements();
+        return std::nullopt;
+    } catch (const DatabaseError& failure) {
+        reader.endStatements();
+        return failed(current, failure);
+    }
+}
+
+}  // namespace vrx::host

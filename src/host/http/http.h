@@ -1,0 +1,50 @@
+// HTTP on libcurl: one thread, begun with the first request, moves the bytes of every session; answers are delivered on
+// the worker queue. Sessions may be used from any thread. Nothing wakes up while nothing is under way.
+//
+// TLS is verified, against the system's authorities and those that the profile adds; plain http reaches this machine
+// only. A GET follows redirects, which carry none of the request's own headers and never leave https; any other method
+// is answered with the redirect itself. Neither headers nor bodies are ever logged here.
+//
+// The shared session keeps answers as their headers allow (http_cache.h). An uncached one neither uses what is kept nor
+// asks whether it still holds; what it brings takes its place, so that nobody is given the older answer afterwards.
+#pragma once
+
+#include <memory>
+
+#include "vrx/host/profile/device_profile.h"
+#include "vrx/platform/clock.h"
+#include "vrx/platform/http_request.h"
+#include "vrx/platform/limits.h"
+#include "vrx/platform/queue.h"
+
+namespace vrx::host {
+
+struct HttpLimits {
+    platform::Duration timeout = std::chrono::seconds(60);       // of a request that sets none
+    platform::Duration longestTimeout = std::chrono::hours(24);  // of any request; a day is as good as for ever
+    std::size_t answerBytes = platform::limits::answerBytes;     // after decompression; headers count apart
+    int redirects = 5;
+    std::size_t storedAnswers = 32;
+    std::size_t storedBytes = 1024 * 1024;  // of all stored answers together
+};
+
+class HttpTransfers;
+
+class HttpSessions final : public platform::HttpSessions {
+public:
+    // Queue, clock and profile must outlive the sessions.
+    HttpSessions(platform::Queue& answers, const platform::Clock& clock, const DeviceProfile& profile,
+                 const HttpLimits& limits = {});
+    ~HttpSessions() override;
+    // Discards what is under way, and what is sent from now on, unanswered.
+    void stop();
+
+    platform::HttpSession& shared() override { return *shared_; }
+    std::shared_ptr<platform::HttpSession> makeUncached() override;
+
+private:
+    std::shared_ptr<HttpTransfers> transfers_;
+    std::unique_ptr<platform::HttpSession> shared_;
+};
+
+}  // namespace vrx::host

@@ -1,0 +1,283 @@
+#include "vrx/host/http/http_transfer.h"
+
+#include <string.h>
+
+#include <algorithm>
+
+#include "vrx/host/base/secret.h"
+#include "vrx/host/base/text.h"
+#include "vrx/host/http/http_cache_rules.h"
+
+namespace vrx::host {
+
+using platform::Data;
+using platform::Duration;
+using platform::Error;
+using platform::HttpHeaders;
+using platform::HttpRequest;
+using platform::HttpResponse;
+using platform::MaybeError;
+
+namespace {
+
+constexpr std::size_t headerBytes = 256 * 1024;
+
+struct UrlFreed {
+    void operator()(CURLU* url) const { curl().urlCleanup(url); }
+    void operator()(char* text) const { curl().free(text); }
+};
+
+std::string urlPart(CURLU* url, CURLUPart part) {
+    char* text = nullptr;
+    if (curl().urlGet(url, part, &text, 0) != CURLUE_OK) return "";
+    return std::unique_ptr<char, UrlFreed>(text).get();
+}
+
+bool isLoopback(const std::string& host) {
+    return host == "localhost" || host == "[::1]" ||
+           (host.starts_with("127.") && std::ranges::count(host, '.') == 3 &&
+            host.find_first_not_of("0123456789.") == std::string::npos);
+}
+
+// What a header of a request may consist of: nothing that could end it and begin another.
+bool isSafeHeader(const std::string& name, const std::string& value) {
+    return isHeaderName(name) && value.find_first_of(std::string_view("\r\n\0", 3)) == value.npos;
+}
+
+std::chrono::steady_clock::time_point deadlineAfter(Duration timeout, Duration longest) {
+    const Duration bounded = timeout < longest ? timeout : longest;
+    return std::chrono::steady_clock::now() +
+           std::chrono::ceil<std::chrono::steady_clock::duration>(bounded > Duration(0) ? bounded : Duration(0));
+}
+
+}  // namespace
+
+Error httpError(int code, std::string text) {
+    return Error{"http", code, std::move(text)};
+}
+
+HttpResponse httpFailure(Error error) {
+    return {.status = 0, .headers = {}, .body = std::nullopt, .error = std::move(error)};
+}
+
+HttpResponse httpSuccess(int status, HttpHeaders headers, Data body) {
+    std::optional<Data> arrived;
+    if (!body.empty()) arrived.emplace(std::move(body));
+    return {.status = status, .headers = std::move(headers), .body = std::move(arrived), .error = std::nullopt};
+}
+
+void HttpTransfer::Freed::operator()(curl_slist* list) const {
+    for (curl_slist* line = list; line; line = line->next) explicit_bzero(line->data, strlen(line->data));
+    curl().slistFreeAll(list);
+}
+
+HttpTransfer::HttpTransfer(HttpRequest request, bool isUncached, HttpSurroundings surroundings, Completion completion)
+    : request_(std::move(request)),
+      isUncached_(isUncached),
+      surroundings_(surroundings),
+      deadline_(
+          deadlineAfter(request_.timeout.value_or(surroundings.limits.timeout), surroundings.limits.longestTimeout)),
+      completion_(std::move(completion)),
+      address_(request_.url) {}
+
+HttpTransfer::~HttpTransfer() {
+    for (auto& [name, value] : request_.headers) wipe(value);
+}
+
+MaybeError HttpTransfer::checkAddress() {
+    std::unique_ptr<CURLU, UrlFreed> url(curl().url());
+    if (curl().urlSet(url.get(), CURLUPART_URL, address_.c_str(), CURLU_NON_SUPPORT_SCHEME) != CURLUE_OK)
+        return httpError(CURLE_URL_MALFORMAT, "the URL is malformed");
+    const std::string scheme = urlPart(url.get(), CURLUPART_SCHEME);
+    isPlain_ = scheme == "http";
+    isLoopback_ = isLoopback(urlPart(url.get(), CURLUPART_HOST));
+    if (!isPlain_ && scheme != "https")
+        return httpError(CURLE_UNSUPPORTED_PROTOCOL, "the scheme " + scheme + " is not supported");
+    if (isPlain_ && !isLoopback_)
+        return httpError(CURLE_UNSUPPORTED_PROTOCOL, "plain http is for this machine only; use https");
+    if (isPlain_ && isSecured_) return httpError(CURLE_UNSUPPORTED_PROTOCOL, "a redirect leaves https");
+    return std::nullopt;
+}
+
+// A redirect's address gets none of them.
+const HttpHeaders& HttpTransfer::ownHeaders() const {
+    static const HttpHeaders none;
+    return redirects_ > 0 ? none : request_.headers;
+}
+
+std::optional<HttpResponse> HttpTransfer::prepare() {
+    if (MaybeError error = checkAddress()) return httpFailure(std::move(*error));
+    if (redirects_ == 0) nameSourceApplication();
+    if (std::optional<HttpResponse> stored = storedAnswer()) return stored;
+
+    if (!easy_) easy_.reset(curl().easyInit());
+    if (!easy_) return httpFailure(httpError(CURLE_OUT_OF_MEMORY, "out of memory"));
+    curl().easyReset(easy_.get());  // keeps the connections
+    headers_.clear();
+    headerSize_ = 0;
+    body_.clear();
+    errorText_[0] = 0;
+    setOptions();
+    setBody();
+    if (MaybeError error = setHeaders()) return httpFailure(std::move(*error));
+    return std::nullopt;
+}
+
+// For whom the traffic is concerns nobody but a developer, whose server runs on this machine.
+void HttpTransfer::nameSourceApplication() {
+    const std::optional<std::string>& application = request_.sourceApplication;
+    if (application && isLoopback_ && isOneLine(*application) && surroundings_.profile.facts()->http.namesApplications)
+        request_.headers["X-Orvane-Source-Application"] = *application;
+}
+
+std::optional<HttpResponse> HttpTransfer::storedAnswer() {
+    // Of the other methods none is asked often enough to be worth it, and most change something.
+    isCached_ = request_.method == "GET" && request_.body.empty() && HttpCache::isFor(ownHeaders());
+    if (!isCached_) return std::nullopt;
+    HttpCache& cache = surroundings_.cache;
+    key_ = HttpCache::keyOf(address_, ownHeaders());
+    asked_ = cache.now();
+    stored_ = isUncached_ ? nullptr : cache.find(key_);
+    return stored_ ? cache.freshAnswer(*stored_) : std::nullopt;
+}
+
+void HttpTransfer::setOptions() {
+    set(CURLOPT_PRIVATE, this);
+    set(CURLOPT_URL, address_.c_str());
+    set(CURLOPT_PROTOCOLS_STR, "http,https");
+    set(CURLOPT_NOSIGNAL, 1L);
+    set(CURLOPT_QUICK_EXIT, 1L);  // a slow resolver is left behind, or the time-out would wait for it
+    set(CURLOPT_ERRORBUFFER, errorText_.data());
+    set(CURLOPT_HEADERFUNCTION, &HttpTransfer::onHeader);
+    set(CURLOPT_HEADERDATA, this);
+    set(CURLOPT_WRITEFUNCTION, &HttpTransfer::onBody);
+    set(CURLOPT_WRITEDATA, this);
+    set(CURLOPT_ACCEPT_ENCODING, "");
+    set(CURLOPT_SUPPRESS_CONNECT_HEADERS, 1L);
+    set(CURLOPT_HTTP_VERSION, long{CURL_HTTP_VERSION_2TLS});
+    // Requests sent at once share a connection where the server can. Without TLS nobody knows before the first answer,
+    // and a server that keeps silent would hold up the others.
+    if (!isPlain_) set(CURLOPT_PIPEWAIT, 1L);
+    // What goes to this machine does not leave it through a proxy; the environment may name one for all else.
+    if (isLoopback_) set(CURLOPT_NOPROXY, "*");
+    // Beside the system's own. Whom TLS trusts is the say of root and the agent's user alone.
+    const std::shared_ptr<const ProfileFacts> facts = surroundings_.profile.facts();
+    if (facts->http.caFile && facts->isTrusted) set(CURLOPT_CAINFO, facts->http.caFile->c_str());
+    const auto left = std::chrono::ceil<std::chrono::milliseconds>(deadline_ - SteadyClock::now()).count();
+    set(CURLOPT_TIMEOUT_MS, static_cast<long>(std::max<decltype(left)>(left, 1)));
+}
+
+void HttpTransfer::setBody() {
+    if (request_.method == "GET" && request_.body.empty()) return;
+    if (request_.method == "HEAD") return set(CURLOPT_NOBODY, 1L);
+    set(CURLOPT_POSTFIELDSIZE_LARGE, static_cast<curl_off_t>(request_.body.size()));
+    set(CURLOPT_POSTFIELDS, request_.body.empty() ? "" : reinterpret_cast<const char*>(request_.body.data()));
+    if (request_.method != "POST") set(CURLOPT_CUSTOMREQUEST, request_.method.c_str());
+}
+
+void HttpTransfer::addHeaderLine(const std::string& name, std::string_view value) {
+    std::string line;
+    line.reserve(name.size() + 2 + value.size());
+    line.append(name);
+    if (trimmed(value).empty())
+        line.append(";");
+    else
+        line.append(": ").append(value);
+    headerList_.reset(curl().slistAppend(headerList_.release(), line.c_str()));
+    wipe(line);
+}
+
+MaybeError HttpTransfer::setHeaders() {
+    const HttpHeaders& own = ownHeaders();
+    // What the library would add to a body of its own accord.
+    headerList_.reset(curl().slistAppend(nullptr, "Expect:"));
+    if (!own.contains("Content-Type")) headerList_.reset(curl().slistAppend(headerList_.release(), "Content-Type:"));
+    if (isUncached_ && !own.contains("Cache-Control")) addHeaderLine("Cache-Control", "no-cache");
+    for (const auto& [name, value] : own) {
+        if (!isSafeHeader(name, value))
+            return httpError(CURLE_BAD_FUNCTION_ARGUMENT, "a header of the request is malformed");
+        addHeaderLine(name, value);
+    }
+    if (stored_)
+        for (const auto& [name, value] : revalidationHeaders(stored_->answer.headers)) addHeaderLine(name, value);
+    set(CURLOPT_HTTPHEADER, headerList_.get());
+    return std::nullopt;
+}
+
+std::size_t HttpTransfer::onHeader(char* bytes, std::size_t, std::size_t size, void* self) {
+    auto& transfer = *static_cast<HttpTransfer*>(self);
+    const std::string_view line = trimmed({bytes, size});
+    // Each status line begins the headers anew, for instance after an interim answer.
+    if (line.starts_with("HTTP/")) transfer.headers_.clear();
+    transfer.headerSize_ += size;
+    if (transfer.headerSize_ > headerBytes) {
+        transfer.tooLarge_ = "the answer's headers are too large";
+        return 0;
+    }
+    const std::size_t colon = line.find(':');
+    if (colon == 0 || colon == line.npos) return size;
+    const std::string_view value = trimmed(line.substr(colon + 1));
+    auto [entry, isNew] = transfer.headers_.try_emplace(std::string(line.substr(0, colon)), value);
+    if (!isNew) entry->second.append(", ").append(value);
+    return size;
+}
+
+std::size_t HttpTransfer::onBody(char* bytes, std::size_t, std::size_t size, void* self) {
+    auto& transfer = *static_cast<HttpTransfer*>(self);
+    if (size > transfer.surroundings_.limits.answerBytes - transfer.body_.size()) {
+        transfer.tooLarge_ = "the answer is too large";
+        return 0;
+    }
+    transfer.body_.insert(transfer.body_.end(), bytes, bytes + size);
+    return size;
+}
+
+// Where the answer redirects to, if that is to be followed.
+const char* HttpTransfer::redirect() const {
+    const char* location = nullptr;
+    if (request_.method == "GET" || request_.method == "HEAD")
+        curl().easyGetinfo(easy_.get(), CURLINFO_REDIRECT_URL, &location);
+    return location;
+}
+
+// A body of whose length HTTP/1 says nothing ends with the connection, which may have broken.
+bool HttpTransfer::isWhole() const {
+    long version = 0;
+    curl().easyGetinfo(easy_.get(), CURLINFO_HTTP_VERSION, &version);
+    return version >= CURL_HTTP_VERSION_2_0 || headers_.contains("Content-Length") ||
+           headers_.contains("Transfer-Encoding");
+}
+
+std::optional<HttpResponse> HttpTransfer::finish(CURLcode result) {
+    long status = 0;
+    curl().easyGetinfo(easy_.get(), CURLINFO_RESPONSE_CODE, &status);
+    if (result != CURLE_OK) {
+        const char* text = errorText_[0] ? errorText_.data() : curl().easyStrerror(result);
+        HttpResponse response =
+            httpFailure(tooLarge_ ? httpError(CURLE_FILESIZE_EXCEEDED, tooLarge_) : httpError(result, text));
+        response.status = static_cast<int>(status);  // that of an answer which broke off
+        return response;
+    }
+    HttpCache& cache = surroundings_.cache;
+
+    if (stored_ && status == 304) {
+        if (isConfirmed(stored_->answer.headers, headers_)) return cache.revalidated(*stored_, asked_, headers_);
+        cache.forget(address_);
+        return std::nullopt;
+    }
+    if (const char* location = redirect()) {
+        if (redirects_++ == surroundings_.limits.redirects)
+            return httpFailure(httpError(CURLE_TOO_MANY_REDIRECTS, "too many redirects"));
+        address_ = location;
+        isSecured_ = !isPlain_;
+        return std::nullopt;
+    }
+    const bool isKept = isCached_ && status == 200 && isWhole();
+    HttpResponse response = httpSuccess(static_cast<int>(status), std::move(headers_), std::move(body_));
+    if (isKept) cache.store(key_, address_, asked_, response);
+    // What was changed at the address is not what is kept of it.
+    if (request_.method != "GET" && request_.method != "HEAD" && status < 400) cache.forget(address_);
+    return response;
+}
+
+}  // namespace vrx::host

@@ -1,0 +1,100 @@
+// One request on its way, over all of its redirects, on a libcurl handle of its own. Belongs to the transfer thread
+// once it is there. The request's headers, which may hold credentials, are wiped with it.
+#pragma once
+
+#include <array>
+#include <chrono>
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "vrx/host/http/curl.h"
+#include "vrx/host/http/http.h"
+#include "vrx/host/http/http_cache.h"
+#include "vrx/host/profile/device_profile.h"
+
+namespace vrx::host {
+
+platform::Error httpError(int code, std::string text);
+platform::HttpResponse httpFailure(platform::Error error);
+platform::HttpResponse httpSuccess(int status, platform::HttpHeaders headers, platform::Data body);
+
+// What all transfers share; it outlives them.
+struct HttpSurroundings {
+    const HttpLimits& limits;
+    const DeviceProfile& profile;
+    HttpCache& cache;
+};
+
+class HttpTransfer {
+public:
+    using Completion = platform::OnceCallback<platform::HttpResponse>;
+
+    HttpTransfer(platform::HttpRequest request, bool isUncached, HttpSurroundings surroundings, Completion completion);
+    ~HttpTransfer();
+    HttpTransfer(const HttpTransfer&) = delete;
+    HttpTransfer& operator=(const HttpTransfer&) = delete;
+
+    CURL* easy() const { return easy_.get(); }
+    Completion takeCompletion() { return std::move(completion_); }
+
+    // Makes ready to be sent to the next address, the request's own or a redirect's. The response, when nothing is to
+    // be sent: a fresh one that was stored, or a failure.
+    std::optional<platform::HttpResponse> prepare();
+    // The response, once the library is done; nothing when there is another address to be asked: then prepare() is
+    // next.
+    std::optional<platform::HttpResponse> finish(CURLcode result);
+
+private:
+    struct Freed {
+        void operator()(CURL* easy) const { curl().easyCleanup(easy); }
+        void operator()(curl_slist* list) const;
+    };
+    using SteadyClock = std::chrono::steady_clock;
+
+    platform::MaybeError checkAddress();
+    const platform::HttpHeaders& ownHeaders() const;
+    void nameSourceApplication();
+    std::optional<platform::HttpResponse> storedAnswer();
+    void setOptions();
+    void setBody();
+    platform::MaybeError setHeaders();
+    void addHeaderLine(const std::string& name, std::string_view value);
+    const char* redirect() const;
+    bool isWhole() const;
+    template <class T>
+    void set(CURLoption option, T value) {
+        curl().easySetopt(easy_.get(), option, value);
+    }
+
+    static std::size_t onHeader(char* bytes, std::size_t one, std::size_t size, void* self);
+    static std::size_t onBody(char* bytes, std::size_t one, std::size_t size, void* self);
+
+    platform::HttpRequest request_;
+    const bool isUncached_;
+    const HttpSurroundings surroundings_;
+    const SteadyClock::time_point deadline_;
+    Completion completion_;
+
+    std::string address_;
+    bool isPlain_ = false;     // not over TLS
+    bool isLoopback_ = false;  // to this machine
+    bool isSecured_ = false;   // what redirected there came over TLS
+    int redirects_ = 0;
+
+    bool isCached_ = false;  // may be answered from the cache, and go there
+    HttpCache::Key key_{};
+    HttpCache::Stored stored_;  // what is being asked about
+    platform::Date asked_;
+
+    std::unique_ptr<CURL, Freed> easy_;
+    std::unique_ptr<curl_slist, Freed> headerList_;
+    std::array<char, CURL_ERROR_SIZE> errorText_{};
+
+    platform::HttpHeaders headers_;
+    std::size_t headerSize_ = 0;
+    platform::Data body_;
+    const char* tooLarge_ = nullptr;
+};
+
+}  // namespace vrx::host

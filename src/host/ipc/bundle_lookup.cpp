@@ -1,0 +1,101 @@
+#include "vrx/host/ipc/bundle_lookup.h"
+
+#include <grp.h>
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+
+#include "vrx/platform/log.h"
+
+namespace vrx::host {
+
+using platform::Bundle;
+using platform::Level;
+using platform::log;
+using platform::MaybeError;
+using platform::Result;
+using platform::Value;
+
+namespace {
+
+thread_local const PeerIdentity* peerUnderAcceptance = nullptr;
+
+bool isSameFile(const std::string& one, const std::string& other) {
+    struct stat oneStatus;
+    struct stat otherStatus;
+    return stat(one.c_str(), &oneStatus) == 0 && stat(other.c_str(), &otherStatus) == 0 &&
+           oneStatus.st_dev == otherStatus.st_dev && oneStatus.st_ino == otherStatus.st_ino;
+}
+
+bool isGroup(gid_t number, const std::string& name) {
+    group entry{};
+    group* found = nullptr;
+    std::array<char, 16384> buffer;
+    return getgrnam_r(name.c_str(), &entry, buffer.data(), buffer.size(), &found) == 0 && found &&
+           found->gr_gid == number;
+}
+
+}  // namespace
+
+BundleLookup::Acceptance::Acceptance(const PeerIdentity& peer) {
+    peerUnderAcceptance = &peer;
+}
+
+BundleLookup::Acceptance::~Acceptance() {
+    peerUnderAcceptance = nullptr;
+}
+
+std::size_t BundleLookup::executablePath(std::int32_t processIdentifier, std::span<char> buffer) const {
+    const bool isUnderAcceptance = peerUnderAcceptance && peerUnderAcceptance->processIdentifier() == processIdentifier;
+    const std::string path =
+        isUnderAcceptance ? peerUnderAcceptance->executable() : executableOfProcess(processIdentifier);
+    if (path.size() > buffer.size()) return 0;
+    std::copy(path.begin(), path.end(), buffer.begin());
+    return path.size();
+}
+
+std::optional<Bundle> BundleLookup::bundleContaining(const std::string& executablePath) const {
+    std::optional<BundleFile> file = bundleOf(executablePath);
+    if (!file) return std::nullopt;
+    return Bundle{file->folder, file->identifier};
+}
+
+Value BundleLookup::entitlement(const PeerIdentity& peer, std::string_view name) const {
+    std::optional<BundleFile> file = bundleOf(peer.executable());
+    if (!file || (file->group && !isGroup(peer.group(), *file->group))) return nullptr;
+    auto entry = file->entitlements.find(name);
+    return entry == file->entitlements.end() ? Value() : entry->second;
+}
+
+std::optional<BundleFile> BundleLookup::bundleOf(const std::string& executable) const {
+    if (executable.empty()) return std::nullopt;
+    if (MaybeError error = isKeptFromOthers(executable)) {
+        log(Level::Default, "%@ has no bundle: %@", executable, error->text);
+        return std::nullopt;
+    }
+    if (std::optional<BundleFile> file = profileBundle(executable)) return file;
+    for (std::string folder = executable.substr(0, executable.rfind('/')); !folder.empty();
+         folder.resize(folder.rfind('/'))) {
+        Result<BundleFile> file = readBundleFile(folder);
+        if (file) return std::move(file).value();
+        if (file.error().code == ENOENT) continue;
+        log(Level::Default, "%@ has no bundle: %@", executable, file.error().text);
+        return std::nullopt;
+    }
+    return std::nullopt;
+}
+
+std::optional<BundleFile> BundleLookup::profileBundle(const std::string& executable) const {
+    const std::shared_ptr<const ProfileFacts> facts = profile_ ? profile_() : nullptr;
+    if (!facts || !facts->isTrusted) return std::nullopt;
+    for (const ProfileBundle& bundle : facts->bundles)
+        for (const std::string& named : bundle.executables)
+            if (isSameFile(named, executable))
+                return BundleFile{executable,    bundle.identifier, bundle.name,
+                                  bundle.vendor, bundle.group,      bundle.entitlements};
+    return std::nullopt;
+}
+
+}  // namespace vrx::host

@@ -1,0 +1,113 @@
+#include "vrx/host/ipc/peer_identity.h"
+
+#include <fcntl.h>
+#include <poll.h>
+#include <sys/socket.h>
+#include <sys/syscall.h>
+
+#include <array>
+#include <cerrno>
+#include <climits>
+#include <cstdio>
+#include <ctime>
+#include <fstream>
+#include <sstream>
+
+#include "vrx/host/base/files.h"
+
+namespace vrx::host {
+
+using platform::Result;
+
+namespace {
+
+constexpr int peerPidfdOption = 77;  // SO_PEERPIDFD, since Linux 6.5; the headers do not have it yet
+
+bool isSameFile(const struct stat& one, const struct stat& other) {
+    return one.st_dev == other.st_dev && one.st_ino == other.st_ino;
+}
+
+Descriptor openProcessFolder(pid_t processIdentifier) {
+    const std::string path = "/proc/" + std::to_string(processIdentifier);
+    return Descriptor(open(path.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+}
+
+bool hasEnded(const Descriptor& pidfd) {
+    pollfd ended{pidfd.number(), POLLIN, 0};
+    return poll(&ended, 1, 0) != 0;
+}
+
+// Whether the process was there before this moment: its number has not been taken over since.
+bool hasStartedBefore(const Descriptor& process, const timespec& moment) {
+    std::ifstream file("/proc/self/fd/" + std::to_string(process.number()) + "/stat");
+    std::string text;
+    if (!std::getline(file, text)) return false;
+    // The start time is the 22nd field; the 2nd, the name in parentheses, may hold anything.
+    const std::size_t name = text.rfind(')');
+    if (name == std::string::npos) return false;
+    std::istringstream fields(text.substr(name + 1));
+    std::string skipped;
+    for (int field = 3; field < 22; ++field) fields >> skipped;
+    long long started = 0;
+    if (!(fields >> started)) return false;
+    const long long perSecond = sysconf(_SC_CLK_TCK);
+    return started <= moment.tv_sec * perSecond + moment.tv_nsec * perSecond / 1'000'000'000;
+}
+
+// The program's path, as long as the file that stands there is the program's.
+std::string pathOfProgram(const Descriptor& process, const struct stat& program) {
+    std::array<char, PATH_MAX> buffer;
+    const ssize_t length = readlinkat(process.number(), "exe", buffer.data(), buffer.size());
+    if (length <= 0 || static_cast<std::size_t>(length) == buffer.size()) return {};
+    std::string path(buffer.data(), static_cast<std::size_t>(length));
+    struct stat status;
+    return stat(path.c_str(), &status) == 0 && isSameFile(status, program) ? path : std::string();
+}
+
+}  // namespace
+
+Result<PeerIdentity> PeerIdentity::ofPeer(int socket) {
+    timespec now{};
+    clock_gettime(CLOCK_BOOTTIME, &now);
+    ucred credentials{};
+    socklen_t size = sizeof credentials;
+    if (getsockopt(socket, SOL_SOCKET, SO_PEERCRED, &credentials, &size) != 0)
+        return systemError("identify", "the peer", errno);
+
+    int pidfd = -1;
+    size = sizeof pidfd;
+    const bool isExact = getsockopt(socket, SOL_SOCKET, peerPidfdOption, &pidfd, &size) == 0;
+    const Descriptor guard(isExact ? pidfd : openProcess(credentials.pid).release());
+    if (!guard) return systemError("identify", "process " + std::to_string(credentials.pid), errno);
+
+    PeerIdentity peer;
+    peer.processIdentifier_ = credentials.pid;
+    peer.user_ = credentials.uid;
+    peer.group_ = credentials.gid;
+    peer.process_ = openProcessFolder(credentials.pid);
+    // The process lives, so the folder that was opened before is its own. A signal would not tell a zombie.
+    if (!peer.process_ || hasEnded(guard) || (!isExact && !hasStartedBefore(peer.process_, now)))
+        return systemError("identify", "process " + std::to_string(credentials.pid), ESRCH);
+    peer.findExecutable();
+    return peer;
+}
+
+void PeerIdentity::findExecutable() {
+    program_ = Descriptor(openat(process_.number(), "exe", O_PATH | O_CLOEXEC));
+    if (program_ && fstat(program_.number(), &programStatus_) == 0)
+        executable_ = pathOfProgram(process_, programStatus_);
+}
+
+bool PeerIdentity::runsSameProgram() const {
+    struct stat status;
+    return program_ && fstatat(process_.number(), "exe", &status, 0) == 0 && isSameFile(status, programStatus_);
+}
+
+std::string executableOfProcess(pid_t processIdentifier) {
+    const Descriptor process = openProcessFolder(processIdentifier);
+    struct stat status;
+    if (!process || fstatat(process.number(), "exe", &status, 0) != 0) return {};
+    return pathOfProgram(process, status);
+}
+
+}  // namespace vrx::host

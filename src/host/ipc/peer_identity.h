@@ -1,0 +1,49 @@
+// Who is at the other end of a connection: the process that connected, its user and group at that time, and the program
+// that it runs. Race-free: a process that takes the same number later is never mistaken for the peer. The program tells
+// who calls; it proves nothing against hostile code of the same user, which can trace or preload it. One thread at a
+// time.
+#pragma once
+
+#include <sys/stat.h>
+#include <sys/types.h>
+
+#include <string>
+
+#include "vrx/host/base/descriptor.h"
+#include "vrx/platform/error.h"
+
+namespace vrx::host {
+
+class PeerIdentity {
+public:
+    // An error when the peer has ended already.
+    static platform::Result<PeerIdentity> ofPeer(int socket);
+
+    pid_t processIdentifier() const { return processIdentifier_; }
+    uid_t user() const { return user_; }
+    gid_t group() const { return group_; }
+
+    // The absolute path of the program. Empty when it may not be known (another user's or a protected process), and
+    // when the file at that path is not the program any more.
+    const std::string& executable() const { return executable_; }
+
+    // Whether the peer still lives and runs the program it ran when it was looked at.
+    bool runsSameProgram() const;
+
+private:
+    PeerIdentity() = default;
+    void findExecutable();
+
+    pid_t processIdentifier_ = 0;
+    uid_t user_ = 0;
+    gid_t group_ = 0;
+    Descriptor process_;  // /proc/PID of this very process
+    Descriptor program_;  // the program's file, held so that its inode is not used again
+    struct stat programStatus_ {};
+    std::string executable_;
+};
+
+// The path of the program that a process runs, by the rules of PeerIdentity::executable(), though not race-free.
+std::string executableOfProcess(pid_t processIdentifier);
+
+}  // namespace vrx::host

@@ -1,0 +1,120 @@
+#include "vrx/host/ipc/refusals.h"
+
+#include <poll.h>
+#include <sys/eventfd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <system_error>
+#include <vector>
+
+#include "vrx/host/ipc/server_bus.h"
+
+namespace vrx::host {
+
+using std::chrono::steady_clock;
+
+// One client on its way out.
+class Refusals::Refused {
+public:
+    Refused(Descriptor socket, pid_t peer, const char* errorName, std::string text, steady_clock::time_point end)
+        : bus_(std::move(socket), peer), errorName_(errorName), text_(std::move(text)), end_(end) {
+        if (bus_.bus()) sd_bus_add_filter(bus_.bus(), nullptr, onMessage, this);
+    }
+
+    // Does what can be done at once; whether there is more to come.
+    bool goesOn(steady_clock::time_point now) {
+        ServerBus::Step step = ServerBus::Step::Progress;
+        while (step == ServerBus::Step::Progress && !(isAnswered_ && bus_.unsentMessages() == 0)) step = bus_.step();
+        return step == ServerBus::Step::Idle && now < end_;
+    }
+
+    pollfd waitFor() const { return {bus_.socket(), bus_.events(), 0}; }
+    steady_clock::time_point end() const { return end_; }
+
+private:
+    static int onMessage(sd_bus_message* message, void* self, sd_bus_error*) {
+        return static_cast<Refused*>(self)->answer(message);
+    }
+
+    // Tools may introspect before they call: they stay until the call that was meant.
+    int answer(sd_bus_message* message) {
+        std::uint8_t type = 0;
+        sd_bus_message_get_type(message, &type);
+        if (type != SD_BUS_MESSAGE_METHOD_CALL) return 0;
+        if (sd_bus_message_is_method_call(message, "org.freedesktop.DBus", "Hello") > 0) return 0;
+        sd_bus_reply_method_errorf(message, errorName_, "%s", text_.c_str());
+        isAnswered_ = sd_bus_message_is_method_call(message, "org.freedesktop.DBus.Introspectable", nullptr) <= 0;
+        return 1;
+    }
+
+    ServerBus bus_;
+    const char* const errorName_;
+    const std::string text_;
+    const steady_clock::time_point end_;
+    bool isAnswered_ = false;
+};
+
+Refusals::Refusals(const ServiceLimits& limits) : limits_(limits), wakeFile_(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {
+    if (!wakeFile_) throw std::system_error(errno, std::generic_category(), "eventfd");
+}
+
+Refusals::~Refusals() {
+    {
+        std::lock_guard lock(mutex_);
+        isStopping_ = true;
+    }
+    eventfd_write(wakeFile_.number(), 1);
+    if (thread_.joinable()) thread_.join();
+}
+
+void Refusals::refuse(Descriptor socket, pid_t peer, const char* errorName, std::string text) {
+    if (!thread_.joinable()) {
+        try {
+            thread_ = std::thread([this] { run(); });
+        } catch (const std::system_error&) {
+            return;  // no thread to be had: the client learns nothing
+        }
+    }
+    {
+        std::lock_guard lock(mutex_);
+        if (count_ >= limits_.refusals) return;
+        ++count_;
+        arriving_.push_back(std::make_unique<Refused>(std::move(socket), peer, errorName, std::move(text),
+                                                      steady_clock::now() + limits_.refusal));
+    }
+    eventfd_write(wakeFile_.number(), 1);
+}
+
+void Refusals::run() {
+    pthread_setname_np(pthread_self(), "refusals");
+    while (true) {
+        {
+            std::lock_guard lock(mutex_);
+            if (isStopping_) break;
+            present_.splice(present_.end(), arriving_);
+        }
+        const int timeout = serveAll();
+        std::vector<pollfd> files{{wakeFile_.number(), POLLIN, 0}};
+        for (const auto& refused : present_) files.push_back(refused->waitFor());
+        poll(files.data(), files.size(), timeout);
+        eventfd_t count;
+        eventfd_read(wakeFile_.number(), &count);
+    }
+    present_.clear();
+}
+
+// Milliseconds until the first of those who stay has had its time, or -1.
+int Refusals::serveAll() {
+    const auto now = steady_clock::now();
+    const std::size_t ended = std::erase_if(present_, [now](auto& refused) { return !refused->goesOn(now); });
+    {
+        std::lock_guard lock(mutex_);
+        count_ -= ended;
+    }
+    if (present_.empty()) return -1;
+    const auto first = std::ranges::min_element(present_, {}, [](auto& refused) { return refused->end(); });
+    return static_cast<int>(std::chrono::ceil<std::chrono::milliseconds>((*first)->end() - now).count());
+}
+
+}  // namespace vrx::host

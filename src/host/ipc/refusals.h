@@ -1,0 +1,44 @@
+// Tells refused clients why: takes each through authentication, answers its calls with the error, and closes after the
+// first that is not introspection. All share one thread, which is there from the first refusal on and sleeps while
+// there is none. Main thread.
+#pragma once
+
+#include <atomic>
+#include <chrono>
+#include <list>
+#include <memory>
+#include <mutex>
+#include <string>
+#include <thread>
+
+#include "vrx/host/base/descriptor.h"
+#include "vrx/host/ipc/service_limits.h"
+
+namespace vrx::host {
+
+class Refusals {
+public:
+    explicit Refusals(const ServiceLimits& limits);
+    ~Refusals();
+    Refusals(const Refusals&) = delete;
+    Refusals& operator=(const Refusals&) = delete;
+
+    // Closes the socket at once when too many are being told, or when it takes the client too long to listen.
+    void refuse(Descriptor socket, pid_t peer, const char* errorName, std::string text);
+
+private:
+    class Refused;
+    void run();
+    int serveAll();
+
+    const ServiceLimits& limits_;
+    const Descriptor wakeFile_;
+    std::mutex mutex_;
+    std::list<std::unique_ptr<Refused>> arriving_;
+    std::size_t count_ = 0;  // of those that have not ended, arriving ones included
+    bool isStopping_ = false;
+    std::list<std::unique_ptr<Refused>> present_;  // the thread's
+    std::thread thread_;
+};
+
+}  // namespace vrx::host

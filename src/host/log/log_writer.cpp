@@ -1,0 +1,232 @@
+#include "vrx/host/log/log_writer.h"
+
+#define SD_JOURNAL_SUPPRESS_LOCATION  // the records bring their own
+#include <pthread.h>
+#include <sys/socket.h>
+#include <sys/uio.h>
+#include <sys/un.h>
+#include <systemd/sd-journal.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <atomic>
+#include <cerrno>
+#include <chrono>
+#include <climits>
+#include <csignal>
+#include <ctime>
+#include <utility>
+
+namespace vrx::host {
+
+namespace {
+
+// How long records are gathered: one wake-up serves them all.
+constexpr std::chrono::milliseconds gatheringTime(5);
+// With so much pending they are written at once.
+constexpr std::size_t enoughPending = 16 * 1024;
+// With so much pending whoever logs waits for the thread: nothing is dropped, and memory stays bounded.
+constexpr std::size_t mostPending = 64 * 1024;
+
+sockaddr_un journalAddress() {
+    return {AF_UNIX, "/run/systemd/journal/socket"};
+}
+
+int openJournal() {
+    const int socket = ::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+    constexpr int size = 8 * 1024 * 1024;  // the journal may be slow for a while
+    if (socket >= 0) setsockopt(socket, SOL_SOCKET, SO_SNDBUF, &size, sizeof size);
+    return socket;
+}
+
+}  // namespace
+
+// At a signal that ends the process, lets the writers write what they have, and leaves the rest to whoever handled the
+// signal before.
+class LogWriter::CrashGuard {
+public:
+    static void add(LogWriter* writer) {
+        static const bool isInstalled = install();
+        (void)isInstalled;
+        for (auto& slot : writers()) {
+            LogWriter* none = nullptr;
+            if (slot.compare_exchange_strong(none, writer)) return;
+        }
+    }
+    static void remove(LogWriter* writer) {
+        for (auto& slot : writers()) {
+            LogWriter* expected = writer;
+            slot.compare_exchange_strong(expected, nullptr);
+        }
+    }
+
+private:
+    static constexpr std::array signals{SIGSEGV, SIGBUS, SIGILL, SIGFPE, SIGABRT};
+
+    static std::array<std::atomic<LogWriter*>, 4>& writers() {
+        static std::array<std::atomic<LogWriter*>, 4> writers{};
+        return writers;
+    }
+    static std::array<struct sigaction, signals.size()>& previous() {
+        static std::array<struct sigaction, signals.size()> previous{};
+        return previous;
+    }
+    static bool install() {
+        writers();
+        struct sigaction action {};
+        action.sa_handler = onCrash;
+        sigemptyset(&action.sa_mask);
+        action.sa_flags = SA_ONSTACK;
+        for (std::size_t i = 0; i < signals.size(); ++i) sigaction(signals[i], &action, &previous()[i]);
+        return true;
+    }
+    static void onCrash(int signal) {
+        for (std::size_t i = 0; i < signals.size(); ++i)
+            if (signals[i] == signal) sigaction(signal, &previous()[i], nullptr);
+        for (auto& slot : writers())
+            if (LogWriter* writer = slot.exchange(nullptr)) writer->flushInCrash();
+        // What faulted faults again when this returns; what was sent is sent again.
+        raise(signal);
+    }
+};
+
+LogWriter::LogWriter(int file, Form form) : file_(file), journal_(form == Form::Journal ? openJournal() : -1) {
+    CrashGuard::add(this);
+}
+
+LogWriter::~LogWriter() {
+    CrashGuard::remove(this);
+    {
+        std::lock_guard lock(mutex_);
+        isEnding_ = true;
+        changed_.notify_one();
+    }
+    if (thread_.joinable()) thread_.join();
+    flush();
+    if (journal_ >= 0) ::close(journal_);
+}
+
+std::string_view LogWriter::Batch::record(std::size_t index) const {
+    const std::size_t begin = index == 0 ? 0 : ends[index - 1];
+    return std::string_view(bytes).substr(begin, ends[index] - begin);
+}
+
+void LogWriter::add(std::string_view record) {
+    std::unique_lock lock(mutex_);
+    hasRoom_.wait(lock, [this] { return pending_.bytes.size() <= mostPending; });
+    const bool wasEnough = isEnough();
+    pending_.bytes += record;
+    pending_.ends.push_back(pending_.bytes.size());
+    if (!thread_.joinable()) {
+        // Signals are others' business.
+        sigset_t all, before;
+        sigfillset(&all);
+        pthread_sigmask(SIG_SETMASK, &all, &before);
+        thread_ = std::thread([this] { run(); });
+        pthread_sigmask(SIG_SETMASK, &before, nullptr);
+    } else if (std::exchange(isIdle_, false) || isEnough() != wasEnough) {
+        changed_.notify_one();
+    }
+}
+
+bool LogWriter::isEnough() const {
+    return pending_.bytes.size() > enoughPending;
+}
+
+void LogWriter::run() {
+    pthread_setname_np(pthread_self(), "log");
+    std::unique_lock lock(mutex_);
+    while (!isEnding_) {
+        isIdle_ = pending_.ends.empty();
+        if (isIdle_) changed_.wait(lock, [this] { return isEnding_ || !isIdle_; });
+        changed_.wait_for(lock, gatheringTime, [this] { return isEnding_ || isEnough(); });
+        lock.unlock();
+        flush();
+        lock.lock();
+    }
+}
+
+void LogWriter::flush() {
+    std::lock_guard writing(writing_);
+    writtenBatch_.bytes.clear();
+    writtenBatch_.ends.clear();
+    {
+        std::lock_guard lock(mutex_);
+        std::swap(pending_, writtenBatch_);
+    }
+    hasRoom_.notify_all();
+    write(writtenBatch_);
+}
+
+void LogWriter::write(const Batch& batch) const {
+    if (journal_ >= 0) return sendToJournal(batch);
+    // Lines together as long as the system keeps them whole beside those of other processes.
+    for (std::size_t begin = 0, next = 0; next < batch.ends.size();) {
+        std::size_t end = batch.ends[next++];
+        while (next < batch.ends.size() && batch.ends[next] - begin <= PIPE_BUF) end = batch.ends[next++];
+        writeToFile(std::string_view(batch.bytes).substr(begin, end - begin));
+        begin = end;
+    }
+}
+
+// What a full pipe refuses is lost.
+void LogWriter::writeToFile(std::string_view bytes) const {
+    while (!bytes.empty()) {
+        const ssize_t count = ::write(file_, bytes.data(), bytes.size());
+        if (count < 0 && errno == EINTR) continue;
+        if (count <= 0) return;
+        bytes.remove_prefix(static_cast<std::size_t>(count));
+    }
+}
+
+void LogWriter::sendToJournal(const Batch& batch) const {
+    constexpr std::size_t most = 64;
+    sockaddr_un address = journalAddress();
+    for (std::size_t next = 0; next < batch.ends.size();) {
+        std::array<iovec, most> parts;
+        std::array<mmsghdr, most> messages{};
+        const std::size_t count = std::min(most, batch.ends.size() - next);
+        for (std::size_t i = 0; i < count; ++i) {
+            const std::string_view record = batch.record(next + i);
+            parts[i] = {const_cast<char*>(record.data()), record.size()};
+            messages[i].msg_hdr.msg_name = &address;
+            messages[i].msg_hdr.msg_namelen = sizeof address;
+            messages[i].msg_hdr.msg_iov = &parts[i];
+            messages[i].msg_hdr.msg_iovlen = 1;
+        }
+        const int sent = sendmmsg(journal_, messages.data(), static_cast<unsigned>(count), MSG_NOSIGNAL);
+        if (sent > 0) {
+            next += static_cast<std::size_t>(sent);
+        } else if (errno != EINTR) {
+            sendLargeToJournal(batch.record(next++));
+        }
+    }
+}
+
+// Too large for a datagram, which the journal's own library knows a way for; or there is no journal.
+void LogWriter::sendLargeToJournal(std::string_view record) const {
+    std::vector<iovec> fields;
+    for (std::string_view rest = record; !rest.empty();) {
+        const std::size_t end = std::min(rest.find('\n'), rest.size() - 1);
+        fields.push_back({const_cast<char*>(rest.data()), end});
+        rest.remove_prefix(end + 1);
+    }
+    if (sd_journal_sendv(fields.data(), static_cast<int>(fields.size())) < 0) writeToFile(record);
+}
+
+// Within a signal handler: the thread that holds a lock may be the one that was struck, and is waited for a while only.
+void LogWriter::flushInCrash() {
+    auto lockInTime = [](std::mutex& mutex) {
+        constexpr int tries = 50;
+        constexpr timespec pause{0, 1'000'000};
+        for (int i = 0; i < tries; ++i) {
+            if (mutex.try_lock()) return true;
+            nanosleep(&pause, nullptr);
+        }
+        return false;
+    };
+    if (lockInTime(writing_) && lockInTime(mutex_)) write(pending_);
+}
+
+}  // namespace vrx::host

@@ -1,0 +1,28 @@
+// The log: the journal when standard error is connected to it, else one line an entry on standard error. Private
+// arguments are redacted in both, and nothing in an argument can begin a line of its own. Any thread may log; an error
+// is written before the call returns, everything else soon after.
+#pragma once
+
+#include "vrx/host/log/log_writer.h"
+#include "vrx/platform/log.h"
+
+namespace vrx::host {
+
+class SystemLog final : public platform::SystemLog {
+public:
+    // Entries below the level are dropped. Lines go to the given file, which is not owned.
+    explicit SystemLog(platform::Level lowest = platform::Level::Default, int file = 2);
+
+    bool isOn(platform::Level level) const override { return level >= lowest_; }
+    void write(const platform::LogEntry& entry) override;
+
+    // Writes what was logged before: for what ends the process without a word.
+    void flush() { writer_.flush(); }
+
+private:
+    const platform::Level lowest_;
+    const bool isJournal_;
+    LogWriter writer_;
+};
+
+}  // namespace vrx::host

@@ -1,0 +1,44 @@
+// Tells when one of some files may have changed: whether it is written in place, replaced by another of its name,
+// removed, or comes and goes with its folder. It is told by what happens in the folder, by whatever name, because that
+// is where editors do what they do; and says so only after a short pause, so that many changes in a row are one. It
+// costs nothing while nothing happens. Main thread.
+#pragma once
+
+#include <functional>
+#include <set>
+#include <string>
+#include <vector>
+
+#include "vrx/host/base/descriptor.h"
+#include "vrx/host/loop/event_source.h"
+#include "vrx/platform/date.h"
+
+namespace vrx::host {
+
+class FileWatch {
+public:
+    // A file need not exist, nor its folder, if the one above exists. The event loop must outlive the watch.
+    FileWatch(sd_event* loop, std::vector<std::string> paths, platform::Duration pause, std::function<void()> onChange);
+    FileWatch(const FileWatch&) = delete;
+    FileWatch& operator=(const FileWatch&) = delete;
+
+    // Calls as if something had changed, after that time, or sooner if something does.
+    void callIn(platform::Duration delay);
+
+private:
+    static int onEvents(sd_event_source*, int file, std::uint32_t, void* self);
+    static int onPause(sd_event_source*, std::uint64_t, void* self);
+    void watchFolders();
+    void addFolders(const std::string& path, std::set<int>& watches) const;
+
+    const std::vector<std::string> paths_;
+    const platform::Duration pause_;
+    const std::function<void()> onChange_;
+    Descriptor file_;
+    std::set<int> watches_;
+    EventSource eventSource_;
+    EventSource pauseSource_;
+    bool isPausing_ = false;
+};
+
+}  // namespace vrx::host

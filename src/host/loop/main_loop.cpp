@@ -1,0 +1,184 @@
+#include "vrx/host/loop/main_loop.h"
+
+#include <sys/eventfd.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <ctime>
+#include <iterator>
+#include <system_error>
+
+namespace vrx::host {
+
+using platform::Duration;
+using platform::Task;
+
+namespace {
+
+std::uint64_t bootMicroseconds() {
+    timespec now{};
+    clock_gettime(CLOCK_BOOTTIME, &now);
+    return static_cast<std::uint64_t>(now.tv_sec) * 1'000'000 + static_cast<std::uint64_t>(now.tv_nsec) / 1'000;
+}
+
+// Later than now by the delay, rounded up; what has no sensible end is a century.
+std::uint64_t dueTime(Duration delay) {
+    constexpr double century = 100.0 * 366 * 86400;
+    double seconds = delay.count() < century ? delay.count() : century;
+    return bootMicroseconds() + static_cast<std::uint64_t>(seconds * 1e6) + 1;
+}
+
+void check(int result, const char* what) {
+    if (result < 0) throw std::system_error(-result, std::generic_category(), what);
+}
+
+}  // namespace
+
+MainLoop::MainLoop() {
+    sigset_t stopping;
+    sigemptyset(&stopping);
+    sigaddset(&stopping, SIGTERM);
+    sigaddset(&stopping, SIGINT);
+    pthread_sigmask(SIG_BLOCK, &stopping, &previousSignals_);
+
+    check(sd_event_new(&event_), "event loop");
+    auto onSignal = [](sd_event_source*, const signalfd_siginfo*, void* self) {
+        static_cast<MainLoop*>(self)->wasStoppedBySignal_ = true;
+        static_cast<MainLoop*>(self)->stop();
+        return 0;
+    };
+    check(sd_event_add_signal(event_, nullptr, SIGTERM, onSignal, this), "SIGTERM");
+    check(sd_event_add_signal(event_, nullptr, SIGINT, onSignal, this), "SIGINT");
+
+    wakeFile_ = eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK);
+    check(wakeFile_ < 0 ? -errno : 0, "eventfd");
+    check(sd_event_add_io(event_, &wakeSource_, wakeFile_, EPOLLIN, onWake, this), "eventfd");
+    // Accurate to a millisecond, and never early.
+    check(sd_event_add_time(event_, &timerSource_, CLOCK_BOOTTIME, 0, 1000, onTimer, this), "timer");
+    check(sd_event_source_set_enabled(timerSource_, SD_EVENT_OFF), "timer");
+}
+
+MainLoop::~MainLoop() {
+    {
+        // A task that is let go may post again while it goes.
+        platform::ShutdownScope shutdown;
+        while (true) {
+            std::deque<Task> posted;
+            std::multimap<std::uint64_t, Timer> timers;
+            std::lock_guard lock(mutex_);
+            posted.swap(posted_);
+            timers.swap(timers_);
+            if (posted.empty() && timers.empty()) break;
+        }
+    }
+    sd_event_source_unref(timerSource_);
+    sd_event_source_unref(wakeSource_);
+    sd_event_unref(event_);
+    ::close(wakeFile_);
+    pthread_sigmask(SIG_SETMASK, &previousSignals_, nullptr);
+}
+
+void MainLoop::run() {
+    while (true) {
+        {
+            std::lock_guard lock(mutex_);
+            if (std::exchange(isStopping_, false)) return;
+        }
+        check(sd_event_run(event_, UINT64_MAX), "event loop");
+    }
+}
+
+void MainLoop::stop() {
+    {
+        std::lock_guard lock(mutex_);
+        isStopping_ = true;
+    }
+    wake();
+}
+
+void MainLoop::post(Task task) {
+    {
+        std::lock_guard lock(mutex_);
+        posted_.push_back(std::move(task));
+    }
+    wake();
+}
+
+void MainLoop::postAfter(Duration delay, Task task) {
+    postAfter(delay, nullptr, std::move(task));
+}
+
+void MainLoop::postAfter(Duration delay, std::shared_ptr<Queue> queue, Task task) {
+    if (!(delay.count() > 0)) return queue ? queue->post(std::move(task)) : post(std::move(task));
+    std::uint64_t due = dueTime(delay);
+    bool isFirst;
+    {
+        std::lock_guard lock(mutex_);
+        auto position = timers_.emplace(due, Timer{std::move(queue), std::move(task)});
+        isFirst = position == timers_.begin();
+    }
+    if (isFirst) wake();
+}
+
+void MainLoop::wake() {
+    // It can only fail when the counter is full, and then the loop is awake.
+    [[maybe_unused]] int result = eventfd_write(wakeFile_, 1);
+}
+
+int MainLoop::onWake(sd_event_source*, int file, unsigned, void* self) {
+    eventfd_t count;
+    eventfd_read(file, &count);
+    static_cast<MainLoop*>(self)->armTimer();
+    static_cast<MainLoop*>(self)->runPosted();
+    return 0;
+}
+
+int MainLoop::onTimer(sd_event_source*, std::uint64_t, void* self) {
+    static_cast<MainLoop*>(self)->postDueTimers();
+    static_cast<MainLoop*>(self)->armTimer();
+    return 0;
+}
+
+// Only what was posted by now: what the tasks post runs in the next round, after other events had their turn.
+void MainLoop::runPosted() {
+    std::deque<Task> tasks;
+    std::unique_lock lock(mutex_);
+    tasks.swap(posted_);
+    while (!tasks.empty() && !isStopping_) {
+        lock.unlock();
+        tasks.front()();
+        tasks.pop_front();
+        lock.lock();
+    }
+    if (tasks.empty()) return;
+    // Stopped: the rest keeps its place, in case the loop is run again.
+    std::move(tasks.rbegin(), tasks.rend(), std::front_inserter(posted_));
+    wake();
+}
+
+void MainLoop::postDueTimers() {
+    const std::uint64_t now = bootMicroseconds();
+    while (true) {
+        Timer timer;
+        {
+            std::lock_guard lock(mutex_);
+            auto first = timers_.begin();
+            if (first == timers_.end() || first->first > now) return;
+            timer = std::move(first->second);
+            timers_.erase(first);
+        }
+        timer.queue ? timer.queue->post(std::move(timer.task)) : post(std::move(timer.task));
+    }
+}
+
+void MainLoop::armTimer() {
+    std::unique_lock lock(mutex_);
+    const bool isNeeded = !timers_.empty();
+    const std::uint64_t due = isNeeded ? timers_.begin()->first : 0;
+    lock.unlock();
+    if (isNeeded) check(sd_event_source_set_time(timerSource_, due), "timer");
+    check(sd_event_source_set_enabled(timerSource_, isNeeded ? SD_EVENT_ONESHOT : SD_EVENT_OFF), "timer");
+}
+
+}  // namespace vrx::host

@@ -1,0 +1,66 @@
+// The event loop of the main thread, on sd-event: the main queue, and the timers of every queue. Made, run and taken
+// down on the main thread; everything else any thread may call. It sleeps without a time limit while nothing is due.
+#pragma once
+
+#include <systemd/sd-event.h>
+
+#include <csignal>
+#include <deque>
+#include <map>
+#include <memory>
+#include <mutex>
+
+#include "vrx/platform/queue.h"
+
+namespace vrx::host {
+
+class MainLoop final : public platform::Queue {
+public:
+    // Takes over SIGTERM and SIGINT, which stop the loop; threads made from now on leave them to it.
+    MainLoop();
+    // What has not run is discarded.
+    ~MainLoop() override;
+    MainLoop(const MainLoop&) = delete;
+    MainLoop& operator=(const MainLoop&) = delete;
+
+    // Runs until stopped: by stop(), also before the call, or by a signal. It can be run again.
+    void run();
+    void stop();
+    // Whether a signal has ever stopped it.
+    bool wasStoppedBySignal() const { return wasStoppedBySignal_; }
+
+    void post(platform::Task task) override;
+    void postAfter(platform::Duration delay, platform::Task task) override;
+    // Posts the task to another queue after the delay on the boot clock, time asleep included.
+    void postAfter(platform::Duration delay, std::shared_ptr<platform::Queue> queue, platform::Task task);
+
+    // For other sources of events, which belong to the main thread.
+    sd_event* event() const { return event_; }
+
+private:
+    struct Timer {
+        std::shared_ptr<platform::Queue> queue;
+        platform::Task task;
+    };
+
+    static int onWake(sd_event_source*, int file, unsigned events, void* self);
+    static int onTimer(sd_event_source*, std::uint64_t due, void* self);
+    void wake();
+    void runPosted();
+    void postDueTimers();
+    void armTimer();
+
+    sd_event* event_ = nullptr;
+    sd_event_source* wakeSource_ = nullptr;
+    sd_event_source* timerSource_ = nullptr;
+    int wakeFile_ = -1;
+    sigset_t previousSignals_;
+    bool wasStoppedBySignal_ = false;
+
+    std::mutex mutex_;
+    std::deque<platform::Task> posted_;
+    std::multimap<std::uint64_t, Timer> timers_;  // by due time in microseconds of the boot clock, first come first
+    bool isStopping_ = false;
+};
+
+}  // namespace vrx::host

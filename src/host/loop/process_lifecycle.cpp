@@ -1,0 +1,63 @@
+#include "vrx/host/loop/process_lifecycle.h"
+
+#include "vrx/platform/log.h"
+
+namespace vrx::host {
+
+using platform::WorkInFlight;
+
+ProcessLifecycle::~ProcessLifecycle() {
+    std::lock_guard lock(state_->mutex);
+    state_->mainLoop = nullptr;
+}
+
+void ProcessLifecycle::exitCleanWhenIdle() {
+    std::lock_guard lock(state_->mutex);
+    state_->isExitWanted = true;
+    considerEnd(state_);
+}
+
+WorkInFlight ProcessLifecycle::beginWork() {
+    std::lock_guard lock(state_->mutex);
+    return begin(state_);
+}
+
+WorkInFlight ProcessLifecycle::beginWorkUnlessEnding() {
+    std::lock_guard lock(state_->mutex);
+    return state_->isEnding ? nullptr : begin(state_);
+}
+
+void ProcessLifecycle::setUnreadQuestion(std::function<bool()> hasUnread) {
+    std::lock_guard lock(state_->mutex);
+    state_->hasUnread = std::move(hasUnread);
+}
+
+bool ProcessLifecycle::isEnding() const {
+    std::lock_guard lock(state_->mutex);
+    return state_->isEnding;
+}
+
+WorkInFlight ProcessLifecycle::begin(const std::shared_ptr<State>& state) {
+    ++state->inFlight;
+    return {state.get(), [state](void*) {
+                std::lock_guard lock(state->mutex);
+                --state->inFlight;
+                considerEnd(state);
+            }};
+}
+
+// On the main thread, and after what is posted already: it may begin work.
+void ProcessLifecycle::considerEnd(const std::shared_ptr<State>& state) {
+    if (state->isExitWanted && state->inFlight == 0 && state->mainLoop)
+        state->mainLoop->post([state] { endIfIdle(*state); });
+}
+
+void ProcessLifecycle::endIfIdle(State& state) {
+    std::lock_guard lock(state.mutex);
+    if (state.isEnding || state.inFlight > 0 || !state.mainLoop || (state.hasUnread && state.hasUnread())) return;
+    state.isEnding = true;
+    log(platform::Level::Default, "Nothing is under way: ending, to be started anew");
+    state.mainLoop->stop();
+}
+
+}  // namespace vrx::host

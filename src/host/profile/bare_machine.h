@@ -1,0 +1,45 @@
+// The facts of the machine itself: what holds where no device profile says otherwise. Any thread may ask; each call
+// gives the present fact.
+#pragma once
+
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "vrx/host/base/current_copy.h"
+
+namespace vrx::host {
+
+class BareMachine {
+public:
+    // The root is another than "/" in tests.
+    explicit BareMachine(const std::string& root = "");
+
+    // The serial number of the firmware where it may be read and means something, else one derived from the machine
+    // identifier, which itself is confidential. Nothing when the machine has neither.
+    std::optional<std::string> serialNumber() const;
+    std::string name() const;            // the host name
+    std::string productType() const;     // the firmware's product name, else the processor architecture
+    std::string productVersion() const;  // the version in os-release, else the kernel's
+    // From the system's locale files, else from the environment, else "en_US".
+    std::string localeIdentifier() const;
+    std::vector<std::string> localeFiles() const { return {localeConf_.path(), defaultLocale_.path()}; }
+
+private:
+    using Text = CurrentCopy<std::optional<std::string>>;
+
+    Text firmwareSerial_;
+    Text firmwareProduct_;
+    Text machineId_;
+    Text versionId_;
+    Text localeConf_;
+    Text defaultLocale_;
+};
+
+// The identifier in the form "de_DE" of a POSIX locale name such as "de_DE.UTF-8@euro"; "en_US" for "C" and "POSIX".
+// Nothing for an empty name.
+std::optional<std::string> localeIdentifierFromPosix(std::string_view name);
+
+}  // namespace vrx::host

@@ -1,0 +1,24 @@
+#include "vrx/host/profile/clock.h"
+
+#include <ctime>
+
+#include "vrx/codec/time_zone.h"
+
+namespace vrx::host {
+
+platform::Date Clock::now() const {
+    return std::chrono::system_clock::now();
+}
+
+std::chrono::seconds Clock::timeZoneOffset() const {
+    if (const std::shared_ptr<const ProfileFacts> facts = profile_.facts(); facts->timeZone)
+        if (std::optional<std::chrono::seconds> offset = codec::timeZoneOffset(*facts->timeZone, now())) return *offset;
+    // localtime_r alone would never notice that the system's zone was changed.
+    tzset();
+    const std::time_t present = std::time(nullptr);
+    std::tm fields{};
+    localtime_r(&present, &fields);
+    return std::chrono::seconds(fields.tm_gmtoff);
+}
+
+}  // namespace vrx::host

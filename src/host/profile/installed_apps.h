@@ -1,0 +1,21 @@
+// The applications of this machine, told by the bundle.toml files of the profile's application folders and of the
+// folders in them. A bundle that others can change is not believed. Read afresh at each call; any thread may ask.
+#pragma once
+
+#include "vrx/host/profile/device_profile.h"
+#include "vrx/platform/installed_apps.h"
+
+namespace vrx::host {
+
+class InstalledApps final : public platform::InstalledApps {
+public:
+    explicit InstalledApps(const DeviceProfile& profile) : profile_(profile) {}
+
+    // Of several bundles with the identifier the first counts, in the order of the folders and of their names.
+    platform::InstalledAppRecord record(const std::string& bundleIdentifier) const override;
+
+private:
+    const DeviceProfile& profile_;
+};
+
+}  // namespace vrx::host

@@ -1,0 +1,48 @@
+#include "vrx/host/profile/localized_strings.h"
+
+#include <toml++/toml.h>
+
+#include "vrx/host/base/files.h"
+#include "vrx/platform/log.h"
+
+namespace vrx::host {
+
+namespace {
+
+// "zh_Hant_TW" gives itself, "zh_Hant" and "zh"; then English.
+std::vector<std::string> languages(std::string identifier) {
+    std::vector<std::string> result;
+    // It becomes the name of a folder.
+    if (identifier.find_first_of("/.") != std::string::npos) identifier.clear();
+    while (!identifier.empty()) {
+        result.push_back(identifier);
+        const std::size_t part = identifier.find_last_of("_-");
+        identifier.resize(part == std::string::npos ? 0 : part);
+    }
+    result.emplace_back("en");
+    return result;
+}
+
+std::optional<std::string> textIn(const std::string& path, std::string_view key) {
+    platform::Result<FileContent> file = readFile(path);
+    if (!file) return std::nullopt;
+    try {
+        const std::string_view document(reinterpret_cast<const char*>(file->bytes.data()), file->bytes.size());
+        return toml::parse(document, path)[key].value_exact<std::string>();
+    } catch (const toml::parse_error& error) {
+        log(platform::Level::Error, "%@: %@", path, std::string(error.description()));
+        return std::nullopt;
+    }
+}
+
+}  // namespace
+
+std::string LocalizedStrings::localizedString(std::string_view key, std::string_view defaultText,
+                                              std::string_view table) const {
+    const std::string folder = profile_.facts()->companionFolder;
+    for (const std::string& language : languages(profile_.preferredLocaleIdentifier()))
+        if (auto text = textIn(folder + "/" + language + "/" + std::string(table) + ".toml", key)) return *text;
+    return std::string(defaultText);
+}
+
+}  // namespace vrx::host

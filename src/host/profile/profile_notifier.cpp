@@ -1,0 +1,88 @@
+#include "vrx/host/profile/profile_notifier.h"
+
+#include <algorithm>
+#include <set>
+
+#include "vrx/host/home/host_facts.h"
+#include "vrx/platform/log.h"
+#include "vrx/platform/sha256_hash.h"
+#include "vrx/platform/vendor.h"
+
+namespace vrx::host {
+
+using platform::MaybeError;
+using platform::PairedWatch;
+
+namespace {
+
+constexpr platform::Duration retryAfterFailure{60.0};
+
+// A line for each watch that is paired, told apart by its serial number, else by its names; one that is paired anew
+// counts as another. Serial numbers are never stored as such.
+std::set<std::string> pairedWatches(const DeviceProfile& profile) {
+    std::set<std::string> lines;
+    for (const PairedWatch& watch : profile.watches()) {
+        if (!watch.isActive()) continue;
+        const std::string name = watch.name.value_or("") + "\n" + watch.localizedModelName.value_or("");
+        const double paired = watch.pairedDate ? platform::epochSeconds(*watch.pairedDate) : 0;
+        lines.insert(platform::sha256Hash(watch.serialNumber.value_or(name) + "\n" + std::to_string(paired)));
+    }
+    return lines;
+}
+
+std::set<std::string> linesOf(std::string_view text) {
+    std::set<std::string> lines;
+    for (std::size_t end; (end = text.find('\n')) != text.npos; text.remove_prefix(end + 1))
+        lines.emplace(text.substr(0, end));
+    return lines;
+}
+
+std::string textOf(const std::set<std::string>& lines) {
+    std::string text;
+    for (const std::string& line : lines) text.append(line).append("\n");
+    return text;
+}
+
+bool includes(const std::set<std::string>& all, const std::set<std::string>& some) {
+    return std::includes(all.begin(), all.end(), some.begin(), some.end());
+}
+
+}  // namespace
+
+void ProfileNotifier::start(sd_event* loop, std::function<void()> onEdit, platform::Duration pause) {
+    watch_ = std::make_unique<FileWatch>(loop, profile_.sources(), pause, [this, onEdit = std::move(onEdit)] {
+        compare();
+        onEdit();
+    });
+    compare();
+}
+
+// What has been stored is what has been raised: were it raised first, a database that cannot be written would have it
+// raised at every start. The first profile of a home is only stored.
+void ProfileNotifier::compare() {
+    if (profile_.facts()->isSubstitute) return;  // of a file that nobody understands there is nothing to tell
+    const std::string language = profile_.preferredLocaleIdentifier();
+    const std::set<std::string> watches = pairedWatches(profile_);
+    std::vector<std::string_view> raised;
+    const MaybeError error = database_.write([&](Connection& connection) {
+        raised.clear();
+        const std::optional<std::string> lastLanguage = hostFact(connection, facts::language);
+        const std::optional<std::string> lastWatches = hostFact(connection, facts::pairedWatches);
+        if (lastLanguage && *lastLanguage != language) raised.push_back(platform::languageChangedNotification);
+        if (lastWatches && !includes(linesOf(*lastWatches), watches))
+            raised.push_back(platform::devicePairedNotification);
+        if (lastWatches && !includes(watches, linesOf(*lastWatches)))
+            raised.push_back(platform::deviceUnpairedNotification);
+        if (lastLanguage && lastWatches && raised.empty()) return;
+        setHostFact(connection, facts::language, language);
+        setHostFact(connection, facts::pairedWatches, textOf(watches));
+    });
+    if (error) {
+        log(platform::Level::Error, "Cannot tell what has changed in the profile, trying again: %@", error->text);
+        if (watch_) watch_->callIn(retryAfterFailure);
+        return;
+    }
+    for (const std::string_view name : raised) center_.raise(platform::vendorIdentifier(name));
+}
+
+}  // namespace vrx::host

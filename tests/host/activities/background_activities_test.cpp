@@ -1,0 +1,193 @@
+// What only a registry that is stored does; what every registry does is in tests/contract.
+#include "vrx/host/activities/background_activities.h"
+
+#include <gmock/gmock.h>
+#include <sys/wait.h>
+
+#include <chrono>
+#include <csignal>
+#include <filesystem>
+
+#include "host/activities/real_activities.h"
+#include "vrx/platform/queue.h"
+
+namespace vrx::host {
+namespace {
+
+using namespace std::chrono_literals;
+using platform::BackgroundActivityResult;
+using platform::OnceCallback;
+using ::testing::ElementsAre;
+using ::testing::HasSubstr;
+using ::testing::IsEmpty;
+using ::testing::IsSupersetOf;
+using ::testing::SizeIs;
+using enum BackgroundActivityResult;
+
+class StoredActivities : public ::testing::Test {
+protected:
+    void SetUp() override { subject.restart(); }
+    void schedule(const std::string& identifier, std::int64_t delay) {
+        subject.activities().schedule({.identifier = identifier, .criteria{{.delay = delay}}},
+                                      [this, identifier](OnceCallback<BackgroundActivityResult> completion) {
+                                          firings.push_back(identifier);
+                                          completions.push_back(std::move(completion));
+                                      });
+    }
+    std::vector<std::string> firingsAfter(platform::Duration time) {
+        subject.pass(time);
+        return std::exchange(firings, {});
+    }
+    void execute(const std::string& sql) {
+        EXPECT_FALSE(tool.write([&](Connection& connection) { connection.execute(sql.c_str()); }));
+    }
+    // What the agent answers a tester.
+    FiringAnswer request(const std::string& identifier) {
+        execute("INSERT INTO activity_requests (identifier) VALUES ('" + identifier + "')");
+        subject.registry().reconsider();
+        subject.pass(0s);
+        std::int64_t answer = 0;
+        EXPECT_FALSE(tool.read([&](Connection& connection) {
+            answer = connection.integer("SELECT answer FROM activity_requests ORDER BY number DESC");
+        }));
+        return static_cast<FiringAnswer>(answer);
+    }
+    // Besides the upgrade and the boot activity, which nobody runs here.
+    std::vector<std::string> scheduled() {
+        std::vector<std::string> identifiers;
+        for (const ScheduledActivity& activity : subject.scheduled()) identifiers.push_back(activity.identifier);
+        return {identifiers.begin() + 2, identifiers.end()};
+    }
+
+    RealActivities subject;
+    Database tool{subject.databasePath()};
+    std::vector<std::string> firings;
+    std::vector<OnceCallback<BackgroundActivityResult>> completions;
+};
+
+// A database that refuses, then works again, as one on a disk that was full.
+TEST_F(StoredActivities, KeepWhatCannotBeStoredAndFireNothingMeanwhile) {
+    schedule("due", 9);
+    schedule("running", 0);
+    EXPECT_THAT(firingsAfter(1s), ElementsAre("running"));
+    execute("CREATE TRIGGER a BEFORE INSERT ON activities BEGIN SELECT RAISE(ABORT, 'full'); END");
+    execute("CREATE TRIGGER b BEFORE UPDATE ON activity_runs BEGIN SELECT RAISE(ABORT, 'full'); END");
+    schedule("new", 9);
+    completions[0](Finished);
+    schedule("new", 99);
+    EXPECT_THAT(firingsAfter(10min), IsEmpty());
+    execute("DROP TRIGGER a; DROP TRIGGER b");
+    EXPECT_THAT(firingsAfter(1min), ElementsAre("due", "new")) << "and the run that ended meanwhile has ended";
+    EXPECT_THAT(scheduled(), ElementsAre("due", "new"));
+    EXPECT_THAT(subject.logged(), SizeIs(1));
+    completions[1](Finished);
+    completions[2](Finished);
+    subject.pass(1s);
+    const int wakeUps = subject.wakeUps();
+    schedule("late", 30 * 86400);
+    EXPECT_THAT(firingsAfter(30 * 24h), IsEmpty());
+    EXPECT_EQ(subject.wakeUps(), wakeUps) << "nothing was due meanwhile";
+}
+
+TEST_F(StoredActivities, FollowTheFileWhenAnotherTakesItsPlace) {
+    schedule("running", 0);
+    schedule("due here only", 59);
+    subject.pass(1s);
+    const std::string path = subject.databasePath();
+    ASSERT_FALSE(tool.peek([&](Connection& connection, const Database::Stamp&) {
+        connection.execute(("VACUUM INTO '" + path + ".copy'").c_str());
+    }));
+    schedule("lost", 59);
+    std::filesystem::rename(path + ".copy", path);
+    subject.registry().reconsider();
+    subject.pass(1s);
+    EXPECT_THAT(scheduled(), ElementsAre("running", "due here only")) << "the run under way is not taken for cut off";
+
+    // A run of one file's registration ends no other file's.
+    std::filesystem::remove(path);
+    subject.registry().reconsider();
+    schedule("running", 59);
+    completions[0](Finished);
+    subject.pass(1s);
+    EXPECT_THAT(scheduled(), ElementsAre("running"));
+    EXPECT_THAT(subject.logged(), ElementsAre(HasSubstr("was replaced"), HasSubstr("was replaced")));
+    firings.clear();
+    EXPECT_THAT(firingsAfter(1h), ElementsAre("running"));
+    completions.back()(Finished);
+}
+
+TEST_F(StoredActivities, FireAtATestersRequestAsTheSystemWould) {
+    EXPECT_EQ(request("a"), FiringAnswer::Unknown);
+    schedule("a", 3599);
+    EXPECT_EQ(request("a"), FiringAnswer::Fired);
+    EXPECT_EQ(request("a"), FiringAnswer::AlreadyRunning);
+    completions[0](Deferred);  // its time has not come: it has the same due time as before
+    EXPECT_THAT(firingsAfter(59min), ElementsAre("a"));
+    EXPECT_THAT(firingsAfter(1min), ElementsAre("a"));
+    completions[1](Finished);
+    subject.pass(1s);
+    EXPECT_THAT(scheduled(), IsEmpty());
+    EXPECT_EQ(request("a"), FiringAnswer::Fired) << "what is not scheduled";
+    completions[2](Finished);
+    subject.pass(24h);
+    EXPECT_THAT(firings, ElementsAre("a"));
+
+    execute("INSERT INTO activity_requests (identifier) VALUES ('a')");
+    subject.restart();
+    subject.pass(1h);
+    EXPECT_THAT(firings, ElementsAre("a")) << "who asked an earlier process has gone";
+}
+
+// Three activities, of which each schedules the next in its run and the last one itself, once. Each writes down that it
+// has run, in a folder that outlives the process.
+class Road {
+public:
+    explicit Road(const TemporaryFolder& folder) : subject(folder / "host.db"), folder_(folder) {
+        subject.restart();
+        subject.activities().setHandlerFactory([this](const std::string& name) { return handler(name); });
+    }
+
+    RealActivities subject;
+
+private:
+    platform::ActivityHandler handler(const std::string& name) {
+        return [this, name](OnceCallback<BackgroundActivityResult> completion) {
+            if (name.ends_with(".upgrade")) schedule("first");
+            if (name == "first") schedule("second");
+            const bool isFirstTime = !std::filesystem::exists(folder_ / name);
+            if (name == "second") isFirstTime ? schedule("second") : writeFile(folder_ / "again", "");
+            writeFile(folder_ / name, "");
+            platform::Platform::current().queues().mainQueue().postAfter(
+                1s, [completion = std::move(completion)]() mutable { completion(Finished); });
+        };
+    }
+    void schedule(const char* name) {
+        subject.activities().schedule({.identifier = name, .criteria{{.delay = 100}}}, handler(name));
+    }
+
+    const TemporaryFolder& folder_;
+};
+
+TEST(StoredActivitiesRoad, LosesNothingWhenKilledAtAnyMoment) {
+    int steps = 0, status = -1;
+    for (; status != 0; ++steps) {
+        TemporaryFolder folder;
+        const pid_t child = fork();
+        if (child == 0) {
+            Road road(folder);
+            for (int i = 0; i < steps; ++i)
+                if (!road.subject.step(24h)) _exit(0);
+            kill(getpid(), SIGKILL);
+        }
+        waitpid(child, &status, 0);
+        Road road(folder);
+        road.subject.pass(24h);
+        EXPECT_THAT(folder.names(), IsSupersetOf({"com.orvane.vrxagent.upgrade", "first", "second", "again"}))
+            << "killed after " << steps;
+        EXPECT_THAT(road.subject.scheduled(), IsEmpty()) << "killed after " << steps;
+    }
+    EXPECT_GT(steps, 20);
+}
+
+}  // namespace
+}  // namespace vrx::host

@@ -1,0 +1,161 @@
+#include "vrx/host/base/files.h"
+
+#include <dirent.h>
+#include <gmock/gmock.h>
+#include <sys/stat.h>
+
+#include <cerrno>
+#include <thread>
+
+#include "host/support.h"
+#include "vrx/host/home/home_lock.h"
+#include "vrx/platform/limits.h"
+
+namespace vrx::host {
+namespace {
+
+using platform::Data;
+using platform::MaybeError;
+using ::testing::ElementsAre;
+
+Data bytes(std::string_view text) {
+    return {text.begin(), text.end()};
+}
+
+std::size_t openFiles() {
+    std::size_t count = 0;
+    for ([[maybe_unused]] const auto& entry : std::filesystem::directory_iterator("/proc/self/fd")) ++count;
+    return count;
+}
+
+// Fails the k-th call and, when it is to be for good, every one after it; clean-up calls pass, so that what is checked
+// is whether they are made.
+class FailingCalls final : public FileCalls {
+public:
+    FailingCalls(int k, bool forGood) : k_(k), forGood_(forGood) {}
+    int open(const char* p, int f, mode_t m) override { return fails() ? -1 : FileCalls::open(p, f, m); }
+    ssize_t write(int f, const void* b, std::size_t n) override {
+        if (fails()) return -1;
+        return FileCalls::write(f, b, std::min<std::size_t>(n, 3));  // short writes are ordinary
+    }
+    int lock(int f) override { return fails() ? -1 : FileCalls::lock(f); }
+    int truncate(int f) override { return fails() ? -1 : FileCalls::truncate(f); }
+    int sync(int f) override { return fails() ? -1 : FileCalls::sync(f); }
+    int status(int f, struct stat* s) override { return fails() ? -1 : FileCalls::status(f, s); }
+    int status(const char* p, struct stat* s) override { return fails() ? -1 : FileCalls::status(p, s); }
+    int rename(const char* a, const char* b) override { return fails() ? -1 : FileCalls::rename(a, b); }
+    int calls() const { return calls_; }
+
+private:
+    bool fails() {
+        ++calls_;
+        errno = ENOSPC;
+        return calls_ == k_ || (forGood_ && calls_ > k_);
+    }
+    const int k_;
+    const bool forGood_;
+    int calls_ = 0;
+};
+
+TEST(ReplaceFile, LeavesTheOldContentWhateverCallFails) {
+    for (bool forGood : {false, true}) {
+        for (int k = 1;; ++k) {
+            SCOPED_TRACE("call " + std::to_string(k) + (forGood ? " and all after it" : ""));
+            TemporaryFolder folder;
+            const std::string path = folder / "file";
+            ASSERT_FALSE(replaceFile(path, bytes("old content")));
+            const std::size_t open = openFiles();
+            FailingCalls calls(k, forGood);
+            const MaybeError error = replaceFile(path, bytes("new content"), calls);
+            EXPECT_EQ(openFiles(), open);
+            if (calls.calls() < k) {  // nothing failed: the last round
+                ASSERT_FALSE(error);
+                EXPECT_EQ(fileText(path), "new content");
+                ASSERT_GT(k, 8);
+                break;
+            }
+            ASSERT_TRUE(error);
+            EXPECT_EQ(error->code, ENOSPC);
+            if (fileText(path) == "new content") {  // the folder alone was not synced
+                EXPECT_THAT(error->text, ::testing::StartsWith("cannot sync " + folder.path() + ":"));
+            } else {
+                EXPECT_EQ(fileText(path), "old content");
+            }
+            // What could not be removed is taken over by the next writer.
+            ASSERT_FALSE(replaceFile(path, bytes("x")));
+            EXPECT_EQ(fileText(path), "x");
+            EXPECT_THAT(folder.names(), ElementsAre("file"));
+        }
+    }
+}
+
+TEST(ReplaceFile, WritersAtOnceEachLeaveAWholeFile) {
+    TemporaryFolder folder;
+    const std::string path = folder / "file";
+    ASSERT_FALSE(replaceFile(path, bytes(std::string(20000, 'a'))));
+    std::vector<std::thread> writers;
+    for (char c : {'a', 'b', 'c'}) {
+        writers.emplace_back([&path, c] {
+            for (int i = 0; i < 30; ++i) EXPECT_FALSE(replaceFile(path, bytes(std::string(20000, c))));
+        });
+    }
+    for (int i = 0; i < 100; ++i) {
+        auto content = readFile(path);
+        ASSERT_TRUE(content) << content.error().text;
+        ASSERT_EQ(content->bytes, Data(20000, content->bytes[0]));
+    }
+    for (std::thread& writer : writers) writer.join();
+    EXPECT_THAT(folder.names(), ElementsAre("file"));
+    struct stat status;
+    ASSERT_EQ(stat(path.c_str(), &status), 0);
+    EXPECT_EQ(status.st_mode & 0777, 0600u);
+}
+
+TEST(ReadFile, RefusesWhatIsNoRegularFileOrTooLargeAndReadsWhatHasNoSize) {
+    TemporaryFolder folder;
+    ASSERT_EQ(mkfifo((folder / "fifo").c_str(), 0600), 0);
+    EXPECT_FALSE(readFile(folder / "fifo"));
+    EXPECT_FALSE(readFile(folder.path()));
+    EXPECT_FALSE(readFile(folder / "absent"));
+    writeFile(folder / "large", "");
+    std::filesystem::resize_file(folder / "large", platform::limits::fileBytes);
+    EXPECT_TRUE(readFile(folder / "large"));
+    std::filesystem::resize_file(folder / "large", platform::limits::fileBytes + 1);
+    EXPECT_FALSE(readFile(folder / "large"));
+    auto status = readFile("/proc/self/status");
+    ASSERT_TRUE(status);
+    EXPECT_GT(status->bytes.size(), 100u);
+}
+
+TEST(CreateDirectories, MakesPrivateFoldersAndAcceptsThoseThatExist) {
+    TemporaryFolder folder;
+    Files files(folder / "home");
+    EXPECT_TRUE(files.replace(folder / "home/a/file", bytes("x")));
+    EXPECT_FALSE(files.createDirectories(folder / "home/a/b"));
+    EXPECT_FALSE(files.createDirectories(folder / "home/a"));
+    struct stat status;
+    ASSERT_EQ(stat((folder / "home/a").c_str(), &status), 0);
+    EXPECT_EQ(status.st_mode & 0777, 0700u);
+    EXPECT_FALSE(files.replace(folder / "home/a/file", bytes("x")));
+    EXPECT_TRUE(files.createDirectories(folder / "home/a/file"));
+    EXPECT_TRUE(files.createDirectories(folder / "home/a/file/b"));
+    EXPECT_FALSE(files.remove(folder / "home/a/file"));
+    EXPECT_TRUE(files.remove(folder / "home/a/file"));
+}
+
+TEST(HomeLock, KeepsASecondAgentOutAndNamesTheFirst) {
+    TemporaryFolder folder;
+    HomeLock second;
+    {
+        HomeLock first;
+        ASSERT_FALSE(first.take(folder / "home"));
+        const MaybeError refusal = second.take(folder / "home");
+        ASSERT_TRUE(refusal);
+        EXPECT_EQ(refusal->code, EWOULDBLOCK);
+        EXPECT_THAT(refusal->text, ::testing::HasSubstr("process " + std::to_string(getpid())));
+    }
+    EXPECT_FALSE(second.take(folder / "home"));
+}
+
+}  // namespace
+}  // namespace vrx::host

@@ -1,0 +1,64 @@
+#include "vrx/host/http/http_cache.h"
+
+#include <gmock/gmock.h>
+
+#include "host/support.h"
+#include "vrx/host/http/http_cache_rules.h"
+
+namespace vrx::host {
+namespace {
+
+using namespace std::chrono_literals;
+
+TEST(HttpCacheRules, ReadCacheControlAndDates) {
+    // Storable, to be revalidated, max-age.
+    const std::map<std::string, std::tuple<bool, bool, std::optional<std::chrono::seconds>>> cases{
+        {"", {true, false, {}}},
+        {" MAX-AGE = 5 ", {true, false, 5s}},
+        {"max-age=\"5\", max-age=6", {true, false, 5s}},
+        {"s-maxage=9,public,,x=\"no-store, \\\" no-cache\" , max-age=1", {true, false, 1s}},
+        {"private=\"Set-Cookie\", no-cache=\"X-A\"", {true, true, {}}},
+        {"max-age=1,No-Store", {false, false, 1s}},
+        {"max-age=\"1, no-store", {false, false, {}}},
+        {"max-age=\"1\\", {false, false, {}}},
+        {"max-age", {true, false, 0s}},
+        {"max-age=-1", {true, false, 0s}},
+        {"max-age=99999999999999999999", {true, false, std::chrono::seconds(std::int64_t{1} << 31)}},
+    };
+    for (const auto& [text, expected] : cases) {
+        const CacheControl read = parseCacheControl(text);
+        EXPECT_EQ(std::tuple(read.isStorable, read.mustRevalidate, read.maxAge), expected) << text;
+    }
+    for (const char* text :
+         {"Sun, 06 Nov 1994 08:49:37 GMT", "Sunday, 06-Nov-94 08:49:37 GMT", "Sun Nov  6 08:49:37 1994"})
+        EXPECT_EQ(parseHttpDate(text), platform::dateFromEpoch(784'111'777)) << text;
+    for (const char* text : {"", "0", "-1", "now", "Sun, 06 Nov 1994 25:49:37 GMT", "Nov 1994"})
+        EXPECT_EQ(parseHttpDate(text), std::nullopt) << text;
+}
+
+TEST(HttpCache, StaysWithinItsBoundsAndLetsTheLeastRecentlyUsedGo) {
+    SettableClock clock;
+    HttpCache cache(clock, 3, 4000);
+    auto add = [&](const std::string& url, std::size_t size, const std::string& accept = "") {
+        platform::HttpResponse answer{.status = 200, .headers = {{"Cache-Control", "max-age=9"}}};
+        answer.body = platform::Data(size);
+        cache.store(HttpCache::keyOf(url, {{"Accept", accept}}), url, clock.now(), answer);
+        EXPECT_LE(cache.bytes(), 4000u);
+    };
+    auto has = [&](const std::string& url, const std::string& accept = "") {
+        return cache.find(HttpCache::keyOf(url, {{"Accept", accept}})) != nullptr;
+    };
+    for (const char* url : {"a", "b", "c"}) add(url, 1);
+    EXPECT_TRUE(has("a") && has("b") && !has("b", "x"));
+    add("d", 1);
+    EXPECT_TRUE(has("b") && !has("c") && has("a"));
+    add("e", 3000);  // only one fits beside it
+    EXPECT_TRUE(has("a") && has("e") && !has("d"));
+    add("e", 5000);  // and this one replaces what it cannot be itself
+    EXPECT_FALSE(has("e"));
+    cache.forget("a");
+    EXPECT_EQ(cache.entries() + cache.bytes(), 0u);
+}
+
+}  // namespace
+}  // namespace vrx::host

@@ -1,0 +1,338 @@
+#include "vrx/host/http/http.h"
+
+#include <gmock/gmock.h>
+#include <sys/stat.h>
+
+#include <array>
+#include <csignal>
+#include <cstdio>
+#include <future>
+
+#include "host/http/loopback_server.h"
+#include "host/support.h"
+#include "vrx/host/loop/queues.h"
+
+namespace vrx::host {
+namespace {
+
+using namespace std::chrono_literals;
+using platform::HttpRequest;
+using platform::HttpResponse;
+using ::testing::ElementsAre;
+using ::testing::HasSubstr;
+using ::testing::Not;
+
+std::string redirectTo(const std::string& url) {
+    return answer("302 Found", "moved", "Location: " + url + "\r\n");
+}
+
+// 10,001 times the letter x, by gzip.
+constexpr std::string_view packed(
+    "\x1f\x8b\x08\x00\x00\x00\x00\x00\x02\xff\xed\xc1\x01\x0d\x00\x00\x00\xc2\xa0\xda\x8f\x6f\x0f\x07\x14\x00\x00\x00"
+    "\x00\x00\x00\x00\x00\x00\x1c\x18\x75\xb1\x0e\xc3\x11\x27\x00\x00",
+    44);
+
+HttpRequest requestTo(std::string url, std::string method = "GET", std::optional<platform::Duration> timeout = {}) {
+    HttpRequest request;
+    request.url = std::move(url);
+    request.method = std::move(method);
+    request.timeout = timeout;
+    return request;
+}
+
+class HttpTest : public ::testing::Test {
+protected:
+    HttpResponse fetch(HttpRequest request) { return fetch(http.shared(), std::move(request)); }
+    HttpResponse fetch(platform::HttpSession& session, HttpRequest request) {
+        std::promise<HttpResponse> response;
+        session.send(std::move(request), [&](HttpResponse arrived) { response.set_value(std::move(arrived)); });
+        return response.get_future().get();
+    }
+    HttpResponse get(const std::string& url) { return fetch(requestTo(url)); }
+
+    static std::string body(const HttpResponse& response) {
+        return response.body ? std::string(response.body->begin(), response.body->end()) : "(none)";
+    }
+    // The status is that of an answer which has begun.
+    static std::string error(const HttpResponse& response, int status = 0) {
+        EXPECT_EQ(response.status, status);
+        EXPECT_FALSE(response.body);
+        return response.error ? response.error->text : "(none)";
+    }
+
+    LogRecorder log;
+    MainLoop loop;
+    Queues queues{loop, 2};
+    SettableClock clock;
+    TemporaryFolder folder;
+    DeviceProfile profile{folder / "device.toml"};
+    platform::Queue& workers = queues.workers(platform::Priority::UserInitiated);
+    HttpSessions http{workers, clock, profile, {.timeout = 10s, .answerBytes = 10'000}};
+};
+
+TEST_F(HttpTest, CarriesRequestAndAnswerAndReusesTheConnection) {
+    std::vector<std::string> requests;
+    LoopbackServer server([&](const std::string& request) {
+        requests.push_back(request);
+        return "HTTP/1.1 100 Continue\r\nX-Interim: 1\r\n\r\n" +
+               answer("404 Not Found", "body", "X-A: 1\r\nx-a:  2 \r\n");
+    });
+    HttpRequest request = requestTo(server.url("/path?q"), "POST");
+    request.body = {'{', '}'};
+    request.headers = {{"X-Empty", ""}, {"Content-Type", "application/json"}};
+    const HttpResponse response = fetch(request);
+    EXPECT_FALSE(response.error);
+    EXPECT_EQ(response.status, 404);
+    EXPECT_EQ(body(response), "body");
+    EXPECT_EQ(response.headers.at("x-a"), "1, 2");
+    EXPECT_FALSE(response.headers.contains("X-Interim"));
+    const HttpResponse second = fetch(*http.makeUncached(), requestTo(server.url()));
+    EXPECT_EQ(second.status, 404);
+    EXPECT_EQ(server.connections(), 1);
+    EXPECT_THAT(requests[0], ::testing::StartsWith("POST /path?q HTTP/1.1\r\n"));
+    EXPECT_THAT(requests[0], HasSubstr("\r\nContent-Type: application/json\r\nX-Empty:"));
+    EXPECT_THAT(requests[0], ::testing::EndsWith("\r\n\r\n{}"));
+    EXPECT_THAT(requests[0], Not(HasSubstr("Cache-Control")));
+    EXPECT_THAT(requests[1], HasSubstr("Cache-Control: no-cache"));
+    EXPECT_THAT(requests[1], Not(HasSubstr("Source-Application")));
+    writeFile(profile.path(), "[http]\nsource_application_header = true");
+    HttpRequest named = requestTo(server.url());
+    named.sourceApplication = "com.example.app";
+    fetch(named);
+    EXPECT_THAT(requests[2], HasSubstr("\r\nX-Orvane-Source-Application: com.example.app\r\n"));
+
+    request.headers = {{"X-A", "1\r\nX-Forged: 2"}};
+    EXPECT_THAT(error(fetch(request)), HasSubstr("header"));
+    EXPECT_EQ(requests.size(), 3u);
+}
+
+TEST_F(HttpTest, BoundsTheAnswerAlsoAfterDecompressionAndItsHeaders) {
+    LoopbackServer server([&](const std::string& request) {
+        if (request.starts_with("GET /fits")) return answer("200 OK", std::string(10'000, 'x'));
+        if (request.starts_with("GET /packed"))
+            return answer("200 OK", std::string(packed), "Content-Encoding: gzip\r\n");
+        if (request.starts_with("GET /headers"))
+            return answer("200 OK", "", "X: " + std::string(300'000, 'x') + "\r\n");
+        return answer("200 OK", std::string(10'001, 'x'));
+    });
+    EXPECT_EQ(body(get(server.url("/fits"))).size(), 10'000u);
+    EXPECT_EQ(error(get(server.url("/large")), 200), "the answer is too large");
+    EXPECT_EQ(error(get(server.url("/packed")), 200), "the answer is too large");
+    EXPECT_NE(error(get(server.url("/headers")), 200), "(none)");
+}
+
+TEST_F(HttpTest, EndsWhatTakesTooLongIsRefusedOrBreaksOff) {
+    LoopbackServer server([](const std::string& request) {
+        return request.starts_with("GET /cut") ? "HTTP/1.1 200 OK\r\nContent-Length: 9\r\nConnection: close\r\n\r\nabc"
+                                               : std::string();
+    });
+    EXPECT_THAT(error(fetch(requestTo(server.url(), "GET", 100ms))), HasSubstr("timed out"));
+    HttpSessions impatient(workers, clock, profile, {.timeout = 100ms});
+    EXPECT_THAT(error(fetch(impatient.shared(), requestTo(server.url("/cut"))), 200), HasSubstr("timed out"));
+
+    const int unused = socket(AF_INET, SOCK_STREAM, 0);
+    sockaddr_in address{};
+    address.sin_family = AF_INET;
+    address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+    socklen_t size = sizeof address;
+    ASSERT_EQ(bind(unused, reinterpret_cast<sockaddr*>(&address), size), 0);
+    getsockname(unused, reinterpret_cast<sockaddr*>(&address), &size);
+    EXPECT_NE(error(get("http://127.0.0.1:" + std::to_string(ntohs(address.sin_port)))), "(none)");
+    ::close(unused);
+}
+
+TEST_F(HttpTest, FollowsFiveRedirectsOfAGetWithoutItsHeadersAndNoneOfAPost) {
+    std::vector<std::string> requests;
+    LoopbackServer server([&](const std::string& request) {
+        requests.push_back(request);
+        const int left = request[request.find('/') + 1] - '0';
+        return left == 0 ? answer("200 OK", "arrived") : redirectTo("/" + std::to_string(left - 1));
+    });
+    HttpRequest request = requestTo(server.url("/5"));
+    request.headers = {{"X-Account", "secret"}};
+    EXPECT_EQ(body(fetch(request)), "arrived");
+    ASSERT_EQ(requests.size(), 6u);
+    EXPECT_THAT(requests[0], HasSubstr("X-Account: secret"));
+    for (std::size_t i = 1; i < 6; ++i) EXPECT_THAT(requests[i], Not(HasSubstr("X-Account")));
+    EXPECT_EQ(error(get(server.url("/6"))), "too many redirects");
+    requests.clear();
+    EXPECT_EQ(fetch(requestTo(server.url("/1"), "POST")).status, 302);
+    EXPECT_EQ(requests.size(), 1u);
+}
+
+TEST_F(HttpTest, SpeaksPlainHttpWithThisMachineOnlyAndReadsFiles) {
+    std::string target;
+    LoopbackServer server([&](const std::string&) { return redirectTo(target); });
+    setenv("http_proxy", "http://proxy.invalid:1", 1);  // not for this machine
+    for (const char* url : {"http://example.com/", "http://127.0.0.1.example.com/", "http://127.0.0.1@example.com/",
+                            "http://0.0.0.0/", "http://[::2]/"}) {
+        EXPECT_EQ(error(get(url)), "plain http is for this machine only; use https") << url;
+        target = url;
+        EXPECT_EQ(error(get(server.url())), "plain http is for this machine only; use https") << url;
+    }
+    target = "file:///etc/hostname";
+    EXPECT_EQ(error(get(server.url())), "the scheme file is not supported");
+    EXPECT_EQ(error(get("ftp://localhost/")), "the scheme ftp is not supported");
+    EXPECT_NE(error(get("")), "(none)");
+
+    writeFile(folder / "a b", "content");
+    EXPECT_EQ(body(get("file://" + folder / "a%20b")), "content");
+    EXPECT_NE(error(get("file://" + folder / "absent")), "(none)");
+    writeFile(folder / "large", std::string(10'001, 'x'));
+    EXPECT_EQ(error(get("file://" + folder / "large")), "the file is too large");
+}
+
+TEST_F(HttpTest, KeepsAnswersAsTheirHeadersAllow) {
+    constexpr const char* ifNoneMatch = "If-None-Match: \"a\"";
+    constexpr const char* ifModifiedSince = "If-Modified-Since: Sun, 06 Nov 1994 08:00:00 GMT";
+    // What the first answer says, how much later the second request comes, and how it asks whether that still holds:
+    // empty for not, null when it does not go out.
+    const std::tuple<std::string, double, const char*> cases[] = {
+        {"Cache-Control: max-age=60", 59, nullptr},
+        {"Cache-Control: max-age=60", 60, ""},
+        {"Cache-Control: max-age=60\r\nAge: 10", 50, ""},
+        {"Cache-Control: max-age=60", -1, ""},  // the clock was set back
+        {"Cache-Control: max-age=60\r\nETag: \"a\"", 60, ifNoneMatch},
+        {"Cache-Control: no-cache, max-age=60\r\nETag: \"a\"", 0, ifNoneMatch},
+        {"Cache-Control: max-age=60\r\ncache-control: no-store\r\nETag: \"a\"", 0, ""},
+        {"ETag: \"a\", \"b\"", 0, ""},
+        {"Last-Modified: Sun, 06 Nov 1994 08:00:00 GMT", 0, ifModifiedSince},
+        {"Expires: Sun, 06 Nov 1994 08:50:37 GMT\r\nDate: Sun, 06 Nov 1994 08:49:37 GMT", 59, nullptr},
+        {"Expires: 0\r\nLast-Modified: Sun, 06 Nov 1994 08:00:00 GMT", 0, ifModifiedSince},
+        {"Cache-Control: max-age=60\r\nVary: Accept-Encoding, X-Other", 1, nullptr},
+        {"Cache-Control: max-age=60\r\nVary: Accept, *", 1, ""},
+        {"X-None: 1", 0, ""},
+    };
+    std::vector<std::string> requests;
+    std::string headers;
+    LoopbackServer server([&](const std::string& request) {
+        requests.push_back(request);
+        const bool isAsked = request.find("\r\nIf-") != request.npos;
+        return isAsked ? "HTTP/1.1 304 Not Modified\r\nX-New: 1\r\nCache-Control: max-age=60\r\n\r\n"
+                       : answer("200 OK", std::to_string(requests.size()), headers);
+    });
+    for (const auto& [said, secondsLater, condition] : cases) {
+        SCOPED_TRACE(said);
+        requests.clear();
+        headers = said + "\r\n";
+        const std::string url = server.url("/" + std::to_string(&said - &std::get<0>(cases[0])));
+        EXPECT_EQ(body(get(url)), "1");
+        clock.seconds = clock.seconds + secondsLater;
+        const bool isConfirmed = condition && *condition;
+        HttpResponse second = get(url);
+        EXPECT_EQ(body(second), condition && !isConfirmed ? "2" : "1");
+        EXPECT_EQ(second.status, 200);
+        ASSERT_EQ(requests.size(), condition ? 2u : 1u);
+        EXPECT_EQ(requests.back().find("\r\nIf-") != std::string::npos, isConfirmed);
+        if (isConfirmed) {
+            EXPECT_THAT(requests[1], HasSubstr(condition));
+            EXPECT_EQ(second.headers["X-New"], "1");
+            EXPECT_EQ(get(url).headers["Age"], "0");  // it is fresh anew
+            EXPECT_EQ(requests.size(), 2u);
+        }
+        clock.seconds = 784'111'777;
+    }
+}
+
+TEST_F(HttpTest, KeepsNothingThatIsDoubtful) {
+    std::vector<std::string> requests;
+    std::string next;
+    LoopbackServer server([&](const std::string& request) {
+        requests.push_back(request);
+        return next;
+    });
+    const std::string fresh = "Cache-Control: max-age=60\r\nETag: \"a\"\r\n";
+    const HttpRequest plain = requestTo(server.url()), posted = requestTo(server.url(), "POST");
+    HttpRequest ranged = plain, typed = plain;
+    ranged.headers["Range"] = "bytes=0-1";
+    typed.headers["Accept"] = "text/plain";
+    const std::pair<HttpRequest, std::string> cases[] = {
+        {plain, answer("404 Not Found", "x", fresh)},
+        {plain, answer("206 Partial Content", "x", fresh)},
+        {plain, "HTTP/1.0 200 OK\r\n" + fresh + "\r\nof unknown length"},
+        {plain, "HTTP/1.0 200 OK\r\nContent-Length: 99\r\n" + fresh + "\r\ncut short"},
+        {plain, answer("200 OK", std::string(10'001, 'x'), fresh)},
+        {ranged, answer("200 OK", "x", fresh)},
+        {posted, answer("200 OK", "x", fresh)},
+        {typed, answer("200 OK", "x", fresh)},
+    };
+    for (const auto& [request, first] : cases) {
+        next = first;
+        fetch(request);
+        next = answer("200 OK", "new");
+        EXPECT_EQ(body(fetch(plain)), "new") << first;
+        EXPECT_THAT(requests.back(), Not(HasSubstr("If-None-Match"))) << first;
+    }
+    EXPECT_EQ(body(fetch(typed)), "x");  // these ones were kept
+
+    auto fetched = [&](platform::HttpSession& session, const std::string& answer) {
+        next = answer;
+        return body(fetch(session, plain));
+    };
+    fetched(http.shared(), answer("200 OK", "1", fresh));
+    EXPECT_EQ(fetched(*http.makeUncached(), answer("200 OK", "2", fresh)), "2");
+    EXPECT_EQ(fetched(http.shared(), answer("200 OK", "3", fresh)), "2");  // the reload has taken its place
+    fetch(posted);
+    EXPECT_EQ(fetched(http.shared(), next), "3");  // it was changed
+    clock.seconds = clock.seconds + 60;
+    EXPECT_EQ(fetched(http.shared(), answer("500 Broken", "broken")), "broken");
+    requests.clear();
+    fetched(http.shared(), "HTTP/1.1 304 Not Modified\r\nETag: \"b\"\r\n\r\n");  // of another answer
+    EXPECT_THAT(requests, ElementsAre(HasSubstr("If-None-Match"), Not(HasSubstr("If-None-Match"))));
+}
+
+TEST_F(HttpTest, TrustsTheProfilesAuthorityWhileTheProfileIsTrusted) {
+    const std::string program =
+        VRX_PROGRAMS "/vrx-coverage-server --tls --fault server-version:redirect=http://127.0.0.1/";
+    FILE* server = popen(("exec 2>/dev/null; echo process $$; exec " + program).c_str(), "r");
+    std::array<char, 1000> process, certificate, url;
+    ASSERT_EQ(fscanf(server, "process %999s control on %*s certificate %999s listening on %999s", process.data(),
+                     certificate.data(), url.data()),
+              3);
+    setenv("https_proxy", "http://proxy.invalid:1", 1);  // not for this machine
+    EXPECT_THAT(error(get(url.data())), HasSubstr("certificate"));
+    writeFile(profile.path(), "[http]\nca_file = '" + std::string(certificate.data()) + "'");
+    chmod(profile.path().c_str(), 0600);
+    EXPECT_EQ(get(url.data()).status, 404);
+    EXPECT_EQ(error(get(url.data() + std::string("/library/ORVANE/asset/vrxV2.plist"))), "a redirect leaves https");
+    chmod(profile.path().c_str(), 0666);
+    EXPECT_THAT(error(get(url.data())), HasSubstr("certificate"));
+    kill(std::stoi(process.data()), SIGTERM);
+    pclose(server);
+}
+
+TEST_F(HttpTest, NamesTheLibraryThatItCannotOpen) {
+    writeFile(folder / "libcurl.so.4", "no library");
+    setenv("LD_LIBRARY_PATH", folder.path().c_str(), 1);  // heeded by a process that begins
+    GTEST_FLAG_SET(death_test_style, "threadsafe");
+    auto tellError = [this] {
+        std::fputs(error(get("https://localhost")).c_str(), stderr);
+        std::filesystem::remove_all(folder.path());
+        _exit(0);
+    };
+    EXPECT_EXIT(tellError(), ::testing::ExitedWithCode(0), "libcurl.so.4");
+    unsetenv("LD_LIBRARY_PATH");
+}
+
+TEST_F(HttpTest, AnswersRequestsAtOnceAndLetsGoOfThoseUnderWayAtItsEnd) {
+    LoopbackServer server([](const std::string& request) {
+        return request.starts_with("GET /silent") ? std::string() : answer("200 OK", "x");
+    });
+    std::promise<void> unanswered;  // broken when let go
+    auto future = unanswered.get_future();
+    http.makeUncached()->send(requestTo(server.url("/silent")), [p = std::move(unanswered)](HttpResponse) {});
+    std::vector<std::future<HttpResponse>> responses;
+    for (int i = 0; i < 40; ++i) {
+        std::promise<HttpResponse> response;
+        responses.push_back(response.get_future());
+        http.shared().send(requestTo(server.url()),
+                           [p = std::move(response)](HttpResponse r) mutable { p.set_value(std::move(r)); });
+    }
+    for (auto& response : responses) EXPECT_EQ(response.get().status, 200);
+    http.stop();
+    EXPECT_THROW(future.get(), std::future_error);
+    http.shared().send(requestTo(server.url()), [](HttpResponse) { FAIL(); });
+}
+
+}  // namespace
+}  // namespace vrx::host
