@@ -20,6 +20,21 @@ using platform::Value;
 
 namespace {
 
+// A line or a column. Newer releases of expat deprecate the name without a width, older ones have no other.
+class PlaceFunction {
+public:
+    PlaceFunction(const LazyLibrary& library, const char* wide, const char* narrow)
+        : wide_(library.optionalFunction(wide)) {
+        if (!wide_) narrow_ = library.function(narrow);
+    }
+
+    std::uint64_t operator()(XML_Parser parser) const { return wide_ ? wide_(parser) : narrow_(parser); }
+
+private:
+    std::uint64_t (*wide_)(XML_Parser);
+    XML_Size (*narrow_)(XML_Parser) = nullptr;
+};
+
 // Opened when the first document is read: what the agent keeps itself is binary.
 struct Expat {
     const LazyLibrary library{"libexpat.so.1"};
@@ -32,8 +47,8 @@ struct Expat {
     decltype(&::XML_Parse) parse = library.function("XML_Parse");
     decltype(&::XML_ErrorString) errorString = library.function("XML_ErrorString");
     decltype(&::XML_GetErrorCode) getErrorCode = library.function("XML_GetErrorCode");
-    decltype(&::XML_GetCurrentLineNumber) getCurrentLineNumber = library.function("XML_GetCurrentLineNumber");
-    decltype(&::XML_GetCurrentColumnNumber) getCurrentColumnNumber = library.function("XML_GetCurrentColumnNumber");
+    const PlaceFunction currentLine{library, "XML_GetCurrentLineNumber64", "XML_GetCurrentLineNumber"};
+    const PlaceFunction currentColumn{library, "XML_GetCurrentColumnNumber64", "XML_GetCurrentColumnNumber"};
     decltype(&::XML_StopParser) stopParser = library.function("XML_StopParser");
     decltype(&::XML_ParserFree) parserFree = library.function("XML_ParserFree");
 };
@@ -124,8 +139,8 @@ private:
     void complain(const std::string& complaint) {
         if (!complaint_.empty()) return;
         complaint_ = complaint;
-        place_ = "line " + std::to_string(expat().getCurrentLineNumber(parser_.get())) + ":" +
-                 std::to_string(expat().getCurrentColumnNumber(parser_.get()) + 1);
+        place_ = "line " + std::to_string(expat().currentLine(parser_.get())) + ":" +
+                 std::to_string(expat().currentColumn(parser_.get()) + 1);
         expat().stopParser(parser_.get(), XML_FALSE);
     }
     void requireLimit(bool within) {

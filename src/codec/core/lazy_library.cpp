@@ -6,10 +6,20 @@ namespace vrx::codec {
 
 LazyLibrary::Function LazyLibrary::function(const char* name) const {
     std::lock_guard lock(mutex_);
-    if (!library_ && missing_.empty()) library_ = dlopen(fileName_.c_str(), RTLD_LAZY | RTLD_LOCAL);
-    void* address = library_ ? dlsym(library_, (name + suffix_).c_str()) : nullptr;
+    void* address = addressOf(name);
     if (!address && missing_.empty()) missing_ = dlerror();
     return Function(address);
+}
+
+LazyLibrary::Function LazyLibrary::optionalFunction(const char* name) const {
+    std::lock_guard lock(mutex_);
+    return Function(addressOf(name));
+}
+
+// The caller holds the mutex. A library that cannot be opened is tried again by the next function until one is missing.
+void* LazyLibrary::addressOf(const char* name) const {
+    if (!library_ && missing_.empty()) library_ = dlopen(fileName_.c_str(), RTLD_LAZY | RTLD_LOCAL);
+    return library_ ? dlsym(library_, (name + suffix_).c_str()) : nullptr;
 }
 
 std::string LazyLibrary::missing() const {

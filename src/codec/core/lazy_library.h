@@ -32,11 +32,15 @@ public:
     // By its name:
     //     decltype(&::unum_open) open = icu().function("unum_open");
     Function function(const char* name) const;
+    // As function(), for one that some releases of the library do not have: its absence is nothing missing.
+    Function optionalFunction(const char* name) const;
 
     // What was not there, the library or the first such function, as a text that names it; empty when all was.
     std::string missing() const;
 
 private:
+    void* addressOf(const char* name) const;
+
     const std::string fileName_;
     const std::string suffix_;
     mutable std::mutex mutex_;
