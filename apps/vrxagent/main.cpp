@@ -46,7 +46,7 @@ int serve(const vrx::wire::Locations& places, Level logLevel, std::optional<Hand
     prctl(PR_CAP_AMBIENT, PR_CAP_AMBIENT_CLEAR_ALL, 0, 0, 0);
     Host host({.home = vrx::apps::absolutePath(places.home.path), .profile = places.profile.path}, logLevel);
     if (MaybeError error = host.open(HomeUse::Agent)) return cannotStart(error->text);
-    BundleLookup bundles([&] { return host.profile().facts(); });
+    BundleLookup bundles([&] { return host.profile().content(); });
     ServiceListenerFactory factory(host.mainLoop().event(), bundles, host.lifecycle());
     if (MaybeError error = factory.open(places.socket.path)) return cannotStart(error->text);
     host.setBundleLookup(&bundles);

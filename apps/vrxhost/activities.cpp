@@ -92,7 +92,7 @@ Outcome activities(AgentView& view) {
 void addActivitiesVerb(CommandLine& line, const wire::LocationOverrides& places) {
     auto profile = std::make_shared<std::optional<std::string>>();
     line.add("activities", "Shows the background activities: when they are due, and their last runs",
-             looking(places, profile, activities));
+             readOnlyVerb(places, profile, activities));
 }
 
 }  // namespace vrx::apps

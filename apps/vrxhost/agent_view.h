@@ -115,8 +115,9 @@ private:
 };
 
 // A verb that looks at the home of an agent, which must be there, and writes nothing. The places are read when it runs.
-CommandLine::Verb looking(const wire::LocationOverrides& places, std::shared_ptr<std::optional<std::string>> profile,
-                          std::function<Outcome(AgentView&)> verb);
+CommandLine::Verb readOnlyVerb(const wire::LocationOverrides& places,
+                               std::shared_ptr<std::optional<std::string>> profile,
+                               std::function<Outcome(AgentView&)> verb);
 // --device, which names the profile.
 void addProfileOption(CLI::App* verb, std::optional<std::string>& profile);
 

@@ -169,7 +169,7 @@ Check Examination::profile() const {
         return problem(reading.error().text, "Correct the line; until then the agent goes by what it read before.");
     if (!reading->warnings.empty())
         return note(reading->warnings.front(), "Correct or remove what means nothing to the agent.");
-    if (!view_.profile().facts()->isTrusted)
+    if (!view_.profile().content()->isTrusted)
         return note(chosen(places_.profile) +
                         ": others can write it, so what it says of bundles, authorities and helpers does not count",
                     "chown it to root or the agent's user, and chmod go-w " + path);
@@ -222,7 +222,7 @@ Check Examination::entitlement() const {
     if (const MaybeError open = host::isKeptFromOthers(program))
         return problem(open->text, "Install the programs where only root and the agent's user can write.",
                        ExitCode::Refused);
-    const auto bundle = host::BundleLookup([this] { return view_.profile().facts(); }).bundleOf(program);
+    const auto bundle = host::BundleLookup([this] { return view_.profile().content(); }).bundleOf(program);
     if (!bundle) return problem(program + " is in no bundle", grant, ExitCode::Refused);
     const auto granted = bundle->entitlements.find(entitlement);
     if (granted == bundle->entitlements.end() || granted->second != Value(true))
@@ -242,21 +242,21 @@ Check Examination::account() const {
 }
 
 Check Examination::credentialHelper() const {
-    const auto facts = view_.profile().facts();
-    if (!facts->account) return skipped("needs an account");
-    if (facts->account->credentialHelper.empty())
+    const auto content = view_.profile().content();
+    if (!content->account) return skipped("needs an account");
+    if (content->account->credentialHelper.empty())
         return note("none: tokens are not renewed",
                     "Name a program in the profile: [account] credential_helper = [\"/…\"].");
-    const std::string& program = facts->account->credentialHelper.front();
+    const std::string& program = content->account->credentialHelper.front();
     if (access(program.c_str(), X_OK) != 0)
         return problem(program + " cannot be run: " + std::strerror(errno), "Correct the profile's credential_helper.");
-    if (!facts->isTrusted)
+    if (!content->isTrusted)
         return problem(program + " is not run: others can write the profile", "chmod go-w " + places_.profile.path);
     return good(program);
 }
 
 Check Examination::network() const {
-    const auto overridden = view_.profile().facts()->networkAvailable;
+    const auto overridden = view_.profile().content()->networkAvailable;
     const bool isAvailable = overridden ? *overridden : host::NetworkRoutes(nullptr, {}).hasDefaultRoute();
     const std::string by = overridden ? "by the profile" : "by the machine's routes";
     if (isAvailable) return good("there is one, " + by);

@@ -71,7 +71,7 @@ Outcome fire(Home& home, const Options& options) {
 void addFireVerb(CommandLine& line, const wire::LocationOverrides& places) {
     auto options = std::make_shared<Options>();
     const CommandLine::Verb verb =
-        inHome(places, Access::Change, [options](Home& home) { return fire(home, *options); });
+        inHome(places, Access::ReadWrite, [options](Home& home) { return fire(home, *options); });
     CLI::App* app = line.add("fire", "Fires an activity now, as the system does when it falls due", [&places, verb] {
         // Without an agent not even the database is opened.
         const std::string home = absolutePath(wire::findLocations(places).home.path);

@@ -270,8 +270,8 @@ void addFollowUpVerbs(CommandLine& line, const wire::LocationOverrides& places) 
         return options->isWatch ? watch(line, home, profile) : list(home, profile).outcome;
     };
     // To watch is to wait for those who write, as one of them.
-    const CommandLine::Verb look = inHome(places, Access::Look, showing),
-                            stay = inHome(places, Access::Change, showing);
+    const CommandLine::Verb look = inHome(places, Access::ReadOnly, showing),
+                            stay = inHome(places, Access::ReadWrite, showing);
     CLI::App* listing = line.add("followups", "Shows what the settings app would",
                                  [options, look, stay] { return options->isWatch ? stay() : look(); });
     CLI::Option* watch = listing->add_flag("--watch", options->isWatch, "Show it again after each change");
@@ -282,11 +282,11 @@ void addFollowUpVerbs(CommandLine& line, const wire::LocationOverrides& places) 
 
     CLI::App* post = line.add(
         "post", "Posts an item, or replaces the pending one of the same identifier",
-        inHome(places, Access::Change, [options](Home& home) { return apps::post(home, options->file); }), listing);
+        inHome(places, Access::ReadWrite, [options](Home& home) { return apps::post(home, options->file); }), listing);
     post->add_option("FILE", options->file, "The item as JSON; - for standard input")->required();
     CLI::App* clear = line.add(
         "clear", "Clears items",
-        inHome(places, Access::Change, [options](Home& home) { return apps::clear(home, options->identifiers); }),
+        inHome(places, Access::ReadWrite, [options](Home& home) { return apps::clear(home, options->identifiers); }),
         listing);
     clear->add_option("ID", options->identifiers, "Unique identifiers of items")->required();
     for (CLI::App* change : {post, clear}) change->excludes(watch)->excludes(device);

@@ -18,7 +18,7 @@
 namespace vrx::apps {
 
 // To look is to change no file: a database that is damaged, or of an older release, is left to the agent.
-enum class Access { Look, Change };
+enum class Access { ReadOnly, ReadWrite };
 
 // What is in it, and the platform that the agent's own classes read it through.
 class Home {

@@ -174,31 +174,31 @@ Findings examine(AgentView& view, const std::string& serialNumber, const std::se
     const PostSettings settings;
 
     Findings findings{.circumstances = {.now = clock.now()}, .name = device->name()};
-    FollowUpCircumstances& facts = findings.circumstances;
-    facts.isTracked = found != devices.end();
-    facts.isPending = pending.contains(serialNumber);
-    facts.wasPosted = settings.dates.postedSerialNumberHashes.contains(platform::sha256Hash(serialNumber));
-    facts.hasRecord = cached.record != nullptr;
-    facts.recordFlaw = cached.flaw;
-    facts.post = decide(*info, settings, clock);
-    facts.refresh = decideRefresh(*info, {.isPending = facts.isPending}, clock);
-    facts.outreach = activities.outreach.nextRun();
-    facts.postRun = activities.post.nextRun();
-    if (facts.postRun)
-        facts.posting = predictedPosting(serialNumber, infos, settings, std::max(facts.now, *facts.postRun),
+    FollowUpCircumstances& state = findings.circumstances;
+    state.isTracked = found != devices.end();
+    state.isPending = pending.contains(serialNumber);
+    state.wasPosted = settings.dates.postedSerialNumberHashes.contains(platform::sha256Hash(serialNumber));
+    state.hasRecord = cached.record != nullptr;
+    state.recordFlaw = cached.flaw;
+    state.post = decide(*info, settings, clock);
+    state.refresh = decideRefresh(*info, {.isPending = state.isPending}, clock);
+    state.outreach = activities.outreach.nextRun();
+    state.postRun = activities.post.nextRun();
+    if (state.postRun)
+        state.posting = predictedPosting(serialNumber, infos, settings, std::max(state.now, *state.postRun),
                                          host::minimumInterval(view.profile()));
 
-    findings.nextPost = nextPostDate(infos, settings.dates, facts.now);
-    findings.nextRefresh = nextRefreshDate(shown, true, RefreshDateSettings::read(), facts.now);
-    findings.inputs = {{"now", facts.now},
+    findings.nextPost = nextPostDate(infos, settings.dates, state.now);
+    findings.nextRefresh = nextRefreshDate(shown, true, RefreshDateSettings::read(), state.now);
+    findings.inputs = {{"now", state.now},
                        {"activationDate", valueOf(device->activationDate())},
                        {"PostUpgradeOutreachDelay", settings.dates.outreachDelay.count()},
-                       {"postDate", facts.post.postDate ? Value(facts.post.postDate->date) : Value()},
-                       {"pending", facts.isPending},
-                       {"posted", facts.wasPosted},
+                       {"postDate", state.post.postDate ? Value(state.post.postDate->date) : Value()},
+                       {"pending", state.isPending},
+                       {"posted", state.wasPosted},
                        {"dismissed", settings.dismissed.contains(platform::sha256Hash(serialNumber))}};
     addRecord(findings, cached, serialNumber);
-    findings.inputs.emplace_back("carrierLeftOut", facts.isCarrierOut);
+    findings.inputs.emplace_back("carrierLeftOut", state.isCarrierOut);
     return findings;
 }
 
@@ -282,7 +282,7 @@ void addWhyVerb(CommandLine& line, const wire::LocationOverrides& places) {
     auto profile = std::make_shared<std::optional<std::string>>();
     CLI::App* verb =
         line.add("why", "Tells why a device's follow-up is shown, or is not",
-                 looking(places, profile, [serialNumber](AgentView& view) { return why(view, *serialNumber); }));
+                 readOnlyVerb(places, profile, [serialNumber](AgentView& view) { return why(view, *serialNumber); }));
     verb->add_option("SERIAL", *serialNumber, "The device's serial number")->required();
     addProfileOption(verb, *profile);
 }

@@ -4,7 +4,7 @@
 
 #include <filesystem>
 
-#include "vrx/host/home/host_facts.h"
+#include "vrx/host/home/stored_facts.h"
 
 namespace vrx::host {
 
@@ -33,7 +33,7 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel, const Ho
                    .workers = queues_.workers(platform::Priority::Background),
                    .conditions = conditions_,
                    .lifecycle = lifecycle_}),
-      store_(profile_),
+      marketplace_(profile_),
       purchases_(profile_),
       apps_(profile_),
       strings_(profile_) {
@@ -58,7 +58,7 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel, const Ho
     facilities_.propertyList = &propertyList_;
     facilities_.purchaseHistory = &purchases_;
     facilities_.queues = &queues_;
-    facilities_.store = &store_;
+    facilities_.store = &marketplace_;
     facilities_.telephonyNetworkInfo = &telephony_;
     facilities_.uuidSource = &uuids_;
     platform_ = Platform(facilities_);
@@ -76,7 +76,7 @@ MaybeError Host::open(HomeUse use) {
     if (MaybeError error = createDirectories(home_)) return error;
     if (use == HomeUse::Agent)
         if (MaybeError error = lock_.take(home_)) return error;
-    profile_.facts();  // what is wrong with it is said now, and what is good is there to stay when an edit is not
+    profile_.content();  // what is wrong with it is said now, and what is good is there to stay when an edit is not
     return database_.open();
 }
 
@@ -90,8 +90,8 @@ void Host::start(const std::string& agentVersion) {
         if (access(path.c_str(), F_OK) == 0) activities_.reconsider();
     });
     database_.write([this](Connection& connection) {
-        setHostFact(connection, facts::profile,
-                    profile_.path().empty() ? "" : std::filesystem::absolute(profile_.path()).string());
+        setStoredFact(connection, stored_facts::profile,
+                      profile_.path().empty() ? "" : std::filesystem::absolute(profile_.path()).string());
     });
     activities_.start(agentVersion);
     profileNotifier_.start(mainLoop_.event(), [this] { activities_.reconsider(); });

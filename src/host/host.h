@@ -24,7 +24,7 @@
 #include "vrx/host/home/follow_up_controller.h"
 #include "vrx/host/home/home_lock.h"
 #include "vrx/host/http/http.h"
-#include "vrx/host/http/store.h"
+#include "vrx/host/http/marketplace.h"
 #include "vrx/host/log/system_log.h"
 #include "vrx/host/loop/file_watch.h"
 #include "vrx/host/loop/main_loop.h"
@@ -114,7 +114,7 @@ private:
     MachineConditions conditions_;
     BackgroundActivities activities_;
     std::unique_ptr<FileWatch> databaseWatch_;
-    Store store_;
+    Marketplace marketplace_;
     PurchaseHistory purchases_;
     InstalledApps apps_;
     LocalizedStrings strings_;

@@ -19,9 +19,9 @@ RenewalResult failed(const Error& error) {
 
 // What the profile says of the account; null once another one, or nobody, is signed in.
 std::shared_ptr<const ProfileAccount> entryOf(const DeviceProfile& profile, const CloudAccount& account) {
-    std::shared_ptr<const ProfileFacts> facts = profile.facts();
-    if (!facts->account || facts->account->identifier != account.identifier) return nullptr;
-    return {facts, &*facts->account};
+    std::shared_ptr<const ProfileContent> content = profile.content();
+    if (!content->account || content->account->identifier != account.identifier) return nullptr;
+    return {content, &*content->account};
 }
 
 }  // namespace
@@ -33,9 +33,9 @@ AccountStore::AccountStore(const DeviceProfile& profile, const std::string& home
       renewals_([this](auto& question, int stopFile) { return renew(question, stopFile); }) {}
 
 std::optional<CloudAccount> AccountStore::primaryCloudAccount() const {
-    const std::shared_ptr<const ProfileFacts> facts = profile_.facts();
-    if (!facts->account) return std::nullopt;
-    return CloudAccount{facts->account->identifier, facts->account->altDSID};
+    const std::shared_ptr<const ProfileContent> content = profile_.content();
+    if (!content->account) return std::nullopt;
+    return CloudAccount{content->account->identifier, content->account->altDSID};
 }
 
 std::optional<AuthenticationAccount> AccountStore::authenticationAccount(const CloudAccount& account) const {
@@ -54,17 +54,17 @@ void AccountStore::renewCredentials(const AuthenticationAccount& account, platfo
 }
 
 RenewalResult AccountStore::renew(const CredentialRenewals::Question& question, int stopFile) {
-    const std::shared_ptr<const ProfileFacts> facts = profile_.facts();
-    if (!facts->account || facts->account->credentialHelper.empty())
+    const std::shared_ptr<const ProfileContent> content = profile_.content();
+    if (!content->account || content->account->credentialHelper.empty())
         return failed(credentialError(CredentialFailure::NotConfigured, "no credential helper is configured"));
-    if (!facts->isTrusted)
+    if (!content->isTrusted)
         return failed(credentialError(CredentialFailure::NotTrusted,
                                       "the credential helper is not run: others can write the device profile"));
     for (const std::string& service : question.options.services) {
         const CredentialQuestion asked{question.account.identifier, question.account.altDSID, service,
                                        question.options.avoidUI};
         const Result<Secret> token =
-            askCredentialHelper(facts->account->credentialHelper, asked, helperLimit_, stopFile);
+            askCredentialHelper(content->account->credentialHelper, asked, helperLimit_, stopFile);
         if (!token) return failed(token.error());
         if (MaybeError error = credentials_.store(asked.account, service, token->text()))
             return failed(credentialError(CredentialFailure::NotStored, error->text));

@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <utility>
 
-#include "vrx/host/home/host_facts.h"
+#include "vrx/host/home/stored_facts.h"
 #include "vrx/platform/log.h"
 #include "vrx/platform/vendor.h"
 
@@ -52,11 +52,11 @@ void scheduleOwn(Connection& connection, const std::string& agentVersion, const 
         std::string_view fact;
         const std::string& value;
         std::string_view activity;
-    } occasions[] = {{facts::agentVersion, agentVersion, platform::upgradeActivityRemainder},
-                     {facts::boot, now.boot, platform::bootActivityRemainder}};
+    } occasions[] = {{stored_facts::agentVersion, agentVersion, platform::upgradeActivityRemainder},
+                     {stored_facts::boot, now.boot, platform::bootActivityRemainder}};
     for (const auto& [fact, value, activity] : occasions) {
-        if (hostFact(connection, fact) == value) continue;
-        setHostFact(connection, fact, value);
+        if (storedFact(connection, fact) == value) continue;
+        setStoredFact(connection, fact, value);
         ActivityRegistry(connection).schedule(platform::vendorIdentifier(activity), {}, dueAfter(Duration(0), now));
     }
 }

@@ -34,11 +34,11 @@ Moment presentMoment() {
 }
 
 Duration minimumInterval(const DeviceProfile& profile) {
-    return std::min(profile.facts()->minimumInterval.value_or(platform::minimumInterval), platform::minimumInterval);
+    return std::min(profile.content()->minimumInterval.value_or(platform::minimumInterval), platform::minimumInterval);
 }
 
 bool MachineConditions::shouldDefer() const {
-    const std::optional<bool> override = profile_.facts()->shouldDefer;
+    const std::optional<bool> override = profile_.content()->shouldDefer;
     return override ? *override : isOnLowBattery();
 }
 
@@ -56,7 +56,7 @@ void MachineConditions::start(Calls calls) {
 }
 
 bool MachineConditions::isNetworkAvailable() {
-    const std::optional<bool> override = profile_.facts()->networkAvailable;
+    const std::optional<bool> override = profile_.content()->networkAvailable;
     return override ? *override : routes_.hasDefaultRoute();
 }
 

@@ -118,7 +118,7 @@ void createPrivately(const std::string& path) {
 
 // For looking: where a log lies beside the database, the index of the two is only read, or made in memory when nobody
 // keeps it; where none does, no index is needed.
-std::string lookingUri(const std::string& path) {
+std::string readOnlyUri(const std::string& path) {
     std::string uri = "file:";
     for (const char character : path) {
         if (character == '%' || character == '?' || character == '#')
@@ -188,11 +188,11 @@ std::span<const std::uint8_t> Statement::bytes(int column) const {
     return {start, start ? static_cast<std::size_t>(sqlite3_column_bytes(statement_, column)) : 0};
 }
 
-Connection::Connection(const std::string& path, std::chrono::milliseconds busyLimit, bool isLooking) {
+Connection::Connection(const std::string& path, std::chrono::milliseconds busyLimit, bool isReadOnly) {
     static const bool isConfigured = configure();
     static_cast<void>(isConfigured);
-    const int flags = isLooking ? SQLITE_OPEN_READONLY | SQLITE_OPEN_URI : SQLITE_OPEN_READWRITE;
-    const int result = sqlite3_open_v2((isLooking ? lookingUri(path) : path).c_str(), &connection_,
+    const int flags = isReadOnly ? SQLITE_OPEN_READONLY | SQLITE_OPEN_URI : SQLITE_OPEN_READWRITE;
+    const int result = sqlite3_open_v2((isReadOnly ? readOnlyUri(path) : path).c_str(), &connection_,
                                        flags | SQLITE_OPEN_NOMUTEX, nullptr);
     try {
         check(result, connection_);
@@ -299,8 +299,8 @@ struct Database::Opening {
     std::uint64_t number = 0;
 };
 
-Database::Database(std::string path, Schema schema, std::chrono::milliseconds busyLimit, bool isLooking)
-    : path_(std::move(path)), schema_(schema), busyLimit_(busyLimit), isLooking_(isLooking) {}
+Database::Database(std::string path, Schema schema, std::chrono::milliseconds busyLimit, bool isReadOnly)
+    : path_(std::move(path)), schema_(schema), busyLimit_(busyLimit), isReadOnly_(isReadOnly) {}
 
 Database::~Database() = default;
 
@@ -337,7 +337,7 @@ void Database::leaveReplacedFile() {
 }
 
 std::shared_ptr<Database::Opening> Database::openChecked() {
-    if (isLooking_) return openToLook();
+    if (isReadOnly_) return openReadOnly();
     try {
         return openOnce();
     } catch (const DatabaseError& error) {
@@ -361,7 +361,7 @@ std::shared_ptr<Database::Opening> Database::openOnce() const {
     return opening;
 }
 
-std::shared_ptr<Database::Opening> Database::openToLook() const {
+std::shared_ptr<Database::Opening> Database::openReadOnly() const {
     auto opening = std::make_shared<Opening>(path_, busyLimit_);
     Connection& reader = opening->reader.emplace(path_, busyLimit_, true);
     reader.checkSoundness();

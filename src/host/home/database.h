@@ -65,7 +65,7 @@ private:
 // One connection to the database, used by one thread at a time.
 class Connection {
 public:
-    Connection(const std::string& path, std::chrono::milliseconds busyLimit, bool isLooking = false);
+    Connection(const std::string& path, std::chrono::milliseconds busyLimit, bool isReadOnly = false);
     ~Connection();
     Connection(const Connection&) = delete;
     Connection& operator=(const Connection&) = delete;
@@ -107,7 +107,7 @@ public:
                       std::chrono::milliseconds busyLimit = std::chrono::seconds(5))
         : Database(std::move(path), schema, busyLimit, false) {}
     // For reading only. It changes no file: where one would have to be made, mended or migrated, it cannot be opened.
-    static Database toLookAt(std::string path, Schema schema = currentSchema) {
+    static Database readOnly(std::string path, Schema schema = currentSchema) {
         return {std::move(path), schema, std::chrono::seconds(5), true};
     }
     ~Database();
@@ -131,11 +131,11 @@ public:
 private:
     struct Opening;
 
-    Database(std::string path, Schema schema, std::chrono::milliseconds busyLimit, bool isLooking);
+    Database(std::string path, Schema schema, std::chrono::milliseconds busyLimit, bool isReadOnly);
     std::shared_ptr<Opening> opening(platform::MaybeError& error);
     std::shared_ptr<Opening> openChecked();
     std::shared_ptr<Opening> openOnce() const;
-    std::shared_ptr<Opening> openToLook() const;
+    std::shared_ptr<Opening> openReadOnly() const;
     std::int64_t checkedVersion(Connection& connection) const;
     void migrate(Connection& writer) const;
     void leaveReplacedFile();
@@ -148,7 +148,7 @@ private:
     const std::string path_;
     const Schema schema_;
     const std::chrono::milliseconds busyLimit_;
-    const bool isLooking_;
+    const bool isReadOnly_;
 
     // One user each of the reading and the writing connection, over all openings; taken before mutex_.
     std::mutex reading_;

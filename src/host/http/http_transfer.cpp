@@ -126,7 +126,8 @@ std::optional<HttpResponse> HttpTransfer::prepare() {
 // For whom the traffic is concerns nobody but a developer, whose server runs on this machine.
 void HttpTransfer::nameSourceApplication() {
     const std::optional<std::string>& application = request_.sourceApplication;
-    if (application && isLoopback_ && isOneLine(*application) && surroundings_.profile.facts()->http.namesApplications)
+    if (application && isLoopback_ && isOneLine(*application) &&
+        surroundings_.profile.content()->http.namesApplications)
         request_.headers["X-Orvane-Source-Application"] = *application;
 }
 
@@ -161,8 +162,8 @@ void HttpTransfer::setOptions() {
     // What goes to this machine does not leave it through a proxy; the environment may name one for all else.
     if (isLoopback_) set(CURLOPT_NOPROXY, "*");
     // Beside the system's own. Whom TLS trusts is the say of root and the agent's user alone.
-    const std::shared_ptr<const ProfileFacts> facts = surroundings_.profile.facts();
-    if (facts->http.caFile && facts->isTrusted) set(CURLOPT_CAINFO, facts->http.caFile->c_str());
+    const std::shared_ptr<const ProfileContent> content = surroundings_.profile.content();
+    if (content->http.caFile && content->isTrusted) set(CURLOPT_CAINFO, content->http.caFile->c_str());
     const auto left = std::chrono::ceil<std::chrono::milliseconds>(deadline_ - SteadyClock::now()).count();
     set(CURLOPT_TIMEOUT_MS, static_cast<long>(std::max<decltype(left)>(left, 1)));
 }

@@ -88,9 +88,9 @@ std::optional<BundleFile> BundleLookup::bundleOf(const std::string& executable) 
 }
 
 std::optional<BundleFile> BundleLookup::profileBundle(const std::string& executable) const {
-    const std::shared_ptr<const ProfileFacts> facts = profile_ ? profile_() : nullptr;
-    if (!facts || !facts->isTrusted) return std::nullopt;
-    for (const ProfileBundle& bundle : facts->bundles)
+    const std::shared_ptr<const ProfileContent> content = profile_ ? profile_() : nullptr;
+    if (!content || !content->isTrusted) return std::nullopt;
+    for (const ProfileBundle& bundle : content->bundles)
         for (const std::string& named : bundle.executables)
             if (isSameFile(named, executable))
                 return BundleFile{executable,    bundle.identifier, bundle.name,

@@ -19,7 +19,7 @@ namespace vrx::host {
 
 class BundleLookup final : public platform::BundleLookup {
 public:
-    using Profile = std::function<std::shared_ptr<const ProfileFacts>()>;
+    using Profile = std::function<std::shared_ptr<const ProfileContent>()>;
 
     explicit BundleLookup(Profile profile = nullptr) : profile_(std::move(profile)) {}
 

@@ -1,7 +1,7 @@
 // The agent's service on a Unix socket: accepts clients on the main loop, asks the delegate about each, and serves each
 // accepted one on a thread of its own.
 //
-//     BundleLookup bundles([&] { return host.profile().facts(); });
+//     BundleLookup bundles([&] { return host.profile().content(); });
 //     ServiceListenerFactory factory(host.mainLoop().event(), bundles, host.lifecycle());
 //     if (MaybeError error = factory.open(socketPath)) …         // tell, and exit
 //     host.setServiceListenerFactory(&factory);

@@ -52,7 +52,7 @@ struct ProfileHttp {
 };
 
 // What the file says.
-struct ProfileFacts {
+struct ProfileContent {
     std::optional<std::string> serialNumber;
     std::optional<std::string> name;
     std::optional<std::string> productType;
@@ -91,7 +91,7 @@ public:
     explicit DeviceProfile(std::string path, std::string machineRoot = "");
 
     // The present facts of the file, never null.
-    std::shared_ptr<const ProfileFacts> facts() const { return facts_.get(); }
+    std::shared_ptr<const ProfileContent> content() const { return content_.get(); }
     const std::string& path() const { return path_; }
     // The files that say which watches are paired and which language holds.
     std::vector<std::string> sources() const;
@@ -107,11 +107,11 @@ public:
 private:
     const std::string path_;
     const BareMachine machine_;
-    const CurrentCopy<ProfileFacts> facts_;
+    const CurrentCopy<ProfileContent> content_;
 };
 
 struct ProfileReading {
-    ProfileFacts facts;
+    ProfileContent content;
     std::vector<std::string> warnings;  // of keys that mean nothing: "PATH:LINE: …"
 };
 

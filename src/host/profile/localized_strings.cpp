@@ -39,7 +39,7 @@ std::optional<std::string> textIn(const std::string& path, std::string_view key)
 
 std::string LocalizedStrings::localizedString(std::string_view key, std::string_view defaultText,
                                               std::string_view table) const {
-    const std::string folder = profile_.facts()->companionFolder;
+    const std::string folder = profile_.content()->companionFolder;
     for (const std::string& language : languages(profile_.preferredLocaleIdentifier()))
         if (auto text = textIn(folder + "/" + language + "/" + std::string(table) + ".toml", key)) return *text;
     return std::string(defaultText);

@@ -93,7 +93,7 @@ TEST_F(BundleLookupTest, ReadsEntitlementsOfAnyType) {
 }
 
 TEST_F(BundleLookupTest, TakesTestersBundlesFromATrustedProfile) {
-    auto facts = std::make_shared<ProfileFacts>();
+    auto facts = std::make_shared<ProfileContent>();
     std::filesystem::create_symlink(folder + "/app/bin/viewer", folder + "/other-name");
     facts->bundles.push_back({{"/nowhere", folder + "/other-name"}, "com.example.tester", {}, {}, {}, {}});
     BundleLookup lookup([facts] { return facts; });
@@ -129,7 +129,7 @@ TEST_F(BundleLookupTest, EntitlesThePeerByItsProgramAndGroup) {
     EXPECT_EQ(BundleLookup().entitlement(peer, "e"), Value(true));
     requireGroup("nogroup");
     EXPECT_TRUE(BundleLookup().entitlement(peer, "e").isNull());
-    auto facts = std::make_shared<ProfileFacts>();
+    auto facts = std::make_shared<ProfileContent>();
     facts->isTrusted = true;
     facts->bundles.push_back({{program}, "com.example.tester", {}, {}, "nogroup", {{"e", true}}});
     BundleLookup tester([facts] { return facts; });

@@ -110,7 +110,7 @@ TEST_F(DeviceProfileTest, GivesEveryFactOfTheFile) {
     EXPECT_EQ(carriers.at("roaming").mobileNetworkCode, std::nullopt);
     EXPECT_EQ(telephony.description(), "telephony (roaming: carrier 02 (null), slot 1: carrier 310 410)");
 
-    const auto facts = profile.facts();
+    const auto facts = profile.content();
     const ProfileAccount account = facts->account.value();
     EXPECT_EQ(account.identifier + *account.altDSID, "adaA1");
     EXPECT_EQ(account.authentication, (platform::AuthenticationAccount{"ada", "A2"}));
@@ -124,11 +124,11 @@ TEST_F(DeviceProfileTest, GivesEveryFactOfTheFile) {
     EXPECT_TRUE(facts->isTrusted);
     EXPECT_THAT(log.lines(), ElementsAre());
     chmod(path().c_str(), 0664);  // somebody else may write it now
-    EXPECT_FALSE(profile.facts()->isTrusted);
+    EXPECT_FALSE(profile.content()->isTrusted);
     EXPECT_THAT(log.lines(), ElementsAre(HasSubstr("others can write it")));
 
     writeFile(path(), "account = { identifier = 'ada', authentication = false }");
-    EXPECT_FALSE(profile.facts()->account->authentication);
+    EXPECT_FALSE(profile.content()->account->authentication);
 }
 
 TEST_F(DeviceProfileTest, EachReadSeesTheFileAsItIsEvenWithinOneTickOfTheClock) {
@@ -143,7 +143,7 @@ TEST_F(DeviceProfileTest, EachReadSeesTheFileAsItIsEvenWithinOneTickOfTheClock) 
         }
         ASSERT_EQ(profile.string("SerialNumber"), serial);
     }
-    const auto facts = profile.facts();
+    const auto facts = profile.content();
     std::filesystem::remove(path());
     EXPECT_EQ(profile.string("SerialNumber"), std::nullopt);  // and the bare machine has none
     EXPECT_EQ(facts->serialNumber, "SN299");

@@ -9,9 +9,9 @@
 
 namespace vrx::host {
 
-class Store final : public platform::Store {
+class Marketplace final : public platform::Store {
 public:
-    explicit Store(const DeviceProfile& profile) : profile_(profile) {}
+    explicit Marketplace(const DeviceProfile& profile) : profile_(profile) {}
 
     platform::StoreProfile lookupProfile() const override;
     // All keys are to be had always.

@@ -1,4 +1,4 @@
-#include "vrx/host/http/store.h"
+#include "vrx/host/http/marketplace.h"
 
 #include <utility>
 
@@ -122,22 +122,22 @@ private:
 
 }  // namespace
 
-platform::StoreProfile Store::lookupProfile() const {
+platform::StoreProfile Marketplace::lookupProfile() const {
     return {.name = "lookup", .version = "1", .bagKeys = {"lookup-url"}};
 }
 
-std::shared_ptr<platform::StoreBag> Store::openBag(const std::string&, const std::string&) {
-    return std::make_shared<Bag>(profile_.facts()->storeLookupURL);
+std::shared_ptr<platform::StoreBag> Marketplace::openBag(const std::string&, const std::string&) {
+    return std::make_shared<Bag>(profile_.content()->storeLookupURL);
 }
 
-std::unique_ptr<platform::StoreLookup> Store::makeLookup(std::shared_ptr<platform::StoreBag> bag,
-                                                         std::string callerName, platform::StoreKeyProfile) {
+std::unique_ptr<platform::StoreLookup> Marketplace::makeLookup(std::shared_ptr<platform::StoreBag> bag,
+                                                               std::string callerName, platform::StoreKeyProfile) {
     return std::make_unique<Lookup>(std::move(bag), std::move(callerName));
 }
 
 void PurchaseHistory::runQuery(platform::PurchaseQuery query,
                                platform::OnceCallback<std::vector<platform::Purchase>> resultHandler) {
-    const std::optional<std::string> address = profile_.facts()->purchaseHistoryURL;
+    const std::optional<std::string> address = profile_.content()->purchaseHistoryURL;
     if (!address) {
         auto none = [resultHandler = std::move(resultHandler)]() mutable { resultHandler({}); };
         return Platform::current().queues().workers(platform::Priority::UserInitiated).post(std::move(none));
