@@ -5,18 +5,15 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <sstream>
 
 #include "vrx/host/base/files.h"
+#include "vrx/host/profile/toml_value.h"
 
 namespace vrx::host {
 
-using platform::Array;
-using platform::Dictionary;
 using platform::Error;
 using platform::MaybeError;
 using platform::Result;
-using platform::Value;
 
 namespace {
 
@@ -28,27 +25,6 @@ bool isOpenToOthers(const struct stat& status) {
 
 Error notBelieved(const std::string& path) {
     return {"bundle", EPERM, path + " can be changed by others than root and the agent's user"};
-}
-
-// Dates and times are given as their text.
-Value toValue(const toml::node& node) {
-    if (const auto* flag = node.as_boolean()) return flag->get();
-    if (const auto* integer = node.as_integer()) return integer->get();
-    if (const auto* number = node.as_floating_point()) return number->get();
-    if (const auto* text = node.as_string()) return text->get();
-    if (const auto* array = node.as_array()) {
-        Array elements;
-        for (const toml::node& element : *array) elements.push_back(toValue(element));
-        return elements;
-    }
-    if (const auto* table = node.as_table()) {
-        Dictionary entries;
-        for (const auto& [key, entry] : *table) entries[std::string(key.str())] = toValue(entry);
-        return entries;
-    }
-    std::ostringstream text;
-    node.visit([&](const auto& value) { text << value; });
-    return text.str();
 }
 
 std::optional<std::string> text(const toml::table& table, const char* key) {
@@ -83,7 +59,7 @@ Result<BundleFile> readBundleFile(const std::string& folder) {
         file.vendor = text(table, "vendor");
         file.group = text(table, "group");
         if (const toml::table* entitlements = table["entitlements"].as_table())
-            file.entitlements = *toValue(*entitlements).asDictionary();
+            file.entitlements = *valueOf(*entitlements).asDictionary();
         return file;
     } catch (const toml::parse_error& error) {
         return Error{"bundle", EINVAL,

@@ -3,11 +3,13 @@
 #include <unistd.h>
 
 #include <toml++/toml.h>
+#include <algorithm>
 #include <cerrno>
 #include <set>
 
 #include "vrx/codec/core/number_format.h"
 #include "vrx/host/base/text.h"
+#include "vrx/host/profile/toml_value.h"
 #include "vrx/platform/log.h"
 
 namespace vrx::host {
@@ -17,7 +19,6 @@ using platform::Error;
 using platform::Level;
 using platform::PairedWatch;
 using platform::Result;
-using platform::Value;
 
 namespace {
 
@@ -193,19 +194,11 @@ platform::Carrier readCarrier(Table& table) {
     return {.mobileCountryCode = table.string("mcc"), .mobileNetworkCode = table.string("mnc")};
 }
 
-std::optional<Value> entitlementValue(const toml::node& node) {
-    if (const auto* flag = node.as_boolean()) return flag->get();
-    if (const auto* number = node.as_integer()) return number->get();
-    if (const auto* number = node.as_floating_point()) return number->get();
-    if (const auto* text = node.as_string()) return text->get();
-    const toml::array* array = node.as_array();
-    if (!array) return std::nullopt;
-    platform::Array list;
-    for (const toml::node& element : *array) {
-        if (!element.is_string()) return std::nullopt;
-        list.emplace_back(**element.as_string());
-    }
-    return list;
+bool isEntitlementValue(const toml::node& node) {
+    const auto isString = [](const toml::node& element) { return element.is_string(); };
+    const toml::array* list = node.as_array();
+    return node.is_boolean() || node.is_number() || node.is_string() ||
+           (list && std::all_of(list->begin(), list->end(), isString));
 }
 
 ProfileBundle readBundle(Table& table) {
@@ -217,9 +210,9 @@ ProfileBundle readBundle(Table& table) {
     bundle.group = table.string("group");
     table.table("entitlements", [&](Table& entitlements) {
         entitlements.each([&](const std::string& name, const toml::node& node) {
-            std::optional<Value> value = entitlementValue(node);
-            if (!value) entitlements.reject(name, node, "a boolean, number, string or list of strings");
-            bundle.entitlements[name] = std::move(*value);
+            if (!isEntitlementValue(node))
+                entitlements.reject(name, node, "a boolean, number, string or list of strings");
+            bundle.entitlements[name] = valueOf(node);
         });
     });
     return bundle;
