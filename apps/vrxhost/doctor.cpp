@@ -169,10 +169,10 @@ Check Examination::profile() const {
         return problem(reading.error().text, "Correct the line; until then the agent goes by what it read before.");
     if (!reading->warnings.empty())
         return note(reading->warnings.front(), "Correct or remove what means nothing to the agent.");
-    if (!view_.profile().content()->isTrusted)
-        return note(chosen(places_.profile) +
-                        ": others can write it, so what it says of bundles, authorities and helpers does not count",
-                    "chown it to root or the agent's user, and chmod go-w " + path);
+    if (const auto open = view_.profile().content()->findOpenToOthers())
+        return note(chosen(places_.profile) + ": others can write " + (open->path == path ? "it" : open->path) +
+                        ", so what it says of bundles, authorities and helpers does not count",
+                    "chown it to root or the agent's user, and chmod go-w " + open->path);
     return good(chosen(places_.profile));
 }
 
@@ -219,8 +219,8 @@ Check Examination::entitlement() const {
     if (!std::filesystem::exists(program, error)) return note("there is no " + program);
     const std::string entitlement = platform::vendorIdentifier(platform::entitlementRemainder);
     const std::string grant = "A bundle.toml in its folder, or above, grants it: \"" + entitlement + "\" = true.";
-    if (const MaybeError open = host::isKeptFromOthers(program))
-        return problem(open->text, "Install the programs where only root and the agent's user can write.",
+    if (const auto open = host::findOpenToOthers(program, host::Links::Refused))
+        return problem(open->error.text, "Install the programs where only root and the agent's user can write.",
                        ExitCode::Refused);
     const auto bundle = host::BundleLookup([this] { return view_.profile().content(); }).bundleOf(program);
     if (!bundle) return problem(program + " is in no bundle", grant, ExitCode::Refused);
@@ -250,8 +250,10 @@ Check Examination::credentialHelper() const {
     const std::string& program = content->account->credentialHelper.front();
     if (access(program.c_str(), X_OK) != 0)
         return problem(program + " cannot be run: " + std::strerror(errno), "Correct the profile's credential_helper.");
-    if (!content->isTrusted)
-        return problem(program + " is not run: others can write the profile", "chmod go-w " + places_.profile.path);
+    if (const auto open = content->findOpenToOthers())
+        return problem(
+            program + " is not run: others can write " + (open->path == content->path ? "the profile" : open->path),
+            "chown it to root or the agent's user, and chmod go-w " + open->path);
     return good(program);
 }
 

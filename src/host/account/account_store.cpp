@@ -57,9 +57,9 @@ RenewalResult AccountStore::renew(const CredentialRenewals::Question& question, 
     const std::shared_ptr<const ProfileContent> content = profile_.content();
     if (!content->account || content->account->credentialHelper.empty())
         return failed(credentialError(CredentialFailure::NotConfigured, "no credential helper is configured"));
-    if (!content->isTrusted)
+    if (const auto open = content->findOpenToOthers())
         return failed(credentialError(CredentialFailure::NotTrusted,
-                                      "the credential helper is not run: others can write the device profile"));
+                                      "the credential helper is not run: others can write " + open->path));
     for (const std::string& service : question.options.services) {
         const CredentialQuestion asked{question.account.identifier, question.account.altDSID, service,
                                        question.options.avoidUI};

@@ -163,7 +163,7 @@ void HttpTransfer::setOptions() {
     if (isLoopback_) set(CURLOPT_NOPROXY, "*");
     // Beside the system's own. Whom TLS trusts is the say of root and the agent's user alone.
     const std::shared_ptr<const ProfileContent> content = surroundings_.profile.content();
-    if (content->http.caFile && content->isTrusted) set(CURLOPT_CAINFO, content->http.caFile->c_str());
+    if (content->http.caFile && content->isTrusted()) set(CURLOPT_CAINFO, content->http.caFile->c_str());
     const auto left = std::chrono::ceil<std::chrono::milliseconds>(deadline_ - SteadyClock::now()).count();
     set(CURLOPT_TIMEOUT_MS, static_cast<long>(std::max<decltype(left)>(left, 1)));
 }

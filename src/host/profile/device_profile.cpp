@@ -1,8 +1,5 @@
 #include "vrx/host/profile/device_profile.h"
 
-#include <unistd.h>
-
-#include <toml++/toml.h>
 #include <algorithm>
 #include <cerrno>
 #include <set>
@@ -301,10 +298,6 @@ ProfileContent readContent(Table& root) {
     return content;
 }
 
-bool isWrittenByTrusted(const struct stat& status) {
-    return (status.st_uid == 0 || status.st_uid == geteuid()) && (status.st_mode & 0022) == 0;
-}
-
 bool needsTrust(const ProfileContent& content) {
     return !content.bundles.empty() || content.http.caFile ||
            (content.account && !content.account->credentialHelper.empty());
@@ -328,15 +321,16 @@ public:
             report(Level::Error, reading.error().text + "; the device profile is not taken over");
             return last;
         }
-        std::string warnings;
-        for (const std::string& warning : reading->warnings) warnings += (warnings.empty() ? "" : "; ") + warning;
-        ProfileContent content = std::move(reading).value().content;
-        content.isTrusted = isWrittenByTrusted(file->status);
-        if (!content.isTrusted && needsTrust(content))
-            warnings +=
-                (warnings.empty() ? "" : "; ") + path_ +
-                ": others can write it; its bundles, http.ca_file and account.credential_helper are not believed";
-        report(Level::Default, warnings);
+        auto [content, warnings] = std::move(reading).value();
+        content.path = path_;
+        content.wasOpenToOthers = findOpenToOthers(path_, file->status).has_value();
+        if (const auto open = needsTrust(content) ? content.findOpenToOthers() : std::nullopt)
+            warnings.push_back(open->path +
+                               ": others can write it; the bundles, http.ca_file and account.credential_helper of " +
+                               path_ + " are not believed");
+        std::string text;
+        for (const std::string& warning : warnings) text += (text.empty() ? "" : "; ") + warning;
+        report(Level::Default, text);
         return std::make_shared<const ProfileContent>(std::move(content));
     }
 
@@ -350,6 +344,13 @@ private:
 };
 
 }  // namespace
+
+std::optional<OpenToOthers> ProfileContent::findOpenToOthers() const {
+    if (path.empty()) return std::nullopt;
+    std::optional<OpenToOthers> open = host::findOpenToOthers(path, Links::Followed);
+    if (!open && wasOpenToOthers) open = {path, Error{"profile", EPERM, path + " could be changed by others"}};
+    return open;
+}
 
 Result<ProfileReading> parseProfile(std::string_view document, const std::string& path) {
     auto place = [&](toml::source_index line) { return path + ":" + std::to_string(line) + ": "; };

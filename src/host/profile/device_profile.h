@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "vrx/host/base/current_copy.h"
+#include "vrx/host/base/trust.h"
 #include "vrx/host/profile/bare_machine.h"
 #include "vrx/platform/account_store.h"
 #include "vrx/platform/device_properties.h"
@@ -77,9 +78,13 @@ struct ProfileContent {
 
     // Whether these are not the file's, because nobody has understood it since the process began.
     bool isSubstitute = false;
-    // Whether root or the agent's own user owns the file and nobody else can write it: only then may what it says
-    // about bundles, authorities and helper programs be believed.
-    bool isTrusted = false;
+    std::string path;              // of the file; empty when there is none
+    bool wasOpenToOthers = false;  // the file itself, when it was read
+
+    // Nothing while only root and the agent's own user can change the file: only then may what it says about bundles,
+    // authorities and helper programs be believed. Examines the file and every folder above it at each call.
+    std::optional<OpenToOthers> findOpenToOthers() const;
+    bool isTrusted() const { return !findOpenToOthers(); }
 };
 
 class DeviceProfile final : public platform::DeviceProperties,

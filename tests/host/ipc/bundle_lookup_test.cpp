@@ -97,8 +97,11 @@ TEST_F(BundleLookupTest, TakesTestersBundlesFromATrustedProfile) {
     std::filesystem::create_symlink(folder + "/app/bin/viewer", folder + "/other-name");
     facts->bundles.push_back({{"/nowhere", folder + "/other-name"}, "com.example.tester", {}, {}, {}, {}});
     BundleLookup lookup([facts] { return facts; });
+    facts->path = folder + "/device.toml";
+    write("device.toml", "");
+    makeMode("device.toml", 0666);
     EXPECT_EQ(identifier(lookup), "com.example.viewer");
-    facts->isTrusted = true;
+    makeMode("device.toml", 0644);
     EXPECT_EQ(identifier(lookup), "com.example.tester");
 }
 
@@ -130,7 +133,6 @@ TEST_F(BundleLookupTest, EntitlesThePeerByItsProgramAndGroup) {
     requireGroup("nogroup");
     EXPECT_TRUE(BundleLookup().entitlement(peer, "e").isNull());
     auto facts = std::make_shared<ProfileContent>();
-    facts->isTrusted = true;
     facts->bundles.push_back({{program}, "com.example.tester", {}, {}, "nogroup", {{"e", true}}});
     BundleLookup tester([facts] { return facts; });
     EXPECT_TRUE(tester.entitlement(peer, "e").isNull());
