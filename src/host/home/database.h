@@ -8,7 +8,6 @@
 #include <sqlite3.h>
 #include <sys/stat.h>
 
-#include <array>
 #include <chrono>
 #include <cstdint>
 #include <functional>
@@ -75,10 +74,8 @@ public:
     // The statement of a literal, prepared at first need and unbound again at each call. It must not be in use.
     Statement& statement(const char* sql);
     std::int64_t integer(const char* sql);
-    // Two equal marks: nothing was committed in between, by any connection of any process. The mark is the header of
-    // the database's shared index, which every commit replaces, and costs no system call.
-    using CommitMark = std::array<std::uint32_t, 12>;
-    CommitMark commitMark();
+    // While two marks are equal, no other connection of any process has committed in between.
+    std::int64_t commitMark();
 
 private:
     friend class Database;
@@ -86,13 +83,11 @@ private:
     // Whether closing leaves the files as they are, as it does at first: a damaged database is to be set aside
     // untouched.
     void keepLogAtClose(bool keep);
-    void findIndexHeader();
     void checkSoundness();
     // A statement left within its rows would keep the transaction open.
     void endStatements();
 
     sqlite3* connection_ = nullptr;
-    const std::uint32_t* indexHeader_ = nullptr;  // mapped by SQLite while the connection is open
     std::unordered_map<const char*, std::unique_ptr<Statement>> statements_;
 };
 
@@ -122,7 +117,7 @@ public:
     // What a copy of something stored must still be equal to if it is to be current.
     struct Stamp {
         std::uint64_t opening = 0;  // none is 0
-        Connection::CommitMark mark{};
+        std::int64_t mark = 0;
         bool operator==(const Stamp&) const = default;
     };
     // As read(), without a transaction, for one statement or for none: the body is told the stamp.
