@@ -27,10 +27,7 @@ class HttpTransfers {
 public:
     HttpTransfers(platform::Queue& answers, const platform::Clock& clock, const DeviceProfile& profile,
                   const HttpLimits& limits)
-        : answers_(answers),
-          limits_(limits),
-          profile_(profile),
-          cache_(clock, limits.storedAnswers, limits.storedBytes) {}
+        : answers_(answers), limits_(limits), profile_(profile), cache_(clock, limits.storedBytes) {}
     ~HttpTransfers() { stop(); }
 
     void send(HttpRequest request, bool isUncached, Completion completion);

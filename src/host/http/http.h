@@ -24,7 +24,6 @@ struct HttpLimits {
     platform::Duration longestTimeout = std::chrono::hours(24);  // of any request; a day is as good as for ever
     std::size_t answerBytes = platform::limits::answerBytes;     // after decompression; headers count apart
     int redirects = 5;
-    std::size_t storedAnswers = 32;
     std::size_t storedBytes = 1024 * 1024;  // of all stored answers together
 };
 

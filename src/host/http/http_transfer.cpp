@@ -132,13 +132,11 @@ void HttpTransfer::nameSourceApplication() {
 }
 
 std::optional<HttpResponse> HttpTransfer::storedAnswer() {
-    // Of the other methods none is asked often enough to be worth it, and most change something.
-    isCached_ = request_.method == "GET" && request_.body.empty() && HttpCache::isFor(ownHeaders());
+    isCached_ = request_.method == "GET" && request_.body.empty() && ownHeaders().empty();
     if (!isCached_) return std::nullopt;
     HttpCache& cache = surroundings_.cache;
-    key_ = HttpCache::keyOf(address_, ownHeaders());
     asked_ = cache.now();
-    stored_ = isUncached_ ? nullptr : cache.find(key_);
+    stored_ = isUncached_ ? nullptr : cache.find(address_);
     return stored_ ? cache.freshAnswer(*stored_) : std::nullopt;
 }
 
@@ -275,7 +273,7 @@ std::optional<HttpResponse> HttpTransfer::finish(CURLcode result) {
     }
     const bool isKept = isCached_ && status == 200 && isWhole();
     HttpResponse response = httpSuccess(static_cast<int>(status), std::move(headers_), std::move(body_));
-    if (isKept) cache.store(key_, address_, asked_, response);
+    if (isKept) cache.store(address_, asked_, response);
     // What was changed at the address is not what is kept of it.
     if (request_.method != "GET" && request_.method != "HEAD" && status < 400) cache.forget(address_);
     return response;

@@ -82,8 +82,7 @@ private:
     bool isSecured_ = false;   // what redirected there came over TLS
     int redirects_ = 0;
 
-    bool isCached_ = false;  // may be answered from the cache, and go there
-    HttpCache::Key key_{};
+    bool isCached_ = false;     // may be answered from the cache, and go there
     HttpCache::Stored stored_;  // what is being asked about
     platform::Date asked_;
 
