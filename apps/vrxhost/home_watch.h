@@ -4,6 +4,7 @@
 
 #include <string>
 
+#include "vrx/host/base/descriptor.h"
 #include "vrx/platform/date.h"
 #include "vrxhost/home.h"
 
@@ -13,9 +14,6 @@ class HomeWatch {
 public:
     // What happens from now on is told of.
     explicit HomeWatch(Home& home);
-    ~HomeWatch();
-    HomeWatch(const HomeWatch&) = delete;
-    HomeWatch& operator=(const HomeWatch&) = delete;
 
     enum class Wake {
         Look,  // something may have been committed, which can be read now; or it is the date
@@ -30,9 +28,9 @@ private:
     Wake letWritersFinish();
 
     Home& home_;
-    const int changes_;
-    const int signals_;
-    const int timer_;
+    const host::Descriptor changes_;
+    const host::Descriptor signals_;
+    const host::Descriptor timer_;
 };
 
 }  // namespace vrx::apps

@@ -1,8 +1,5 @@
 #include "vrx/host/account/credential_renewals.h"
 
-#include <sys/eventfd.h>
-
-#include <cerrno>
 #include <system_error>
 
 #include "vrx/host/account/credential_helper.h"
@@ -10,11 +7,6 @@
 namespace vrx::host {
 
 using platform::RenewalResult;
-
-CredentialRenewals::CredentialRenewals(Renew renew)
-    : renew_(std::move(renew)), stopFile_(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {
-    if (!stopFile_) throw std::system_error(errno, std::generic_category(), "eventfd");
-}
 
 CredentialRenewals::~CredentialRenewals() {
     stop();

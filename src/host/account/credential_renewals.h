@@ -25,7 +25,7 @@ public:
     // Does the work, as long as it takes; ends early, with a failure, once the stop file can be read.
     using Renew = std::function<platform::RenewalResult(const Question& question, int stopFile)>;
 
-    explicit CredentialRenewals(Renew renew);
+    explicit CredentialRenewals(Renew renew) : renew_(std::move(renew)) {}
     // Stops, and waits until all are answered.
     ~CredentialRenewals();
 
@@ -45,7 +45,7 @@ private:
     void removeEnded();
 
     const Renew renew_;
-    const Descriptor stopFile_;
+    const Descriptor stopFile_ = makeEventFile();
     std::mutex mutex_;
     std::list<Run> runs_;
 };

@@ -1,11 +1,11 @@
 #include "vrx/host/activities/activity_requests.h"
 
 #include <fcntl.h>
-#include <unistd.h>
 
 #include <chrono>
 #include <thread>
 
+#include "vrx/host/base/descriptor.h"
 #include "vrx/host/home/home_lock.h"
 
 namespace vrx::host {
@@ -16,8 +16,7 @@ namespace {
 
 // Its being closed after writing is what the agent sees.
 void touch(const std::string& path) {
-    const int file = ::open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600);
-    if (file >= 0) ::close(file);
+    const Descriptor file(::open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600));
 }
 
 void removeRequest(Database& database, std::int64_t number) {

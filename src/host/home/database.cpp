@@ -2,7 +2,6 @@
 
 #include <fcntl.h>
 #include <sys/file.h>
-#include <unistd.h>
 
 #include <array>
 #include <cerrno>
@@ -10,6 +9,7 @@
 #include <ctime>
 #include <thread>
 
+#include "vrx/host/base/descriptor.h"
 #include "vrx/host/base/files.h"
 #include "vrx/platform/log.h"
 
@@ -81,23 +81,17 @@ class FolderLock {
 public:
     FolderLock(const std::string& folder, std::chrono::milliseconds limit)
         : file_(::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC)) {
-        if (file_ < 0) throw DatabaseError(SQLITE_CANTOPEN, systemError("open", folder, errno).text);
+        if (!file_) throw DatabaseError(SQLITE_CANTOPEN, systemError("open", folder, errno).text);
         const auto end = std::chrono::steady_clock::now() + limit;
-        while (flock(file_, LOCK_EX | LOCK_NB) != 0) {
-            if (std::chrono::steady_clock::now() < end) {
-                std::this_thread::sleep_for(std::chrono::milliseconds(2));
-                continue;
-            }
-            ::close(file_);
-            throw DatabaseError(SQLITE_BUSY, "another process keeps " + folder + " locked");
+        while (flock(file_.number(), LOCK_EX | LOCK_NB) != 0) {
+            if (std::chrono::steady_clock::now() >= end)
+                throw DatabaseError(SQLITE_BUSY, "another process keeps " + folder + " locked");
+            std::this_thread::sleep_for(std::chrono::milliseconds(2));
         }
     }
-    ~FolderLock() { ::close(file_); }
-    FolderLock(const FolderLock&) = delete;
-    FolderLock& operator=(const FolderLock&) = delete;
 
 private:
-    int file_;
+    const Descriptor file_;
 };
 
 // The whole database is some ten pages. As it comes, SQLite would set aside, and touch, room for twenty pages and for
@@ -109,11 +103,8 @@ bool configure() {
 
 // SQLite would make the file readable for others; what it makes beside it has the file's own mode.
 void createPrivately(const std::string& path) {
-    int file = ::open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600);
-    if (file >= 0)
-        ::close(file);
-    else if (errno != EEXIST)
-        throw DatabaseError(SQLITE_CANTOPEN, systemError("create", path, errno).text);
+    const Descriptor file(::open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600));
+    if (!file && errno != EEXIST) throw DatabaseError(SQLITE_CANTOPEN, systemError("create", path, errno).text);
 }
 
 // For looking: where a log lies beside the database, the index of the two is only read, or made in memory when nobody

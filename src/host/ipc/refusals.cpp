@@ -1,10 +1,8 @@
 #include "vrx/host/ipc/refusals.h"
 
 #include <poll.h>
-#include <sys/eventfd.h>
 
 #include <algorithm>
-#include <cerrno>
 #include <system_error>
 #include <vector>
 
@@ -55,9 +53,7 @@ private:
     bool isAnswered_ = false;
 };
 
-Refusals::Refusals(const ServiceLimits& limits) : limits_(limits), wakeFile_(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {
-    if (!wakeFile_) throw std::system_error(errno, std::generic_category(), "eventfd");
-}
+Refusals::Refusals(const ServiceLimits& limits) : limits_(limits) {}
 
 Refusals::~Refusals() {
     {

@@ -32,7 +32,7 @@ private:
     int serveAll();
 
     const ServiceLimits& limits_;
-    const Descriptor wakeFile_;
+    const Descriptor wakeFile_ = makeEventFile();
     std::mutex mutex_;
     std::list<std::unique_ptr<Refused>> arriving_;
     std::size_t count_ = 0;  // of those that have not ended, arriving ones included

@@ -38,8 +38,6 @@ public:
 
 class ReplyBox {
 public:
-    ReplyBox();
-
     // Any thread.
     void put(RequestReply reply);
     // Makes the wake file readable, so that the serving thread looks about.
@@ -53,7 +51,7 @@ public:
     int wakeFile() const { return wakeFile_.number(); }
 
 private:
-    const Descriptor wakeFile_;
+    const Descriptor wakeFile_ = makeEventFile();
     std::mutex mutex_;
     ReplySender* sender_ = nullptr;  // none while the box is not open
     std::thread::id servingThread_;

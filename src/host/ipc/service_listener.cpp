@@ -2,7 +2,6 @@
 
 #include <fcntl.h>
 #include <malloc.h>
-#include <sys/eventfd.h>
 #include <sys/socket.h>
 
 #include <algorithm>
@@ -40,7 +39,7 @@ public:
           lifecycle_(lifecycle),
           limits_(limits),
           refusals_(limits),
-          endedFile_(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)),
+          endedFile_(makeEventFile()),
           spare_(openSpare()) {
         endedSource_ = addReadSource(loop_, endedFile_.number(), onEnded, this);
         lifecycle_.setUnreadQuestion([this] { return hasUnread(); });

@@ -33,11 +33,11 @@ sockaddr_un journalAddress() {
     return {AF_UNIX, "/run/systemd/journal/socket"};
 }
 
-int openJournal() {
-    const int socket = ::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+Descriptor openJournal() {
+    Descriptor journal(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
     constexpr int size = 8 * 1024 * 1024;  // the journal may be slow for a while
-    if (socket >= 0) setsockopt(socket, SOL_SOCKET, SO_SNDBUF, &size, sizeof size);
-    return socket;
+    if (journal) setsockopt(journal.number(), SOL_SOCKET, SO_SNDBUF, &size, sizeof size);
+    return journal;
 }
 
 }  // namespace
@@ -91,7 +91,8 @@ private:
     }
 };
 
-LogWriter::LogWriter(int file, Form form) : file_(file), journal_(form == Form::Journal ? openJournal() : -1) {
+LogWriter::LogWriter(int file, Form form)
+    : file_(file), journal_(form == Form::Journal ? openJournal() : Descriptor()) {
     CrashGuard::add(this);
 }
 
@@ -104,7 +105,6 @@ LogWriter::~LogWriter() {
     }
     if (thread_.joinable()) thread_.join();
     flush();
-    if (journal_ >= 0) ::close(journal_);
 }
 
 std::string_view LogWriter::Batch::record(std::size_t index) const {
@@ -160,7 +160,7 @@ void LogWriter::flush() {
 }
 
 void LogWriter::write(const Batch& batch) const {
-    if (journal_ >= 0) return sendToJournal(batch);
+    if (journal_) return sendToJournal(batch);
     // Lines together as long as the system keeps them whole beside those of other processes.
     for (std::size_t begin = 0, next = 0; next < batch.ends.size();) {
         std::size_t end = batch.ends[next++];
@@ -195,7 +195,7 @@ void LogWriter::sendToJournal(const Batch& batch) const {
             messages[i].msg_hdr.msg_iov = &parts[i];
             messages[i].msg_hdr.msg_iovlen = 1;
         }
-        const int sent = sendmmsg(journal_, messages.data(), static_cast<unsigned>(count), MSG_NOSIGNAL);
+        const int sent = sendmmsg(journal_.number(), messages.data(), static_cast<unsigned>(count), MSG_NOSIGNAL);
         if (sent > 0) {
             next += static_cast<std::size_t>(sent);
         } else if (errno != EINTR) {

@@ -11,6 +11,8 @@
 #include <thread>
 #include <vector>
 
+#include "vrx/host/base/descriptor.h"
+
 namespace vrx::host {
 
 class LogWriter {
@@ -49,7 +51,7 @@ private:
     void flushInCrash();
 
     const int file_;
-    const int journal_;  // a socket, or -1
+    const Descriptor journal_;  // a socket; none for lines
 
     std::mutex writing_;  // taken before mutex_
     Batch writtenBatch_;  // its memory is used again; under writing_

@@ -2,14 +2,14 @@
 // down on the main thread; everything else any thread may call. It sleeps without a time limit while nothing is due.
 #pragma once
 
-#include <systemd/sd-event.h>
-
 #include <csignal>
 #include <deque>
 #include <map>
 #include <memory>
 #include <mutex>
 
+#include "vrx/host/base/descriptor.h"
+#include "vrx/host/loop/event_source.h"
 #include "vrx/platform/queue.h"
 
 namespace vrx::host {
@@ -35,7 +35,7 @@ public:
     void postAfter(platform::Duration delay, std::shared_ptr<platform::Queue> queue, platform::Task task);
 
     // For other sources of events, which belong to the main thread.
-    sd_event* event() const { return event_; }
+    sd_event* event() const { return event_.get(); }
 
 private:
     struct Timer {
@@ -43,6 +43,19 @@ private:
         platform::Task task;
     };
 
+    // SIGTERM and SIGINT, blocked for as long as it lives.
+    class BlockedSignals {
+    public:
+        BlockedSignals();
+        ~BlockedSignals();
+        BlockedSignals(const BlockedSignals&) = delete;
+        BlockedSignals& operator=(const BlockedSignals&) = delete;
+
+    private:
+        sigset_t previous_;
+    };
+
+    static int onSignal(sd_event_source*, const signalfd_siginfo*, void* self);
     static int onWake(sd_event_source*, int file, unsigned events, void* self);
     static int onTimer(sd_event_source*, std::uint64_t due, void* self);
     void wake();
@@ -50,11 +63,13 @@ private:
     void postDueTimers();
     void armTimer();
 
-    sd_event* event_ = nullptr;
-    sd_event_source* wakeSource_ = nullptr;
-    sd_event_source* timerSource_ = nullptr;
-    int wakeFile_ = -1;
-    sigset_t previousSignals_;
+    const BlockedSignals blockedSignals_;
+    const EventLoop event_;
+    const Descriptor wakeFile_;
+    const EventSource sigtermSource_;
+    const EventSource sigintSource_;
+    const EventSource timerSource_;
+    const EventSource wakeSource_;
     bool wasStoppedBySignal_ = false;
 
     std::mutex mutex_;
