@@ -25,7 +25,7 @@ public:
 
     explicit operator bool() const { return number_ >= 0; }
     int number() const { return number_; }
-    // Leaves the descriptor open, to whoever takes it.
+    // Gives the descriptor up without closing it.
     int release() { return std::exchange(number_, -1); }
 
 private:

@@ -37,8 +37,8 @@ std::optional<OpenToOthers> findOpenToOthers(const std::string& path, const stru
     return std::nullopt;
 }
 
-// Goes down from the root, as the kernel does. What has been reached is kept from others and holds no link, so that its
-// parent is the folder above it by name as well.
+// Walks down from the root, as the kernel does. `reached` is kept from others and contains no link, so its parent is
+// the folder above it by name, too.
 std::optional<OpenToOthers> findOpenToOthers(const std::string& path, Links links) {
     std::error_code error;
     const std::filesystem::path whole = std::filesystem::absolute(path, error);
@@ -48,15 +48,11 @@ std::optional<OpenToOthers> findOpenToOthers(const std::string& path, Links link
     for (int linksFollowed = 0; !rest.empty(); rest.pop_front()) {
         const std::filesystem::path& part = rest.front();
         if (part.empty() || part == ".") continue;
-        if (part == "..") {
-            reached = reached.parent_path();
+        if (part == "/" || part == "..") {
+            reached = part == "/" ? part : reached.parent_path();
             continue;
         }
-        const std::filesystem::path next = reached / part;  // the root itself, where the part is "/"
-        if (part.is_absolute()) {
-            reached = next;
-            continue;
-        }
+        const std::filesystem::path next = reached / part;
         struct stat status;
         if (lstat(next.c_str(), &status) != 0) return unknown(next, errno);
         if (!S_ISLNK(status.st_mode)) {

@@ -18,13 +18,14 @@ struct OpenToOthers {
     platform::Error error;  // for people; says the same
 };
 
-// A link is part of the path: followed, it must be in a folder that is kept from others, as must what it leads to.
+// A link that is followed must be kept from others itself, as must everything on the way to its target.
 enum class Links { Refused, Followed };
 
-// Nothing when the file at the path is kept from others. A relative path is below the working directory.
+// Nothing when the file and every folder above it are kept from others. A relative path starts at the working
+// directory.
 std::optional<OpenToOthers> findOpenToOthers(const std::string& path, Links links);
 
-// The same for one file alone, which was found to be so.
+// The same for a single file or folder, by its status.
 std::optional<OpenToOthers> findOpenToOthers(const std::string& path, const struct stat& status);
 
 }  // namespace vrx::host

@@ -1,4 +1,4 @@
-// A source of events on the main loop, which goes with its owner.
+// Event sources of the main loop, each removed when its owner is destroyed.
 #pragma once
 
 #include <systemd/sd-event.h>
@@ -56,7 +56,7 @@ inline EventSource addBootTimer(sd_event* loop, sd_event_time_handler_t handler,
     return owner;
 }
 
-// Once, at a time since boot; what has no sensible end is some centuries.
+// Fires once, at a time since boot; after some 300 years at the latest.
 inline void armTimer(const EventSource& timer, platform::Duration sinceBoot) {
     constexpr platform::Duration longest{1e10};
     const auto microseconds = std::chrono::ceil<std::chrono::microseconds>(std::min(sinceBoot, longest));

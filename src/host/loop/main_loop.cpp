@@ -19,7 +19,7 @@ std::uint64_t bootMicroseconds() {
     return static_cast<std::uint64_t>(now.tv_sec) * 1'000'000 + static_cast<std::uint64_t>(now.tv_nsec) / 1'000;
 }
 
-// Later than now by the delay, rounded up; what has no sensible end is a century.
+// Now plus the delay, rounded up; a century at most.
 std::uint64_t dueTime(Duration delay) {
     constexpr double century = 100.0 * 366 * 86400;
     double seconds = delay.count() < century ? delay.count() : century;
@@ -49,7 +49,7 @@ MainLoop::MainLoop()
       wakeSource_(addReadSource(event_.get(), wakeFile_.number(), onWake, this)) {}
 
 MainLoop::~MainLoop() {
-    // A task that is let go may post again while it goes.
+    // Repeats, because destroying a task may post another.
     platform::ShutdownScope shutdown;
     while (true) {
         std::deque<Task> posted;
@@ -128,7 +128,7 @@ int MainLoop::onTimer(sd_event_source*, std::uint64_t, void* self) {
     return 0;
 }
 
-// Only what was posted by now: what the tasks post runs in the next round, after other events had their turn.
+// Runs only what has been posted so far. What these tasks post runs in the next round, after other events.
 void MainLoop::runPosted() {
     std::deque<Task> tasks;
     std::unique_lock lock(mutex_);

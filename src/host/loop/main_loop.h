@@ -1,5 +1,5 @@
-// The event loop of the main thread, on sd-event: the main queue, and the timers of every queue. Made, run and taken
-// down on the main thread; everything else any thread may call. It sleeps without a time limit while nothing is due.
+// The event loop of the main thread, on sd-event: the main queue, and the timers of every queue. Made, run and
+// destroyed on the main thread; any thread may call the rest. Sleeps without a time limit while nothing is due.
 #pragma once
 
 #include <csignal>
@@ -16,14 +16,14 @@ namespace vrx::host {
 
 class MainLoop final : public platform::Queue {
 public:
-    // Takes over SIGTERM and SIGINT, which stop the loop; threads made from now on leave them to it.
+    // Takes over SIGTERM and SIGINT, which stop the loop. Threads made from now on have them blocked.
     MainLoop();
-    // What has not run is discarded.
+    // Discards tasks that have not run.
     ~MainLoop() override;
     MainLoop(const MainLoop&) = delete;
     MainLoop& operator=(const MainLoop&) = delete;
 
-    // Runs until stopped: by stop(), also before the call, or by a signal. It can be run again.
+    // Runs until stop() is called, which may be before run(), or a signal comes. It can be run again.
     void run();
     void stop();
     // Whether a signal has ever stopped it.
