@@ -60,14 +60,14 @@ std::string timeSuffix() {
     return {text.data(), std::strftime(text.data(), text.size(), "%Y%m%dT%H%M%SZ", &fields)};
 }
 
-// Which file a name stands for.
+// Which file a path leads to.
 struct FileIdentity {
     dev_t device = 0;
     ino_t inode = 0;
     bool operator==(const FileIdentity&) const = default;
     explicit operator bool() const { return inode != 0; }
 
-    // None when the name stands for nothing.
+    // Empty when there is no file.
     static FileIdentity of(const std::string& path) {
         struct stat status;
         if (stat(path.c_str(), &status) != 0) return {};
@@ -75,8 +75,8 @@ struct FileIdentity {
     }
 };
 
-// Held while the database is opened: of several processes that find it damaged, one sets it aside and the others find
-// the fresh one.
+// Held while the database is opened: of several processes that find it damaged, the first sets it aside and the others
+// find the fresh one.
 class FolderLock {
 public:
     FolderLock(const std::string& folder, std::chrono::milliseconds limit)
@@ -94,21 +94,21 @@ private:
     const Descriptor file_;
 };
 
-// The whole database is some ten pages. As it comes, SQLite would set aside, and touch, room for twenty pages and for
-// the statements of a busy server, for each connection.
+// Keeps SQLite small: the whole database is some ten pages, and by default each connection would reserve memory for
+// twenty pages and for the statements of a busy server.
 bool configure() {
     return sqlite3_config(SQLITE_CONFIG_PAGECACHE, nullptr, 0, 0) == SQLITE_OK &&
            sqlite3_config(SQLITE_CONFIG_LOOKASIDE, 512, 16) == SQLITE_OK;
 }
 
-// SQLite would make the file readable for others; what it makes beside it has the file's own mode.
+// Creates the file for its user alone, as SQLite would not. The files that SQLite makes beside it get the same mode.
 void createPrivately(const std::string& path) {
     const Descriptor file(::open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600));
     if (!file && errno != EEXIST) throw DatabaseError(SQLITE_CANTOPEN, systemError("create", path, errno).text);
 }
 
-// For looking: where a log lies beside the database, the index of the two is only read, or made in memory when nobody
-// keeps it; where none does, no index is needed.
+// For read-only access. With a log beside the database, SQLite reads the shared index, or builds one in memory when no
+// process keeps it; without a log it needs no index.
 std::string readOnlyUri(const std::string& path) {
     std::string uri = "file:";
     for (const char character : path) {
@@ -129,7 +129,7 @@ Statement::Statement(sqlite3* connection, const char* sql) : connection_(connect
 }
 
 Statement& Statement::bind(int parameter, std::string_view text) {
-    // An absent pointer would bind null.
+    // A null pointer would bind null.
     check(sqlite3_bind_text64(statement_, parameter + 1, text.data() ? text.data() : "", text.size(), SQLITE_TRANSIENT,
                               SQLITE_UTF8),
           connection_);
@@ -241,19 +241,19 @@ std::int64_t Connection::commitMark() {
     return integer("PRAGMA data_version");
 }
 
-// The connections of one opening. Reading has one of its own, so that it does not wait while a write waits.
+// The connections of one opening. Reading has its own, so that it does not wait while a write waits.
 struct Database::Opening {
     Opening(const std::string& path, std::chrono::milliseconds busyLimit) : path(path), busyLimit(busyLimit) {}
 
     ~Opening() {
-        // Closing the last connection takes the -wal file away by its name, which is not ours any more when another
-        // database has come to stand there.
+        // Closing the last connection removes the -wal file by its name. When another database has taken this path,
+        // that file is not ours.
         if (FileIdentity::of(path) == file) return;
         for (auto* connection : {&writer, &reader})
             if (*connection) (*connection)->keepLogAtClose(true);
     }
 
-    // The database is sound: it is opened for reading, too, and is tidied up when it is closed.
+    // Called once the database is known to be sound: opens it for reading, and lets closing tidy it up.
     void passed() {
         reader.emplace(path, busyLimit);
         for (auto* connection : {&writer, &reader}) (*connection)->keepLogAtClose(false);
@@ -264,7 +264,7 @@ struct Database::Opening {
 
     const std::string path;
     const std::chrono::milliseconds busyLimit;
-    std::optional<Connection> writer;  // none for looking
+    std::optional<Connection> writer;  // absent when read-only
     std::optional<Connection> reader;
     FileIdentity file, wal, shm;
     std::uint64_t number = 0;
@@ -298,7 +298,8 @@ std::shared_ptr<Database::Opening> Database::opening(MaybeError& error) {
     }
 }
 
-// What stands beside the replaced file belongs to it, unless it came with the new one, which would take it for its own.
+// Sets the -wal and -shm files of the replaced database aside, because the new one would take them for its own. Files
+// that came with the new one stay.
 void Database::leaveReplacedFile() {
     log(Level::Error, "%@ was replaced and is opened again", path_);
     const std::string aside = freeAsideName("replaced");
@@ -353,7 +354,7 @@ std::int64_t Database::checkedVersion(Connection& connection) const {
 
 void Database::migrate(Connection& writer) const {
     const auto newest = static_cast<std::int64_t>(schema_.size());
-    if (checkedVersion(writer) == newest) return;  // without waiting for a writer
+    if (checkedVersion(writer) == newest) return;  // does not wait for a writer
     writer.execute("BEGIN IMMEDIATE");
     const std::int64_t version = checkedVersion(writer);
     for (std::int64_t step = version; step < newest; ++step) writer.execute(schema_[static_cast<std::size_t>(step)]);
@@ -379,7 +380,7 @@ void Database::moveAside(const std::string& asideName, const char* suffix) const
         throw DatabaseError(SQLITE_CANTOPEN, systemError("set aside", from, errno).text);
 }
 
-// Damage that shows only in use: the next operation opens the database again, and examines it.
+// After damage that shows in use, the next operation opens the database again and examines it.
 Error Database::failed(const std::shared_ptr<Opening>& opening, const DatabaseError& error) {
     if (isDamage(error)) {
         std::lock_guard lock(mutex_);
@@ -388,6 +389,7 @@ Error Database::failed(const std::shared_ptr<Opening>& opening, const DatabaseEr
     return Error{"database", error.code, path_ + ": " + error.what()};
 }
 
+// A statement left unfinished would block COMMIT and ROLLBACK, so all are ended first.
 MaybeError Database::transaction(Connection& connection, const std::shared_ptr<Opening>& opening, const char* begin,
                                  const std::function<void(Connection&)>& body) {
     try {
@@ -398,7 +400,7 @@ MaybeError Database::transaction(Connection& connection, const std::shared_ptr<O
         return std::nullopt;
     } catch (const DatabaseError& error) {
         connection.endStatements();
-        // Some failures have undone the transaction already.
+        // Some failures roll back by themselves.
         if (!sqlite3_get_autocommit(connection.connection_))
             sqlite3_exec(connection.connection_, "ROLLBACK", nullptr, nullptr, nullptr);
         return failed(opening, error);

@@ -14,7 +14,7 @@ std::optional<std::string> storedFact(Connection& connection, std::string_view n
     return std::string(query.text(0));
 }
 
-// What is there already is not written: at most starts that spares the disk's syncs.
+// An equal value is not written, which spares most starts a sync of the disk.
 void setStoredFact(Connection& connection, std::string_view name, std::string_view value) {
     connection
         .statement(

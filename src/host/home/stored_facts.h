@@ -1,5 +1,4 @@
-// What the host keeps in host.db from one process to the next, and what the agent lets its tools know: one text by
-// name.
+// Facts that the host stores in host.db, by name: for the next process, and for the tools beside the agent.
 #pragma once
 
 #include <optional>
@@ -18,7 +17,7 @@ inline constexpr std::string_view profile = "profile";              // the agent
 inline constexpr std::string_view pairedWatches = "pairedWatches";  // a line for each watch, as last notified
 }  // namespace stored_facts
 
-// For tools: nothing when it can't be read, either.
+// For tools. Nothing also when it cannot be read.
 std::optional<std::string> storedFact(Database& database, std::string_view name);
 // Within a transaction.
 std::optional<std::string> storedFact(Connection& connection, std::string_view name);
