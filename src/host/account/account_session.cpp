@@ -17,7 +17,7 @@ void AccountSession::addClientInformationHeader(HttpRequest& request) const {
         platform::vendorIdentifier(platform::serviceNameRemainder));
 }
 
-// One that tells the device apart from others, but not its serial number.
+// Identifies the device without revealing its serial number.
 void AccountSession::addDeviceIdentifierHeader(HttpRequest& request) const {
     const std::shared_ptr<const ProfileContent> content = profile_.content();
     if (!content->account) return;

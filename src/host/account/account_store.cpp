@@ -17,7 +17,7 @@ RenewalResult failed(const Error& error) {
     return {error.code, error};
 }
 
-// What the profile says of the account; null once another one, or nobody, is signed in.
+// The profile's entry of the account. Null when another account, or none, is signed in by now.
 std::shared_ptr<const ProfileAccount> entryOf(const DeviceProfile& profile, const CloudAccount& account) {
     std::shared_ptr<const ProfileContent> content = profile.content();
     if (!content->account || content->account->identifier != account.identifier) return nullptr;
@@ -53,6 +53,7 @@ void AccountStore::renewCredentials(const AuthenticationAccount& account, platfo
     renewals_.begin({account, std::move(options)}, std::move(completion));
 }
 
+// Runs the helper once for each service. The first failure ends the renewal; tokens stored before it stay.
 RenewalResult AccountStore::renew(const CredentialRenewals::Question& question, int stopFile) {
     const std::shared_ptr<const ProfileContent> content = profile_.content();
     if (!content->account || content->account->credentialHelper.empty())

@@ -21,6 +21,7 @@ std::optional<std::string> text(const toml::table& table, const char* key) {
 
 }  // namespace
 
+// Examines the file as it was opened and the path to it: another file may be at the path by now.
 Result<BundleFile> readBundleFile(const std::string& folder) {
     const std::string path = folder + "/" + bundleFileName;
     Result<FileContent> content = readFile(path);

@@ -19,13 +19,13 @@ using platform::Result;
 
 namespace {
 
-// Where the profile is wrong, and how.
+// A mistake in the profile, thrown at its line.
 struct ProfileError {
     toml::source_index line;
     std::string text;
 };
 
-// One table of the profile: hands out its entries by type, and knows in the end which ones nobody asked for.
+// One table of the profile. Returns its entries by type, and reports in the end the keys that nobody asked for.
 class Table {
 public:
     using Unknown = std::function<void(toml::source_index line, const std::string& name)>;
@@ -52,7 +52,8 @@ public:
         return *text;
     }
 
-    // A string that may be sent in a header or in a line of its own; an empty one counts as none.
+    // A string without control characters, which may stand in a header or on a line of its own. An empty one counts as
+    // absent.
     std::optional<std::string> line(const char* key) {
         std::optional<std::string> text = string(key);
         if (text && !isOneLine(*text)) reject(key, *find(key), "without control characters");
@@ -78,7 +79,7 @@ public:
         return node && node->is_boolean() && !**node->as_boolean();
     }
 
-    // A date, with or without a time; one without an offset is in UTC.
+    // A date, with or without a time. Without an offset it is in UTC.
     std::optional<Date> date(const char* key) {
         const toml::node* node = find(key);
         if (!node) return std::nullopt;
@@ -109,7 +110,7 @@ public:
         return result;
     }
 
-    // Calls with the table under the key, if there is one.
+    // Calls with the table under the key, if there is one, and reports its unknown keys.
     template <class F>
     void table(const char* key, F read) {
         const toml::node* node = find(key);
@@ -130,7 +131,7 @@ public:
         }
     }
 
-    // Calls with every key and node.
+    // Calls with every key and its node.
     template <class F>
     void each(F read) {
         for (const auto& [key, node] : table_) {
@@ -226,7 +227,7 @@ platform::HttpHeaders readHeaders(Table& table) {
     return headers;
 }
 
-// Nothing when it has no identifier: nobody is signed in then.
+// Nothing without an identifier: nobody is signed in then.
 std::optional<ProfileAccount> readAccount(Table& table) {
     ProfileAccount account;
     account.identifier = table.line("identifier").value_or("");
@@ -303,11 +304,12 @@ bool needsTrust(const ProfileContent& content) {
            (content.account && !content.account->credentialHelper.empty());
 }
 
-// Reads the file afresh, and says each thing about it once: while the file is new, it is read more than once.
+// Reads the file. Reports each thing once, although a file that has just changed is read several times.
 class ProfileReader {
 public:
     explicit ProfileReader(std::string path) : path_(std::move(path)) {}
 
+    // Without a file the content is empty. A file that cannot be understood leaves the last content in place.
     std::shared_ptr<const ProfileContent> operator()(const Result<FileContent>& file,
                                                      std::shared_ptr<const ProfileContent> last) {
         if (!last) {

@@ -1,7 +1,7 @@
 // The device profile, device.toml: who this device is, which watches are paired with it, the user's account and
-// language, and what a tester wants different from the bare machine. Every fact can be left out; what is left out is
-// the machine's own. Each read gives what the file says now; a file that cannot be understood is reported once, with
-// its line, and the last good one stays. Any thread may ask.
+// language, and what a tester wants different from the machine. Every key can be left out; the machine's own fact holds
+// then. Each read returns what the file says now. A file that cannot be understood is reported once, with its line, and
+// the last good content stays. Any thread may ask.
 #pragma once
 
 #include <map>
@@ -41,7 +41,7 @@ struct ProfileAccount {
     std::vector<std::string> credentialHelper;  // the program, an absolute path, and its arguments; empty for none
     std::optional<std::string> storefront;
     std::optional<std::int64_t> storeAccountIdentifier;
-    // What its requests carry; made of the device's facts where they are absent.
+    // What the account's requests carry. Made of the device's properties where absent.
     std::optional<std::string> clientInformation;
     std::optional<std::string> deviceIdentifier;
     std::optional<platform::HttpHeaders> headers;
@@ -76,13 +76,14 @@ struct ProfileContent {
     std::optional<bool> shouldDefer;                    // else its power supply
     std::optional<platform::Duration> minimumInterval;  // between the runs of an activity that schedules itself
 
-    // Whether these are not the file's, because nobody has understood it since the process began.
+    // Whether this stands in for the file's content, because no version of the file could be read since the process
+    // began.
     bool isSubstitute = false;
     std::string path;              // of the file; empty when there is none
     bool wasOpenToOthers = false;  // the file itself, when it was read
 
-    // Nothing while only root and the agent's own user can change the file: only then may what it says about bundles,
-    // authorities and helper programs be believed. Examines the file and every folder above it at each call.
+    // Nothing while only root and the agent's own user can change the file. Only then may its bundles, http.ca_file and
+    // account.credential_helper be believed. Each call examines the file and every folder above it.
     std::optional<OpenToOthers> findOpenToOthers() const;
     bool isTrusted() const { return !findOpenToOthers(); }
 };
@@ -92,13 +93,13 @@ class DeviceProfile final : public platform::DeviceProperties,
                             public platform::PairedDeviceRegistry,
                             public platform::Locale {
 public:
-    // An empty path, and a file that is not there, leave the bare machine's facts.
+    // With an empty path, or without a file, all facts are the machine's.
     explicit DeviceProfile(std::string path, std::string machineRoot = "");
 
-    // The present facts of the file, never null.
+    // What the file says now. Never null.
     std::shared_ptr<const ProfileContent> content() const { return content_.get(); }
     const std::string& path() const { return path_; }
-    // The files that say which watches are paired and which language holds.
+    // The files that the paired watches and the language come from.
     std::vector<std::string> sources() const;
 
     std::optional<std::string> string(std::string_view key) const override;
@@ -117,10 +118,10 @@ private:
 
 struct ProfileReading {
     ProfileContent content;
-    std::vector<std::string> warnings;  // of keys that mean nothing: "PATH:LINE: …"
+    std::vector<std::string> warnings;  // of unknown keys: "PATH:LINE: …"
 };
 
-// The facts in a document; an error's text begins "PATH:LINE: ".
+// Reads a document. The text of an error begins "PATH:LINE: ".
 platform::Result<ProfileReading> parseProfile(std::string_view document, const std::string& path);
 
 }  // namespace vrx::host

@@ -11,7 +11,7 @@ using platform::InstalledAppRecord;
 
 namespace {
 
-// The folder, and those in it in the order of their names.
+// The folder itself, and the folders in it by name.
 std::vector<std::string> candidates(const std::string& folder) {
     std::set<std::string> inner;
     std::error_code error;

@@ -9,10 +9,10 @@ namespace vrx::host {
 
 namespace {
 
-// "zh_Hant_TW" gives itself, "zh_Hant" and "zh"; then English.
+// For "zh_Hant_TW": itself, "zh_Hant", "zh" and "en".
 std::vector<std::string> languages(std::string identifier) {
     std::vector<std::string> result;
-    // It becomes the name of a folder.
+    // The identifier becomes the name of a folder.
     if (identifier.find_first_of("/.") != std::string::npos) identifier.clear();
     while (!identifier.empty()) {
         result.push_back(identifier);

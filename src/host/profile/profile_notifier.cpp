@@ -17,8 +17,8 @@ namespace {
 
 constexpr platform::Duration retryAfterFailure{60.0};
 
-// A line for each watch that is paired, told apart by its serial number, else by its names; one that is paired anew
-// counts as another. Serial numbers are never stored as such.
+// A line for each paired watch, told apart by its serial number, else by its names. A watch that is paired anew counts
+// as another. Only hashes of serial numbers are stored.
 std::set<std::string> pairedWatches(const DeviceProfile& profile) {
     std::set<std::string> lines;
     for (const PairedWatch& watch : profile.watches()) {
@@ -57,10 +57,10 @@ void ProfileNotifier::start(sd_event* loop, std::function<void()> onEdit, platfo
     compare();
 }
 
-// What has been stored is what has been raised: were it raised first, a database that cannot be written would have it
-// raised at every start. The first profile of a home is only stored.
+// Stores before it raises: in the opposite order a database that cannot be written would have the same notifications
+// raised at every start. The first profile of a home is stored only.
 void ProfileNotifier::compare() {
-    if (profile_.content()->isSubstitute) return;  // of a file that nobody understands there is nothing to tell
+    if (profile_.content()->isSubstitute) return;  // the file could not be read
     const std::string language = profile_.preferredLocaleIdentifier();
     const std::set<std::string> watches = pairedWatches(profile_);
     std::vector<std::string_view> raised;
