@@ -1,6 +1,6 @@
-// The answers that the shared session keeps, in memory and by address: those to GET requests without headers of their
-// own. What is asked with headers, which may name an account, is never kept. The agent has one such request, for the
-// server's versions; room for a few answers is enough, and when it is used up all of them go. Belongs to one thread.
+// The answers that the shared session keeps in memory, by address. Answers to requests with headers of their own, which
+// may name an account, are never kept. The agent sends one request whose answer is kept, for the server's versions; so
+// a small bound is enough, and all answers are dropped when a new one does not fit. Used by one thread.
 #pragma once
 
 #include <map>
@@ -40,7 +40,7 @@ public:
                                        const platform::HttpHeaders& confirmation);
     void forget(const std::string& url);
 
-    // What is kept, with its headers.
+    // The size of all kept answers, headers included.
     std::size_t bytes() const { return bytes_; }
 
 private:
