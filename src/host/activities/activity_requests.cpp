@@ -14,7 +14,7 @@ using platform::MaybeError;
 
 namespace {
 
-// Its being closed after writing is what the agent sees.
+// The agent sees that the file is closed after writing.
 void touch(const std::string& path) {
     const Descriptor file(::open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600));
 }
@@ -52,11 +52,12 @@ void answerRequest(Connection& connection, std::int64_t number, FiringAnswer ans
         .step();
 }
 
-// Without a condition SQLite would write the table's page anew, though there is nothing in it as a rule.
+// Without a condition SQLite would rewrite the table's page even when the table is empty, as it usually is.
 void dropRequests(Connection& connection) {
     connection.execute("DELETE FROM activity_requests WHERE true");
 }
 
+// Stores the request before it touches the file that makes the agent look for it.
 platform::Result<std::optional<FiringAnswer>> requestFiring(const std::string& home, Database& database,
                                                             std::string_view identifier, platform::Duration limit) {
     if (!HomeLock::isInUse(home)) return std::optional<FiringAnswer>();
