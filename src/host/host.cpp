@@ -11,6 +11,7 @@ namespace vrx::host {
 using platform::MaybeError;
 using platform::Platform;
 
+// The platform gets its facilities once all exist. Until then it can only log.
 Host::Host(const HostLocations& locations, platform::Level lowestLevel, const HostLimits& limits)
     : home_(locations.home),
       log_(lowestLevel),
@@ -64,8 +65,8 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel, const Ho
     platform_ = Platform(facilities_);
 }
 
-// Tasks may use any facility to their end, and the current platform too: they end first, and what one may wait for
-// before them.
+// Tasks may use any facility, and the current platform, to their end, so they end first. What a task may wait for ends
+// before that.
 Host::~Host() {
     http_.stop();
     accounts_.stop();
@@ -76,14 +77,14 @@ MaybeError Host::open(HomeUse use) {
     if (MaybeError error = createDirectories(home_)) return error;
     if (use == HomeUse::Agent)
         if (MaybeError error = lock_.take(home_)) return error;
-    profile_.content();  // what is wrong with it is said now, and what is good is there to stay when an edit is not
+    profile_.content();  // reports mistakes now, and keeps the content for when an edit is wrong
     return database_.open();
 }
 
-// The database's folder is watched for the requests of tools, and for a database that takes the place of this one;
-// while there is none, someone may be about to put one there.
+// Watches the database's folder for tools' requests and for another database in its place. While there is no database
+// it waits, because somebody may be replacing it.
 void Host::start(const std::string& agentVersion) {
-    sd_event_set_watchdog(mainLoop_.event(), 1);  // if the service manager wants to hear
+    sd_event_set_watchdog(mainLoop_.event(), 1);  // if the service manager asks for it
     constexpr platform::Duration pause = std::chrono::milliseconds(5);
     const std::string path = home_ + "/host.db";
     databaseWatch_ = std::make_unique<FileWatch>(mainLoop_.event(), std::vector{path}, pause, [this, path] {
