@@ -60,6 +60,7 @@ std::string AgentLocale::preferredLocaleIdentifier() const {
     return found ? *found : profile_.preferredLocaleIdentifier();
 }
 
+// The platform gets its facilities once all exist. Until then it can only log.
 AgentView::AgentView(const std::string& home, const std::optional<std::string>& profile)
     : home_(home),
       facilities_{.systemLog = &errors_},

@@ -1,4 +1,4 @@
-// vrxhost cache: what is cached for a serial number, and whether it is valid.
+// vrxhost cache: the cached record of a serial number, and whether it is valid.
 #include <filesystem>
 
 #include "vrx/codec/property_list.h"
@@ -39,6 +39,7 @@ CacheFile readCacheFile(Home& home, const std::string& path) {
     return {.content = *root};
 }
 
+// Compares the record's language and version with the present ones, as the agent does before it uses the record.
 Outcome showCache(Home& home, const std::string& serialNumber, const std::string& profile) {
     const std::string path =
         platform::filled(VRXWarranty::_warrantyPathForSerialNumberFormat(), {platform::sha256Hash(serialNumber)});

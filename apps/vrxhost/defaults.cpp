@@ -77,7 +77,7 @@ void addKey(CLI::App* verb, Setting& setting) {
     verb->add_option("KEY", setting.key, "The setting's name")->required();
 }
 
-// One of a JSON value and the typed options.
+// Adds the value's options: a JSON value or one of the typed forms.
 void addValue(CLI::App* verb, Setting& setting) {
     CLI::Option_group* group = verb->add_option_group("value", "The value, in one of these forms");
     auto add = [&]<class T>(const char* name, const char* type, const char* help, std::type_identity<T>) {

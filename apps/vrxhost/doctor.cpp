@@ -1,4 +1,4 @@
-// vrxhost doctor: whether an agent's surroundings are as it needs them, and what to do next.
+// vrxhost doctor: checks an agent's surroundings, and says what to do next.
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/un.h>
@@ -156,6 +156,7 @@ Check Examination::database() {
                    "of a newer release it leaves alone: use that release.");
 }
 
+// Mistakes in the whole profile come before those in single keys.
 Check Examination::profile() const {
     const std::string& path = places_.profile.path;
     if (path.empty()) return good("none: the machine's own facts hold");
@@ -184,7 +185,7 @@ Check Examination::agent() {
                    ExitCode::NotReachable);
 }
 
-// Whether somebody listens at the path, without a connection, which would have a service manager start an agent.
+// Whether somebody listens at the path. Does not connect, because a service manager would start an agent.
 bool isListenedAt(const std::string& path) {
     std::ifstream sockets("/proc/net/unix");
     constexpr const char* accepting = " 00010000 ";
@@ -193,6 +194,7 @@ bool isListenedAt(const std::string& path) {
     return false;
 }
 
+// Connects only when an agent runs: otherwise a service manager would start one.
 Check Examination::socket() const {
     const std::string& path = places_.socket.path;
     const std::string advice = "Name the agent's socket with --socket, or start an agent.";
@@ -212,7 +214,7 @@ Check Examination::socket() const {
     return problem(chosen(places_.socket) + ": " + std::strerror(errno), advice, ExitCode::NotReachable);
 }
 
-// Of the vrxctl that was installed with this program.
+// Checks the vrxctl that was installed with this program.
 Check Examination::entitlement() const {
     std::error_code error;
     const std::string program = std::filesystem::read_symlink("/proc/self/exe", error).replace_filename("vrxctl");
@@ -302,6 +304,7 @@ Check Examination::activities() {
     return note("nothing is scheduled", "vrxctl outreach has the agent look for offers now.");
 }
 
+// The next step is the advice of the first problem, else of the first note.
 Outcome report(const std::vector<Check>& checks) {
     const auto first = [&](Health health) {
         return std::ranges::find_if(

@@ -67,7 +67,7 @@ HomeWatch::Wake HomeWatch::wait(std::optional<platform::Date> latest) {
     return letWritersFinish();
 }
 
-// On the wall clock, also when it is set: that ends the wait.
+// Uses the wall clock. Setting that clock also ends the wait.
 void HomeWatch::arm(std::optional<platform::Date> latest) const {
     itimerspec due{};
     if (latest) {
@@ -78,7 +78,8 @@ void HomeWatch::arm(std::optional<platform::Date> latest) const {
     timerfd_settime(timer_.number(), TFD_TIMER_ABSTIME | TFD_TIMER_CANCEL_ON_SET, &due, nullptr);
 }
 
-// A writer changes the files first and then, unseen, makes the change hold: it is waited for by its lock.
+// Waits for the writer's lock: a writer changes the files first and then commits by a memory write that inotify does
+// not report.
 HomeWatch::Wake HomeWatch::letWritersFinish() {
     pollfd ended{signals_.number(), POLLIN, 0};
     while (true) {

@@ -1,4 +1,4 @@
-// vrxhost why: one device's follow-up, and the rule that decides about it now.
+// vrxhost why: the state of one device's follow-up, and the rule that decides it.
 #include <algorithm>
 #include <memory>
 #include <set>
@@ -39,7 +39,7 @@ namespace {
 using DevicePtr = std::shared_ptr<VRXDevice>;
 using InfoPtr = std::shared_ptr<VRXDeviceInfo>;
 
-// A moment that rules are asked about.
+// A fixed time for which rules are evaluated.
 class FixedClock final : public platform::Clock {
 public:
     explicit FixedClock(Date now) : now_(now) {}
@@ -51,7 +51,7 @@ private:
 };
 
 struct CachedRecord {
-    std::shared_ptr<VRXWarranty> record;  // also one that does not count
+    std::shared_ptr<VRXWarranty> record;  // also when it does not count
     std::optional<CachedRecordFlaw> flaw;
 };
 
@@ -66,7 +66,7 @@ InfoPtr infoOf(const DevicePtr& device) {
     return VRXDeviceInfo::deviceInfoWithDevice(device, cached.flaw ? nullptr : cached.record);
 }
 
-// The settings that the rules for posts go by.
+// The settings that the post rules use.
 struct PostSettings {
     std::set<std::string> dismissed = serialNumberHashes(dismissedSerialNumberHashesKey);
     PostDateSettings dates = PostDateSettings::read();
@@ -78,8 +78,8 @@ PostDecision decide(const VRXDeviceInfo& info, const PostSettings& settings, con
         info, {.isDismissed = settings.dismissed.contains(hash), .outreachDelay = settings.dates.outreachDelay}, clock);
 }
 
-// When the device's follow-up is posted, by the run at that date or by those that each sets for the next: as long as
-// the records stay as they are.
+// Predicts when the device's follow-up is posted, by the run at that date or by the runs that follow from it, if the
+// records stay as they are.
 std::optional<Date> predictedPosting(const std::string& serialNumber, const DeviceInfoList& infos,
                                      PostSettings settings, Date run, Duration interval) {
     constexpr int mostRuns = 1000;
@@ -111,7 +111,7 @@ const char* nameOf(FollowUpState state) {
     return "";
 }
 
-// Everything about one device that decides, and what is told of it.
+// What decides about one device, and what is shown of it.
 struct Findings {
     FollowUpCircumstances circumstances;
     std::optional<std::string> name{};
@@ -156,6 +156,7 @@ void addRecord(Findings& findings, const CachedRecord& cached, const std::string
     findings.circumstances.isCarrierOut = !VRXOutreachActivity::currentDeviceShouldReceiveOutreachForWarranty(record);
 }
 
+// Evaluates the agent's own rules with what it would read now; stores nothing.
 Findings examine(AgentView& view, const std::string& serialNumber, const std::set<std::string>& pending,
                  const Activities& activities) {
     const platform::Clock& clock = Platform::current().clock();
@@ -223,6 +224,7 @@ std::string headline(const FollowUpExplanation& explanation) {
     return "";
 }
 
+// The next activity is named only when it is scheduled. Without an agent, starting one comes before any other advice.
 Outcome report(const std::string& serialNumber, const Findings& findings, const Activities& activities,
                bool isAgentRunning) {
     FollowUpExplanation explanation = explainFollowUp(findings.circumstances);
