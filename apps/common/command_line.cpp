@@ -19,7 +19,7 @@ using platform::Value;
 
 namespace {
 
-// Of the document; raised when a program that reads it would have to change.
+// The document's version. Raised when programs that read it have to change.
 constexpr int documentVersion = 1;
 
 const char* kindOf(ExitCode code) {
@@ -34,7 +34,7 @@ const char* kindOf(ExitCode code) {
     return "";
 }
 
-// Control characters, and those that break lines or turn the direction of text.
+// Control characters, and those that break lines or change the direction of text.
 bool steersTerminal(char32_t character) {
     return character < 0x20 || (character >= 0x7f && character < 0xa0) || character == 0x061c || character == 0x200e ||
            character == 0x200f || (character >= 0x2028 && character <= 0x202e) ||
@@ -105,6 +105,7 @@ std::string secondsText(double seconds) {
     return Value(seconds).description() + " s";
 }
 
+// Cells are made printable before they are measured, since escapes are longer.
 std::string table(const std::vector<std::vector<std::string>>& rows) {
     std::vector<std::size_t> widths;
     std::vector<std::vector<std::string>> cells;
@@ -150,12 +151,13 @@ CLI::App* CommandLine::addGroup(const std::string& name, const std::string& help
 }
 
 int CommandLine::run(int argc, const char* const* argv) {
-    // Also where reading ends before it comes to the flag.
+    // Read beforehand, because a mistake may end parsing before it comes to the flags.
     isJson_ = hasFlag(argc, argv, "--json");
     isWatch_ = hasFlag(argc, argv, "--watch");
     return report(read(argc, argv));
 }
 
+// Turns every way in which parsing or the verb can end into an outcome.
 Outcome CommandLine::read(int argc, const char* const* argv) {
     try {
         app_.parse(argc, argv);
@@ -164,7 +166,7 @@ Outcome CommandLine::read(int argc, const char* const* argv) {
         return {.document = {{"help", app_.help()}}, .text = app_.help()};
     } catch (const CLI::CallForVersion& version) {
         return {.document = {{"release", VRX_VERSION}}, .text = version.what() + std::string("\n")};
-    } catch (const CLI::Success&) {  // the option has printed what it gives
+    } catch (const CLI::Success&) {  // the option has printed its result
         return {.isShown = true};
     } catch (const CLI::ParseError& error) {
         return failed(ExitCode::Usage, error.what(), "See " + program_ + " --help.");

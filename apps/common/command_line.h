@@ -4,9 +4,8 @@
 //     {"version": 1, "ok": true, …what the verb gives…}
 //     {"version": 1, "ok": false, "error": {"kind": "not-reachable", "message": …, "advice": …}, …what is known…}
 //
-// Without it, standard output is text for people. In both, standard error says what went wrong and what to try next. A
-// verb with --watch shows an outcome after the other, each document on a line of its own.
-// One thread.
+// Without it, standard output is text for people. In both cases, standard error says what went wrong and what to try
+// next. A verb with --watch shows one outcome after another, each document on a line of its own. One thread.
 #pragma once
 
 #include <CLI/CLI.hpp>
@@ -19,37 +18,37 @@
 
 namespace vrx::apps {
 
-// The same with and without --json. Done is also "nothing to do" and an empty list.
+// The same with and without --json. Done includes "nothing to do" and an empty list.
 enum class ExitCode { Done = 0, NoAnswer = 1, Usage = 2, NotReachable = 3, Refused = 4, TimedOut = 5 };
 
-// What a verb came to.
+// The result of a verb.
 struct Outcome {
     ExitCode code = ExitCode::Done;
     platform::Dictionary document{};  // for programs
     std::string text{};               // for people, with a line break at its end; may be empty
-    // Why it is not done, and what to try next.
+    // Why the code is not Done, and what to try next.
     std::string problem{};
     std::string advice{};
-    std::string kind{};    // the error's kind, when the code's own says too little
-    bool isShown = false;  // by show(): nothing of it is left to print
+    std::string kind{};    // the error's kind, where the code's own is too general
+    bool isShown = false;  // already printed by show()
 };
 
 Outcome failed(ExitCode code, std::string problem, std::string advice, std::string kind = "");
 
-// A value as people read it. Texts come from servers and files: what could steer a terminal, or break a line, is shown
-// as an escape.
+// A value as text for people. Texts come from servers and files: what could steer a terminal or break a line is
+// escaped.
 std::string printable(std::string_view text);
 std::string printableValue(const platform::Value& value);
 
-// A path from the command line, in the form that the host needs: absolute, without a slash at its end.
+// A path from the command line in the host's form: absolute, without a slash at its end.
 std::string absolutePath(const std::string& path);
 
-// --timeout, in seconds above 0: how long the program waits for what the help says.
+// Adds --timeout, in seconds above 0. The help says what is waited for.
 void addTimeout(CLI::App& app, double& seconds, const std::string& help);
 
 std::string secondsText(double seconds);
 
-// Left-aligned columns, a line each row, the first row being the heading; cells are made printable.
+// Left-aligned columns, a line for each row. The first row is the heading. Cells are made printable.
 std::string table(const std::vector<std::vector<std::string>>& rows);
 
 class CommandLine {
@@ -58,17 +57,17 @@ public:
 
     CommandLine(const std::string& program, const std::string& purpose);
 
-    // For options that every verb has; they may stand before and behind the verb.
+    // For options of every verb, which may stand before and after the verb.
     CLI::App& app() { return app_; }
-    // A verb, or with a group one of the verbs below it. What it returns takes the options of this verb alone. A verb
-    // that has verbs below it is run when none of them is named.
+    // Adds a verb, or one below the group. The returned app takes the options of this verb alone. A verb with verbs
+    // below it runs when none of them is named.
     CLI::App* add(const std::string& name, const std::string& help, Verb verb, CLI::App* group = nullptr);
     CLI::App* addGroup(const std::string& name, const std::string& help);
 
-    // Reads the arguments, runs the verb, prints its outcome and gives the program's exit code.
+    // Reads the arguments, runs the verb, prints its outcome and returns the program's exit code.
     int run(int argc, const char* const* argv);
 
-    // Prints an outcome while the verb goes on. Whether it could be written.
+    // Prints an outcome while the verb goes on. Returns whether it could be written.
     bool show(const Outcome& outcome) const;
 
 private:

@@ -11,7 +11,7 @@ namespace {
 using Options = std::vector<const CLI::Option*>;
 using Verbs = std::vector<const CLI::App*>;
 
-// What help shows: an option without a group is hidden. That there is help is said once, for the whole program.
+// The options that help shows: those without a group are hidden. --help is listed once, for the whole program.
 Options optionsOf(const CLI::App& app) {
     Options options;
     for (const CLI::Option* option : app.get_options())
@@ -28,7 +28,7 @@ Verbs verbsOf(const CLI::App& app) {
     return app.get_subcommands([](const CLI::App* inner) { return !inner->get_name().empty(); });
 }
 
-// Calls for the app and all verbs below it, with the names that lead there.
+// Calls for the app and all verbs below it, with the verbs' names that lead there.
 template <class F>
 void forEach(const CLI::App& app, const std::string& path, F use) {
     use(app, path);
@@ -114,7 +114,7 @@ std::vector<Candidate> candidatesOf(const CLI::App& app) {
     return candidates;
 }
 
-// In bash and zsh the verbs before the cursor select the words that may follow.
+// In bash and zsh the verbs before the cursor select the candidates.
 std::string verbPattern(const std::string& path) {
     return "\"" + path + "\"";
 }
@@ -173,7 +173,7 @@ std::string fishCompletion(const CLI::App& app) {
                 if (path.find(' ', begin) == std::string::npos) break;
             }
         }
-        // The options of the program itself may stand anywhere.
+        // The program's own options may stand anywhere.
         for (const Candidate& candidate : candidatesOf(verb)) {
             const bool isOption = candidate.word.starts_with("--");
             text += "complete -c " + app.get_name();

@@ -35,7 +35,7 @@ void Progress::run() {
         std::fprintf(stderr, "\r%s", line.c_str());
         shown = line.size();
     }
-    // Blanks and not an escape sequence: any terminal understands them.
+    // Erases with blanks, because every terminal understands them.
     if (shown > 0) std::fprintf(stderr, "\r%*s\r", static_cast<int>(shown), "");
 }
 

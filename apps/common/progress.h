@@ -1,5 +1,5 @@
-// Tells a person at a terminal that something takes its time: a line on standard error that begins after half a second,
-// counts the seconds, and is gone when the object goes. Where standard error is no terminal nothing is written.
+// Shows at a terminal that something takes its time: a line on standard error that appears after half a second, counts
+// the seconds, and is erased when the object is destroyed. Writes nothing when standard error is not a terminal.
 #pragma once
 
 #include <condition_variable>

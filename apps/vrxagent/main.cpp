@@ -1,6 +1,6 @@
-// vrxagent: the agent. Serves its clients until SIGTERM or SIGINT. Once it is to start anew and nothing is under way,
-// it ends for its service manager to start it again, or, when it was started by hand, executes itself. Exit codes: 0
-// ended cleanly, 1 could not start or go on, 2 usage.
+// vrxagent: the agent. Serves its clients until SIGTERM or SIGINT. When it has to start again and nothing is under way,
+// it ends for its service manager to start it, or executes itself when it was started by hand. Exit codes: 0 ended
+// cleanly, 1 could not start or go on, 2 usage.
 #include <sys/prctl.h>
 #include <systemd/sd-daemon.h>
 
@@ -34,19 +34,19 @@ int cannotStart(const std::string& why) {
     return 1;
 }
 
-// What the next program of this process takes over.
+// What this process passes on to the program that it executes next.
 struct HandOver {
     vrx::host::PassedSocket socket;
     vrx::host::Descriptor homeLock;
 };
 
-// Fills in what is to be handed over when the agent is to be executed again.
+// Runs the agent. Fills in the hand-over when the agent has to be executed again.
 int serve(const vrx::wire::Locations& places, Level logLevel, std::optional<HandOver>& handOver) {
-    // A capability that the service manager gave is for the agent alone, not for the programs that it starts.
+    // A capability from the service manager is for the agent alone, not for programs that it starts.
     prctl(PR_CAP_AMBIENT, PR_CAP_AMBIENT_CLEAR_ALL, 0, 0, 0);
     Host host({.home = vrx::apps::absolutePath(places.home.path), .profile = places.profile.path}, logLevel);
     if (MaybeError error = host.open(HomeUse::Agent)) return cannotStart(error->text);
-    BundleLookup bundles([&] { return host.profile().facts(); });
+    BundleLookup bundles([&] { return host.profile().content(); });
     ServiceListenerFactory factory(host.mainLoop().event(), bundles, host.lifecycle());
     if (MaybeError error = factory.open(places.socket.path)) return cannotStart(error->text);
     host.setBundleLookup(&bundles);

@@ -75,7 +75,7 @@ std::string offerText(const VRXWarranty& record) {
     return "until " + textOf(record.qxOfferEligibleUntil()) + ", days left: " + std::to_string(record.daysEligible());
 }
 
-// An entry of a list, whose form is the server's affair: of a dictionary the values, such as "Repairs: at no cost".
+// An entry of a list, whose form the server chooses. Of a dictionary the values, such as "Repairs: at no cost".
 std::string entryText(const Value& entry) {
     const Dictionary* parts = entry.asDictionary();
     if (!parts) return printableValue(entry);
@@ -124,7 +124,7 @@ const char* adviceFor(Failure::Refusal refusal) {
     return "Correct the argument; vrxctl --help tells what is wanted.";
 }
 
-// What the agent answered, shown; or why it did not.
+// Shows the agent's answer, or explains why there is none.
 template <class T, class Show>
 Outcome outcomeOf(const AgentConnection& agent, const Answer<T>& answer, Show show) {
     if (answer) return show(*answer);
@@ -166,6 +166,7 @@ Outcome paired(AgentConnection& agent) {
     });
 }
 
+// A device without a record is still shown, but counts as no answer.
 Outcome info(AgentConnection& agent, const std::optional<std::string>& serialNumber, VRXWarrantyLookupPolicy policy) {
     const auto answer = serialNumber ? agent.getDeviceInfoForSerialNumber(*serialNumber, policy)
                                      : agent.getDefaultDeviceInfoUsingPolicy(policy);
@@ -214,7 +215,7 @@ Outcome outreach(AgentConnection& agent) {
     });
 }
 
-// The agent says that it has done so, whatever became of it.
+// The agent always answers true, whatever came of it.
 Outcome dismiss(AgentConnection& agent, const std::string& serialNumber) {
     return outcomeOf(agent, agent.dismissFollowUpForSerialNumber(serialNumber), [&](bool isDone) {
         if (!isDone) return failed(ExitCode::NoAnswer, "the agent did not dismiss the follow-up", seeLog);
@@ -222,7 +223,7 @@ Outcome dismiss(AgentConnection& agent, const std::string& serialNumber) {
     });
 }
 
-// What the agent tells of an application. Entries that it doesn't give, or that are empty, are left out.
+// What the agent tells of an application. Leaves out entries that are absent or empty.
 Outcome availability(const Value& answer, const std::string& problem) {
     Outcome outcome;
     if (!answer["AppAvailabilityType"].isNumber())
@@ -300,6 +301,7 @@ void addPolicy(CLI::App* verb, Options& options) {
         ->type_name("POLICY");
 }
 
+// Options are read while parsing and used by the verb that runs afterwards.
 int run(int argc, const char* const* argv) {
     CommandLine line("vrxctl", "Asks the coverage agent about this device and its paired watches.");
     Options options;

@@ -1,4 +1,4 @@
-// vrxhost activities: what the agent has scheduled, when it falls due, and how it went the last time.
+// vrxhost activities: what the agent has scheduled, when it is due, and how the last run ended.
 #include "vrx/host/home/home_lock.h"
 #include "vrx/platform/text.h"
 #include "vrxhost/agent_activities.h"
@@ -15,7 +15,7 @@ using platform::Value;
 
 namespace {
 
-// Of the last run. One without an end is under way, or was when the agent ended.
+// The outcome of the last run. A run without an end is under way, or was when the agent ended.
 const char* outcomeOf(const host::ActivityRun& run, bool isAgentRunning) {
     if (!run.outcome) return isAgentRunning ? "running" : "interrupted";
     switch (*run.outcome) {
@@ -92,7 +92,7 @@ Outcome activities(AgentView& view) {
 void addActivitiesVerb(CommandLine& line, const wire::LocationOverrides& places) {
     auto profile = std::make_shared<std::optional<std::string>>();
     line.add("activities", "Shows the background activities: when they are due, and their last runs",
-             looking(places, profile, activities));
+             readOnlyVerb(places, profile, activities));
 }
 
 }  // namespace vrx::apps

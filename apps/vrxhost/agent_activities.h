@@ -1,4 +1,4 @@
-// The agent's background activities as they stand in a home.
+// The agent's background activities, as host.db has them.
 #pragma once
 
 #include <optional>
@@ -13,19 +13,19 @@ namespace vrx::apps {
 
 struct AgentActivity {
     std::string identifier;
-    std::optional<platform::Date> targetDate{};  // before which it does nothing
+    std::optional<platform::Date> targetDate{};  // it does nothing before
     std::optional<host::ScheduledActivity> scheduled{};
     std::optional<platform::Date> due{};  // on the wall clock, when it is scheduled
     std::optional<host::ActivityRun> lastRun{};
 
-    // When it does its work next, unless it has to wait for the network.
+    // When it works next, unless it has to wait for the network.
     std::optional<platform::Date> nextRun() const { return due ? std::max(due, targetDate) : std::nullopt; }
 };
 
-// All that the agent has, in the order of their use, and then what else is scheduled.
+// All activities of the agent, in the order of their use, then whatever else is scheduled.
 platform::Result<std::vector<AgentActivity>> agentActivities(AgentView& view);
 
-// The one of an identifier's last part, such as "outreach".
+// The activity with that last part of its identifier, such as "outreach".
 const AgentActivity& activityNamed(const std::vector<AgentActivity>& activities, std::string_view name);
 std::string activityIdentifier(std::string_view name);
 

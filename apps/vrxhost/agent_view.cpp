@@ -2,7 +2,7 @@
 
 #include <utility>
 
-#include "vrx/host/home/host_facts.h"
+#include "vrx/host/home/stored_facts.h"
 #include "vrx/service/register_defaults.h"
 #include "vrxhost/home.h"
 
@@ -55,18 +55,19 @@ std::vector<std::string> ErrorLog::take() {
 }
 
 std::string AgentLocale::preferredLocaleIdentifier() const {
-    if (profile_.facts()->language) return profile_.preferredLocaleIdentifier();
-    const std::optional<std::string> found = host::hostFact(database_, host::facts::language);
+    if (profile_.content()->language) return profile_.preferredLocaleIdentifier();
+    const std::optional<std::string> found = host::storedFact(database_, host::stored_facts::language);
     return found ? *found : profile_.preferredLocaleIdentifier();
 }
 
+// The platform gets its facilities once all exist. Until then it can only log.
 AgentView::AgentView(const std::string& home, const std::optional<std::string>& profile)
     : home_(home),
       facilities_{.systemLog = &errors_},
       platform_(facilities_),
       current_(platform_),
       files_(home),
-      database_(host::Database::toLookAt(Home::databasePath(home))),
+      database_(host::Database::readOnly(Home::databasePath(home))),
       stored_(database_),
       defaults_(stored_),
       followUps_(database_),
@@ -105,8 +106,9 @@ void AgentView::use(platform::Queues* queues, platform::HttpSessions* sessions) 
     platform_ = platform::Platform(facilities_);
 }
 
-CommandLine::Verb looking(const wire::LocationOverrides& places, std::shared_ptr<std::optional<std::string>> profile,
-                          std::function<Outcome(AgentView&)> verb) {
+CommandLine::Verb readOnlyVerb(const wire::LocationOverrides& places,
+                               std::shared_ptr<std::optional<std::string>> profile,
+                               std::function<Outcome(AgentView&)> verb) {
     return [&places, profile = std::move(profile), verb = std::move(verb)] {
         const std::string home = absolutePath(wire::findLocations(places).home.path);
         if (std::optional<Outcome> missing = missingDatabase(home)) return *std::move(missing);

@@ -1,6 +1,5 @@
-// What an agent of a home finds, without the agent: the agent's own classes read here what they would read there.
-// Nothing is written: what they store is kept in memory, and the home's files stay as they are. One thread makes and
-// ends it.
+// What an agent of a home would see, without an agent: the agent's own classes read the home through this platform.
+// Nothing is written: what they store is kept in memory. Made and destroyed on one thread.
 #pragma once
 
 #include <atomic>
@@ -28,12 +27,12 @@
 
 namespace vrx::apps {
 
-// The settings of a store, over which those that are stored here are kept in memory.
+// A store's settings, with changes kept in memory over them.
 class UnwrittenDefaults final : public platform::DefaultsStore {
 public:
     explicit UnwrittenDefaults(const platform::DefaultsStore& store) : store_(store) {}
 
-    // Reads the store from now on; until then only registered values are there.
+    // Reads the store from now on. Until then there are only registered values.
     void useStore() { isStoreUsed_ = true; }
 
     platform::Value get(std::string_view key) const override;
@@ -46,16 +45,16 @@ private:
     const platform::DefaultsStore& store_;
     std::atomic<bool> isStoreUsed_ = false;
     mutable std::mutex mutex_;
-    platform::Dictionary kept_;  // null for what was removed
+    platform::Dictionary kept_;  // null for removed ones
     platform::Dictionary registered_;
 };
 
-// Keeps what is wrong, and drops the rest.
+// Keeps errors and drops everything else.
 class ErrorLog final : public platform::SystemLog {
 public:
     bool isOn(platform::Level level) const override { return level == platform::Level::Error; }
     void write(const platform::LogEntry& entry) override;
-    // Those since the last call.
+    // The errors since the last call.
     std::vector<std::string> take();
 
 private:
@@ -63,7 +62,7 @@ private:
     std::vector<std::string> messages_;
 };
 
-// The language that the agent has last found, which may be another than this process's; else the profile's.
+// The profile's language, else the one that the agent found last, which may differ from this process's own.
 class AgentLocale final : public platform::Locale {
 public:
     AgentLocale(const host::DeviceProfile& profile, host::Database& database)
@@ -78,11 +77,12 @@ private:
 
 class AgentView {
 public:
-    // The home may be missing, as may all in it. The profile is the one that the agent has told of in its database,
-    // unless another is named.
+    // The home and everything in it may be missing. The profile is the named one, else the one that the agent noted in
+    // its database.
     AgentView(const std::string& home, const std::optional<std::string>& profile);
 
-    // Reads the database from now on, if it can. Until then the registered settings hold, and nothing is pending.
+    // Reads the database from now on, if possible. Until then settings have their registered values, and nothing is
+    // pending.
     platform::MaybeError open();
 
     const std::string& home() const { return home_; }
@@ -90,7 +90,8 @@ public:
     const host::DeviceProfile& profile() const { return profile_; }
     ErrorLog& errors() { return errors_; }
 
-    // What only some need, for as long as they do; while no other thread uses the platform. Not owned.
+    // Adds facilities that only some verbs need; null removes them. Not owned. No other thread may use the platform
+    // meanwhile.
     void use(platform::Queues* queues, platform::HttpSessions* sessions);
 
 private:
@@ -114,10 +115,11 @@ private:
     host::TelephonyNetworkInfo telephony_;
 };
 
-// A verb that looks at the home of an agent, which must be there, and writes nothing. The places are read when it runs.
-CommandLine::Verb looking(const wire::LocationOverrides& places, std::shared_ptr<std::optional<std::string>> profile,
-                          std::function<Outcome(AgentView&)> verb);
-// --device, which names the profile.
+// A verb that reads the home of an agent, which must exist, and writes nothing. The places are read when the verb runs.
+CommandLine::Verb readOnlyVerb(const wire::LocationOverrides& places,
+                               std::shared_ptr<std::optional<std::string>> profile,
+                               std::function<Outcome(AgentView&)> verb);
+// Adds --device, which names the profile.
 void addProfileOption(CLI::App* verb, std::optional<std::string>& profile);
 
 }  // namespace vrx::apps

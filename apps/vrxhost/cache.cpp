@@ -1,4 +1,4 @@
-// vrxhost cache: what is cached for a serial number, and whether it is valid.
+// vrxhost cache: the cached record of a serial number, and whether it is valid.
 #include <filesystem>
 
 #include "vrx/codec/property_list.h"
@@ -39,6 +39,7 @@ CacheFile readCacheFile(Home& home, const std::string& path) {
     return {.content = *root};
 }
 
+// Compares the record's language and version with the present ones, as the agent does before it uses the record.
 Outcome showCache(Home& home, const std::string& serialNumber, const std::string& profile) {
     const std::string path =
         platform::filled(VRXWarranty::_warrantyPathForSerialNumberFormat(), {platform::sha256Hash(serialNumber)});
@@ -87,7 +88,7 @@ void addCacheVerb(CommandLine& line, const wire::LocationOverrides& places) {
     };
     auto options = std::make_shared<Options>();
     CLI::App* verb = line.add(
-        "cache", "Shows what is cached for a serial number", inHome(places, Access::Look, [options](Home& home) {
+        "cache", "Shows what is cached for a serial number", inHome(places, Access::ReadOnly, [options](Home& home) {
             return showCache(home, options->serialNumber, agentProfile(home.database(), options->profile));
         }));
     verb->add_option("SERIAL", options->serialNumber, "The serial number")->required();

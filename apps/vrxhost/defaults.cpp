@@ -77,7 +77,7 @@ void addKey(CLI::App* verb, Setting& setting) {
     verb->add_option("KEY", setting.key, "The setting's name")->required();
 }
 
-// One of a JSON value and the typed options.
+// Adds the value's options: a JSON value or one of the typed forms.
 void addValue(CLI::App* verb, Setting& setting) {
     CLI::Option_group* group = verb->add_option_group("value", "The value, in one of these forms");
     auto add = [&]<class T>(const char* name, const char* type, const char* help, std::type_identity<T>) {
@@ -115,22 +115,24 @@ void addValue(CLI::App* verb, Setting& setting) {
 void addDefaultsVerbs(CommandLine& line, const wire::LocationOverrides& places) {
     auto setting = std::make_shared<Setting>();
     CLI::App* group = line.addGroup("defaults", "The agent's settings");
-    line.add("list", "Lists all settings, stored and registered", inHome(places, Access::Look, listDefaults), group);
+    line.add("list", "Lists all settings, stored and registered", inHome(places, Access::ReadOnly, listDefaults),
+             group);
     addKey(line.add("read", "Shows a setting",
-                    inHome(places, Access::Look, [setting](Home& home) { return readDefault(home, setting->key); }),
+                    inHome(places, Access::ReadOnly, [setting](Home& home) { return readDefault(home, setting->key); }),
                     group),
            *setting);
     CLI::App* write =
         line.add("write", "Stores a setting",
-                 inHome(places, Access::Change,
+                 inHome(places, Access::ReadWrite,
                         [setting](Home& home) { return storeDefault(home, setting->key, setting->value); }),
                  group);
     addKey(write, *setting);
     addValue(write, *setting);
-    addKey(line.add("delete", "Removes a stored setting; a registered value holds again",
-                    inHome(places, Access::Change, [setting](Home& home) { return deleteDefault(home, setting->key); }),
-                    group),
-           *setting);
+    addKey(
+        line.add("delete", "Removes a stored setting; a registered value holds again",
+                 inHome(places, Access::ReadWrite, [setting](Home& home) { return deleteDefault(home, setting->key); }),
+                 group),
+        *setting);
 }
 
 }  // namespace vrx::apps

@@ -1,4 +1,4 @@
-// vrxhost doctor: whether an agent's surroundings are as it needs them, and what to do next.
+// vrxhost doctor: checks an agent's surroundings, and says what to do next.
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/un.h>
@@ -156,6 +156,7 @@ Check Examination::database() {
                    "of a newer release it leaves alone: use that release.");
 }
 
+// Mistakes in the whole profile come before those in single keys.
 Check Examination::profile() const {
     const std::string& path = places_.profile.path;
     if (path.empty()) return good("none: the machine's own facts hold");
@@ -169,10 +170,10 @@ Check Examination::profile() const {
         return problem(reading.error().text, "Correct the line; until then the agent goes by what it read before.");
     if (!reading->warnings.empty())
         return note(reading->warnings.front(), "Correct or remove what means nothing to the agent.");
-    if (!view_.profile().facts()->isTrusted)
-        return note(chosen(places_.profile) +
-                        ": others can write it, so what it says of bundles, authorities and helpers does not count",
-                    "chown it to root or the agent's user, and chmod go-w " + path);
+    if (const auto open = view_.profile().content()->findOpenToOthers())
+        return note(chosen(places_.profile) + ": others can write " + (open->path == path ? "it" : open->path) +
+                        ", so what it says of bundles, authorities and helpers does not count",
+                    "chown it to root or the agent's user, and chmod go-w " + open->path);
     return good(chosen(places_.profile));
 }
 
@@ -184,7 +185,7 @@ Check Examination::agent() {
                    ExitCode::NotReachable);
 }
 
-// Whether somebody listens at the path, without a connection, which would have a service manager start an agent.
+// Whether somebody listens at the path. Does not connect, because a service manager would start an agent.
 bool isListenedAt(const std::string& path) {
     std::ifstream sockets("/proc/net/unix");
     constexpr const char* accepting = " 00010000 ";
@@ -193,6 +194,7 @@ bool isListenedAt(const std::string& path) {
     return false;
 }
 
+// Connects only when an agent runs: otherwise a service manager would start one.
 Check Examination::socket() const {
     const std::string& path = places_.socket.path;
     const std::string advice = "Name the agent's socket with --socket, or start an agent.";
@@ -212,17 +214,17 @@ Check Examination::socket() const {
     return problem(chosen(places_.socket) + ": " + std::strerror(errno), advice, ExitCode::NotReachable);
 }
 
-// Of the vrxctl that was installed with this program.
+// Checks the vrxctl that was installed with this program.
 Check Examination::entitlement() const {
     std::error_code error;
     const std::string program = std::filesystem::read_symlink("/proc/self/exe", error).replace_filename("vrxctl");
     if (!std::filesystem::exists(program, error)) return note("there is no " + program);
     const std::string entitlement = platform::vendorIdentifier(platform::entitlementRemainder);
     const std::string grant = "A bundle.toml in its folder, or above, grants it: \"" + entitlement + "\" = true.";
-    if (const MaybeError open = host::isKeptFromOthers(program))
-        return problem(open->text, "Install the programs where only root and the agent's user can write.",
+    if (const auto open = host::findOpenToOthers(program, host::Links::Refused))
+        return problem(open->error.text, "Install the programs where only root and the agent's user can write.",
                        ExitCode::Refused);
-    const auto bundle = host::BundleLookup([this] { return view_.profile().facts(); }).bundleOf(program);
+    const auto bundle = host::BundleLookup([this] { return view_.profile().content(); }).bundleOf(program);
     if (!bundle) return problem(program + " is in no bundle", grant, ExitCode::Refused);
     const auto granted = bundle->entitlements.find(entitlement);
     if (granted == bundle->entitlements.end() || granted->second != Value(true))
@@ -242,21 +244,23 @@ Check Examination::account() const {
 }
 
 Check Examination::credentialHelper() const {
-    const auto facts = view_.profile().facts();
-    if (!facts->account) return skipped("needs an account");
-    if (facts->account->credentialHelper.empty())
+    const auto content = view_.profile().content();
+    if (!content->account) return skipped("needs an account");
+    if (content->account->credentialHelper.empty())
         return note("none: tokens are not renewed",
                     "Name a program in the profile: [account] credential_helper = [\"/…\"].");
-    const std::string& program = facts->account->credentialHelper.front();
+    const std::string& program = content->account->credentialHelper.front();
     if (access(program.c_str(), X_OK) != 0)
         return problem(program + " cannot be run: " + std::strerror(errno), "Correct the profile's credential_helper.");
-    if (!facts->isTrusted)
-        return problem(program + " is not run: others can write the profile", "chmod go-w " + places_.profile.path);
+    if (const auto open = content->findOpenToOthers())
+        return problem(
+            program + " is not run: others can write " + (open->path == content->path ? "the profile" : open->path),
+            "chown it to root or the agent's user, and chmod go-w " + open->path);
     return good(program);
 }
 
 Check Examination::network() const {
-    const auto overridden = view_.profile().facts()->networkAvailable;
+    const auto overridden = view_.profile().content()->networkAvailable;
     const bool isAvailable = overridden ? *overridden : host::NetworkRoutes(nullptr, {}).hasDefaultRoute();
     const std::string by = overridden ? "by the profile" : "by the machine's routes";
     if (isAvailable) return good("there is one, " + by);
@@ -300,6 +304,7 @@ Check Examination::activities() {
     return note("nothing is scheduled", "vrxctl outreach has the agent look for offers now.");
 }
 
+// The next step is the advice of the first problem, else of the first note.
 Outcome report(const std::vector<Check>& checks) {
     const auto first = [&](Health health) {
         return std::ranges::find_if(

@@ -17,7 +17,7 @@ using platform::Date;
 
 namespace {
 
-// A run that has done its work hands its result back a second later; only one that takes longer is in the way.
+// A finished run hands its result back a second later. Only one that takes longer is reported as running.
 constexpr auto handBackLimit = std::chrono::seconds(3);
 
 platform::Result<std::optional<host::FiringAnswer>> requestFiring(Home& home, const std::string& identifier,
@@ -36,6 +36,7 @@ struct Options {
     double limit = 10;
 };
 
+// The target date is read before the firing, because the run changes it.
 Outcome fire(Home& home, const Options& options) {
     const std::string& name = options.name;
     const std::string identifier = name.find('.') == std::string::npos ? activityIdentifier(name) : name;
@@ -71,9 +72,9 @@ Outcome fire(Home& home, const Options& options) {
 void addFireVerb(CommandLine& line, const wire::LocationOverrides& places) {
     auto options = std::make_shared<Options>();
     const CommandLine::Verb verb =
-        inHome(places, Access::Change, [options](Home& home) { return fire(home, *options); });
+        inHome(places, Access::ReadWrite, [options](Home& home) { return fire(home, *options); });
     CLI::App* app = line.add("fire", "Fires an activity now, as the system does when it falls due", [&places, verb] {
-        // Without an agent not even the database is opened.
+        // Without an agent the database is not even opened.
         const std::string home = absolutePath(wire::findLocations(places).home.path);
         if (host::HomeLock::isInUse(home)) return verb();
         if (std::optional<Outcome> missing = missingDatabase(home)) return *std::move(missing);

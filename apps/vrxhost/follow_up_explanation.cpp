@@ -25,7 +25,7 @@ std::string recordProblem(const Circumstances& device) {
     return "";
 }
 
-// The run that considers posting next.
+// The activity that considers posting next.
 NextStep nextConsideration(const Circumstances& device) {
     if (device.postRun) return NextStep::Post;
     return device.outreach ? NextStep::Outreach : NextStep::None;
@@ -62,7 +62,7 @@ Explanation explainWithoutRecord(const Circumstances& device) {
             next == NextStep::Post ? device.postRun : device.outreach, next};
 }
 
-// The rule that sets the date before which it is not posted.
+// Explains the date before which it is not posted.
 Explanation explainPostDate(const Circumstances& device) {
     const PostDate& date = *device.post.postDate;
     Explanation explanation{Waiting, "", ""};
@@ -79,7 +79,8 @@ Explanation explainPostDate(const Circumstances& device) {
     return explanation;
 }
 
-// There is an offer, and nobody has dismissed it.
+// For an offer that nobody has dismissed. The order of the questions is that of the agent: the offer's end, what is
+// scheduled, the carrier, the date of the run.
 Explanation explainUnposted(const Circumstances& device) {
     const Date end = *device.eligibleUntil;
     const Date day = device.post.postDate->date;

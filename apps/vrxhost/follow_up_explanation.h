@@ -1,5 +1,5 @@
-// Why a device's follow-up is where it is: the first rule that decides, of those that the agent goes by. A pure
-// function of what the agent's own rules say.
+// Explains the state of a device's follow-up: the first of the agent's rules that decides. A pure function of what
+// those rules say.
 #pragma once
 
 #include <cstdint>
@@ -16,7 +16,7 @@ struct FollowUpCircumstances {
     platform::Date now;
     bool isTracked = false;     // the agent knows the device
     bool isPending = false;     // its item is shown
-    bool wasPosted = false;     // before, so that no date is set for it again
+    bool wasPosted = false;     // before: no date is set for it again
     bool isCarrierOut = false;  // the record leaves out a carrier of this device
     bool hasRecord = false;
     std::optional<CachedRecordFlaw> recordFlaw{};
@@ -24,7 +24,7 @@ struct FollowUpCircumstances {
     RefreshReason refresh{};
     std::optional<platform::Date> eligibleUntil{};
     std::optional<platform::Date> displayDate{};  // that the record names
-    // When the activities do their work next.
+    // When the activities work next.
     std::optional<platform::Date> outreach{};
     std::optional<platform::Date> postRun{};
     std::optional<platform::Date> posting{};  // by the next post run, or one that follows it by the agent's date rule
@@ -37,7 +37,7 @@ struct FollowUpExplanation {
     FollowUpState state;
     std::string rule;  // a name for programs
     std::string text;
-    std::optional<platform::Date> until{};  // of one that waits, or is shown
+    std::optional<platform::Date> until{};  // for one that waits or is shown
     NextStep next = NextStep::None;
     std::string advice{};
 };

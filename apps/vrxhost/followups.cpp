@@ -1,4 +1,4 @@
-// vrxhost followups: what the settings app shows to the user, and what a tester has it show.
+// vrxhost followups: what the settings app shows to the user, and changes to it for testing.
 #include <algorithm>
 #include <array>
 #include <cerrno>
@@ -39,15 +39,15 @@ std::optional<std::string> deviceName(const host::DeviceProfile& profile, const 
     return std::nullopt;
 }
 
-// How an item looks at a moment.
+// How an item looks at one moment.
 struct Shown {
     std::optional<std::string> serialNumber{};
     std::optional<std::string> deviceName{};
     bool hasBadge = false;
     bool isExpired = false;
-    bool isLegacy = false;                      // of the older layout, which knew one device
-    std::optional<std::int64_t> daysLeft{};     // nothing without an expiration date
-    std::optional<std::string> relativeText{};  // what the settings app makes of them, if the user info says how
+    bool isLegacy = false;                      // of the older single-device layout
+    std::optional<std::int64_t> daysLeft{};     // absent without an expiration date
+    std::optional<std::string> relativeText{};  // their text, if the user info has one
     std::optional<Date> nextChange{};           // when fewer days will be left, or it expires
 
     bool differsFromFooter(const FollowUpItem& item) const {
@@ -132,7 +132,7 @@ std::string textOf(const FollowUpItem& item, const Shown& shown) {
     return text;
 }
 
-// The listing, and when it will look different by itself.
+// The listing, and when it changes by itself.
 struct Listing {
     Outcome outcome;
     std::optional<Date> nextChange{};
@@ -159,7 +159,7 @@ Listing list(Home& home, const host::DeviceProfile& profile) {
     return listing;
 }
 
-// The listing now, and after each change of it, until a signal.
+// Shows the listing now and after each change, until a signal.
 Outcome watch(const CommandLine& line, Home& home, const host::DeviceProfile& profile) try {
     HomeWatch changes(home);
     Outcome last;
@@ -194,8 +194,8 @@ Result<std::string> readAll(const std::string& file) {
     return text;
 }
 
-// An item as the listing prints it; the expiration date may be a text as well, and nothing is taken that an item could
-// not mean.
+// Reads an item in the form that the listing prints. The expiration date may also be a text. Values that an item cannot
+// have are rejected.
 Result<FollowUpItem> readItem(const std::string& file) {
     const auto mistake = [&](const std::string& what) { return platform::Error{"follow-up", 0, file + ": " + what}; };
     const Result<std::string> text = readAll(file);
@@ -269,11 +269,11 @@ void addFollowUpVerbs(CommandLine& line, const wire::LocationOverrides& places) 
         const host::DeviceProfile profile(agentProfile(home.database(), options->profile));
         return options->isWatch ? watch(line, home, profile) : list(home, profile).outcome;
     };
-    // To watch is to wait for those who write, as one of them.
-    const CommandLine::Verb look = inHome(places, Access::Look, showing),
-                            stay = inHome(places, Access::Change, showing);
+    // Watching waits for writers by taking the write lock, so it needs write access.
+    const CommandLine::Verb once = inHome(places, Access::ReadOnly, showing),
+                            watching = inHome(places, Access::ReadWrite, showing);
     CLI::App* listing = line.add("followups", "Shows what the settings app would",
-                                 [options, look, stay] { return options->isWatch ? stay() : look(); });
+                                 [options, once, watching] { return options->isWatch ? watching() : once(); });
     CLI::Option* watch = listing->add_flag("--watch", options->isWatch, "Show it again after each change");
     watch->disable_flag_override();
     CLI::Option* device =
@@ -282,11 +282,11 @@ void addFollowUpVerbs(CommandLine& line, const wire::LocationOverrides& places) 
 
     CLI::App* post = line.add(
         "post", "Posts an item, or replaces the pending one of the same identifier",
-        inHome(places, Access::Change, [options](Home& home) { return apps::post(home, options->file); }), listing);
+        inHome(places, Access::ReadWrite, [options](Home& home) { return apps::post(home, options->file); }), listing);
     post->add_option("FILE", options->file, "The item as JSON; - for standard input")->required();
     CLI::App* clear = line.add(
         "clear", "Clears items",
-        inHome(places, Access::Change, [options](Home& home) { return apps::clear(home, options->identifiers); }),
+        inHome(places, Access::ReadWrite, [options](Home& home) { return apps::clear(home, options->identifiers); }),
         listing);
     clear->add_option("ID", options->identifiers, "Unique identifiers of items")->required();
     for (CLI::App* change : {post, clear}) change->excludes(watch)->excludes(device);

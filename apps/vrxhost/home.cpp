@@ -5,7 +5,7 @@
 #include <cerrno>
 #include <cstring>
 
-#include "vrx/host/home/host_facts.h"
+#include "vrx/host/home/stored_facts.h"
 #include "vrx/service/register_defaults.h"
 
 namespace vrx::apps {
@@ -13,8 +13,8 @@ namespace vrx::apps {
 Home::Home(const std::string& path, Access access)
     : path_(path),
       files_(path),
-      database_(access == Access::Look ? host::Database::toLookAt(databasePath(path))
-                                       : host::Database(databasePath(path))) {
+      database_(access == Access::ReadOnly ? host::Database::readOnly(databasePath(path))
+                                           : host::Database(databasePath(path))) {
     vrx_registerDefaults(defaults_);
 }
 
@@ -48,7 +48,7 @@ Outcome databaseFailure(const platform::Error& error, const char* kind) {
 
 std::string agentProfile(host::Database& database, const std::optional<std::string>& named) {
     if (named) return *named;
-    const std::optional<std::string> told = host::hostFact(database, host::facts::profile);
+    const std::optional<std::string> told = host::storedFact(database, host::stored_facts::profile);
     return told ? *told : wire::findLocations().profile.path;
 }
 

@@ -1,4 +1,4 @@
-// An agent's home as vrxhost sees it, beside the agent: it makes no home and no database of its own. One thread.
+// An agent's home as vrxhost sees it, beside the agent. Never makes a home or a database. One thread.
 #pragma once
 
 #include <functional>
@@ -17,10 +17,10 @@
 
 namespace vrx::apps {
 
-// To look is to change no file: a database that is damaged, or of an older release, is left to the agent.
-enum class Access { Look, Change };
+// Read-only access changes no file: a damaged database, or one of an older release, is left to the agent.
+enum class Access { ReadOnly, ReadWrite };
 
-// What is in it, and the platform that the agent's own classes read it through.
+// The home's content, and the platform through which the agent's own classes read it.
 class Home {
 public:
     Home(const std::string& path, Access access);
@@ -56,17 +56,17 @@ private:
 
 Outcome notReachable(std::string problem);
 
-// When the home has no database that this user can get at.
+// The failure when this user can reach no database in the home; nothing when there is one.
 std::optional<Outcome> missingDatabase(const std::string& home);
-// Whether an operation on the database failed because another process has held it for long.
+// Whether a database operation failed because another process holds the database.
 bool isHeldByAnother(const platform::Error& error);
-// When there is one that cannot be used; the kind is the one of an error other than a lock that is held for long.
+// The failure when a database cannot be used. The kind is for errors other than a database that is held.
 Outcome databaseFailure(const platform::Error& error, const char* kind);
 
-// The device profile: the one that is named, else the one that the agent has told of, else where an agent would look.
+// The path of the device profile: the named one, else the one that the agent noted, else where an agent would look.
 std::string agentProfile(host::Database& database, const std::optional<std::string>& named);
 
-// A verb that is run within the home, which must be there. The places are read when it runs.
+// A verb that runs in the home, which must exist. The places are read when the verb runs.
 CommandLine::Verb inHome(const wire::LocationOverrides& places, Access access, std::function<Outcome(Home&)> verb);
 
 }  // namespace vrx::apps

@@ -19,9 +19,9 @@ namespace vrx::apps {
 
 namespace {
 
-int opened(int file, const char* what) {
+host::Descriptor opened(int file, const char* what) {
     if (file < 0) throw std::system_error(errno, std::generic_category(), what);
-    return file;
+    return host::Descriptor(file);
 }
 
 int signalFile() {
@@ -49,27 +49,25 @@ HomeWatch::HomeWatch(Home& home)
     // A commit writes to the log beside the database.
     constexpr std::uint32_t events =
         IN_MODIFY | IN_CREATE | IN_DELETE | IN_MOVED_FROM | IN_MOVED_TO | IN_DELETE_SELF | IN_MOVE_SELF;
-    opened(inotify_add_watch(changes_, home.path().c_str(), events), "inotify_add_watch");
-}
-
-HomeWatch::~HomeWatch() {
-    for (int file : {changes_, signals_, timer_}) close(file);
+    if (inotify_add_watch(changes_.number(), home.path().c_str(), events) < 0)
+        throw std::system_error(errno, std::generic_category(), "inotify_add_watch");
 }
 
 HomeWatch::Wake HomeWatch::wait(std::optional<platform::Date> latest) {
     arm(latest);
-    std::array<pollfd, 3> files{{{signals_, POLLIN, 0}, {changes_, POLLIN, 0}, {timer_, POLLIN, 0}}};
+    std::array<pollfd, 3> files{
+        {{signals_.number(), POLLIN, 0}, {changes_.number(), POLLIN, 0}, {timer_.number(), POLLIN, 0}}};
     while (poll(files.data(), files.size(), -1) < 0 && errno == EINTR) {
     }
     if (files[0].revents) return Wake::End;
-    drain(changes_);
-    drain(timer_);
+    drain(changes_.number());
+    drain(timer_.number());
     std::error_code ignored;
     if (!std::filesystem::exists(Home::databasePath(home_.path()), ignored)) return Wake::Gone;
     return letWritersFinish();
 }
 
-// On the wall clock, also when it is set: that ends the wait.
+// Uses the wall clock. Setting that clock also ends the wait.
 void HomeWatch::arm(std::optional<platform::Date> latest) const {
     itimerspec due{};
     if (latest) {
@@ -77,12 +75,13 @@ void HomeWatch::arm(std::optional<platform::Date> latest) const {
         due.it_value.tv_sec = platform::clampedInteger(std::floor(seconds));
         due.it_value.tv_nsec = static_cast<long>((seconds - std::floor(seconds)) * 1e9);
     }
-    timerfd_settime(timer_, TFD_TIMER_ABSTIME | TFD_TIMER_CANCEL_ON_SET, &due, nullptr);
+    timerfd_settime(timer_.number(), TFD_TIMER_ABSTIME | TFD_TIMER_CANCEL_ON_SET, &due, nullptr);
 }
 
-// A writer changes the files first and then, unseen, makes the change hold: it is waited for by its lock.
+// Waits for the writer's lock: a writer changes the files first and then commits by a memory write that inotify does
+// not report.
 HomeWatch::Wake HomeWatch::letWritersFinish() {
-    pollfd ended{signals_, POLLIN, 0};
+    pollfd ended{signals_.number(), POLLIN, 0};
     while (true) {
         const platform::MaybeError error = home_.database().write([](host::Connection&) {});
         if (!error || !isHeldByAnother(*error)) return Wake::Look;

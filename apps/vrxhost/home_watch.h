@@ -1,9 +1,10 @@
-// Waits for something to happen to a home's database, by whatever process, without looking again and again. It takes
-// SIGINT and SIGTERM over for the rest of the program. One thread.
+// Waits until any process changes a home's database, without polling. Takes over SIGINT and SIGTERM for the rest of the
+// program. One thread.
 #pragma once
 
 #include <string>
 
+#include "vrx/host/base/descriptor.h"
 #include "vrx/platform/date.h"
 #include "vrxhost/home.h"
 
@@ -11,18 +12,15 @@ namespace vrx::apps {
 
 class HomeWatch {
 public:
-    // What happens from now on is told of.
+    // Notices changes from now on.
     explicit HomeWatch(Home& home);
-    ~HomeWatch();
-    HomeWatch(const HomeWatch&) = delete;
-    HomeWatch& operator=(const HomeWatch&) = delete;
 
     enum class Wake {
-        Look,  // something may have been committed, which can be read now; or it is the date
-        Gone,  // there is no database any more
+        Look,  // the database may have changed, or the date has come
+        Gone,  // the database is gone
         End,   // a signal has come
     };
-    // Comes back at the date at the latest.
+    // Returns at the date at the latest.
     Wake wait(std::optional<platform::Date> latest);
 
 private:
@@ -30,9 +28,9 @@ private:
     Wake letWritersFinish();
 
     Home& home_;
-    const int changes_;
-    const int signals_;
-    const int timer_;
+    const host::Descriptor changes_;
+    const host::Descriptor signals_;
+    const host::Descriptor timer_;
 };
 
 }  // namespace vrx::apps

@@ -1,5 +1,5 @@
-// vrxhost: looks into the agent's home beside the agent, explains what it finds, changes settings and fires activities,
-// for testers.
+// vrxhost: for testers. Reads the agent's home beside the agent, explains what it finds, changes settings and fires
+// activities.
 #include "vrxhost/verbs.h"
 
 int main(int argc, char** argv) {

@@ -12,12 +12,14 @@ namespace vrx::apps {
 using platform::HttpResponse;
 using platform::Platform;
 
+// Answers come on workers and are noted on the main loop, which ends with the last answer or the time limit. Sessions
+// and queues stop before what their callbacks use.
 Reachability askServers(AgentView& view, platform::Duration limit) {
     platform::Platform& platform = Platform::current();
     host::MainLoop loop;
     host::Queues queues(loop);
     host::HttpSessions sessions(queues.workers(platform::Priority::UserInitiated), platform.clock(), view.profile(),
-                                {.timeout = limit + std::chrono::hours(1)});  // this function's own limit ends it
+                                {.timeout = limit + std::chrono::hours(1)});  // the limit below ends it sooner
     view.use(&queues, &sessions);
     view.errors().take();
 

@@ -1,4 +1,4 @@
-// Whether the servers that an agent fetches from can be had, asked as the agent would ask them. Keeps nothing.
+// Whether the agent's servers can be reached, asked as the agent asks them. Stores nothing.
 #pragma once
 
 #include <optional>
@@ -12,15 +12,15 @@
 namespace vrx::apps {
 
 struct Reachability {
-    // Nothing of what was not answered in time.
+    // Absent when not answered in time.
     std::optional<bool> isServerVersionSupported{};
     std::vector<std::string> serverVersionErrors{};
-    platform::Value serverVersions{};  // the document that counts
+    platform::Value serverVersions{};  // the document that was read
     std::string coverageUrl;
     std::optional<platform::HttpResponse> coverage{};
 };
 
-// Takes SIGINT and SIGTERM over, which end the asking.
+// SIGINT and SIGTERM end the asking.
 Reachability askServers(AgentView& view, platform::Duration limit);
 
 }  // namespace vrx::apps

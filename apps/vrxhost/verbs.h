@@ -1,5 +1,5 @@
-// The verbs of vrxhost, by family. Each function adds one family with its options to the command line; the places hold
-// what the options for all verbs say, and must outlive it.
+// The verbs of vrxhost, by family. Each function adds one family with its options to the command line. The places hold
+// the options of all verbs and must outlive the command line.
 #pragma once
 
 #include "common/command_line.h"

@@ -1,4 +1,4 @@
-// vrxhost why: one device's follow-up, and the rule that decides about it now.
+// vrxhost why: the state of one device's follow-up, and the rule that decides it.
 #include <algorithm>
 #include <memory>
 #include <set>
@@ -39,7 +39,7 @@ namespace {
 using DevicePtr = std::shared_ptr<VRXDevice>;
 using InfoPtr = std::shared_ptr<VRXDeviceInfo>;
 
-// A moment that rules are asked about.
+// A fixed time for which rules are evaluated.
 class FixedClock final : public platform::Clock {
 public:
     explicit FixedClock(Date now) : now_(now) {}
@@ -51,7 +51,7 @@ private:
 };
 
 struct CachedRecord {
-    std::shared_ptr<VRXWarranty> record;  // also one that does not count
+    std::shared_ptr<VRXWarranty> record;  // also when it does not count
     std::optional<CachedRecordFlaw> flaw;
 };
 
@@ -66,7 +66,7 @@ InfoPtr infoOf(const DevicePtr& device) {
     return VRXDeviceInfo::deviceInfoWithDevice(device, cached.flaw ? nullptr : cached.record);
 }
 
-// The settings that the rules for posts go by.
+// The settings that the post rules use.
 struct PostSettings {
     std::set<std::string> dismissed = serialNumberHashes(dismissedSerialNumberHashesKey);
     PostDateSettings dates = PostDateSettings::read();
@@ -78,8 +78,8 @@ PostDecision decide(const VRXDeviceInfo& info, const PostSettings& settings, con
         info, {.isDismissed = settings.dismissed.contains(hash), .outreachDelay = settings.dates.outreachDelay}, clock);
 }
 
-// When the device's follow-up is posted, by the run at that date or by those that each sets for the next: as long as
-// the records stay as they are.
+// Predicts when the device's follow-up is posted, by the run at that date or by the runs that follow from it, if the
+// records stay as they are.
 std::optional<Date> predictedPosting(const std::string& serialNumber, const DeviceInfoList& infos,
                                      PostSettings settings, Date run, Duration interval) {
     constexpr int mostRuns = 1000;
@@ -111,7 +111,7 @@ const char* nameOf(FollowUpState state) {
     return "";
 }
 
-// Everything about one device that decides, and what is told of it.
+// What decides about one device, and what is shown of it.
 struct Findings {
     FollowUpCircumstances circumstances;
     std::optional<std::string> name{};
@@ -156,6 +156,7 @@ void addRecord(Findings& findings, const CachedRecord& cached, const std::string
     findings.circumstances.isCarrierOut = !VRXOutreachActivity::currentDeviceShouldReceiveOutreachForWarranty(record);
 }
 
+// Evaluates the agent's own rules with what it would read now; stores nothing.
 Findings examine(AgentView& view, const std::string& serialNumber, const std::set<std::string>& pending,
                  const Activities& activities) {
     const platform::Clock& clock = Platform::current().clock();
@@ -174,31 +175,31 @@ Findings examine(AgentView& view, const std::string& serialNumber, const std::se
     const PostSettings settings;
 
     Findings findings{.circumstances = {.now = clock.now()}, .name = device->name()};
-    FollowUpCircumstances& facts = findings.circumstances;
-    facts.isTracked = found != devices.end();
-    facts.isPending = pending.contains(serialNumber);
-    facts.wasPosted = settings.dates.postedSerialNumberHashes.contains(platform::sha256Hash(serialNumber));
-    facts.hasRecord = cached.record != nullptr;
-    facts.recordFlaw = cached.flaw;
-    facts.post = decide(*info, settings, clock);
-    facts.refresh = decideRefresh(*info, {.isPending = facts.isPending}, clock);
-    facts.outreach = activities.outreach.nextRun();
-    facts.postRun = activities.post.nextRun();
-    if (facts.postRun)
-        facts.posting = predictedPosting(serialNumber, infos, settings, std::max(facts.now, *facts.postRun),
+    FollowUpCircumstances& state = findings.circumstances;
+    state.isTracked = found != devices.end();
+    state.isPending = pending.contains(serialNumber);
+    state.wasPosted = settings.dates.postedSerialNumberHashes.contains(platform::sha256Hash(serialNumber));
+    state.hasRecord = cached.record != nullptr;
+    state.recordFlaw = cached.flaw;
+    state.post = decide(*info, settings, clock);
+    state.refresh = decideRefresh(*info, {.isPending = state.isPending}, clock);
+    state.outreach = activities.outreach.nextRun();
+    state.postRun = activities.post.nextRun();
+    if (state.postRun)
+        state.posting = predictedPosting(serialNumber, infos, settings, std::max(state.now, *state.postRun),
                                          host::minimumInterval(view.profile()));
 
-    findings.nextPost = nextPostDate(infos, settings.dates, facts.now);
-    findings.nextRefresh = nextRefreshDate(shown, true, RefreshDateSettings::read(), facts.now);
-    findings.inputs = {{"now", facts.now},
+    findings.nextPost = nextPostDate(infos, settings.dates, state.now);
+    findings.nextRefresh = nextRefreshDate(shown, true, RefreshDateSettings::read(), state.now);
+    findings.inputs = {{"now", state.now},
                        {"activationDate", valueOf(device->activationDate())},
                        {"PostUpgradeOutreachDelay", settings.dates.outreachDelay.count()},
-                       {"postDate", facts.post.postDate ? Value(facts.post.postDate->date) : Value()},
-                       {"pending", facts.isPending},
-                       {"posted", facts.wasPosted},
+                       {"postDate", state.post.postDate ? Value(state.post.postDate->date) : Value()},
+                       {"pending", state.isPending},
+                       {"posted", state.wasPosted},
                        {"dismissed", settings.dismissed.contains(platform::sha256Hash(serialNumber))}};
     addRecord(findings, cached, serialNumber);
-    findings.inputs.emplace_back("carrierLeftOut", facts.isCarrierOut);
+    findings.inputs.emplace_back("carrierLeftOut", state.isCarrierOut);
     return findings;
 }
 
@@ -223,6 +224,7 @@ std::string headline(const FollowUpExplanation& explanation) {
     return "";
 }
 
+// The next activity is named only when it is scheduled. Without an agent, starting one comes before any other advice.
 Outcome report(const std::string& serialNumber, const Findings& findings, const Activities& activities,
                bool isAgentRunning) {
     FollowUpExplanation explanation = explainFollowUp(findings.circumstances);
@@ -282,7 +284,7 @@ void addWhyVerb(CommandLine& line, const wire::LocationOverrides& places) {
     auto profile = std::make_shared<std::optional<std::string>>();
     CLI::App* verb =
         line.add("why", "Tells why a device's follow-up is shown, or is not",
-                 looking(places, profile, [serialNumber](AgentView& view) { return why(view, *serialNumber); }));
+                 readOnlyVerb(places, profile, [serialNumber](AgentView& view) { return why(view, *serialNumber); }));
     verb->add_option("SERIAL", *serialNumber, "The device's serial number")->required();
     addProfileOption(verb, *profile);
 }

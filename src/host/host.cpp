@@ -4,13 +4,14 @@
 
 #include <filesystem>
 
-#include "vrx/host/home/host_facts.h"
+#include "vrx/host/home/stored_facts.h"
 
 namespace vrx::host {
 
 using platform::MaybeError;
 using platform::Platform;
 
+// The platform gets its facilities once all exist. Until then it can only log.
 Host::Host(const HostLocations& locations, platform::Level lowestLevel, const HostLimits& limits)
     : home_(locations.home),
       log_(lowestLevel),
@@ -33,7 +34,7 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel, const Ho
                    .workers = queues_.workers(platform::Priority::Background),
                    .conditions = conditions_,
                    .lifecycle = lifecycle_}),
-      store_(profile_),
+      marketplace_(profile_),
       purchases_(profile_),
       apps_(profile_),
       strings_(profile_) {
@@ -58,14 +59,14 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel, const Ho
     facilities_.propertyList = &propertyList_;
     facilities_.purchaseHistory = &purchases_;
     facilities_.queues = &queues_;
-    facilities_.store = &store_;
+    facilities_.store = &marketplace_;
     facilities_.telephonyNetworkInfo = &telephony_;
     facilities_.uuidSource = &uuids_;
     platform_ = Platform(facilities_);
 }
 
-// Tasks may use any facility to their end, and the current platform too: they end first, and what one may wait for
-// before them.
+// Tasks may use any facility, and the current platform, to their end, so they end first. What a task may wait for ends
+// before that.
 Host::~Host() {
     http_.stop();
     accounts_.stop();
@@ -76,22 +77,22 @@ MaybeError Host::open(HomeUse use) {
     if (MaybeError error = createDirectories(home_)) return error;
     if (use == HomeUse::Agent)
         if (MaybeError error = lock_.take(home_)) return error;
-    profile_.facts();  // what is wrong with it is said now, and what is good is there to stay when an edit is not
+    profile_.content();  // reports mistakes now, and keeps the content for when an edit is wrong
     return database_.open();
 }
 
-// The database's folder is watched for the requests of tools, and for a database that takes the place of this one;
-// while there is none, someone may be about to put one there.
+// Watches the database's folder for tools' requests and for another database in its place. While there is no database
+// it waits, because somebody may be replacing it.
 void Host::start(const std::string& agentVersion) {
-    sd_event_set_watchdog(mainLoop_.event(), 1);  // if the service manager wants to hear
+    sd_event_set_watchdog(mainLoop_.event(), 1);  // if the service manager asks for it
     constexpr platform::Duration pause = std::chrono::milliseconds(5);
     const std::string path = home_ + "/host.db";
     databaseWatch_ = std::make_unique<FileWatch>(mainLoop_.event(), std::vector{path}, pause, [this, path] {
         if (access(path.c_str(), F_OK) == 0) activities_.reconsider();
     });
     database_.write([this](Connection& connection) {
-        setHostFact(connection, facts::profile,
-                    profile_.path().empty() ? "" : std::filesystem::absolute(profile_.path()).string());
+        setStoredFact(connection, stored_facts::profile,
+                      profile_.path().empty() ? "" : std::filesystem::absolute(profile_.path()).string());
     });
     activities_.start(agentVersion);
     profileNotifier_.start(mainLoop_.event(), [this] { activities_.reconsider(); });

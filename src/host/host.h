@@ -1,5 +1,5 @@
 // The Linux host: owns every facility, and is the program's current platform while it is alive. Made on the main thread
-// before any other thread, and taken down there.
+// before any other thread, and destroyed there.
 //
 //     Host host({.home = home, .profile = profile});
 //     if (MaybeError error = host.open(HomeUse::Agent)) …        // tell, and exit
@@ -24,7 +24,7 @@
 #include "vrx/host/home/follow_up_controller.h"
 #include "vrx/host/home/home_lock.h"
 #include "vrx/host/http/http.h"
-#include "vrx/host/http/store.h"
+#include "vrx/host/http/marketplace.h"
 #include "vrx/host/log/system_log.h"
 #include "vrx/host/loop/file_watch.h"
 #include "vrx/host/loop/main_loop.h"
@@ -44,7 +44,7 @@ namespace vrx::host {
 
 struct HostLocations {
     std::string home;     // absolute, without a slash at its end
-    std::string profile;  // empty for the bare machine's facts
+    std::string profile;  // empty for the machine's own facts
 };
 
 struct HostLimits {
@@ -52,14 +52,14 @@ struct HostLimits {
     platform::Duration credentialHelper = std::chrono::seconds(60);
 };
 
-// The agent has a home to itself; its tools look in and may change settings beside it.
+// An agent has the home to itself. Tools read it, and may change settings, beside an agent.
 enum class HomeUse { Agent, Tool };
 
 class Host {
 public:
     explicit Host(const HostLocations& locations, platform::Level lowestLevel = platform::Level::Default,
                   const HostLimits& limits = {});
-    // Ends what is under way: requests go unanswered, renewals of credentials fail, running tasks are waited for.
+    // Ends what is under way: requests are dropped, renewals of credentials fail, running tasks are waited for.
     ~Host();
     Host(const Host&) = delete;
     Host& operator=(const Host&) = delete;
@@ -67,12 +67,12 @@ public:
     // Makes the home if need be, locks it for an agent, and opens the database. An error's text is for people.
     platform::MaybeError open(HomeUse use);
 
-    // What the IPC side adds, before any other thread uses the platform; not owned.
+    // Set by the IPC side, before any other thread uses the platform. Not owned.
     void setServiceListenerFactory(platform::ServiceListenerFactory* factory);
     void setBundleLookup(platform::BundleLookup* lookup);
 
-    // For an agent of that version, when its start-up is done: activities fire from now on, and what has changed while
-    // no agent ran is notified. Once.
+    // Starts the work of an agent of that version, once its start-up is done: activities fire from now on, and what has
+    // changed while no agent ran is notified. Once.
     void start(const std::string& agentVersion);
 
     MainLoop& mainLoop() { return mainLoop_; }
@@ -80,13 +80,13 @@ public:
     const DeviceProfile& profile() const { return profile_; }
     Database& database() { return database_; }
     const std::string& home() const { return home_; }
-    // For the program that this process executes next.
+    // Gives up the lock, for the program that this process executes next.
     Descriptor releaseHomeLock() { return lock_.release(); }
 
 private:
     const std::string home_;
     SystemLog log_;
-    // The current platform from here on, so that what follows can log from its beginning to its end.
+    // The current platform from here on, so that the members below can log during all of their life.
     platform::Platform::Facilities facilities_;
     platform::Platform platform_;
     platform::ScopedPlatform current_;
@@ -94,7 +94,7 @@ private:
     codec::Json json_;
     codec::PropertyList propertyList_;
     codec::Digest digest_;
-    MainLoop mainLoop_;  // takes over signals before the first thread
+    MainLoop mainLoop_;  // blocks signals before the first thread starts
     ProcessLifecycle lifecycle_{mainLoop_};
     Queues queues_;
     HomeLock lock_;
@@ -114,7 +114,7 @@ private:
     MachineConditions conditions_;
     BackgroundActivities activities_;
     std::unique_ptr<FileWatch> databaseWatch_;
-    Store store_;
+    Marketplace marketplace_;
     PurchaseHistory purchases_;
     InstalledApps apps_;
     LocalizedStrings strings_;

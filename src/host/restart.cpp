@@ -13,7 +13,7 @@ namespace {
 
 constexpr const char* ownProgram = "/proc/self/exe";
 
-// A number above those that are passed.
+// Moves the descriptor above the numbers of those that are passed.
 Descriptor moveUp(Descriptor file) {
     constexpr int above = SD_LISTEN_FDS_START + 2;
     return Descriptor(fcntl(file.number(), F_DUPFD_CLOEXEC, above));
@@ -21,7 +21,8 @@ Descriptor moveUp(Descriptor file) {
 
 }  // namespace
 
-// A shell inherits the invocation of a service that it was started in; the process that is the service's own is named.
+// Shells inherit INVOCATION_ID from the service that they were started in; SYSTEMD_EXEC_PID names the service's own
+// process.
 bool isUnderServiceManager() {
     if (std::getenv("NOTIFY_SOCKET")) return true;
     const char* process = std::getenv("SYSTEMD_EXEC_PID");
@@ -38,7 +39,7 @@ void Restart::execute(char** arguments, PassedSocket socket, Descriptor homeLock
     const Descriptor sources[] = {moveUp(std::move(socket.file)), moveUp(std::move(homeLock))};
     Descriptor passed[2];
     for (int i = 0; i < 2; ++i)
-        passed[i] = Descriptor(dup2(sources[i].number(), SD_LISTEN_FDS_START + i));  // open in the program to come
+        passed[i] = Descriptor(dup2(sources[i].number(), SD_LISTEN_FDS_START + i));  // stays open in the next program
     setenv("LISTEN_PID", std::to_string(getpid()).c_str(), 1);
     setenv("LISTEN_FDS", "2", 1);
     setenv("LISTEN_FDNAMES",

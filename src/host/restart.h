@@ -1,5 +1,5 @@
-// How an agent that has ended starts anew. Under a service manager it only ends, and the manager starts a fresh
-// process; by hand, its process executes the program again, with what must not be let go of meanwhile: the socket at
+// How an ended agent starts again. Under a service manager it only ends, and the manager starts a fresh process.
+// Started by hand, its process executes the program again and passes on what must not be lost meanwhile: the socket at
 // which clients wait, and the lock of the home.
 #pragma once
 
@@ -14,10 +14,10 @@ bool isUnderServiceManager();
 
 class Restart {
 public:
-    // Notes which program this is, before it is replaced on disk: the new one is executed then.
+    // Notes the program's path at the start, before the file can be replaced: the new file is executed then.
     Restart();
 
-    // Comes back only when the program cannot be executed; what is handed over is closed then.
+    // Returns only when the program cannot be executed. The descriptors are closed then.
     void execute(char** arguments, PassedSocket socket, Descriptor homeLock) const;
 
 private:

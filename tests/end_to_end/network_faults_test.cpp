@@ -120,7 +120,7 @@ private:
         host::Host host({.home = place / "home", .profile = place / "device.toml"}, platform::Level::Error,
                         {.http = {.longestTimeout = timeLimit}, .credentialHelper = timeLimit});
         EXPECT_FALSE(host.open(host::HomeUse::Agent));
-        host::BundleLookup bundles([&] { return host.profile().facts(); });
+        host::BundleLookup bundles([&] { return host.profile().content(); });
         host::ServiceListenerFactory factory(host.mainLoop().event(), bundles, host.lifecycle());
         EXPECT_FALSE(factory.open(place / "socket"));
         host.setBundleLookup(&bundles);

@@ -8,7 +8,7 @@
 
 #include "host/support.h"
 #include "vrx/host/account/credential_helper.h"
-#include "vrx/host/home/host_facts.h"
+#include "vrx/host/home/stored_facts.h"
 
 namespace vrx::host {
 namespace {
@@ -87,7 +87,7 @@ TEST(Host, FiresActivitiesThatItsToolsAskFor) {
                 fired += answer == FiringAnswer::Fired;
                 EXPECT_TRUE(answer == FiringAnswer::Fired || answer == FiringAnswer::AlreadyRunning);
             }
-            EXPECT_EQ(hostFact(database, facts::profile), locations.profile);
+            EXPECT_EQ(storedFact(database, stored_facts::profile), locations.profile);
         });
     std::jthread last([&] {
         for (auto& tool : tools) tool.join();

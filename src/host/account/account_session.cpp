@@ -10,18 +10,18 @@ using platform::HttpRequest;
 
 // PRODUCT-TYPE (VERSION) AGENT
 void AccountSession::addClientInformationHeader(HttpRequest& request) const {
-    const std::shared_ptr<const ProfileFacts> facts = profile_.facts();
-    if (!facts->account) return;
-    request.headers["X-Orvane-Client-Info"] = facts->account->clientInformation.value_or(
+    const std::shared_ptr<const ProfileContent> content = profile_.content();
+    if (!content->account) return;
+    request.headers["X-Orvane-Client-Info"] = content->account->clientInformation.value_or(
         profile_.string("ProductType").value_or("") + " (" + profile_.string("ProductVersion").value_or("") + ") " +
         platform::vendorIdentifier(platform::serviceNameRemainder));
 }
 
-// One that tells the device apart from others, but not its serial number.
+// Identifies the device without revealing its serial number.
 void AccountSession::addDeviceIdentifierHeader(HttpRequest& request) const {
-    const std::shared_ptr<const ProfileFacts> facts = profile_.facts();
-    if (!facts->account) return;
-    std::optional<std::string> identifier = facts->account->deviceIdentifier;
+    const std::shared_ptr<const ProfileContent> content = profile_.content();
+    if (!content->account) return;
+    std::optional<std::string> identifier = content->account->deviceIdentifier;
     if (!identifier)
         if (const std::optional<std::string> serialNumber = profile_.string("SerialNumber"))
             identifier = platform::sha256Hash("device identifier of " + *serialNumber);
@@ -29,9 +29,9 @@ void AccountSession::addDeviceIdentifierHeader(HttpRequest& request) const {
 }
 
 HttpHeaders AccountSession::accountHeaders(const HttpRequest&) const {
-    const std::shared_ptr<const ProfileFacts> facts = profile_.facts();
-    if (!facts->account) return {};
-    return facts->account->headers.value_or(HttpHeaders{{"X-Orvane-Account-Id", facts->account->identifier}});
+    const std::shared_ptr<const ProfileContent> content = profile_.content();
+    if (!content->account) return {};
+    return content->account->headers.value_or(HttpHeaders{{"X-Orvane-Account-Id", content->account->identifier}});
 }
 
 }  // namespace vrx::host

@@ -1,5 +1,5 @@
-// The headers that the account's requests carry: what the device profile says, else made of the device's facts. Without
-// an account there are none. Any thread may ask.
+// The headers of the account's requests: as the device profile says, else made of the device's properties. Without an
+// account there are none. Any thread may ask.
 #pragma once
 
 #include "vrx/host/profile/device_profile.h"

@@ -17,11 +17,11 @@ RenewalResult failed(const Error& error) {
     return {error.code, error};
 }
 
-// What the profile says of the account; null once another one, or nobody, is signed in.
+// The profile's entry of the account. Null when another account, or none, is signed in by now.
 std::shared_ptr<const ProfileAccount> entryOf(const DeviceProfile& profile, const CloudAccount& account) {
-    std::shared_ptr<const ProfileFacts> facts = profile.facts();
-    if (!facts->account || facts->account->identifier != account.identifier) return nullptr;
-    return {facts, &*facts->account};
+    std::shared_ptr<const ProfileContent> content = profile.content();
+    if (!content->account || content->account->identifier != account.identifier) return nullptr;
+    return {content, &*content->account};
 }
 
 }  // namespace
@@ -33,9 +33,9 @@ AccountStore::AccountStore(const DeviceProfile& profile, const std::string& home
       renewals_([this](auto& question, int stopFile) { return renew(question, stopFile); }) {}
 
 std::optional<CloudAccount> AccountStore::primaryCloudAccount() const {
-    const std::shared_ptr<const ProfileFacts> facts = profile_.facts();
-    if (!facts->account) return std::nullopt;
-    return CloudAccount{facts->account->identifier, facts->account->altDSID};
+    const std::shared_ptr<const ProfileContent> content = profile_.content();
+    if (!content->account) return std::nullopt;
+    return CloudAccount{content->account->identifier, content->account->altDSID};
 }
 
 std::optional<AuthenticationAccount> AccountStore::authenticationAccount(const CloudAccount& account) const {
@@ -53,18 +53,19 @@ void AccountStore::renewCredentials(const AuthenticationAccount& account, platfo
     renewals_.begin({account, std::move(options)}, std::move(completion));
 }
 
+// Runs the helper once for each service. The first failure ends the renewal; tokens stored before it stay.
 RenewalResult AccountStore::renew(const CredentialRenewals::Question& question, int stopFile) {
-    const std::shared_ptr<const ProfileFacts> facts = profile_.facts();
-    if (!facts->account || facts->account->credentialHelper.empty())
+    const std::shared_ptr<const ProfileContent> content = profile_.content();
+    if (!content->account || content->account->credentialHelper.empty())
         return failed(credentialError(CredentialFailure::NotConfigured, "no credential helper is configured"));
-    if (!facts->isTrusted)
+    if (const auto open = content->findOpenToOthers())
         return failed(credentialError(CredentialFailure::NotTrusted,
-                                      "the credential helper is not run: others can write the device profile"));
+                                      "the credential helper is not run: others can write " + open->path));
     for (const std::string& service : question.options.services) {
         const CredentialQuestion asked{question.account.identifier, question.account.altDSID, service,
                                        question.options.avoidUI};
         const Result<Secret> token =
-            askCredentialHelper(facts->account->credentialHelper, asked, helperLimit_, stopFile);
+            askCredentialHelper(content->account->credentialHelper, asked, helperLimit_, stopFile);
         if (!token) return failed(token.error());
         if (MaybeError error = credentials_.store(asked.account, service, token->text()))
             return failed(credentialError(CredentialFailure::NotStored, error->text));

@@ -1,4 +1,4 @@
-// The user's cloud account, as the device profile names it, its tokens, and their renewal by the profile's credential
+// The user's cloud account as the device profile names it, its tokens, and their renewal by the profile's credential
 // helper. Any thread may ask.
 #pragma once
 
@@ -11,10 +11,10 @@ namespace vrx::host {
 
 class AccountStore final : public platform::AccountStore {
 public:
-    // The profile must outlive the store. A helper that has not answered within the limit is ended.
+    // The profile must outlive the store. A helper that has not answered within the limit is killed.
     AccountStore(const DeviceProfile& profile, const std::string& home,
                  platform::Duration helperLimit = std::chrono::seconds(60));
-    // Ends renewals under way, and those that are asked for from now on: they fail.
+    // Makes renewals fail: those under way, and those begun from now on.
     void stop() { renewals_.stop(); }
 
     std::optional<platform::CloudAccount> primaryCloudAccount() const override;
@@ -33,7 +33,7 @@ private:
     const DeviceProfile& profile_;
     const platform::Duration helperLimit_;
     Credentials credentials_;
-    CredentialRenewals renewals_;  // ends before what it uses
+    CredentialRenewals renewals_;  // last: its threads use the others
 };
 
 }  // namespace vrx::host

@@ -38,8 +38,7 @@ std::string questionText(const CredentialQuestion& question) {
     return text + "service=" + question.service + "\navoid_ui=" + (question.avoidsUI ? "1" : "0") + "\n\n";
 }
 
-// A file in memory, read from its beginning: unlike a pipe it never has to be waited for, however little the helper
-// reads of it.
+// A file in memory. Unlike a pipe, it never blocks the writer, however little the helper reads.
 Descriptor inputFile(const std::string& text) {
     Descriptor file(memfd_create("credential-question", MFD_CLOEXEC));
     if (file && pwrite(file.number(), text.data(), text.size(), 0) != static_cast<ssize_t>(text.size()))
@@ -52,7 +51,7 @@ Error cannotStart(const std::string& program, int number) {
                            "the credential helper " + program + " cannot be run: " + std::strerror(number));
 }
 
-// The helper and its process group, which end with the object.
+// The helper and its process group, which are killed when this object is destroyed.
 class Helper {
 public:
     Helper() = default;
@@ -62,7 +61,7 @@ public:
 
     MaybeError start(const std::vector<std::string>& command, int input, int output);
     int process() const { return process_.number(); }
-    // Kills what is left of the group; the helper's own status as waitpid gives it, -1 when it cannot be known.
+    // Kills what is left of the group. Returns the helper's own status as waitpid gives it, -1 when it is unknown.
     int end();
 
 private:
@@ -70,7 +69,8 @@ private:
     Descriptor process_;
 };
 
-// The agent's threads keep signals blocked, and its descriptors are none of the helper's business.
+// Gives the helper default signal handling, since the agent's threads have signals blocked, and none of the agent's
+// other descriptors.
 MaybeError Helper::start(const std::vector<std::string>& command, int input, int output) {
     posix_spawn_file_actions_t files;
     posix_spawn_file_actions_init(&files);
@@ -114,8 +114,8 @@ MaybeError Helper::start(const std::vector<std::string>& command, int input, int
 
 int Helper::end() {
     if (identifier_ < 0) return -1;
-    // Before the helper is waited for: until then nobody else can get its number. One that runs as another user may not
-    // be killed, and is not waited for.
+    // Kills before waiting: until then no other process can get the helper's number. One that runs as another user
+    // cannot be killed, and is not waited for.
     kill(-identifier_, SIGKILL);
     const int options = kill(identifier_, SIGKILL) == 0 ? 0 : WNOHANG;
     int status = -1;
@@ -126,12 +126,12 @@ int Helper::end() {
     return ended > 0 ? status : -1;
 }
 
-// What the helper prints, as it comes.
+// The helper's output so far.
 class Answer {
 public:
     explicit Answer(int file) : file_(file) { fcntl(file, F_SETFL, O_NONBLOCK); }
 
-    // Takes what is there already; false once nothing more can come.
+    // Reads what is there. Returns false once nothing more can come.
     bool read() {
         while (size_ < bytes_.bytes().size()) {
             const ssize_t count = ::read(file_, bytes_.bytes().data() + size_, bytes_.bytes().size() - size_);
@@ -150,7 +150,7 @@ private:
     std::size_t size_ = 0;
 };
 
-// Reads until the helper has ended. Its children may keep its output open longer than that.
+// Reads until the helper has ended, not until its output is closed, which its children may keep open.
 MaybeError listen(const Helper& helper, int output, Answer& answer, Duration limit, int stopFile) {
     const SteadyClock::time_point deadline = SteadyClock::now() + std::chrono::ceil<SteadyClock::duration>(limit);
     std::array<pollfd, 3> files{{{helper.process(), POLLIN, 0}, {stopFile, POLLIN, 0}, {output, POLLIN, 0}}};
@@ -160,7 +160,7 @@ MaybeError listen(const Helper& helper, int output, Answer& answer, Duration lim
         if (ready < 0) continue;  // EINTR
         if (ready == 0) return credentialError(CredentialFailure::TimedOut, "the credential helper took too long");
         if (files[1].revents) return credentialError(CredentialFailure::Ended, "the agent is ending");
-        // First, what it printed before it ended.
+        // Before its end is noticed, what it printed is read.
         if (!answer.read()) files[2].fd = -1;
         if (answer.isTooLong())
             return credentialError(CredentialFailure::Answer, "the credential helper printed too much");
@@ -185,6 +185,7 @@ Error credentialError(CredentialFailure failure, std::string text) {
     return Error{"credential", static_cast<int>(failure), std::move(text)};
 }
 
+// Closes its own copy of the pipe's writing end, so that the output ends when the helper and its children do.
 Result<Secret> askCredentialHelper(const std::vector<std::string>& command, const CredentialQuestion& question,
                                    Duration limit, int stopFile) {
     const Descriptor input = inputFile(questionText(question));

@@ -6,8 +6,8 @@
 //     service=IDENTIFIER
 //     avoid_ui=1                (0 when it may ask the user)
 //
-// and it prints such lines itself: token=TOKEN, and others, which mean nothing. It must end with status 0. What it says
-// on standard error is dropped: it may hold what no log should.
+// It answers with such lines: token=TOKEN, and others, which are ignored. It must end with status 0. Its standard error
+// is dropped, because it may hold what no log should.
 #pragma once
 
 #include <optional>
@@ -28,17 +28,17 @@ struct CredentialQuestion {
     bool avoidsUI;
 };
 
-// Why a renewal failed: the code of its error, and of its result.
+// Why a renewal failed: the code of its error and of its result.
 enum class CredentialFailure { NotConfigured = 1, NotTrusted, NotStarted, TimedOut, Ended, Status, Answer, NotStored };
 platform::Error credentialError(CredentialFailure failure, std::string text);
 
-// The token. Waits for the helper, which gets a process group of its own; the whole group is killed when the helper has
-// answered, when the time is over, and when the stop file can be read.
+// Returns the token. Waits for the helper, which gets a process group of its own. The whole group is killed when the
+// helper has answered, when the time is over, or when the stop file becomes readable.
 platform::Result<Secret> askCredentialHelper(const std::vector<std::string>& command,
                                              const CredentialQuestion& question, platform::Duration limit,
                                              int stopFile);
 
-// The token in what a helper printed, or what is wrong with that; the text of an error holds none of it.
+// The token in a helper's output, or what is wrong with the output. The text of an error contains none of it.
 platform::Result<std::string_view> tokenIn(std::string_view answer);
 
 }  // namespace vrx::host

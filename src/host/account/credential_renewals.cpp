@@ -1,8 +1,5 @@
 #include "vrx/host/account/credential_renewals.h"
 
-#include <sys/eventfd.h>
-
-#include <cerrno>
 #include <system_error>
 
 #include "vrx/host/account/credential_helper.h"
@@ -10,11 +7,6 @@
 namespace vrx::host {
 
 using platform::RenewalResult;
-
-CredentialRenewals::CredentialRenewals(Renew renew)
-    : renew_(std::move(renew)), stopFile_(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {
-    if (!stopFile_) throw std::system_error(errno, std::generic_category(), "eventfd");
-}
 
 CredentialRenewals::~CredentialRenewals() {
     stop();
@@ -25,7 +17,7 @@ void CredentialRenewals::stop() {
     eventfd_write(stopFile_.number(), 1);
 }
 
-// Under the lock throughout, which a renewal needs before it answers: so it never does before this returns.
+// Holds the lock throughout. A renewal needs it before it answers, so none answers before this returns.
 void CredentialRenewals::begin(Question question, Completion completion) {
     std::unique_lock lock(mutex_);
     removeEnded();
@@ -39,7 +31,7 @@ void CredentialRenewals::begin(Question question, Completion completion) {
     try {
         added.thread = std::thread([this, &added] { run(added); });
     } catch (const std::system_error& error) {
-        // There is no other thread to answer on, and whoever waits must not wait for ever.
+        // There is no thread to answer on, and the caller must not wait for ever.
         completion = std::move(added.waiting.front());
         runs_.pop_back();
         lock.unlock();
@@ -61,7 +53,7 @@ void CredentialRenewals::run(Run& run) {
     run.hasEnded = true;
 }
 
-// Each of them is past its last line.
+// Joins the threads that have nothing left to do.
 void CredentialRenewals::removeEnded() {
     for (auto run = runs_.begin(); run != runs_.end();) {
         if (!run->hasEnded) {

@@ -1,6 +1,6 @@
-// Renewals of credentials under way. Each runs on a thread of its own, on which whoever asked for it is answered. What
-// is asked once more while it runs is the same renewal: its token is newer than the one that was stored when the second
-// was asked for. Any thread may ask.
+// Renewals of credentials under way. Each runs on a thread of its own, which also answers. An equal question that comes
+// while a renewal runs joins it: its token will be newer than the one that was stored at the time of the question. Any
+// thread may ask.
 #pragma once
 
 #include <functional>
@@ -22,22 +22,22 @@ public:
         platform::RenewalOptions options;
         bool operator==(const Question&) const = default;
     };
-    // Does the work, as long as it takes; ends early, with a failure, once the stop file can be read.
+    // Does the work, however long it takes. Returns early, with a failure, once the stop file is readable.
     using Renew = std::function<platform::RenewalResult(const Question& question, int stopFile)>;
 
-    explicit CredentialRenewals(Renew renew);
-    // Stops, and waits until all are answered.
+    explicit CredentialRenewals(Renew renew) : renew_(std::move(renew)) {}
+    // Stops, and waits until everybody is answered.
     ~CredentialRenewals();
 
     void begin(Question question, Completion completion);
-    // Ends what is under way, and soon after it begins what comes later: all of it fails, and is answered.
+    // Makes renewals fail soon, those under way and those begun later. All are answered.
     void stop();
 
 private:
     struct Run {
         const Question question;
         std::vector<Completion> waiting;
-        bool isJoinable = true;  // by others who ask the same
+        bool isJoinable = true;  // by equal questions
         bool hasEnded = false;
         std::thread thread{};
     };
@@ -45,7 +45,7 @@ private:
     void removeEnded();
 
     const Renew renew_;
-    const Descriptor stopFile_;
+    const Descriptor stopFile_ = makeEventFile();
     std::mutex mutex_;
     std::list<Run> runs_;
 };

@@ -40,7 +40,7 @@ std::optional<std::string> Credentials::token(const std::string& account, std::s
         return std::nullopt;
     }
     std::string_view token = content.text();
-    if (token.ends_with('\n')) token.remove_suffix(1);  // of a file that was written by hand
+    if (token.ends_with('\n')) token.remove_suffix(1);  // written by hand
     if (isToken(token)) return std::string(token);
     log(Level::Error, "The credential %@ is not used: it holds no token", path);
     return std::nullopt;

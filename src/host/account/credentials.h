@@ -1,6 +1,7 @@
-// The tokens of the user's accounts: each in a file of its own in the agent's home, credentials/HASH, where HASH is the
-// SHA-256 of the account's identifier, a line end and the service. A file holds the token and nothing else, is read
-// afresh each time, and counts only while it is the agent's alone. Tokens are never logged. Any thread may use it.
+// The tokens of the user's accounts, each in a file of its own in the agent's home, credentials/HASH. HASH is the
+// SHA-256 of the account's identifier, a line end and the service. The file holds nothing but the token. It is read at
+// each call, and ignored unless it belongs to the agent's user and only that user can read it. Tokens are never logged.
+// Any thread may use it.
 #pragma once
 
 #include <optional>
@@ -16,7 +17,7 @@ public:
     explicit Credentials(const std::string& home) : folder_(home + "/credentials") {}
 
     std::optional<std::string> token(const std::string& account, std::string_view service) const;
-    // Replaces the token as a whole, or leaves the one before.
+    // Replaces the token as a whole, or keeps the old one.
     platform::MaybeError store(const std::string& account, std::string_view service, std::string_view token);
 
 private:
@@ -25,7 +26,7 @@ private:
     const std::string folder_;
 };
 
-// Whether the text can be a token: it becomes the value of a header.
+// Whether the text can be a token, which becomes the value of a header.
 bool isToken(std::string_view text);
 
 }  // namespace vrx::host

@@ -1,5 +1,4 @@
-// What background activities depend on of the machine. The agent's is the machine itself; a test moves the clocks by
-// hand.
+// What background activities depend on in the machine. Tests replace it to move the clocks by hand.
 #pragma once
 
 #include <functional>
@@ -18,15 +17,15 @@ public:
     virtual bool shouldDefer() const = 0;
     virtual platform::Duration minimumInterval() const = 0;
 
-    // Main thread. What is called, there too: at the time that was asked for, also when the network has changed; and
-    // when the wall clock was set.
+    // Main thread, for the calls as well: wake at the requested time or when the network has changed, wallClockSet when
+    // somebody set the wall clock.
     struct Calls {
         std::function<void()> wake;
         std::function<void()> wallClockSet;
     };
     virtual void start(Calls calls) = 0;
     virtual bool isNetworkAvailable() = 0;
-    // Replaces what was asked before. The time is on the boot clock; a wake-up is never early.
+    // Replaces the earlier request. The time is on the boot clock; a wake-up is never early.
     virtual void wakeAt(std::optional<platform::Duration> sinceBoot, bool whenNetworkChanges) = 0;
 };
 

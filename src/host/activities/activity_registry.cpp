@@ -26,7 +26,7 @@ ScheduledActivity scheduledIn(const Statement& row) {
             .deferrals = static_cast<int>(row.integer(10))};
 }
 
-// Its five columns, from a parameter on.
+// Binds its five columns, from a parameter on.
 Statement& bindDue(Statement& statement, int parameter, const DueTime& due) {
     return statement.bind(parameter, due.boot)
         .bind(parameter + 1, due.sinceBoot.count())

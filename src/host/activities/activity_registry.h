@@ -1,5 +1,5 @@
-// The background activities in host.db: what is scheduled, and how the last run of each went. Each operation is part of
-// the caller's transaction.
+// The background activities in host.db: what is scheduled, and how the last run of each ended. Each operation is part
+// of the caller's transaction.
 #pragma once
 
 #include <cstdint>
@@ -14,11 +14,11 @@
 namespace vrx::host {
 
 struct ScheduledActivity {
-    std::int64_t generation = 0;  // of this registration: random, so that no other has it, in no other file either
+    std::int64_t generation = 0;  // identifies this registration: random, so unique over all files
     std::string identifier;
     platform::ActivityCriteria criteria;
     platform::DueTime due;
-    int deferrals = 0;  // results in a row that were no end
+    int deferrals = 0;  // deferred or interrupted runs in a row
 };
 
 enum class RunOutcome {
@@ -31,7 +31,7 @@ struct ActivityRun {
     std::string identifier;
     std::int64_t generation = 0;
     platform::Date began;
-    std::optional<platform::Date> ended{};  // none: under way, or interrupted and not noticed yet
+    std::optional<platform::Date> ended{};  // absent while it runs, and when it was interrupted unnoticed
     std::optional<RunOutcome> outcome{};
 };
 
@@ -42,13 +42,13 @@ public:
     // In the order of their due times.
     std::vector<ScheduledActivity> scheduled();
     std::optional<ScheduledActivity> scheduled(std::string_view identifier);
-    // In place of an earlier one of that identifier, with a generation of its own.
+    // Replaces an earlier one of that identifier. Gets a generation of its own.
     void schedule(std::string_view identifier, const platform::ActivityCriteria& criteria,
                   const platform::DueTime& due);
     void postpone(std::int64_t generation, const platform::DueTime& due, int deferrals);
     void remove(std::int64_t generation);
 
-    // The last one of each identifier.
+    // The last run of each identifier.
     std::vector<ActivityRun> runs();
     void beginRun(std::string_view identifier, std::int64_t generation, platform::Date now);
     void endRun(std::string_view identifier, RunOutcome outcome, platform::Date now);

@@ -1,11 +1,11 @@
 #include "vrx/host/activities/activity_requests.h"
 
 #include <fcntl.h>
-#include <unistd.h>
 
 #include <chrono>
 #include <thread>
 
+#include "vrx/host/base/descriptor.h"
 #include "vrx/host/home/home_lock.h"
 
 namespace vrx::host {
@@ -14,10 +14,9 @@ using platform::MaybeError;
 
 namespace {
 
-// Its being closed after writing is what the agent sees.
+// The agent sees that the file is closed after writing.
 void touch(const std::string& path) {
-    const int file = ::open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600);
-    if (file >= 0) ::close(file);
+    const Descriptor file(::open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600));
 }
 
 void removeRequest(Database& database, std::int64_t number) {
@@ -53,11 +52,12 @@ void answerRequest(Connection& connection, std::int64_t number, FiringAnswer ans
         .step();
 }
 
-// Without a condition SQLite would write the table's page anew, though there is nothing in it as a rule.
+// Without a condition SQLite would rewrite the table's page even when the table is empty, as it usually is.
 void dropRequests(Connection& connection) {
     connection.execute("DELETE FROM activity_requests WHERE true");
 }
 
+// Stores the request before it touches the file that makes the agent look for it.
 platform::Result<std::optional<FiringAnswer>> requestFiring(const std::string& home, Database& database,
                                                             std::string_view identifier, platform::Duration limit) {
     if (!HomeLock::isInUse(home)) return std::optional<FiringAnswer>();

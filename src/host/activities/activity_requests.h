@@ -1,5 +1,5 @@
-// What testers ask of a running agent: to fire an activity now. A request is a row in host.db and a touch of a file in
-// the home, which the agent watches; the answer comes in the row.
+// Testers' requests to a running agent to fire an activity now. A request is a row in host.db and a touched file in the
+// home, which the agent watches. The answer comes in the row.
 #pragma once
 
 #include <optional>
@@ -30,11 +30,11 @@ struct FiringRequest {
 // The agent's side, within a transaction: the requests without an answer, and the answer to one.
 std::vector<FiringRequest> openRequests(Connection& connection);
 void answerRequest(Connection& connection, std::int64_t number, FiringAnswer answer);
-// Drops those of an earlier process: who asked has been told by now that nobody answers.
+// Drops requests to an earlier process. Whoever made them has timed out by now.
 void dropRequests(Connection& connection);
 
-// The tool's side. Waits for the answer; nothing when no agent has the home, or when none has answered in time, and
-// then the request is taken back. An error when the database cannot be written.
+// The tool's side. Waits for the answer. Nothing when no agent has the home, or when it does not answer in time; the
+// request is withdrawn then. An error when the database cannot be written.
 platform::Result<std::optional<FiringAnswer>> requestFiring(const std::string& home, Database& database,
                                                             std::string_view identifier, platform::Duration limit);
 

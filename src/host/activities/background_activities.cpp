@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <utility>
 
-#include "vrx/host/home/host_facts.h"
+#include "vrx/host/home/stored_facts.h"
 #include "vrx/platform/log.h"
 #include "vrx/platform/vendor.h"
 
@@ -30,8 +30,8 @@ void carryOverAll(ActivityRegistry& registry, const Moment& now) {
     }
 }
 
-// What such a run registered itself in its place comes at its own time. Runs that are interrupted over and over, maybe
-// because they are what ends the process, come less and less often.
+// Schedules interrupted runs again. One that has registered a successor is left to it. The delay grows with each
+// interruption, in case the run itself is what ends the process.
 void resumeInterrupted(ActivityRegistry& registry, const std::set<std::string, std::less<>>& running,
                        const Moment& now) {
     for (const ActivityRun& run : registry.runs()) {
@@ -45,18 +45,18 @@ void resumeInterrupted(ActivityRegistry& registry, const std::set<std::string, s
     }
 }
 
-// What the system fires on its own. Being scheduled in the same transaction as the fact that it was, it is lost to no
-// crash.
+// Schedules what the system fires on its own, in the same transaction as the fact that it did, so that a crash loses
+// neither.
 void scheduleOwn(Connection& connection, const std::string& agentVersion, const Moment& now) {
     const struct {
         std::string_view fact;
         const std::string& value;
         std::string_view activity;
-    } occasions[] = {{facts::agentVersion, agentVersion, platform::upgradeActivityRemainder},
-                     {facts::boot, now.boot, platform::bootActivityRemainder}};
+    } occasions[] = {{stored_facts::agentVersion, agentVersion, platform::upgradeActivityRemainder},
+                     {stored_facts::boot, now.boot, platform::bootActivityRemainder}};
     for (const auto& [fact, value, activity] : occasions) {
-        if (hostFact(connection, fact) == value) continue;
-        setHostFact(connection, fact, value);
+        if (storedFact(connection, fact) == value) continue;
+        setStoredFact(connection, fact, value);
         ActivityRegistry(connection).schedule(platform::vendorIdentifier(activity), {}, dueAfter(Duration(0), now));
     }
 }
@@ -70,11 +70,12 @@ void BackgroundActivities::start(std::string agentVersion) {
     reconsider();
 }
 
+// The handler is in place before the row, so that a row that is due finds it.
 void BackgroundActivities::schedule(const platform::ActivityRegistration& registration, ActivityHandler handler) {
     const std::string& identifier = registration.identifier;
     {
         std::lock_guard lock(mutex_);
-        handlers_[identifier].swap(handler);  // the earlier one goes outside the lock: it may hold what comes here
+        handlers_[identifier].swap(handler);  // the old one is destroyed outside the lock: it may own what calls here
         if (!registration.isPreregistered) {
             registeredByOwnRun_.erase(identifier);
             if (registration.isByOwnRun && running_.contains(identifier)) registeredByOwnRun_.insert(identifier);
@@ -117,7 +118,7 @@ void BackgroundActivities::carryOver() {
     reconsider();
 }
 
-// Gives false, and logs the first of several failures.
+// Logs the first of several failures. Returns false.
 bool BackgroundActivities::failed(const Error& error) {
     if (!isFailing_.exchange(true))
         log(Level::Error, "No background activity is fired until this works: %@", error.text);
@@ -130,7 +131,7 @@ bool BackgroundActivities::write(const Change& change) {
     return true;
 }
 
-// Stores the change after the earlier ones. False when it is kept for later.
+// Stores the change after the earlier ones. Returns false when it is kept for later.
 bool BackgroundActivities::store(Change change) {
     std::lock_guard lock(storing_);
     unsaved_.push_back(std::move(change));
@@ -150,7 +151,8 @@ bool BackgroundActivities::storeUnsaved() {
     return isStored;
 }
 
-// The registry is taken up at the start, and again when it is another file's.
+// Takes the registry up at the start, and again when the file was replaced: carries due times over to this boot, and
+// schedules interrupted and own activities.
 bool BackgroundActivities::takeUpIfReplaced() {
     {
         std::lock_guard lock(storing_);
@@ -175,6 +177,7 @@ bool BackgroundActivities::takeUpIfReplaced() {
     });
 }
 
+// Fires what is due, and has itself woken for the next one. Returns false when the database cannot be used.
 bool BackgroundActivities::fireDue() {
     ActivityConditions& conditions = around_.conditions;
     std::vector<ScheduledActivity> activities;
@@ -182,7 +185,7 @@ bool BackgroundActivities::fireDue() {
         around_.database.read([&](Connection& connection) { activities = ActivityRegistry(connection).scheduled(); });
     if (error) return failed(*error);
 
-    // So that the boot activity runs by the time that those are looked at which it holds.
+    // The boot activity comes first, so that it is running when those that wait for it are considered.
     std::stable_partition(activities.begin(), activities.end(), [](const ScheduledActivity& activity) {
         return !platform::waitsForBootActivity(activity.identifier);
     });
@@ -193,7 +196,7 @@ bool BackgroundActivities::fireDue() {
     bool isWaitingForNetwork = false;
     for (const ScheduledActivity& activity : activities) {
         const bool isHeld = isRunning(boot) && platform::waitsForBootActivity(activity.identifier);
-        if (isHeld || isRunning(activity.identifier)) continue;  // the end of that run comes here again
+        if (isHeld || isRunning(activity.identifier)) continue;  // reconsidered at the end of that run
         const bool isDue = timeLeft(activity.due, now) == Duration(0);
         const FiringDecision decision =
             decideFiring(activity.due, activity.criteria, now,
@@ -224,7 +227,7 @@ bool BackgroundActivities::answerRequests() {
     return true;
 }
 
-// As if it had fallen due and its conditions held. It keeps its due time, in case that its result is deferred.
+// Fires as if it were due and its conditions held. It keeps its due time, in case the result is "deferred".
 FiringAnswer BackgroundActivities::fireRequested(const std::string& identifier) {
     if (isRunning(identifier)) return FiringAnswer::AlreadyRunning;
     const ActivityHandler handler = handlerFor(identifier);
@@ -239,7 +242,7 @@ FiringAnswer BackgroundActivities::fireRequested(const std::string& identifier) 
     return isFound && fire(*activity, handler) ? FiringAnswer::Fired : FiringAnswer::NotStored;
 }
 
-// False when it could not be stored that the run begins.
+// Stores the beginning of the run, then runs the handler. Returns false when the beginning could not be stored.
 bool BackgroundActivities::fire(const ScheduledActivity& activity, const ActivityHandler& handler) {
     const Run run{activity.identifier, activity.generation};
     bool isPresent = false;
@@ -250,7 +253,7 @@ bool BackgroundActivities::fire(const ScheduledActivity& activity, const Activit
         if (isPresent) registry.beginRun(run.identifier, run.generation, around_.conditions.now().wall);
     });
     if (!isStored) return false;
-    if (!isPresent) return true;  // it has just been registered anew, and will be looked at
+    if (!isPresent) return true;  // registered anew meanwhile: reconsidered by itself
     {
         std::lock_guard lock(mutex_);
         running_.insert(run.identifier);
@@ -261,6 +264,7 @@ bool BackgroundActivities::fire(const ScheduledActivity& activity, const Activit
     return true;
 }
 
+// Stores the end of the run before it counts as ended, so that it cannot fire again in between.
 void BackgroundActivities::end(const Run& run, BackgroundActivityResult result) {
     const bool isFinished = result == BackgroundActivityResult::Finished;
     Duration interval{0};
@@ -286,7 +290,7 @@ void BackgroundActivities::end(const Run& run, BackgroundActivityResult result) 
     around_.mainQueue.post([this] { reconsider(); });
 }
 
-// What an earlier process scheduled and this one has not checked in for gets one of the factory's.
+// An activity of an earlier process for which this one has no handler gets one from the factory.
 ActivityHandler BackgroundActivities::handlerFor(const std::string& identifier) {
     std::function<ActivityHandler(const std::string&)> factory;
     {

@@ -1,10 +1,10 @@
-// The system's registry of background activities, in host.db: fires each on a worker when it is due, and takes up at
-// the start what earlier processes scheduled. It sleeps until the nearest one is due.
+// The system's registry of background activities, in host.db. Fires each on a worker when it is due, and resumes at the
+// start what earlier processes scheduled. Sleeps until the next one is due.
 //
-// host.db decides what fires; in memory there is only what a process has of its own, handlers and runs. So the registry
-// follows the file when it is replaced, and a run that the end of the process interrupted shows at the next start as
-// one without an end: no other agent has the home meanwhile. While the file cannot be written nothing fires, because
-// its end could not be kept either; what was to be stored is stored later, in order.
+// host.db decides what fires; memory holds only what belongs to the process, handlers and runs. So the registry follows
+// the file when it is replaced, and a run that the end of a process interrupted is found at the next start as one
+// without an end. While the file cannot be written nothing fires, because the end of the run could not be stored
+// either; changes are kept and stored later, in order.
 #pragma once
 
 #include <atomic>
@@ -26,7 +26,7 @@ namespace vrx::host {
 
 class BackgroundActivities final : public platform::BackgroundActivities {
 public:
-    // None is owned. Handlers run on the workers.
+    // All must outlive this object. Handlers run on the workers.
     struct Surroundings {
         Database& database;
         platform::Queue& mainQueue;
@@ -36,14 +36,14 @@ public:
     };
     explicit BackgroundActivities(const Surroundings& surroundings) : around_(surroundings) {}
 
-    // Takes the registry up, for an agent of that version; activities fire from now on. Main thread, once, when those
-    // that start-up monitors have their handlers.
+    // Begins to fire activities, for an agent of that version. Main thread, once, when start-up has registered its
+    // handlers.
     void start(std::string agentVersion);
-    // Looks for what fires now, and for what testers have asked: when something has changed that is not told by itself.
-    // Main thread.
+    // Fires what is due and what testers have requested. To be called after a change that is not noticed here. Main
+    // thread.
     void reconsider();
 
-    // An activity that is scheduled fires once: none repeats, and all are of background quality.
+    // A scheduled activity fires once: none repeats, and all are of background quality.
     void schedule(const platform::ActivityRegistration& registration, platform::ActivityHandler handler) override;
     bool shouldDefer(std::string_view identifier) const override;
     void setHandlerFactory(std::function<platform::ActivityHandler(const std::string&)> factory) override;
@@ -76,18 +76,18 @@ private:
     // Main thread.
     bool isStarted_ = false;
     std::string agentVersion_;
-    std::uint64_t takenUp_ = 0;  // the opening of the database whose registry this is
+    std::uint64_t takenUp_ = 0;  // the opening of the database that was last taken up
 
     mutable std::mutex mutex_;
     std::map<std::string, platform::ActivityHandler, std::less<>> handlers_;
     std::function<platform::ActivityHandler(const std::string&)> factory_;
     std::set<std::string, std::less<>> running_;
-    std::set<std::string, std::less<>> registeredByOwnRun_;  // of those running
+    std::set<std::string, std::less<>> registeredByOwnRun_;  // identifiers that are running
 
-    std::atomic<bool> isFailing_ = false;  // the database, since it was last logged
+    std::atomic<bool> isFailing_ = false;  // whether the database fails, which is logged once
     std::mutex storing_;                   // taken before the database
     std::vector<Change> unsaved_;
-    platform::WorkInFlight unsavedWork_;  // while there are any
+    platform::WorkInFlight unsavedWork_;  // while there are unsaved changes
 };
 
 }  // namespace vrx::host

@@ -17,8 +17,8 @@ using platform::Moment;
 
 namespace {
 
-// Where the kernel doesn't tell which boot this is, each process takes itself for one: what is left of a delay is then
-// told by the wall clock.
+// Where the kernel does not tell the boot, each process counts as one boot: the rest of a delay then follows the wall
+// clock.
 std::string bootIdentifier() {
     sd_id128_t identifier;
     if (sd_id128_get_boot(&identifier) < 0) sd_id128_randomize(&identifier);
@@ -34,11 +34,11 @@ Moment presentMoment() {
 }
 
 Duration minimumInterval(const DeviceProfile& profile) {
-    return std::min(profile.facts()->minimumInterval.value_or(platform::minimumInterval), platform::minimumInterval);
+    return std::min(profile.content()->minimumInterval.value_or(platform::minimumInterval), platform::minimumInterval);
 }
 
 bool MachineConditions::shouldDefer() const {
-    const std::optional<bool> override = profile_.facts()->shouldDefer;
+    const std::optional<bool> override = profile_.content()->shouldDefer;
     return override ? *override : isOnLowBattery();
 }
 
@@ -56,7 +56,7 @@ void MachineConditions::start(Calls calls) {
 }
 
 bool MachineConditions::isNetworkAvailable() {
-    const std::optional<bool> override = profile_.facts()->networkAvailable;
+    const std::optional<bool> override = profile_.content()->networkAvailable;
     return override ? *override : routes_.hasDefaultRoute();
 }
 
@@ -64,12 +64,12 @@ void MachineConditions::wakeAt(std::optional<Duration> sinceBoot, bool whenNetwo
     const bool isNewlyReported = whenNetworkChanges && !isNetworkReported_;
     isNetworkReported_ = whenNetworkChanges;
     routes_.setReporting(whenNetworkChanges);
-    // It may have come between the question and the reports.
+    // The network may have appeared before reports began.
     if (isNewlyReported && isNetworkAvailable()) sinceBoot = Duration(0);
     sinceBoot ? armTimer(timer_, *sinceBoot) : disarmTimer(timer_);
 }
 
-// A timer that never ends, but tells when the clock that it runs on is set.
+// Arms a timer that never fires, but is cancelled, and so readable, when the wall clock is set.
 void MachineConditions::watchWallClock() const {
     constexpr std::time_t farAhead = std::numeric_limits<std::int32_t>::max();
     itimerspec end{};

@@ -1,5 +1,5 @@
-// What background activities depend on, as the machine has it: its clocks, routes and power supply, with what the
-// device profile says instead.
+// What background activities depend on, as the machine has it: its clocks, routes and power supply. The device profile
+// can override them.
 #pragma once
 
 #include "vrx/host/activities/activity_conditions.h"
@@ -9,9 +9,9 @@
 
 namespace vrx::host {
 
-// The present moment; for tools beside the agent, too. Any thread.
+// The present moment. Also for tools beside the agent. Any thread.
 platform::Moment presentMoment();
-// From an activity's run to the one that it schedules itself: the profile can only make it shorter.
+// The least time between an activity's run and the one that it schedules itself. The profile can only shorten it.
 platform::Duration minimumInterval(const DeviceProfile& profile);
 
 class MachineConditions final : public ActivityConditions {

@@ -31,7 +31,7 @@ bool requestRoutes(int file) {
     return send(file, &request, sizeof request, 0) == static_cast<ssize_t>(sizeof request);
 }
 
-// A machine without a network may have routes that lead nowhere, and some whose link is down.
+// Ignores routes that lead nowhere and those whose link is down, which a machine without a network may have.
 bool leadsEverywhere(const rtmsg& route) {
     return route.rtm_dst_len == 0 && route.rtm_src_len == 0 && route.rtm_type == RTN_UNICAST &&
            route.rtm_table != RT_TABLE_LOCAL && (route.rtm_flags & (RTNH_F_DEAD | RTNH_F_LINKDOWN)) == 0;
@@ -39,7 +39,7 @@ bool leadsEverywhere(const rtmsg& route) {
 
 enum class Part { Nothing, DefaultRoute, End, Failure };
 
-// One datagram of the answer.
+// Reads one datagram of the answer.
 Part readPart(const void* bytes, std::size_t size) {
     const auto* message = static_cast<const nlmsghdr*>(bytes);
     for (; NLMSG_OK(message, size); message = NLMSG_NEXT(message, size)) {
@@ -65,7 +65,7 @@ bool NetworkRoutes::hasDefaultRoute() const {
     }
 }
 
-// A link that goes down takes routes with it that the kernel doesn't name one by one, hence the links.
+// Listens for links, too: when a link goes down, the kernel does not report each route that goes with it.
 void NetworkRoutes::setReporting(bool isReporting) {
     if (isReporting == static_cast<bool>(events_)) return;
     source_.reset();
@@ -75,7 +75,7 @@ void NetworkRoutes::setReporting(bool isReporting) {
     if (events_) source_ = addReadSource(loop_, events_.number(), onEvents, this);
 }
 
-// Which change it was is asked afresh. More of them than fit, which shows as an error, are one as well.
+// Drains the socket, also when it has overflowed (ENOBUFS). What changed is asked afresh.
 int NetworkRoutes::onEvents(sd_event_source*, int file, std::uint32_t, void* self) {
     std::array<char, 8192> events;
     while (recv(file, events.data(), events.size(), MSG_TRUNC) > 0 || errno == ENOBUFS) {

@@ -1,4 +1,4 @@
-// Whether the machine has a network: a route to everywhere. Main thread.
+// Whether the machine has a network: a default route. Main thread.
 #pragma once
 
 #include <functional>
@@ -10,10 +10,10 @@ namespace vrx::host {
 
 class NetworkRoutes {
 public:
-    // The event loop must outlive the object. A change is reported while it is asked for, on the loop.
+    // The event loop must outlive the object. Changes are reported on the loop while setReporting(true) holds.
     NetworkRoutes(sd_event* loop, std::function<void()> onChange) : loop_(loop), onChange_(std::move(onChange)) {}
 
-    // What the kernel says now; where it can't be asked, there is one.
+    // The kernel's present answer. True when it cannot be asked.
     bool hasDefaultRoute() const;
     void setReporting(bool isReporting);
 

@@ -27,7 +27,7 @@ bool isLow(const std::filesystem::path& battery) {
 
 }  // namespace
 
-// Batteries of mice and the like are of the scope "Device".
+// Skips batteries of mice and the like, whose scope is "Device".
 bool isOnLowBattery(const std::string& root) {
     bool hasBattery = false;
     std::error_code none;

@@ -1,12 +1,12 @@
-// What the machine runs on. Each call reads it afresh; any thread may ask.
+// The machine's power supply. Each call reads it afresh; any thread may ask.
 #pragma once
 
 #include <string>
 
 namespace vrx::host {
 
-// Whether it runs on a battery that is low. A machine that says nothing of batteries does not. The root is another than
-// "/" in tests.
+// Whether the machine runs on a battery that is low. False when it reports no battery. Tests pass another root than
+// "/".
 bool isOnLowBattery(const std::string& root = "");
 
 }  // namespace vrx::host

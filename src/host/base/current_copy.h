@@ -1,7 +1,6 @@
-// A parsed copy of a file that proves itself current whenever it is asked for: by the file's identity, size and times,
-// which cost half a microsecond. A file that was changed just before it was read is read again each time until its
-// time stamp has aged, because a second change within the same tick of the clock would leave no trace. Any thread may
-// ask.
+// A parsed copy of a file. Each read compares the file's identity, size and times with those of the copy, which takes
+// half a microsecond, and parses the file again when they differ. A file that changed within the last tick of the clock
+// is read again at each call: a second change in the same tick would not show. Any thread may ask.
 #pragma once
 
 #include <sys/stat.h>
@@ -19,7 +18,7 @@ namespace vrx::host {
 template <class T>
 class CurrentCopy {
 public:
-    // Given the file as it was read, or why it could not be, and the copy so far (none at first); never gives null.
+    // Takes the file as it was read, or the error, and the copy so far, null at first. Never returns null.
     using Parse = std::function<std::shared_ptr<const T>(const platform::Result<FileContent>& file,
                                                          std::shared_ptr<const T> last)>;
 
@@ -44,7 +43,7 @@ private:
         ino_t inode = 0;
         off_t size = 0;
         std::int64_t modified = 0;
-        std::int64_t changed = 0;  // ownership and mode, too
+        std::int64_t changed = 0;  // also when owner or mode change
         bool operator==(const Stamp&) const = default;
 
         static std::int64_t nanoseconds(const timespec& time) {
@@ -56,7 +55,7 @@ private:
             return {status.st_dev, status.st_ino, status.st_size, nanoseconds(status.st_mtim),
                     nanoseconds(status.st_ctim)};
         }
-        // Whether a later change is bound to show. An absent file's is.
+        // Whether a later change must show in the stamp. True for a missing file.
         bool isSettled() const {
             constexpr std::int64_t tick = 20'000'000;
             timespec now{};

@@ -1,9 +1,12 @@
 // A file descriptor that is closed with its owner.
 #pragma once
 
+#include <sys/eventfd.h>
 #include <sys/syscall.h>
 #include <unistd.h>
 
+#include <cerrno>
+#include <system_error>
 #include <utility>
 
 namespace vrx::host {
@@ -22,12 +25,19 @@ public:
 
     explicit operator bool() const { return number_ >= 0; }
     int number() const { return number_; }
-    // Leaves the descriptor open, to whoever takes it.
+    // Gives the descriptor up without closing it.
     int release() { return std::exchange(number_, -1); }
 
 private:
     int number_;
 };
+
+// An event counter, by which one thread wakes another that polls it. Throws when there are no descriptors left.
+inline Descriptor makeEventFile() {
+    Descriptor file(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK));
+    if (!file) throw std::system_error(errno, std::generic_category(), "eventfd");
+    return file;
+}
 
 // A descriptor of a process, readable once it has ended. The library's own function cannot be called from C++ before
 // glibc 2.37.

@@ -142,8 +142,8 @@ Result<FileContent> readFile(const std::string& path, FileCalls& calls) {
     return content;
 }
 
-// The temporary file has one name for each target. Writers of the same target take turns by a lock on it, and one left
-// behind by a process that was killed is taken over by the next writer, so none ever pile up.
+// The temporary file has one name for each target. Writers of the same target take turns by a lock on it. One that a
+// killed process left behind is used by the next writer, so that none pile up.
 MaybeError replaceFile(const std::string& path, std::span<const std::uint8_t> content, FileCalls& calls) {
     const std::string temporary = path + ".tmp";
     while (true) {

@@ -1,5 +1,5 @@
-// Whole-file operations, and the one door through which the host replaces a file. Any thread, and any process that goes
-// through the same door, may use them at once.
+// Whole-file operations. A file of the home is replaced by replaceFile() alone. Any number of threads and processes may
+// use them at once.
 #pragma once
 
 #include <sys/stat.h>
@@ -13,7 +13,7 @@
 
 namespace vrx::host {
 
-// The system calls beneath, each as the manual describes it; a test stands in for them to make one fail.
+// The system calls used here, as their manual pages describe them. A test overrides one to make it fail.
 class FileCalls {
 public:
     virtual ~FileCalls() = default;
@@ -33,23 +33,23 @@ public:
     static FileCalls& system();
 };
 
-// A file as it was read, and what it was at that moment.
+// A file's content, and its status at the time of reading.
 struct FileContent {
     platform::Data bytes;
     struct stat status;
     std::string_view text() const { return {reinterpret_cast<const char*>(bytes.data()), bytes.size()}; }
 };
 
-// The whole of a regular file of at most limits::fileBytes; anything else, a FIFO too, is an error and never waits.
+// Reads a regular file of at most limits::fileBytes. Anything else is an error. Never blocks, not even on a FIFO.
 platform::Result<FileContent> readFile(const std::string& path, FileCalls& calls = FileCalls::system());
 
-// Replaces or creates the file, mode 0600: afterwards, and after a power cut, it holds the whole new content; after a
-// failure it holds what it held before. Only when the last step fails, making the new name last, may the new content
+// Replaces or creates the file, with mode 0600. After success it holds the whole new content, also after a power cut;
+// after an error it holds the old one. Only when the last step fails, making the new name durable, may the new content
 // be there although an error is returned.
 platform::MaybeError replaceFile(const std::string& path, std::span<const std::uint8_t> content,
                                  FileCalls& calls = FileCalls::system());
 
-// The directory and the missing ones above it, mode 0700.
+// Creates the directory and the missing ones above it, with mode 0700.
 platform::MaybeError createDirectories(const std::string& path, FileCalls& calls = FileCalls::system());
 
 // The error of a failed system call: "cannot WHAT PATH: REASON", with errno as its code.

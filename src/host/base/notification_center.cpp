@@ -13,13 +13,13 @@ std::int32_t NotificationCenter::registerForNotification(std::string name, platf
 }
 
 void NotificationCenter::cancel(std::int32_t token) {
-    std::shared_ptr<const Registration> cancelled;  // goes outside the lock, as its handler may do anything then
+    std::shared_ptr<const Registration> cancelled;  // destroyed outside the lock: its handler may own what calls here
     std::lock_guard lock(mutex_);
     auto registration = registrations_.extract(token);
     if (!registration.empty()) cancelled.swap(registration.mapped());
 }
 
-// The posts hold what is registered weakly: what is cancelled before its turn is not run.
+// Posts hold registrations weakly: one that is cancelled before its turn is not run.
 void NotificationCenter::raise(std::string_view name) {
     std::lock_guard lock(mutex_);
     for (const auto& [token, registration] : registrations_) {

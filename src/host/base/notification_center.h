@@ -1,5 +1,4 @@
-// Named notifications within this process: whoever learns of an event raises its notification here. Any thread may use
-// it.
+// Named notifications within this process. Any thread may use it.
 #pragma once
 
 #include <map>

@@ -1,5 +1,5 @@
-// Keeping what is confidential from lying about in memory that has been given back. It reaches as far as the host's own
-// copies do: what a library or the agent copies from them is theirs.
+// Wipes confidential text before its memory is freed. Covers the host's own copies only, not those that a library or
+// the agent makes.
 #pragma once
 
 #include <string.h>
@@ -16,7 +16,8 @@ inline void wipe(std::string& text) {
     text.clear();
 }
 
-// Bytes that are wiped when they go. Whoever fills them reserves what they need first: growing leaves a copy behind.
+// Bytes that are wiped when they are destroyed. Give them their full size before filling them: growing leaves a copy
+// behind.
 class Secret {
 public:
     explicit Secret(platform::Data bytes = {}) : bytes_(std::move(bytes)) {}

@@ -1,15 +1,15 @@
-// Small questions about text that the host reads or writes a line at a time.
+// Helpers for text that the host reads or writes line by line.
 #pragma once
 
 #include <string_view>
 
 namespace vrx::host {
 
-// Without the blanks and line ends at both ends.
+// Removes blanks and line ends from both ends.
 std::string_view trimmed(std::string_view text);
-// Whether it holds no control character: it may stand in a line of its own, or be a header's value.
+// Whether it holds no control character, so that it may stand on a line of its own or be a header's value.
 bool isOneLine(std::string_view text);
-// Whether it can be a header's name.
+// Whether it is valid as the name of a header.
 bool isHeaderName(std::string_view text);
 
 }  // namespace vrx::host

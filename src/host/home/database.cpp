@@ -2,7 +2,6 @@
 
 #include <fcntl.h>
 #include <sys/file.h>
-#include <unistd.h>
 
 #include <array>
 #include <cerrno>
@@ -10,6 +9,7 @@
 #include <ctime>
 #include <thread>
 
+#include "vrx/host/base/descriptor.h"
 #include "vrx/host/base/files.h"
 #include "vrx/platform/log.h"
 
@@ -60,14 +60,14 @@ std::string timeSuffix() {
     return {text.data(), std::strftime(text.data(), text.size(), "%Y%m%dT%H%M%SZ", &fields)};
 }
 
-// Which file a name stands for.
+// Which file a path leads to.
 struct FileIdentity {
     dev_t device = 0;
     ino_t inode = 0;
     bool operator==(const FileIdentity&) const = default;
     explicit operator bool() const { return inode != 0; }
 
-    // None when the name stands for nothing.
+    // Empty when there is no file.
     static FileIdentity of(const std::string& path) {
         struct stat status;
         if (stat(path.c_str(), &status) != 0) return {};
@@ -75,50 +75,41 @@ struct FileIdentity {
     }
 };
 
-// Held while the database is opened: of several processes that find it damaged, one sets it aside and the others find
-// the fresh one.
+// Held while the database is opened: of several processes that find it damaged, the first sets it aside and the others
+// find the fresh one.
 class FolderLock {
 public:
     FolderLock(const std::string& folder, std::chrono::milliseconds limit)
         : file_(::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC)) {
-        if (file_ < 0) throw DatabaseError(SQLITE_CANTOPEN, systemError("open", folder, errno).text);
+        if (!file_) throw DatabaseError(SQLITE_CANTOPEN, systemError("open", folder, errno).text);
         const auto end = std::chrono::steady_clock::now() + limit;
-        while (flock(file_, LOCK_EX | LOCK_NB) != 0) {
-            if (std::chrono::steady_clock::now() < end) {
-                std::this_thread::sleep_for(std::chrono::milliseconds(2));
-                continue;
-            }
-            ::close(file_);
-            throw DatabaseError(SQLITE_BUSY, "another process keeps " + folder + " locked");
+        while (flock(file_.number(), LOCK_EX | LOCK_NB) != 0) {
+            if (std::chrono::steady_clock::now() >= end)
+                throw DatabaseError(SQLITE_BUSY, "another process keeps " + folder + " locked");
+            std::this_thread::sleep_for(std::chrono::milliseconds(2));
         }
     }
-    ~FolderLock() { ::close(file_); }
-    FolderLock(const FolderLock&) = delete;
-    FolderLock& operator=(const FolderLock&) = delete;
 
 private:
-    int file_;
+    const Descriptor file_;
 };
 
-// The whole database is some ten pages. As it comes, SQLite would set aside, and touch, room for twenty pages and for
-// the statements of a busy server, for each connection.
+// Keeps SQLite small: the whole database is some ten pages, and by default each connection would reserve memory for
+// twenty pages and for the statements of a busy server.
 bool configure() {
     return sqlite3_config(SQLITE_CONFIG_PAGECACHE, nullptr, 0, 0) == SQLITE_OK &&
            sqlite3_config(SQLITE_CONFIG_LOOKASIDE, 512, 16) == SQLITE_OK;
 }
 
-// SQLite would make the file readable for others; what it makes beside it has the file's own mode.
+// Creates the file for its user alone, as SQLite would not. The files that SQLite makes beside it get the same mode.
 void createPrivately(const std::string& path) {
-    int file = ::open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600);
-    if (file >= 0)
-        ::close(file);
-    else if (errno != EEXIST)
-        throw DatabaseError(SQLITE_CANTOPEN, systemError("create", path, errno).text);
+    const Descriptor file(::open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600));
+    if (!file && errno != EEXIST) throw DatabaseError(SQLITE_CANTOPEN, systemError("create", path, errno).text);
 }
 
-// For looking: where a log lies beside the database, the index of the two is only read, or made in memory when nobody
-// keeps it; where none does, no index is needed.
-std::string lookingUri(const std::string& path) {
+// For read-only access. With a log beside the database, SQLite reads the shared index, or builds one in memory when no
+// process keeps it; without a log it needs no index.
+std::string readOnlyUri(const std::string& path) {
     std::string uri = "file:";
     for (const char character : path) {
         if (character == '%' || character == '?' || character == '#')
@@ -138,7 +129,7 @@ Statement::Statement(sqlite3* connection, const char* sql) : connection_(connect
 }
 
 Statement& Statement::bind(int parameter, std::string_view text) {
-    // An absent pointer would bind null.
+    // A null pointer would bind null.
     check(sqlite3_bind_text64(statement_, parameter + 1, text.data() ? text.data() : "", text.size(), SQLITE_TRANSIENT,
                               SQLITE_UTF8),
           connection_);
@@ -188,11 +179,11 @@ std::span<const std::uint8_t> Statement::bytes(int column) const {
     return {start, start ? static_cast<std::size_t>(sqlite3_column_bytes(statement_, column)) : 0};
 }
 
-Connection::Connection(const std::string& path, std::chrono::milliseconds busyLimit, bool isLooking) {
+Connection::Connection(const std::string& path, std::chrono::milliseconds busyLimit, bool isReadOnly) {
     static const bool isConfigured = configure();
     static_cast<void>(isConfigured);
-    const int flags = isLooking ? SQLITE_OPEN_READONLY | SQLITE_OPEN_URI : SQLITE_OPEN_READWRITE;
-    const int result = sqlite3_open_v2((isLooking ? lookingUri(path) : path).c_str(), &connection_,
+    const int flags = isReadOnly ? SQLITE_OPEN_READONLY | SQLITE_OPEN_URI : SQLITE_OPEN_READWRITE;
+    const int result = sqlite3_open_v2((isReadOnly ? readOnlyUri(path) : path).c_str(), &connection_,
                                        flags | SQLITE_OPEN_NOMUTEX, nullptr);
     try {
         check(result, connection_);
@@ -246,45 +237,25 @@ void Connection::endStatements() {
         if (sqlite3_stmt_busy(used)) sqlite3_reset(used);
 }
 
-// Both the shared-memory method and the header's place and size, 48 bytes at the beginning, are part of SQLite's
-// published interfaces and formats; SQLite itself compares the header to tell whether its cache is current.
-void Connection::findIndexHeader() {
-    constexpr int regionBytes = 32768;
-    integer("PRAGMA user_version");  // a read is what makes it map the index
-    sqlite3_file* file = nullptr;
-    void volatile* region = nullptr;
-    check(sqlite3_file_control(connection_, "main", SQLITE_FCNTL_FILE_POINTER, &file), connection_);
-    if (file->pMethods->iVersion >= 2) file->pMethods->xShmMap(file, 0, regionBytes, 0, &region);
-    indexHeader_ = static_cast<const std::uint32_t*>(const_cast<void*>(region));
+std::int64_t Connection::commitMark() {
+    return integer("PRAGMA data_version");
 }
 
-Connection::CommitMark Connection::commitMark() {
-    CommitMark mark{};
-    if (!indexHeader_) {  // a file system without shared memory
-        mark[0] = static_cast<std::uint32_t>(integer("PRAGMA data_version"));
-        return mark;
-    }
-    // Another process may be writing it: a mixture of old and new equals neither.
-    for (std::size_t i = 0; i < mark.size(); ++i) mark[i] = __atomic_load_n(indexHeader_ + i, __ATOMIC_ACQUIRE);
-    return mark;
-}
-
-// The connections of one opening. Reading has one of its own, so that it does not wait while a write waits.
+// The connections of one opening. Reading has its own, so that it does not wait while a write waits.
 struct Database::Opening {
     Opening(const std::string& path, std::chrono::milliseconds busyLimit) : path(path), busyLimit(busyLimit) {}
 
     ~Opening() {
-        // Closing the last connection takes the -wal file away by its name, which is not ours any more when another
-        // database has come to stand there.
+        // Closing the last connection removes the -wal file by its name. When another database has taken this path,
+        // that file is not ours.
         if (FileIdentity::of(path) == file) return;
         for (auto* connection : {&writer, &reader})
             if (*connection) (*connection)->keepLogAtClose(true);
     }
 
-    // The database is sound: it is opened for reading, too, and is tidied up when it is closed.
+    // Called once the database is known to be sound: opens it for reading, and lets closing tidy it up.
     void passed() {
         reader.emplace(path, busyLimit);
-        reader->findIndexHeader();
         for (auto* connection : {&writer, &reader}) (*connection)->keepLogAtClose(false);
         file = FileIdentity::of(path);
         wal = FileIdentity::of(path + "-wal");
@@ -293,14 +264,14 @@ struct Database::Opening {
 
     const std::string path;
     const std::chrono::milliseconds busyLimit;
-    std::optional<Connection> writer;  // none for looking
+    std::optional<Connection> writer;  // absent when read-only
     std::optional<Connection> reader;
     FileIdentity file, wal, shm;
     std::uint64_t number = 0;
 };
 
-Database::Database(std::string path, Schema schema, std::chrono::milliseconds busyLimit, bool isLooking)
-    : path_(std::move(path)), schema_(schema), busyLimit_(busyLimit), isLooking_(isLooking) {}
+Database::Database(std::string path, Schema schema, std::chrono::milliseconds busyLimit, bool isReadOnly)
+    : path_(std::move(path)), schema_(schema), busyLimit_(busyLimit), isReadOnly_(isReadOnly) {}
 
 Database::~Database() = default;
 
@@ -327,7 +298,8 @@ std::shared_ptr<Database::Opening> Database::opening(MaybeError& error) {
     }
 }
 
-// What stands beside the replaced file belongs to it, unless it came with the new one, which would take it for its own.
+// Sets the -wal and -shm files of the replaced database aside, because the new one would take them for its own. Files
+// that came with the new one stay.
 void Database::leaveReplacedFile() {
     log(Level::Error, "%@ was replaced and is opened again", path_);
     const std::string aside = freeAsideName("replaced");
@@ -337,7 +309,7 @@ void Database::leaveReplacedFile() {
 }
 
 std::shared_ptr<Database::Opening> Database::openChecked() {
-    if (isLooking_) return openToLook();
+    if (isReadOnly_) return openReadOnly();
     try {
         return openOnce();
     } catch (const DatabaseError& error) {
@@ -361,7 +333,7 @@ std::shared_ptr<Database::Opening> Database::openOnce() const {
     return opening;
 }
 
-std::shared_ptr<Database::Opening> Database::openToLook() const {
+std::shared_ptr<Database::Opening> Database::openReadOnly() const {
     auto opening = std::make_shared<Opening>(path_, busyLimit_);
     Connection& reader = opening->reader.emplace(path_, busyLimit_, true);
     reader.checkSoundness();
@@ -382,7 +354,7 @@ std::int64_t Database::checkedVersion(Connection& connection) const {
 
 void Database::migrate(Connection& writer) const {
     const auto newest = static_cast<std::int64_t>(schema_.size());
-    if (checkedVersion(writer) == newest) return;  // without waiting for a writer
+    if (checkedVersion(writer) == newest) return;  // does not wait for a writer
     writer.execute("BEGIN IMMEDIATE");
     const std::int64_t version = checkedVersion(writer);
     for (std::int64_t step = version; step < newest; ++step) writer.execute(schema_[static_cast<std::size_t>(step)]);
@@ -408,7 +380,7 @@ void Database::moveAside(const std::string& asideName, const char* suffix) const
         throw DatabaseError(SQLITE_CANTOPEN, systemError("set aside", from, errno).text);
 }
 
-// Damage that shows only in use: the next operation opens the database again, and examines it.
+// After damage that shows in use, the next operation opens the database again and examines it.
 Error Database::failed(const std::shared_ptr<Opening>& opening, const DatabaseError& error) {
     if (isDamage(error)) {
         std::lock_guard lock(mutex_);
@@ -417,6 +389,7 @@ Error Database::failed(const std::shared_ptr<Opening>& opening, const DatabaseEr
     return Error{"database", error.code, path_ + ": " + error.what()};
 }
 
+// A statement left unfinished would block COMMIT and ROLLBACK, so all are ended first.
 MaybeError Database::transaction(Connection& connection, const std::shared_ptr<Opening>& opening, const char* begin,
                                  const std::function<void(Connection&)>& body) {
     try {
@@ -427,7 +400,7 @@ MaybeError Database::transaction(Connection& connection, const std::shared_ptr<O
         return std::nullopt;
     } catch (const DatabaseError& error) {
         connection.endStatements();
-        // Some failures have undone the transaction already.
+        // Some failures roll back by themselves.
         if (!sqlite3_get_autocommit(connection.connection_))
             sqlite3_exec(connection.connection_, "ROLLBACK", nullptr, nullptr, nullptr);
         return failed(opening, error);

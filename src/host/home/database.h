@@ -1,14 +1,13 @@
 // The host's one database, host.db in the agent's home: settings, and whatever else of the host must outlive the
-// process. Any thread may use it, and any number of processes at once; readers never wait for a writer.
+// process. Any number of threads and processes may use it; readers never wait for a writer.
 //
-// A file that is damaged is set aside under another name and a fresh one made; a file that was replaced while it was
-// open is opened again. Both leave a line in the log.
+// A damaged file is set aside under another name and replaced by a fresh one. A file that was replaced while it was
+// open is opened again. Both are logged.
 #pragma once
 
 #include <sqlite3.h>
 #include <sys/stat.h>
 
-#include <array>
 #include <chrono>
 #include <cstdint>
 #include <functional>
@@ -25,14 +24,14 @@
 
 namespace vrx::host {
 
-// How a failure travels from a statement to the end of its transaction; it never leaves Database.
+// Carries a failure from a statement to the end of its transaction. Never leaves Database.
 class DatabaseError : public std::runtime_error {
 public:
     DatabaseError(int code, const std::string& text) : std::runtime_error(text), code(code) {}
     const int code;  // SQLite's
 };
 
-// A prepared statement: bind, then step through its rows. Columns and parameters count from 0. What it hands out lives
+// A prepared statement: bind, then step through its rows. Columns and parameters count from 0. What it returns is valid
 // until the next step.
 class Statement {
 public:
@@ -47,7 +46,7 @@ public:
     Statement& bind(int parameter, const platform::Data& bytes);
     Statement& bind(int parameter, std::nullptr_t);
 
-    // Whether there is a (next) row.
+    // Goes to the first or the next row. Returns whether there is one.
     bool step();
     void reset();
 
@@ -65,34 +64,29 @@ private:
 // One connection to the database, used by one thread at a time.
 class Connection {
 public:
-    Connection(const std::string& path, std::chrono::milliseconds busyLimit, bool isLooking = false);
+    Connection(const std::string& path, std::chrono::milliseconds busyLimit, bool isReadOnly = false);
     ~Connection();
     Connection(const Connection&) = delete;
     Connection& operator=(const Connection&) = delete;
 
-    // Runs statements that give no rows of interest.
+    // Runs statements whose rows, if any, are ignored.
     void execute(const char* sql);
-    // The statement of a literal, prepared at first need and unbound again at each call. It must not be in use.
+    // The statement of a string literal, prepared at its first use and with nothing bound. It must not be in use.
     Statement& statement(const char* sql);
     std::int64_t integer(const char* sql);
-    // Two equal marks: nothing was committed in between, by any connection of any process. The mark is the header of
-    // the database's shared index, which every commit replaces, and costs no system call.
-    using CommitMark = std::array<std::uint32_t, 12>;
-    CommitMark commitMark();
+    // While two marks are equal, no other connection of any process has committed in between.
+    std::int64_t commitMark();
 
 private:
     friend class Database;
 
-    // Whether closing leaves the files as they are, as it does at first: a damaged database is to be set aside
-    // untouched.
+    // Whether closing leaves all files as they are. True at first, so that a damaged database is set aside untouched.
     void keepLogAtClose(bool keep);
-    void findIndexHeader();
     void checkSoundness();
-    // A statement left within its rows would keep the transaction open.
+    // Resets unfinished statements, which would keep the transaction open.
     void endStatements();
 
     sqlite3* connection_ = nullptr;
-    const std::uint32_t* indexHeader_ = nullptr;  // mapped by SQLite while the connection is open
     std::unordered_map<const char*, std::unique_ptr<Statement>> statements_;
 };
 
@@ -102,40 +96,40 @@ public:
     using Schema = std::span<const char* const>;
     static const Schema currentSchema;
 
-    // Nothing is opened before the first use, or open(). A write waits for other writers up to the limit.
+    // Opens nothing before the first use or open(). A write waits for other writers up to the limit.
     explicit Database(std::string path, Schema schema = currentSchema,
                       std::chrono::milliseconds busyLimit = std::chrono::seconds(5))
         : Database(std::move(path), schema, busyLimit, false) {}
-    // For reading only. It changes no file: where one would have to be made, mended or migrated, it cannot be opened.
-    static Database toLookAt(std::string path, Schema schema = currentSchema) {
+    // For reading only. Changes no file: a database that would have to be made, repaired or migrated cannot be opened.
+    static Database readOnly(std::string path, Schema schema = currentSchema) {
         return {std::move(path), schema, std::chrono::seconds(5), true};
     }
     ~Database();
 
-    // An error names the file and the reason: it cannot be written, or a newer version of the program has made it.
+    // The error names the file and the reason, for instance that a newer version of the program made it.
     platform::MaybeError open();
 
-    // Run the body within one transaction; an error undoes the whole of it. The body must not use the database again.
+    // Runs the body in one transaction, which an error undoes as a whole. The body must not use the database again.
     platform::MaybeError read(const std::function<void(Connection&)>& body);
     platform::MaybeError write(const std::function<void(Connection&)>& body);
 
-    // What a copy of something stored must still be equal to if it is to be current.
+    // Identifies a state of the database. A copy made in that state is current while the stamp is the same.
     struct Stamp {
-        std::uint64_t opening = 0;  // none is 0
-        Connection::CommitMark mark{};
+        std::uint64_t opening = 0;  // 0 when there is none
+        std::int64_t mark = 0;
         bool operator==(const Stamp&) const = default;
     };
-    // As read(), without a transaction, for one statement or for none: the body is told the stamp.
+    // Like read(), but without a transaction, for at most one statement. The body gets the present stamp.
     platform::MaybeError peek(const std::function<void(Connection&, const Stamp&)>& body);
 
 private:
     struct Opening;
 
-    Database(std::string path, Schema schema, std::chrono::milliseconds busyLimit, bool isLooking);
+    Database(std::string path, Schema schema, std::chrono::milliseconds busyLimit, bool isReadOnly);
     std::shared_ptr<Opening> opening(platform::MaybeError& error);
     std::shared_ptr<Opening> openChecked();
     std::shared_ptr<Opening> openOnce() const;
-    std::shared_ptr<Opening> openToLook() const;
+    std::shared_ptr<Opening> openReadOnly() const;
     std::int64_t checkedVersion(Connection& connection) const;
     void migrate(Connection& writer) const;
     void leaveReplacedFile();
@@ -148,16 +142,16 @@ private:
     const std::string path_;
     const Schema schema_;
     const std::chrono::milliseconds busyLimit_;
-    const bool isLooking_;
+    const bool isReadOnly_;
 
-    // One user each of the reading and the writing connection, over all openings; taken before mutex_.
+    // The reading and the writing connection have one user at a time, over all openings. Taken before mutex_.
     std::mutex reading_;
     std::mutex writing_;
 
     std::mutex mutex_;
     std::shared_ptr<Opening> opening_;
     std::uint64_t openings_ = 0;
-    std::string lastFailure_;  // of opening, so that it is logged once
+    std::string lastFailure_;  // to open, so that it is logged once
 };
 
 }  // namespace vrx::host

@@ -16,7 +16,7 @@ using platform::Value;
 
 namespace {
 
-// Serial numbers that clients make up must not fill the memory.
+// Bounds the memory that clients can fill with made-up serial numbers.
 constexpr std::size_t mostCopies = 1000;
 
 constexpr const char* selectOne = "SELECT value FROM defaults WHERE key = ?";
@@ -26,7 +26,7 @@ constexpr const char* replace =
     "ON CONFLICT (key) DO UPDATE SET value = excluded.value";
 constexpr const char* removeOne = "DELETE FROM defaults WHERE key = ?";
 
-// The value in column 0; null, with a line in the log, for one that cannot be understood.
+// The value in column 0. Null, with a line in the log, when it cannot be read.
 Value storedValue(const Statement& row, std::string_view key) {
     switch (row.type(0)) {
         case SQLITE_INTEGER: return row.integer(0);
@@ -45,7 +45,7 @@ void bindValue(Statement& statement, int parameter, const Value& value) {
     const std::optional<double> number = value.asNumber();
     if (std::optional<std::int64_t> integer = value.asInteger()) {
         statement.bind(parameter, *integer);
-    } else if (number && !std::isnan(*number)) {  // which SQLite would make null
+    } else if (number && !std::isnan(*number)) {  // SQLite stores NaN as null
         statement.bind(parameter, *number);
     } else if (const std::string* text = value.asString()) {
         statement.bind(parameter, std::string_view(*text));

@@ -1,6 +1,5 @@
-// The agent's settings in host.db, over registered defaults that live in memory. Any thread, and any number of
-// processes at once, may use them. A value that was read once is answered from memory for as long as nothing has been
-// committed to the database since.
+// The agent's settings in host.db, over registered defaults in memory. Any number of threads and processes may use
+// them. A value that was read is kept in memory until something is committed to the database.
 #pragma once
 
 #include <mutex>
@@ -23,7 +22,7 @@ public:
     void registerDefaults(const platform::Dictionary& values) override;
     platform::Dictionary dictionaryRepresentation() const override;
 
-    // As set(), which only logs a failure.
+    // Like set(), but returns a failure instead of logging it.
     platform::MaybeError write(std::string_view key, const platform::Value& value);
 
 private:
@@ -32,14 +31,14 @@ private:
     struct TextHash : std::hash<std::string_view> {
         using is_transparent = void;
     };
-    // What was read, null for what is not stored, at one state of the database.
+    // The values read in one state of the database; null for what is not stored.
     struct Copies {
         Database::Stamp stamp;
         std::unordered_map<std::string, platform::Value, TextHash, std::equal_to<>> values;
     };
 
     Database& database_;
-    mutable Copies copies_;  // used within Database::peek, one thread at a time
+    mutable Copies copies_;  // used within Database::peek only, so by one thread at a time
     mutable std::mutex mutex_;
     platform::Dictionary registered_;
 };

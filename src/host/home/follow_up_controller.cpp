@@ -25,7 +25,7 @@ constexpr const char* replace =
     "ON CONFLICT (client, identifier) DO UPDATE SET item = excluded.item";
 constexpr const char* removeOne = "DELETE FROM follow_ups WHERE client = ? AND identifier = ?";
 
-// The item of a row; nothing, with a line in the log, for one that cannot be understood.
+// The item of a row. Nothing, with a line in the log, when it cannot be read.
 std::optional<FollowUpItem> storedItem(const Statement& row) {
     const std::span<const std::uint8_t> bytes = row.bytes(1);
     const Result<Value> document = codec::parsePropertyList(Data(bytes.begin(), bytes.end()));
@@ -65,7 +65,7 @@ std::string FollowUpControllers::settingsAppBundleIdentifier() const {
     return platform::vendorIdentifier(platform::settingsAppRemainder);
 }
 
-// A refresh posts what is pending already, most of the time: then nobody waits for a lock or a disk.
+// Writes nothing when the item is pending as it is, which is usual in a refresh.
 MaybeError FollowUpControllers::post(const std::string& client, const FollowUpItem& item) {
     bool isUnchanged = false;
     if (MaybeError error = database_.peek([&](Connection& connection, const Database::Stamp& stamp) {
@@ -81,7 +81,7 @@ MaybeError FollowUpControllers::post(const std::string& client, const FollowUpIt
     });
 }
 
-// So does a refresh clear what is not there.
+// Writes nothing when none of the items is pending, which is usual in a refresh.
 MaybeError FollowUpControllers::clear(const std::string& client, const std::vector<std::string>& identifiers) {
     bool isAnyPending = false;
     if (MaybeError error = database_.peek([&](Connection& connection, const Database::Stamp& stamp) {
@@ -122,8 +122,8 @@ const FollowUpControllers::Listing& FollowUpControllers::listing(Connection& con
     return copies_.listings.emplace(client, std::move(listing)).first->second;
 }
 
-// Whether it is pending as it is. One row is read, not all, where there is no listing: each of many posts in a row
-// makes the listing before it out of date.
+// Whether the item is pending with the same content. Without a current listing it reads one row: in a series of posts
+// each makes the listing out of date.
 bool FollowUpControllers::isPending(Connection& connection, const Database::Stamp& stamp, const std::string& client,
                                     const FollowUpItem& item) const {
     const auto copy = copies_.listings.find(client);

@@ -1,7 +1,7 @@
-// The follow-up service, on host.db: whoever shows the items reads them there. Any thread, and any number of processes
-// at once, may use it. What was listed once is answered from memory for as long as nothing has been committed to the
-// database since, and a request that would change nothing writes nothing. An item that cannot be read back is left out,
-// with a line in the log; posting it again, or clearing it, ends that.
+// The follow-up service, on host.db: whoever shows the items reads them there. Any number of threads and processes may
+// use it. A listing is kept in memory until something is committed to the database, and a request that would change
+// nothing writes nothing. An item that cannot be read is left out, with a line in the log, until it is posted again or
+// cleared.
 #pragma once
 
 #include <map>
@@ -16,7 +16,7 @@ namespace vrx::host {
 
 class FollowUpControllers final : public platform::FollowUpControllers {
 public:
-    // The database must outlive it, and it the controllers that it makes.
+    // The database must outlive this object, and this object its controllers.
     explicit FollowUpControllers(Database& database) : database_(database) {}
 
     std::unique_ptr<platform::FollowUpController> makeController(std::string clientIdentifier) override;
@@ -46,7 +46,7 @@ private:
                    const platform::FollowUpItem& item) const;
 
     Database& database_;
-    Copies copies_;  // used within Database::peek, one thread at a time
+    Copies copies_;  // used within Database::peek only, so by one thread at a time
 };
 
 }  // namespace vrx::host

@@ -32,12 +32,12 @@ void add(Dictionary& document, std::string_view key, const std::optional<std::st
     if (text) document.emplace(key, *text);
 }
 
-// How the first mistake travels out of a document.
+// Carries the first mistake out of a document.
 class Mistake : public std::runtime_error {
     using std::runtime_error::runtime_error;
 };
 
-// The entries of a dictionary, read by type; what is absent, or null, is nothing.
+// The entries of a dictionary, read by type. Absent and null entries read as nothing.
 class Entries {
 public:
     Entries(const Value& value, const std::string& what, std::initializer_list<std::string_view> keys) : value_(value) {

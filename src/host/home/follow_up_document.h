@@ -4,8 +4,8 @@
 //      "displayStyle": 18, "title": "…", "informativeFooterText": "…", "expirationDate": 1769860799.999,
 //      "userInfo": {…}, "actions": [{"label": "…", "url": "…"}]}
 //
-// What an item does not have is not there. The expiration date is the seconds since 1970, so that its fraction is exact
-// in every form.
+// Absent members are left out. The expiration date is in seconds since 1970, so that its fraction is exact in every
+// form.
 #pragma once
 
 #include "vrx/platform/error.h"
@@ -16,8 +16,7 @@ namespace vrx::host {
 
 platform::Value followUpDocument(const platform::FollowUpItem& item);
 
-// Needs an identifier and, of what is there, the right types; knows no other keys. The error's text names the first
-// thing that is wrong.
+// Requires an identifier and the right types, and rejects unknown keys. The error names the first mistake.
 platform::Result<platform::FollowUpItem> followUpFromDocument(const platform::Value& document);
 
 }  // namespace vrx::host

@@ -21,7 +21,8 @@ std::string pathIn(const std::string& home) {
     return home + "/lock";
 }
 
-// The whole file, for the open file and not for the process: it can be handed over, and be asked for without taking it.
+// A lock of the whole file that belongs to the open file, not to the process: it can be handed over, and queried
+// without being taken.
 struct flock wholeFile() {
     struct flock lock {};
     lock.l_type = F_WRLCK;
@@ -35,7 +36,8 @@ std::string ownerIn(int file) {
     return size > 1 ? " (process " + std::string(text.data(), static_cast<std::size_t>(size) - 1) + ")" : "";
 }
 
-// One of the descriptors that were passed to this program, if it is that file. The service's socket may be another.
+// The descriptor of that file among those passed to this program, if it was passed. The service's socket may be
+// another.
 Descriptor passedFile(const std::string& path) {
     struct stat wanted;
     if (stat(path.c_str(), &wanted) != 0) return Descriptor();
@@ -63,7 +65,7 @@ MaybeError HomeLock::take(const std::string& home) {
         if (number != EWOULDBLOCK) return systemError("lock", path, number);
         return Error{"system", number, "another agent" + ownerIn(file.number()) + " uses the home " + home};
     }
-    // For people; the lock itself does not depend on it.
+    // For people. The lock does not depend on it.
     const std::string owner = std::to_string(getpid()) + "\n";
     if (ftruncate(file.number(), 0) != 0 || pwrite(file.number(), owner.data(), owner.size(), 0) < 0)
         return systemError("write", path, errno);

@@ -1,5 +1,5 @@
-// Keeps a home directory to one agent. The lock ends with its object, or with the process, however that ends; unless
-// its file is handed over to the program that the process executes next, which then has the home without a gap.
+// Reserves a home directory for one agent. The lock ends with its object or with the process. Handed over as a file, it
+// stays with the program that the process executes next.
 #pragma once
 
 #include <string>
@@ -11,14 +11,14 @@ namespace vrx::host {
 
 class HomeLock {
 public:
-    // Makes the directory if need be, and takes over the lock that an earlier program of this process handed over. When
-    // another agent has the home, the error's code is EWOULDBLOCK and its text tells which process.
+    // Makes the directory if need be. Takes over a lock that an earlier program of this process handed over. When
+    // another agent has the home, the error's code is EWOULDBLOCK and its text names the process.
     platform::MaybeError take(const std::string& home);
     bool isTaken() const { return static_cast<bool>(file_); }
-    // The locked file. The home stays locked for as long as it is open.
+    // Gives up the locked file. The home stays locked while that file is open.
     Descriptor release() { return std::move(file_); }
 
-    // Whether some agent has the home. Takes nothing.
+    // Whether an agent has the home. Does not take the lock.
     static bool isInUse(const std::string& home);
 
 private:

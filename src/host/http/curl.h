@@ -1,5 +1,5 @@
-// libcurl, opened when the first request is sent: with all the libraries that it brings along it would be most of a
-// small process.
+// libcurl, opened when the first request is sent: with the libraries that it depends on it would be most of a small
+// process.
 #pragma once
 
 #include <curl/curl.h>
@@ -10,7 +10,7 @@
 
 namespace vrx::host {
 
-// Its functions, named as they are there. Any thread may call them, once they are found to be there.
+// libcurl's functions by their names there. Any thread may call them while problem is empty.
 class Curl {
     codec::LazyLibrary library_{"libcurl.so.4"};
 
@@ -40,7 +40,7 @@ public:
     decltype(&::curl_multi_wakeup) multiWakeup = library_.function("curl_multi_wakeup");
     decltype(&::curl_multi_info_read) multiInfoRead = library_.function("curl_multi_info_read");
 
-    // Why none of them may be called; empty when they may.
+    // Why the functions must not be called. Empty when they may be.
     const std::string problem = begin();
 
 private:

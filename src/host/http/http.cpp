@@ -22,15 +22,12 @@ using platform::Url;
 
 using Completion = HttpTransfer::Completion;
 
-// The transfer thread and what is under way on it.
+// The transfer thread and its transfers.
 class HttpTransfers {
 public:
     HttpTransfers(platform::Queue& answers, const platform::Clock& clock, const DeviceProfile& profile,
                   const HttpLimits& limits)
-        : answers_(answers),
-          limits_(limits),
-          profile_(profile),
-          cache_(clock, limits.storedAnswers, limits.storedBytes) {}
+        : answers_(answers), limits_(limits), profile_(profile), cache_(clock, limits.storedBytes) {}
     ~HttpTransfers() { stop(); }
 
     void send(HttpRequest request, bool isUncached, Completion completion);
@@ -49,16 +46,17 @@ private:
     const DeviceProfile& profile_;
 
     std::mutex mutex_;
-    std::vector<std::unique_ptr<HttpTransfer>> sent_;  // not begun yet
+    std::vector<std::unique_ptr<HttpTransfer>> sent_;  // waiting for the transfer thread
     bool isStopping_ = false;
     std::thread thread_;
     CURLM* multi_ = nullptr;
 
-    // The transfer thread's.
+    // Used by the transfer thread only.
     HttpCache cache_;
     std::map<HttpTransfer*, std::unique_ptr<HttpTransfer>> running_;
 };
 
+// A transfer is handed over under the lock, so that stop() misses none.
 void HttpTransfers::send(HttpRequest request, bool isUncached, Completion completion) {
     if (std::optional<Url> url = Url::parse(request.url); url && url->isFile())
         return sendFile(*url, std::move(completion));
@@ -80,7 +78,7 @@ void HttpTransfers::send(HttpRequest request, bool isUncached, Completion comple
     curl().multiWakeup(multi_);
 }
 
-// Read here and not by the library, which could wait for ever on what is no regular file.
+// Reads the file here: the library could wait for ever on one that is not regular.
 void HttpTransfers::sendFile(const Url& url, Completion completion) {
     answers_.post([path = url.filePath(), limit = limits_.answerBytes, completion = std::move(completion)]() mutable {
         if (!path) return completion(httpFailure(httpError(CURLE_URL_MALFORMAT, "the URL names no local file")));
@@ -121,7 +119,7 @@ void HttpTransfers::stop() {
 }
 
 void HttpTransfers::run() {
-    // Writing to a connection that the server has closed is an error and nothing more.
+    // Writing to a connection that the server closed is then only an error.
     sigset_t brokenPipe;
     sigemptyset(&brokenPipe);
     sigaddset(&brokenPipe, SIGPIPE);
@@ -138,7 +136,7 @@ void HttpTransfers::run() {
         int running = 0;
         curl().multiPerform(multi_, &running);
         finishEnded();
-        // Wakes for bytes, for the library's own timers, and for a new request: never otherwise.
+        // Wakes only for bytes, for the library's own timers and for a new request.
         curl().multiPoll(multi_, nullptr, 0, INT_MAX, nullptr);
     }
 }

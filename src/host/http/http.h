@@ -1,12 +1,12 @@
-// HTTP on libcurl: one thread, begun with the first request, moves the bytes of every session; answers are delivered on
-// the worker queue. Sessions may be used from any thread. Nothing wakes up while nothing is under way.
+// HTTP on libcurl. One thread, started with the first request, transfers for all sessions; answers are delivered on the
+// worker queue. Any thread may use a session. Nothing wakes up while nothing is under way.
 //
 // TLS is verified, against the system's authorities and those that the profile adds; plain http reaches this machine
 // only. A GET follows redirects, which carry none of the request's own headers and never leave https; any other method
-// is answered with the redirect itself. Neither headers nor bodies are ever logged here.
+// gets the redirect itself as its answer. Headers and bodies are never logged here.
 //
-// The shared session keeps answers as their headers allow (http_cache.h). An uncached one neither uses what is kept nor
-// asks whether it still holds; what it brings takes its place, so that nobody is given the older answer afterwards.
+// The shared session keeps answers as their headers allow (http_cache.h). An uncached one does not use them, but stores
+// its own answer in their place, so that nobody gets an older one afterwards.
 #pragma once
 
 #include <memory>
@@ -21,10 +21,9 @@ namespace vrx::host {
 
 struct HttpLimits {
     platform::Duration timeout = std::chrono::seconds(60);       // of a request that sets none
-    platform::Duration longestTimeout = std::chrono::hours(24);  // of any request; a day is as good as for ever
+    platform::Duration longestTimeout = std::chrono::hours(24);  // of any request
     std::size_t answerBytes = platform::limits::answerBytes;     // after decompression; headers count apart
     int redirects = 5;
-    std::size_t storedAnswers = 32;
     std::size_t storedBytes = 1024 * 1024;  // of all stored answers together
 };
 
@@ -32,11 +31,11 @@ class HttpTransfers;
 
 class HttpSessions final : public platform::HttpSessions {
 public:
-    // Queue, clock and profile must outlive the sessions.
+    // The queue, the clock and the profile must outlive the sessions.
     HttpSessions(platform::Queue& answers, const platform::Clock& clock, const DeviceProfile& profile,
                  const HttpLimits& limits = {});
     ~HttpSessions() override;
-    // Discards what is under way, and what is sent from now on, unanswered.
+    // Discards requests under way, and those sent from now on, without an answer.
     void stop();
 
     platform::HttpSession& shared() override { return *shared_; }

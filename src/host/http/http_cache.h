@@ -1,10 +1,9 @@
-// The answers that the shared session keeps, in memory, the least recently used going first. An answer is given again
-// only for a request with the same address and the very same headers of its own: so whatever headers it varies by, they
-// match, and what one account was answered no other one gets. Belongs to one thread.
+// The answers that the shared session keeps in memory, by address. Answers to requests with headers of their own, which
+// may name an account, are never kept. The agent sends one request whose answer is kept, for the server's versions; so
+// a small bound is enough, and all answers are dropped when a new one does not fit. Used by one thread.
 #pragma once
 
-#include <array>
-#include <list>
+#include <map>
 #include <memory>
 #include <optional>
 #include <string>
@@ -16,14 +15,7 @@ namespace vrx::host {
 
 class HttpCache {
 public:
-    // Of address and headers. A hash: headers may hold what should not lie about in memory.
-    using Key = std::array<std::uint8_t, 32>;
-    static Key keyOf(const std::string& url, const platform::HttpHeaders& requestHeaders);
-    // Whether a request with these headers asks nothing of caches itself; one that does has the cache out of its way.
-    static bool isFor(const platform::HttpHeaders& requestHeaders);
-
     struct Entry {
-        Key key;
         std::string url;
         platform::HttpResponse answer;
         platform::Date arrived;
@@ -33,35 +25,28 @@ public:
     };
     using Stored = std::shared_ptr<const Entry>;
 
-    HttpCache(const platform::Clock& clock, std::size_t entries, std::size_t bytes)
-        : clock_(clock), entriesAtMost_(entries), bytesAtMost_(bytes) {}
+    HttpCache(const platform::Clock& clock, std::size_t mostBytes) : clock_(clock), mostBytes_(mostBytes) {}
 
     platform::Date now() const { return clock_.now(); }
-    Stored find(const Key& key);
-    // The stored answer, if it may be given without asking.
+    // Null when nothing is kept for the address.
+    Stored find(const std::string& url) const;
+    // The stored answer with its age, if it may still be given without asking the server.
     std::optional<platform::HttpResponse> freshAnswer(const Entry& stored) const;
 
-    // Keeps a whole answer of status 200 in place of the one before, or neither when it may not be kept.
-    void store(const Key& key, const std::string& url, platform::Date asked, const platform::HttpResponse& answer);
-    // The stored answer, which still holds, as the confirming headers leave it; it is kept so.
+    // Keeps a whole answer of status 200 in place of the one before. When it must not be kept, neither is.
+    void store(const std::string& url, platform::Date asked, const platform::HttpResponse& answer);
+    // Takes over the headers by which the server confirmed the stored answer, keeps it so, and returns it.
     platform::HttpResponse revalidated(const Entry& stored, platform::Date asked,
                                        const platform::HttpHeaders& confirmation);
-    // Lets go of what is kept for the address.
     void forget(const std::string& url);
 
-    std::size_t entries() const { return entries_.size(); }
+    // The size of all kept answers, headers included.
     std::size_t bytes() const { return bytes_; }
 
 private:
-    using Entries = std::list<Stored>;
-    static std::size_t sizeOf(const std::string& url, const platform::HttpResponse& answer);
-    void remove(Entries::iterator entry);
-    Entries::iterator search(const Key& key);
-
     const platform::Clock& clock_;
-    const std::size_t entriesAtMost_;
-    const std::size_t bytesAtMost_;
-    Entries entries_;  // so few that searching beats an index; the one used last stands first
+    const std::size_t mostBytes_;
+    std::map<std::string, Stored> entries_;  // by address
     std::size_t bytes_ = 0;
 };
 

@@ -21,7 +21,7 @@ bool isSame(std::string_view text, std::string_view name) {
     return text.size() == name.size() && strncasecmp(text.data(), name.data(), name.size()) == 0;
 }
 
-// Takes the next element of a list, up to a comma that stands in no quotation marks; nothing when those never end.
+// Takes the next element of a list, up to a comma outside quotation marks. Nothing when the marks do not end.
 std::optional<std::string_view> takeElement(std::string_view& list) {
     bool isQuoted = false;
     std::size_t end = 0;
@@ -35,7 +35,7 @@ std::optional<std::string_view> takeElement(std::string_view& list) {
     return element;
 }
 
-// A number of seconds; what is over the limit is as good as for ever.
+// A number of seconds, at most 2^31.
 std::optional<std::chrono::seconds> seconds(std::string_view text) {
     constexpr std::int64_t longest = std::int64_t{1} << 31;
     std::uint64_t count = 0;
@@ -61,7 +61,7 @@ bool variesByMoreThanHeaders(const HttpHeaders& answer) {
     return false;
 }
 
-// One entity tag, and not a list of them, which would ask for something else.
+// Whether it is a single entity tag: a list would ask about others.
 bool isEntityTag(std::string_view text) {
     if (text.starts_with("W/")) text.remove_prefix(2);
     return text.size() >= 2 && text.front() == '"' && text.find('"', 1) == text.size() - 1 && isOneLine(text);
@@ -78,7 +78,7 @@ CacheControl parseCacheControl(std::string_view value) {
         const std::string_view name = trimmed(directive->substr(0, equals));
         if (isSame(name, "no-store")) result.isStorable = false;
         if (isSame(name, "no-cache")) result.mustRevalidate = true;
-        if (!isSame(name, "max-age") || result.maxAge) continue;  // the first one holds
+        if (!isSame(name, "max-age") || result.maxAge) continue;  // the first one counts
         std::string_view argument = trimmed(directive->substr(std::min(equals + 1, directive->size())));
         if (argument.size() >= 2 && argument.front() == '"' && argument.back() == '"')
             argument = argument.substr(1, argument.size() - 2);
@@ -133,11 +133,11 @@ bool isConfirmed(const HttpHeaders& stored, const HttpHeaders& confirmation) {
 }
 
 HttpHeaders revalidatedHeaders(HttpHeaders stored, const HttpHeaders& confirmation) {
-    // They were true of the answer at its time.
+    // They described the answer at its time.
     stored.erase("Age");
     stored.erase("Date");
     for (const auto& [name, value] : confirmation) {
-        // What is said of the body is not said of the stored one, nor what is said of the connection.
+        // Headers of the body or the connection are about the confirming answer, not about the stored one.
         const bool isOfBody = isSame(std::string_view(name).substr(0, 8), "Content-");
         if (isOfBody || isSame(name, "Transfer-Encoding") || isSame(name, "Connection") || isSame(name, "Keep-Alive"))
             continue;

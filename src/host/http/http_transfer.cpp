@@ -39,7 +39,7 @@ bool isLoopback(const std::string& host) {
             host.find_first_not_of("0123456789.") == std::string::npos);
 }
 
-// What a header of a request may consist of: nothing that could end it and begin another.
+// Whether the header stays one line: nothing in it can begin another.
 bool isSafeHeader(const std::string& name, const std::string& value) {
     return isHeaderName(name) && value.find_first_of(std::string_view("\r\n\0", 3)) == value.npos;
 }
@@ -99,7 +99,7 @@ MaybeError HttpTransfer::checkAddress() {
     return std::nullopt;
 }
 
-// A redirect's address gets none of them.
+// Redirects carry none of them.
 const HttpHeaders& HttpTransfer::ownHeaders() const {
     static const HttpHeaders none;
     return redirects_ > 0 ? none : request_.headers;
@@ -123,21 +123,20 @@ std::optional<HttpResponse> HttpTransfer::prepare() {
     return std::nullopt;
 }
 
-// For whom the traffic is concerns nobody but a developer, whose server runs on this machine.
+// Only a developer's server, on this machine, is told which application a request is for.
 void HttpTransfer::nameSourceApplication() {
     const std::optional<std::string>& application = request_.sourceApplication;
-    if (application && isLoopback_ && isOneLine(*application) && surroundings_.profile.facts()->http.namesApplications)
+    if (application && isLoopback_ && isOneLine(*application) &&
+        surroundings_.profile.content()->http.namesApplications)
         request_.headers["X-Orvane-Source-Application"] = *application;
 }
 
 std::optional<HttpResponse> HttpTransfer::storedAnswer() {
-    // Of the other methods none is asked often enough to be worth it, and most change something.
-    isCached_ = request_.method == "GET" && request_.body.empty() && HttpCache::isFor(ownHeaders());
+    isCached_ = request_.method == "GET" && request_.body.empty() && ownHeaders().empty();
     if (!isCached_) return std::nullopt;
     HttpCache& cache = surroundings_.cache;
-    key_ = HttpCache::keyOf(address_, ownHeaders());
     asked_ = cache.now();
-    stored_ = isUncached_ ? nullptr : cache.find(key_);
+    stored_ = isUncached_ ? nullptr : cache.find(address_);
     return stored_ ? cache.freshAnswer(*stored_) : std::nullopt;
 }
 
@@ -146,7 +145,7 @@ void HttpTransfer::setOptions() {
     set(CURLOPT_URL, address_.c_str());
     set(CURLOPT_PROTOCOLS_STR, "http,https");
     set(CURLOPT_NOSIGNAL, 1L);
-    set(CURLOPT_QUICK_EXIT, 1L);  // a slow resolver is left behind, or the time-out would wait for it
+    set(CURLOPT_QUICK_EXIT, 1L);  // the time-out does not wait for a slow resolver
     set(CURLOPT_ERRORBUFFER, errorText_.data());
     set(CURLOPT_HEADERFUNCTION, &HttpTransfer::onHeader);
     set(CURLOPT_HEADERDATA, this);
@@ -155,14 +154,14 @@ void HttpTransfer::setOptions() {
     set(CURLOPT_ACCEPT_ENCODING, "");
     set(CURLOPT_SUPPRESS_CONNECT_HEADERS, 1L);
     set(CURLOPT_HTTP_VERSION, long{CURL_HTTP_VERSION_2TLS});
-    // Requests sent at once share a connection where the server can. Without TLS nobody knows before the first answer,
-    // and a server that keeps silent would hold up the others.
+    // Requests sent together share a connection where the server can. Without TLS this is known only after the first
+    // answer, and a server that stays silent would block the others.
     if (!isPlain_) set(CURLOPT_PIPEWAIT, 1L);
-    // What goes to this machine does not leave it through a proxy; the environment may name one for all else.
+    // Requests to this machine bypass any proxy that the environment names.
     if (isLoopback_) set(CURLOPT_NOPROXY, "*");
-    // Beside the system's own. Whom TLS trusts is the say of root and the agent's user alone.
-    const std::shared_ptr<const ProfileFacts> facts = surroundings_.profile.facts();
-    if (facts->http.caFile && facts->isTrusted) set(CURLOPT_CAINFO, facts->http.caFile->c_str());
+    // Trusted in addition to the system's authorities, and only if root or our user alone can write the profile.
+    const std::shared_ptr<const ProfileContent> content = surroundings_.profile.content();
+    if (content->http.caFile && content->isTrusted()) set(CURLOPT_CAINFO, content->http.caFile->c_str());
     const auto left = std::chrono::ceil<std::chrono::milliseconds>(deadline_ - SteadyClock::now()).count();
     set(CURLOPT_TIMEOUT_MS, static_cast<long>(std::max<decltype(left)>(left, 1)));
 }
@@ -189,7 +188,7 @@ void HttpTransfer::addHeaderLine(const std::string& name, std::string_view value
 
 MaybeError HttpTransfer::setHeaders() {
     const HttpHeaders& own = ownHeaders();
-    // What the library would add to a body of its own accord.
+    // Headers that the library would otherwise add to a body.
     headerList_.reset(curl().slistAppend(nullptr, "Expect:"));
     if (!own.contains("Content-Type")) headerList_.reset(curl().slistAppend(headerList_.release(), "Content-Type:"));
     if (isUncached_ && !own.contains("Cache-Control")) addHeaderLine("Cache-Control", "no-cache");
@@ -207,7 +206,7 @@ MaybeError HttpTransfer::setHeaders() {
 std::size_t HttpTransfer::onHeader(char* bytes, std::size_t, std::size_t size, void* self) {
     auto& transfer = *static_cast<HttpTransfer*>(self);
     const std::string_view line = trimmed({bytes, size});
-    // Each status line begins the headers anew, for instance after an interim answer.
+    // Each status line starts the headers again, for instance after an interim answer.
     if (line.starts_with("HTTP/")) transfer.headers_.clear();
     transfer.headerSize_ += size;
     if (transfer.headerSize_ > headerBytes) {
@@ -232,7 +231,7 @@ std::size_t HttpTransfer::onBody(char* bytes, std::size_t, std::size_t size, voi
     return size;
 }
 
-// Where the answer redirects to, if that is to be followed.
+// The redirect to follow, or null.
 const char* HttpTransfer::redirect() const {
     const char* location = nullptr;
     if (request_.method == "GET" || request_.method == "HEAD")
@@ -240,7 +239,8 @@ const char* HttpTransfer::redirect() const {
     return location;
 }
 
-// A body of whose length HTTP/1 says nothing ends with the connection, which may have broken.
+// Whether the body is known to be complete. Over HTTP/1 without a length it ends with the connection, which may have
+// broken.
 bool HttpTransfer::isWhole() const {
     long version = 0;
     curl().easyGetinfo(easy_.get(), CURLINFO_HTTP_VERSION, &version);
@@ -248,6 +248,8 @@ bool HttpTransfer::isWhole() const {
            headers_.contains("Transfer-Encoding");
 }
 
+// Handles, in this order, a failure, the confirmation of the stored answer, a redirect and a final answer. Only the
+// latter is stored.
 std::optional<HttpResponse> HttpTransfer::finish(CURLcode result) {
     long status = 0;
     curl().easyGetinfo(easy_.get(), CURLINFO_RESPONSE_CODE, &status);
@@ -255,7 +257,7 @@ std::optional<HttpResponse> HttpTransfer::finish(CURLcode result) {
         const char* text = errorText_[0] ? errorText_.data() : curl().easyStrerror(result);
         HttpResponse response =
             httpFailure(tooLarge_ ? httpError(CURLE_FILESIZE_EXCEEDED, tooLarge_) : httpError(result, text));
-        response.status = static_cast<int>(status);  // that of an answer which broke off
+        response.status = static_cast<int>(status);  // of an answer that broke off
         return response;
     }
     HttpCache& cache = surroundings_.cache;
@@ -274,8 +276,8 @@ std::optional<HttpResponse> HttpTransfer::finish(CURLcode result) {
     }
     const bool isKept = isCached_ && status == 200 && isWhole();
     HttpResponse response = httpSuccess(static_cast<int>(status), std::move(headers_), std::move(body_));
-    if (isKept) cache.store(key_, address_, asked_, response);
-    // What was changed at the address is not what is kept of it.
+    if (isKept) cache.store(address_, asked_, response);
+    // A successful change makes what is kept of the address out of date.
     if (request_.method != "GET" && request_.method != "HEAD" && status < 400) cache.forget(address_);
     return response;
 }

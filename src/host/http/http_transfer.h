@@ -1,5 +1,5 @@
-// One request on its way, over all of its redirects, on a libcurl handle of its own. Belongs to the transfer thread
-// once it is there. The request's headers, which may hold credentials, are wiped with it.
+// One request, over all of its redirects, on a libcurl handle of its own. Used by the transfer thread only, once that
+// has it. The request's headers, which may hold credentials, are wiped at the end.
 #pragma once
 
 #include <array>
@@ -19,7 +19,7 @@ platform::Error httpError(int code, std::string text);
 platform::HttpResponse httpFailure(platform::Error error);
 platform::HttpResponse httpSuccess(int status, platform::HttpHeaders headers, platform::Data body);
 
-// What all transfers share; it outlives them.
+// What all transfers share. Outlives them.
 struct HttpSurroundings {
     const HttpLimits& limits;
     const DeviceProfile& profile;
@@ -38,11 +38,11 @@ public:
     CURL* easy() const { return easy_.get(); }
     Completion takeCompletion() { return std::move(completion_); }
 
-    // Makes ready to be sent to the next address, the request's own or a redirect's. The response, when nothing is to
-    // be sent: a fresh one that was stored, or a failure.
+    // Prepares the request to the next address, the request's own or a redirect's. Returns the response when nothing is
+    // to be sent: a stored answer that is fresh, or a failure.
     std::optional<platform::HttpResponse> prepare();
-    // The response, once the library is done; nothing when there is another address to be asked: then prepare() is
-    // next.
+    // To be called when the library is done. Returns the response, or nothing when another address has to be asked:
+    // then prepare() is next.
     std::optional<platform::HttpResponse> finish(CURLcode result);
 
 private:
@@ -82,9 +82,8 @@ private:
     bool isSecured_ = false;   // what redirected there came over TLS
     int redirects_ = 0;
 
-    bool isCached_ = false;  // may be answered from the cache, and go there
-    HttpCache::Key key_{};
-    HttpCache::Stored stored_;  // what is being asked about
+    bool isCached_ = false;     // may be answered from the cache and stored in it
+    HttpCache::Stored stored_;  // the answer that the request asks to confirm
     platform::Date asked_;
 
     std::unique_ptr<CURL, Freed> easy_;

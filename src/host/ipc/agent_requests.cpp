@@ -37,7 +37,7 @@ Value archived(const std::vector<std::shared_ptr<T>>& objects) {
     return codec::archive(objects);
 }
 
-// Takes the place of every Reply of the protocol.
+// Serves as every Reply of the protocol.
 class ArchivingReply {
 public:
     explicit ArchivingReply(PendingReply reply) : reply_(std::move(reply)) {}

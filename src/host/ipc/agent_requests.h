@@ -1,4 +1,4 @@
-// Requests as they come from the bus, made into calls of VRXAgentProtocol, and its replies made into archives.
+// Turns requests from the bus into calls of VRXAgentProtocol, and its replies into archives.
 #pragma once
 
 #include <systemd/sd-bus.h>
@@ -12,14 +12,14 @@
 
 namespace vrx::host {
 
-// An operation takes one of each at the most.
+// An operation takes at most one of each.
 struct RequestArguments {
     std::string text;
     VRXWarrantyLookupPolicy policy = VRXWarrantyLookupPolicyDefault;
     bool flag = false;
 };
 
-// The arguments of a call whose signature is the operation's; nothing when a string is too long.
+// Reads the arguments of a call with the operation's signature. Nothing when a string is too long.
 std::optional<RequestArguments> readArguments(sd_bus_message* call, const wire::Operation& operation);
 
 // Calls the operation, which answers through the pending reply.

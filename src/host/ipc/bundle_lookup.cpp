@@ -7,6 +7,7 @@
 #include <array>
 #include <cerrno>
 
+#include "vrx/host/base/trust.h"
 #include "vrx/platform/log.h"
 
 namespace vrx::host {
@@ -14,7 +15,6 @@ namespace vrx::host {
 using platform::Bundle;
 using platform::Level;
 using platform::log;
-using platform::MaybeError;
 using platform::Result;
 using platform::Value;
 
@@ -71,8 +71,8 @@ Value BundleLookup::entitlement(const PeerIdentity& peer, std::string_view name)
 
 std::optional<BundleFile> BundleLookup::bundleOf(const std::string& executable) const {
     if (executable.empty()) return std::nullopt;
-    if (MaybeError error = isKeptFromOthers(executable)) {
-        log(Level::Default, "%@ has no bundle: %@", executable, error->text);
+    if (const auto open = findOpenToOthers(executable, Links::Refused)) {
+        log(Level::Default, "%@ has no bundle: %@", executable, open->error.text);
         return std::nullopt;
     }
     if (std::optional<BundleFile> file = profileBundle(executable)) return file;
@@ -88,9 +88,9 @@ std::optional<BundleFile> BundleLookup::bundleOf(const std::string& executable) 
 }
 
 std::optional<BundleFile> BundleLookup::profileBundle(const std::string& executable) const {
-    const std::shared_ptr<const ProfileFacts> facts = profile_ ? profile_() : nullptr;
-    if (!facts || !facts->isTrusted) return std::nullopt;
-    for (const ProfileBundle& bundle : facts->bundles)
+    const std::shared_ptr<const ProfileContent> content = profile_ ? profile_() : nullptr;
+    if (!content || content->bundles.empty() || !content->isTrusted()) return std::nullopt;
+    for (const ProfileBundle& bundle : content->bundles)
         for (const std::string& named : bundle.executables)
             if (isSameFile(named, executable))
                 return BundleFile{executable,    bundle.identifier, bundle.name,

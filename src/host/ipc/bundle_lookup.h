@@ -1,7 +1,6 @@
-// From a caller to its bundle, and to what the bundle entitles it to. A bundle is the nearest folder above the program
-// that holds a bundle.toml; the program, the file and the folders above them must be kept from others, or there is no
-// bundle. For testers, the device profile may make programs such as busctl into bundles of their own, where it is
-// trusted. Any thread may ask.
+// Finds a caller's bundle, and what it is entitled to. The bundle is the nearest folder above the program that holds a
+// bundle.toml. There is none if others can change the program, the file or a folder above them. For testers, the device
+// profile can make programs such as busctl bundles of their own, while it is trusted itself. Any thread may ask.
 #pragma once
 
 #include <functional>
@@ -19,20 +18,20 @@ namespace vrx::host {
 
 class BundleLookup final : public platform::BundleLookup {
 public:
-    using Profile = std::function<std::shared_ptr<const ProfileFacts>()>;
+    using Profile = std::function<std::shared_ptr<const ProfileContent>()>;
 
     explicit BundleLookup(Profile profile = nullptr) : profile_(std::move(profile)) {}
 
-    // Of the peer under acceptance, as it was identified; of any other process, as /proc tells.
+    // For the peer under acceptance, the path as it was identified; for any other process, as /proc tells.
     std::size_t executablePath(std::int32_t processIdentifier, std::span<char> buffer) const override;
     std::optional<platform::Bundle> bundleContaining(const std::string& executablePath) const override;
 
-    // Null when the peer's bundle does not hold it, or asks for a group that is not the peer's.
+    // Null when the peer's bundle does not hold the entitlement, or requires another group than the peer's.
     platform::Value entitlement(const PeerIdentity& peer, std::string_view name) const;
-    // Of a program, whoever runs it. For tools.
+    // The bundle of a program, whoever runs it. For tools.
     std::optional<BundleFile> bundleOf(const std::string& executable) const;
 
-    // While one is alive on a thread, executablePath() answers there for the peer out of its identity.
+    // While one is alive on a thread, executablePath() there answers for the peer from its identity.
     class Acceptance {
     public:
         explicit Acceptance(const PeerIdentity& peer);

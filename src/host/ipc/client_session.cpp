@@ -35,6 +35,7 @@ ClientSession::~ClientSession() {
     box_->close();
 }
 
+// One row for each operation; its offset selects the operation's place among `methods_`.
 const std::vector<sd_bus_vtable>& ClientSession::methodTable() {
     static const std::vector<sd_bus_vtable> table = [] {
         std::vector<sd_bus_vtable> rows{SD_BUS_VTABLE_START(0)};
@@ -90,13 +91,14 @@ int ClientSession::onCall(sd_bus_message* call, void* method, sd_bus_error* erro
     return session->handle(call, operation, error);
 }
 
+// The peer may have executed another program since it was accepted: checked before each request.
 int ClientSession::handle(sd_bus_message* call, wire::OperationIndex operation, sd_bus_error* error) {
     if (!peer_.runsSameProgram()) {
         log(Level::Error, "Dropping connection from %d: it runs another program now", peer_.processIdentifier());
         isCutOff_ = true;
         return 1;
     }
-    // Replies that the client does not read count as well.
+    // Unread replies count as open requests.
     const std::size_t open = openCalls_.size() + bus_.unsentMessages();
     if (open >= limits_.requestsPerConnection) {
         isCutOff_ = open >= 2 * limits_.requestsPerConnection;

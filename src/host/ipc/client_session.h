@@ -1,6 +1,6 @@
-// Serves one accepted client, on the thread that calls serve(), until it goes or the service ends: takes each request
-// when the operation of the one before has returned, and sends replies as they come, from whatever thread. A request
-// keeps the process from ending until its reply is sent; a client that is silent does not.
+// Serves one accepted client, on the thread that calls serve(), until the client goes or the service ends. Takes the
+// next request when the operation of the one before has returned. Sends replies as they come, from any thread. A
+// request keeps the process alive until its reply is sent; a silent client does not.
 #pragma once
 
 #include <systemd/sd-bus.h>
@@ -27,13 +27,13 @@ public:
                   std::shared_ptr<ReplyBox> box, const ServiceLimits& limits, ProcessLifecycle& lifecycle);
     ~ClientSession() override;
 
-    // To stop it, set the flag and wake the box. While the socket is read or closed, the session has work in flight.
+    // To stop it, set the flag and wake the box. The session has work in flight while the socket is read or closed.
     void serve(const std::atomic<bool>& isStopping);
 
     void send(const RequestReply& reply) override;
 
 private:
-    // What sd-bus hands to the handler: an operation's own place among `methods_`.
+    // The handler's argument: an operation's own place among `methods_`.
     struct Method {
         ClientSession* session;
         wire::OperationIndex operation;

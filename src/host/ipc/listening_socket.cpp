@@ -33,7 +33,7 @@ const sockaddr* generic(const sockaddr_un& address) {
     return reinterpret_cast<const sockaddr*>(&address);
 }
 
-// Removes what a dead agent left; the error tells why it has to stay.
+// Checks that only a dead agent's socket, or nothing, is at the path. An error tells what prevents listening there.
 MaybeError makeRoom(const std::string& path, const sockaddr_un& address) {
     struct stat status;
     if (lstat(path.c_str(), &status) != 0)
@@ -67,7 +67,7 @@ MaybeError ListeningSocket::open(const std::string& path) {
     return std::nullopt;
 }
 
-// The stream socket that was passed, if any. One that this process has bound was bound at the same path.
+// Takes the stream socket that was passed, if any. One that this process has bound was bound at the same path.
 void ListeningSocket::takePassed(const std::string& path) {
     char** names = nullptr;
     const int count = sd_listen_fds_with_names(1, &names);
@@ -82,7 +82,7 @@ void ListeningSocket::takePassed(const std::string& path) {
     std::free(names);
 }
 
-// The file at the path goes with this process.
+// Notes the file at the path, which is removed with this process.
 void ListeningSocket::own(const std::string& path) {
     struct stat status;
     if (lstat(path.c_str(), &status) != 0) return;
@@ -96,8 +96,8 @@ PassedSocket ListeningSocket::release() {
     return {std::move(file_), isBoundByUs};
 }
 
-// The socket is made ready under a second name and then takes the path in one step: who finds it there can connect, and
-// nobody finds it with a mode that it will not keep.
+// Prepares the socket under a second name and renames it, so that whoever finds it at the path can connect, and it
+// never shows with a wrong mode.
 MaybeError ListeningSocket::bind(const std::string& path) {
     const std::string newPath = path + ".new";
     const std::optional<sockaddr_un> address = addressOf(path);

@@ -1,6 +1,6 @@
-// The socket at which clients connect: the one that the service manager passed, or an earlier program of this process,
-// else one bound at a path, which takes the place of a file that a dead agent left there. A socket that this process
-// has bound goes with it. Main thread.
+// The socket at which clients connect: one that the service manager or an earlier program of this process passed, else
+// one bound at a path, in place of a file that a dead agent left there. A socket bound by this process is removed with
+// it. Main thread.
 #pragma once
 
 #include <sys/types.h>
@@ -15,8 +15,8 @@ namespace vrx::host {
 // A socket for the program that this process executes next.
 struct PassedSocket {
     Descriptor file;
-    bool isBoundByUs = false;  // else the service manager keeps it
-    // The name under which such a socket is passed.
+    bool isBoundByUs = false;  // else the service manager owns it
+    // The name under which a socket bound by us is passed.
     static constexpr const char* boundByUsName = "vrxagent-bound";
 };
 
@@ -27,8 +27,8 @@ public:
     ListeningSocket(const ListeningSocket&) = delete;
     ListeningSocket& operator=(const ListeningSocket&) = delete;
 
-    // The error's code is EADDRINUSE when somebody answers at the path. The file is for its user alone, except in
-    // /run/vrxagent, a system service's, where every user may connect.
+    // The error's code is EADDRINUSE when somebody listens at the path. Only the agent's user may connect, except in
+    // /run/vrxagent, where the system service's socket is open to every user.
     platform::MaybeError open(const std::string& path);
 
     bool isOpen() const { return static_cast<bool>(file_); }
@@ -41,7 +41,7 @@ private:
     platform::MaybeError bind(const std::string& path);
 
     Descriptor file_;
-    std::string boundPath_;  // empty for one that the service manager keeps
+    std::string boundPath_;  // empty when the service manager owns the socket
     dev_t device_ = 0;
     ino_t inode_ = 0;
 };

@@ -37,7 +37,7 @@ bool hasEnded(const Descriptor& pidfd) {
     return poll(&ended, 1, 0) != 0;
 }
 
-// Whether the process was there before this moment: its number has not been taken over since.
+// Whether the process had started by that moment, so that its number was not reused since.
 bool hasStartedBefore(const Descriptor& process, const timespec& moment) {
     std::ifstream file("/proc/self/fd/" + std::to_string(process.number()) + "/stat");
     std::string text;
@@ -54,7 +54,7 @@ bool hasStartedBefore(const Descriptor& process, const timespec& moment) {
     return started <= moment.tv_sec * perSecond + moment.tv_nsec * perSecond / 1'000'000'000;
 }
 
-// The program's path, as long as the file that stands there is the program's.
+// The program's path, if the file there still is the program.
 std::string pathOfProgram(const Descriptor& process, const struct stat& program) {
     std::array<char, PATH_MAX> buffer;
     const ssize_t length = readlinkat(process.number(), "exe", buffer.data(), buffer.size());
@@ -66,6 +66,8 @@ std::string pathOfProgram(const Descriptor& process, const struct stat& program)
 
 }  // namespace
 
+// Opens the process's folder first and only then checks that the process has not ended: in this order the folder cannot
+// be another's.
 Result<PeerIdentity> PeerIdentity::ofPeer(int socket) {
     timespec now{};
     clock_gettime(CLOCK_BOOTTIME, &now);
@@ -85,7 +87,7 @@ Result<PeerIdentity> PeerIdentity::ofPeer(int socket) {
     peer.user_ = credentials.uid;
     peer.group_ = credentials.gid;
     peer.process_ = openProcessFolder(credentials.pid);
-    // The process lives, so the folder that was opened before is its own. A signal would not tell a zombie.
+    // The process still lives, so the folder opened above is its own. A signal of 0 would not detect a zombie.
     if (!peer.process_ || hasEnded(guard) || (!isExact && !hasStartedBefore(peer.process_, now)))
         return systemError("identify", "process " + std::to_string(credentials.pid), ESRCH);
     peer.findExecutable();

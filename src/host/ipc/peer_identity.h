@@ -1,7 +1,6 @@
 // Who is at the other end of a connection: the process that connected, its user and group at that time, and the program
-// that it runs. Race-free: a process that takes the same number later is never mistaken for the peer. The program tells
-// who calls; it proves nothing against hostile code of the same user, which can trace or preload it. One thread at a
-// time.
+// it runs. Race-free: a process that gets the same number later is never mistaken for the peer. The program tells who
+// calls, but proves nothing against hostile code of the same user, which can trace or preload it. One thread at a time.
 #pragma once
 
 #include <sys/stat.h>
@@ -16,18 +15,18 @@ namespace vrx::host {
 
 class PeerIdentity {
 public:
-    // An error when the peer has ended already.
+    // An error when the peer has already ended.
     static platform::Result<PeerIdentity> ofPeer(int socket);
 
     pid_t processIdentifier() const { return processIdentifier_; }
     uid_t user() const { return user_; }
     gid_t group() const { return group_; }
 
-    // The absolute path of the program. Empty when it may not be known (another user's or a protected process), and
-    // when the file at that path is not the program any more.
+    // The program's absolute path. Empty when it cannot be read (another user's or a protected process), and when
+    // another file is at that path by now.
     const std::string& executable() const { return executable_; }
 
-    // Whether the peer still lives and runs the program it ran when it was looked at.
+    // Whether the peer still lives and runs the program that it ran when it was identified.
     bool runsSameProgram() const;
 
 private:
@@ -43,7 +42,7 @@ private:
     std::string executable_;
 };
 
-// The path of the program that a process runs, by the rules of PeerIdentity::executable(), though not race-free.
+// The path of the program that a process runs, like PeerIdentity::executable(), but not race-free.
 std::string executableOfProcess(pid_t processIdentifier);
 
 }  // namespace vrx::host

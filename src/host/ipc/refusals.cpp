@@ -1,10 +1,8 @@
 #include "vrx/host/ipc/refusals.h"
 
 #include <poll.h>
-#include <sys/eventfd.h>
 
 #include <algorithm>
-#include <cerrno>
 #include <system_error>
 #include <vector>
 
@@ -14,7 +12,7 @@ namespace vrx::host {
 
 using std::chrono::steady_clock;
 
-// One client on its way out.
+// One refused client.
 class Refusals::Refused {
 public:
     Refused(Descriptor socket, pid_t peer, const char* errorName, std::string text, steady_clock::time_point end)
@@ -22,7 +20,7 @@ public:
         if (bus_.bus()) sd_bus_add_filter(bus_.bus(), nullptr, onMessage, this);
     }
 
-    // Does what can be done at once; whether there is more to come.
+    // Does what is possible without waiting. Returns whether more is to come.
     bool goesOn(steady_clock::time_point now) {
         ServerBus::Step step = ServerBus::Step::Progress;
         while (step == ServerBus::Step::Progress && !(isAnswered_ && bus_.unsentMessages() == 0)) step = bus_.step();
@@ -37,7 +35,7 @@ private:
         return static_cast<Refused*>(self)->answer(message);
     }
 
-    // Tools may introspect before they call: they stay until the call that was meant.
+    // Introspection does not count, because tools introspect before the call that they mean.
     int answer(sd_bus_message* message) {
         std::uint8_t type = 0;
         sd_bus_message_get_type(message, &type);
@@ -55,9 +53,7 @@ private:
     bool isAnswered_ = false;
 };
 
-Refusals::Refusals(const ServiceLimits& limits) : limits_(limits), wakeFile_(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {
-    if (!wakeFile_) throw std::system_error(errno, std::generic_category(), "eventfd");
-}
+Refusals::Refusals(const ServiceLimits& limits) : limits_(limits) {}
 
 Refusals::~Refusals() {
     {
@@ -73,7 +69,7 @@ void Refusals::refuse(Descriptor socket, pid_t peer, const char* errorName, std:
         try {
             thread_ = std::thread([this] { run(); });
         } catch (const std::system_error&) {
-            return;  // no thread to be had: the client learns nothing
+            return;  // without a thread the client learns nothing
         }
     }
     {
@@ -104,7 +100,8 @@ void Refusals::run() {
     present_.clear();
 }
 
-// Milliseconds until the first of those who stay has had its time, or -1.
+// Serves all, and removes those that have ended. Returns the milliseconds until the first of the others times out, or
+// -1.
 int Refusals::serveAll() {
     const auto now = steady_clock::now();
     const std::size_t ended = std::erase_if(present_, [now](auto& refused) { return !refused->goesOn(now); });

@@ -1,6 +1,6 @@
-// Tells refused clients why: takes each through authentication, answers its calls with the error, and closes after the
-// first that is not introspection. All share one thread, which is there from the first refusal on and sleeps while
-// there is none. Main thread.
+// Tells refused clients why: authenticates each, answers its calls with the error, and closes after the first that is
+// not introspection. All share one thread, which starts with the first refusal and sleeps while there is none. Main
+// thread.
 #pragma once
 
 #include <atomic>
@@ -23,7 +23,8 @@ public:
     Refusals(const Refusals&) = delete;
     Refusals& operator=(const Refusals&) = delete;
 
-    // Closes the socket at once when too many are being told, or when it takes the client too long to listen.
+    // Closes the socket at once when too many clients are being told, and later when the client takes too long to
+    // listen.
     void refuse(Descriptor socket, pid_t peer, const char* errorName, std::string text);
 
 private:
@@ -32,12 +33,12 @@ private:
     int serveAll();
 
     const ServiceLimits& limits_;
-    const Descriptor wakeFile_;
+    const Descriptor wakeFile_ = makeEventFile();
     std::mutex mutex_;
     std::list<std::unique_ptr<Refused>> arriving_;
-    std::size_t count_ = 0;  // of those that have not ended, arriving ones included
+    std::size_t count_ = 0;  // of all that have not ended
     bool isStopping_ = false;
-    std::list<std::unique_ptr<Refused>> present_;  // the thread's
+    std::list<std::unique_ptr<Refused>> present_;  // used by the thread only
     std::thread thread_;
 };
 

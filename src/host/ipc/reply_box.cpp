@@ -1,15 +1,6 @@
 #include "vrx/host/ipc/reply_box.h"
 
-#include <sys/eventfd.h>
-
-#include <cerrno>
-#include <system_error>
-
 namespace vrx::host {
-
-ReplyBox::ReplyBox() : wakeFile_(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {
-    if (!wakeFile_) throw std::system_error(errno, std::generic_category(), "eventfd");
-}
 
 void ReplyBox::put(RequestReply reply) {
     ReplySender* sender = nullptr;

@@ -1,5 +1,5 @@
-// Where the replies to one connection's requests are put: by the thread that serves the connection, which sends them at
-// once, or by any other, which hands them over. Replies outlive connections: those of one that has ended are dropped.
+// Collects the replies to one connection's requests. The thread that serves the connection sends its own at once; other
+// threads hand theirs over. Replies outlive connections: those to a closed connection are dropped.
 #pragma once
 
 #include <atomic>
@@ -23,7 +23,7 @@ namespace vrx::host {
 
 using RequestNumber = std::uint64_t;
 
-// The archived root of a reply, or nothing when the request was given up unanswered.
+// The archived root of a reply; nothing when the request was dropped without an answer.
 struct RequestReply {
     RequestNumber request;
     std::optional<platform::Value> root;
@@ -38,31 +38,29 @@ public:
 
 class ReplyBox {
 public:
-    ReplyBox();
-
     // Any thread.
     void put(RequestReply reply);
-    // Makes the wake file readable, so that the serving thread looks about.
+    // Makes the wake file readable, so that the serving thread looks at its state.
     void wake();
 
-    // The serving thread: opens the box for its sender, which is used on this thread only; sends what others have put,
-    // while the box is open.
+    // For the serving thread. open() names the sender, which is used on this thread only; sendPending() sends what
+    // other threads have put.
     void open(ReplySender& sender);
     void sendPending();
     void close();
     int wakeFile() const { return wakeFile_.number(); }
 
 private:
-    const Descriptor wakeFile_;
+    const Descriptor wakeFile_ = makeEventFile();
     std::mutex mutex_;
-    ReplySender* sender_ = nullptr;  // none while the box is not open
+    ReplySender* sender_ = nullptr;  // null while the box is not open
     std::thread::id servingThread_;
     std::vector<RequestReply> pending_;
     std::atomic<bool> hasPending_ = false;
 };
 
-// The obligation to answer one request. It keeps the object that serves the request alive, and the process; when it is
-// dropped, the caller is told that there will be no reply.
+// The obligation to answer one request. It keeps the process and the object that serves the request alive. Dropped
+// without an answer, it tells the caller that there will be no reply.
 class PendingReply {
 public:
     PendingReply(std::shared_ptr<ReplyBox> box, RequestNumber request, std::shared_ptr<VRXAgentProtocol> server,

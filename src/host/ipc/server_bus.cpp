@@ -13,7 +13,7 @@ namespace vrx::host {
 
 namespace {
 
-// Far above what a request needs; sd-bus by itself would gather 128 MiB.
+// Far above what a request needs. sd-bus alone would accept 128 MiB.
 constexpr std::uint64_t messageBytes = platform::limits::documentBytes;
 
 int answerHello(sd_bus_message* message, void*, sd_bus_error*) {
@@ -29,8 +29,8 @@ std::uint32_t numberAt(const std::array<unsigned char, 16>& header, std::size_t 
     return header[0] == nativeOrder ? number : __builtin_bswap32(number);
 }
 
-// Whether these bytes begin a message that is too long. In the middle of one they only look like it by chance, and only
-// of one that is long already.
+// Whether these bytes begin a message that is too long. Bytes in the middle of a message can look like it only by
+// chance, and only in one that is long already.
 bool beginsLongMessage(const std::array<unsigned char, 16>& header) {
     const bool isHeader =
         (header[0] == 'l' || header[0] == 'B') && header[1] >= 1 && header[1] <= 4 && header[2] < 8 && header[3] == 1;
@@ -63,7 +63,7 @@ ServerBus::~ServerBus() {
 ServerBus::Step ServerBus::step() {
     if (state_ >= 0) {
         const Incoming incoming = examineIncoming();
-        // sd-bus would read what has come since it was looked for.
+        // Otherwise sd-bus would read bytes that arrived after this examination.
         if (incoming == Incoming::Nothing && isDrained_ && !hasQueued()) return Step::Idle;
         state_ = incoming == Incoming::Refused ? -EACCES : sd_bus_process(bus_, nullptr);
         isDrained_ = isDrained_ || (state_ == 0 && isAuthenticated());
@@ -72,13 +72,13 @@ ServerBus::Step ServerBus::step() {
     return state_ > 0 ? Step::Progress : Step::Idle;
 }
 
-// Looks at what sd-bus will read next: who wrote it, and how long the message is that begins there. sd-bus gives
-// neither away. It reads a message in several reads, but no step reads beyond a message, and the kernel never joins in
-// one read what different processes wrote: so no message begins with another process's bytes.
+// Peeks at what sd-bus reads next: who wrote it, and the length of the message that begins there. sd-bus tells neither.
+// It reads a message in several reads, but never beyond it in one step, and the kernel never joins in one read what
+// different processes wrote: so no message begins with another process's bytes.
 ServerBus::Incoming ServerBus::examineIncoming() const {
     std::array<unsigned char, 16> header{};
     iovec content{header.data(), header.size()};
-    // No room for descriptors that come along: peeking would leave copies of them here.
+    // No room for descriptors: peeking would leave copies of them open here.
     alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(ucred))> control;
     msghdr peeked{};
     peeked.msg_iov = &content;

@@ -1,6 +1,5 @@
-// The agent's end of one client's socket, in D-Bus's protocol: takes the client through authentication and hands out
-// its messages. It answers Hello, with which stock tools begin although there is no bus daemon. Made on any thread and
-// then used by one.
+// The agent's end of one client's socket, speaking D-Bus: authenticates the client and dispatches its messages. It
+// answers Hello, which stock tools send first although there is no bus daemon. Made on any thread and then used by one.
 #pragma once
 
 #include <sys/types.h>
@@ -20,14 +19,14 @@ public:
         Ended,     // the client has gone, or was cut off
     };
 
-    // Messages are admitted from that process only.
+    // Only messages from that process are accepted.
     ServerBus(Descriptor socket, pid_t peer);
     ~ServerBus();
     ServerBus(const ServerBus&) = delete;
     ServerBus& operator=(const ServerBus&) = delete;
 
-    // Takes one step: a part of the authentication, or one message. To be called until it is idle before each wait,
-    // because a message may have come together with the end of the authentication and wait in sd-bus's own buffer.
+    // Takes one step: a part of the authentication, or one message. Repeat it until it returns Idle before each wait: a
+    // message can arrive together with the end of the authentication and wait in sd-bus's own buffer.
     Step step();
 
     bool isAuthenticated() const;
@@ -48,7 +47,7 @@ private:
     int socket_;
     const pid_t peer_;
     int state_ = 0;           // a negative errno once the connection is over
-    bool isDrained_ = false;  // sd-bus has handed out what came together with the end of the authentication
+    bool isDrained_ = false;  // sd-bus's buffer is empty after authentication
 };
 
 }  // namespace vrx::host

@@ -37,7 +37,7 @@ Value ServiceConnection::valueForEntitlement(std::string_view name) const {
 }
 
 void ServiceConnection::setExportedInterface(std::string_view protocolName) {
-    // The one that this host speaks.
+    // This host has one protocol.
     if (protocolName != VRXAgentProtocol::protocolName)
         throw std::invalid_argument("cannot export " + std::string(protocolName));
 }

@@ -1,4 +1,4 @@
-// One client's connection, from its acceptance on: tells the listener's delegate who the client is, and once resumed
+// One client's connection, from its acceptance on. Tells the listener's delegate who the client is, and once resumed
 // serves it on a thread of its own. Main thread.
 #pragma once
 
@@ -20,10 +20,10 @@ namespace vrx::host {
 
 class ServiceConnection final : public platform::ServiceConnection {
 public:
-    // onEnd is called on the connection's thread when it has nothing more to do.
+    // Calls onEnd on the connection's thread when it has ended.
     ServiceConnection(Descriptor socket, PeerIdentity peer, const BundleLookup& bundles, const ServiceLimits& limits,
                       ProcessLifecycle& lifecycle, std::function<void()> onEnd);
-    // Ends the connection. Waits for the operation under way, if any, to return; its reply goes nowhere.
+    // Ends the connection. Waits for a running operation to return; its reply is dropped.
     ~ServiceConnection() override;
 
     std::int32_t processIdentifier() const override { return peer_.processIdentifier(); }
@@ -35,12 +35,13 @@ public:
     const PeerIdentity& peer() const { return peer_; }
     bool isResumed() const { return thread_.joinable(); }
     bool hasEnded() const { return hasEnded_; }
-    // Whether the client has sent what its thread has not begun to read. Only while no work is in flight nor begins.
+    // Whether the client has sent something that its thread has not read. Valid only while no work is in flight and
+    // none can begin.
     bool hasUnread() const;
-    // Begins to end it, without waiting.
+    // Begins to end it without waiting.
     void stop();
 
-    // For a refusal: what to tell the client, and its socket, which is then no longer the connection's.
+    // For a refusal: the text for the client, and its socket, which this object then gives up.
     std::string refusal() const;
     Descriptor takeSocket() { return std::move(socket_); }
 

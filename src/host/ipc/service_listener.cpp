@@ -2,7 +2,6 @@
 
 #include <fcntl.h>
 #include <malloc.h>
-#include <sys/eventfd.h>
 #include <sys/socket.h>
 
 #include <algorithm>
@@ -40,7 +39,7 @@ public:
           lifecycle_(lifecycle),
           limits_(limits),
           refusals_(limits),
-          endedFile_(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)),
+          endedFile_(makeEventFile()),
           spare_(openSpare()) {
         endedSource_ = addReadSource(loop_, endedFile_.number(), onEnded, this);
         lifecycle_.setUnreadQuestion([this] { return hasUnread(); });
@@ -72,7 +71,7 @@ private:
 
     void removeEnded() {
         const auto ended = std::erase_if(connections_, [](auto& connection) { return connection->hasEnded(); });
-        // What serving took goes back to the system: it may be long until the next client comes.
+        // Returns freed memory to the system: the next client may be long in coming.
         if (ended > 0 && connections_.empty()) malloc_trim(0);
     }
 
@@ -93,8 +92,8 @@ private:
         }
     }
 
-    // There is no descriptor left for the client: it is accepted with the spare one and closed. Left in the queue, it
-    // would wake the loop without end.
+    // Without a free descriptor, accepts the client with the spare one and closes it. Left in the queue, it would wake
+    // the loop without end.
     void turnAway() {
         log(Level::Error, "A client was turned away: too many open files");
         spare_ = Descriptor();
@@ -103,9 +102,10 @@ private:
         spare_ = openSpare();
     }
 
+    // A refused client gets no thread of its own, and no object is made for it.
     void take(Descriptor client) {
         Result<PeerIdentity> peer = PeerIdentity::ofPeer(client.number());
-        if (!peer) return;  // it has gone
+        if (!peer) return;  // it has already ended
         removeEnded();
         if (connections_.size() >= limits_.connections)
             return refusals_.refuse(std::move(client), peer->processIdentifier(), wire::limitsExceeded,

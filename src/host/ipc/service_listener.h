@@ -1,12 +1,12 @@
 // The agent's service on a Unix socket: accepts clients on the main loop, asks the delegate about each, and serves each
 // accepted one on a thread of its own.
 //
-//     BundleLookup bundles([&] { return host.profile().facts(); });
+//     BundleLookup bundles([&] { return host.profile().content(); });
 //     ServiceListenerFactory factory(host.mainLoop().event(), bundles, host.lifecycle());
 //     if (MaybeError error = factory.open(socketPath)) …         // tell, and exit
 //     host.setServiceListenerFactory(&factory);
 //
-// Everything on the main thread.
+// Main thread.
 #pragma once
 
 #include <systemd/sd-event.h>
@@ -25,20 +25,20 @@ namespace vrx::host {
 
 class ServiceListenerFactory final : public platform::ServiceListenerFactory {
 public:
-    // The event loop, the lookup and the lifecycle are not owned and must outlive the factory; it must outlive its
-    // listeners.
+    // The event loop, the lookup and the lifecycle must outlive the factory, and the factory its listeners.
     ServiceListenerFactory(sd_event* loop, const BundleLookup& bundles, ProcessLifecycle& lifecycle,
                            const ServiceLimits& limits = {})
         : loop_(loop), bundles_(bundles), lifecycle_(lifecycle), limits_(limits) {}
 
-    // Takes the socket that the service manager passed, else binds one at the path. Clients can connect from now on,
-    // and wait until the listener is resumed. An error's text is for people.
+    // Takes the socket that the service manager passed, else binds one at the path. Clients can connect from now on and
+    // wait until the listener is resumed. An error's text is for people.
     platform::MaybeError open(const std::string& socketPath) { return socket_.open(socketPath); }
 
-    // One at a time, of the open socket, whatever the service's name.
+    // One at a time, for the open socket, whatever the service's name.
     std::unique_ptr<platform::ServiceListener> makeListener(std::string serviceName) override;
 
-    // The open socket, for the program that this process executes next: clients that connect meanwhile wait in it.
+    // Gives up the open socket, for the program that this process executes next. Clients that connect meanwhile wait in
+    // it.
     PassedSocket release() { return socket_.release(); }
 
 private:

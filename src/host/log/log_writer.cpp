@@ -22,28 +22,28 @@ namespace vrx::host {
 
 namespace {
 
-// How long records are gathered: one wake-up serves them all.
+// How long records are gathered, so that one wake-up writes them all.
 constexpr std::chrono::milliseconds gatheringTime(5);
-// With so much pending they are written at once.
+// With more bytes pending than this they are written at once.
 constexpr std::size_t enoughPending = 16 * 1024;
-// With so much pending whoever logs waits for the thread: nothing is dropped, and memory stays bounded.
+// With more bytes pending than this a thread that logs waits: nothing is dropped, and memory stays bounded.
 constexpr std::size_t mostPending = 64 * 1024;
 
 sockaddr_un journalAddress() {
     return {AF_UNIX, "/run/systemd/journal/socket"};
 }
 
-int openJournal() {
-    const int socket = ::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+Descriptor openJournal() {
+    Descriptor journal(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
     constexpr int size = 8 * 1024 * 1024;  // the journal may be slow for a while
-    if (socket >= 0) setsockopt(socket, SOL_SOCKET, SO_SNDBUF, &size, sizeof size);
-    return socket;
+    if (journal) setsockopt(journal.number(), SOL_SOCKET, SO_SNDBUF, &size, sizeof size);
+    return journal;
 }
 
 }  // namespace
 
-// At a signal that ends the process, lets the writers write what they have, and leaves the rest to whoever handled the
-// signal before.
+// At a fatal signal, lets all writers write what is pending, restores the signal's previous handler and raises it
+// again.
 class LogWriter::CrashGuard {
 public:
     static void add(LogWriter* writer) {
@@ -86,12 +86,13 @@ private:
             if (signals[i] == signal) sigaction(signal, &previous()[i], nullptr);
         for (auto& slot : writers())
             if (LogWriter* writer = slot.exchange(nullptr)) writer->flushInCrash();
-        // What faulted faults again when this returns; what was sent is sent again.
+        // A fault would repeat on return by itself; a signal that was sent would not.
         raise(signal);
     }
 };
 
-LogWriter::LogWriter(int file, Form form) : file_(file), journal_(form == Form::Journal ? openJournal() : -1) {
+LogWriter::LogWriter(int file, Form form)
+    : file_(file), journal_(form == Form::Journal ? openJournal() : Descriptor()) {
     CrashGuard::add(this);
 }
 
@@ -104,7 +105,6 @@ LogWriter::~LogWriter() {
     }
     if (thread_.joinable()) thread_.join();
     flush();
-    if (journal_ >= 0) ::close(journal_);
 }
 
 std::string_view LogWriter::Batch::record(std::size_t index) const {
@@ -119,7 +119,7 @@ void LogWriter::add(std::string_view record) {
     pending_.bytes += record;
     pending_.ends.push_back(pending_.bytes.size());
     if (!thread_.joinable()) {
-        // Signals are others' business.
+        // The new thread takes no signals.
         sigset_t all, before;
         sigfillset(&all);
         pthread_sigmask(SIG_SETMASK, &all, &before);
@@ -160,8 +160,8 @@ void LogWriter::flush() {
 }
 
 void LogWriter::write(const Batch& batch) const {
-    if (journal_ >= 0) return sendToJournal(batch);
-    // Lines together as long as the system keeps them whole beside those of other processes.
+    if (journal_) return sendToJournal(batch);
+    // Joins lines up to PIPE_BUF: a write of that size is not mixed with those of other processes.
     for (std::size_t begin = 0, next = 0; next < batch.ends.size();) {
         std::size_t end = batch.ends[next++];
         while (next < batch.ends.size() && batch.ends[next] - begin <= PIPE_BUF) end = batch.ends[next++];
@@ -170,7 +170,7 @@ void LogWriter::write(const Batch& batch) const {
     }
 }
 
-// What a full pipe refuses is lost.
+// Drops what a full pipe refuses.
 void LogWriter::writeToFile(std::string_view bytes) const {
     while (!bytes.empty()) {
         const ssize_t count = ::write(file_, bytes.data(), bytes.size());
@@ -180,6 +180,7 @@ void LogWriter::writeToFile(std::string_view bytes) const {
     }
 }
 
+// Sends as many datagrams as possible with one system call.
 void LogWriter::sendToJournal(const Batch& batch) const {
     constexpr std::size_t most = 64;
     sockaddr_un address = journalAddress();
@@ -195,7 +196,7 @@ void LogWriter::sendToJournal(const Batch& batch) const {
             messages[i].msg_hdr.msg_iov = &parts[i];
             messages[i].msg_hdr.msg_iovlen = 1;
         }
-        const int sent = sendmmsg(journal_, messages.data(), static_cast<unsigned>(count), MSG_NOSIGNAL);
+        const int sent = sendmmsg(journal_.number(), messages.data(), static_cast<unsigned>(count), MSG_NOSIGNAL);
         if (sent > 0) {
             next += static_cast<std::size_t>(sent);
         } else if (errno != EINTR) {
@@ -204,7 +205,7 @@ void LogWriter::sendToJournal(const Batch& batch) const {
     }
 }
 
-// Too large for a datagram, which the journal's own library knows a way for; or there is no journal.
+// For a record that is too large for a datagram, which the journal's library can send, or when there is no journal.
 void LogWriter::sendLargeToJournal(std::string_view record) const {
     std::vector<iovec> fields;
     for (std::string_view rest = record; !rest.empty();) {
@@ -215,7 +216,7 @@ void LogWriter::sendLargeToJournal(std::string_view record) const {
     if (sd_journal_sendv(fields.data(), static_cast<int>(fields.size())) < 0) writeToFile(record);
 }
 
-// Within a signal handler: the thread that holds a lock may be the one that was struck, and is waited for a while only.
+// Runs in a signal handler. The interrupted thread may hold the locks itself, so they are only tried for a while.
 void LogWriter::flushInCrash() {
     auto lockInTime = [](std::mutex& mutex) {
         constexpr int tries = 50;

@@ -1,7 +1,7 @@
-// Takes the log's records from all threads and writes them on a thread of its own, some at a time, in the order in
-// which they came: whoever logs waits for no file and no journal. A record is written within milliseconds, at once by
-// flush(), and before the process ends, cleanly or by a crash; kill -9 loses the last milliseconds. The thread comes
-// with the first record and sleeps while there is none.
+// Writes the log's records on a thread of its own, in batches and in their order, so that a thread that logs does not
+// wait for the file or the journal. A record is written within milliseconds, at once by flush(), and before the process
+// ends, also when it crashes; kill -9 loses the last milliseconds. The thread starts with the first record and sleeps
+// while there is none.
 #pragma once
 
 #include <condition_variable>
@@ -11,13 +11,15 @@
 #include <thread>
 #include <vector>
 
+#include "vrx/host/base/descriptor.h"
+
 namespace vrx::host {
 
 class LogWriter {
 public:
     enum class Form {
         Lines,    // to the file
-        Journal,  // each a datagram of the journal's, NAME=VALUE lines; to the file what the journal does not take
+        Journal,  // NAME=VALUE lines, a datagram each; to the file what the journal does not take
     };
 
     // The file is not owned.
@@ -49,7 +51,7 @@ private:
     void flushInCrash();
 
     const int file_;
-    const int journal_;  // a socket, or -1
+    const Descriptor journal_;  // a socket; none for lines
 
     std::mutex writing_;  // taken before mutex_
     Batch writtenBatch_;  // its memory is used again; under writing_

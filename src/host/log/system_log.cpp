@@ -26,8 +26,8 @@ bool isJournalStream(int file) {
     return std::to_string(status.st_dev) + ":" + std::to_string(status.st_ino) == stream;
 }
 
-// Control characters, those of Unicode's second range and its line separators become escapes, so that an argument
-// neither forges a line nor steers a terminal.
+// Escapes control characters, those of Unicode's second range and its line separators, so that an argument can neither
+// forge a line nor steer a terminal.
 std::string escaped(std::string_view text) {
     std::string result;
     result.reserve(text.size());

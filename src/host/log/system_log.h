@@ -1,6 +1,6 @@
-// The log: the journal when standard error is connected to it, else one line an entry on standard error. Private
-// arguments are redacted in both, and nothing in an argument can begin a line of its own. Any thread may log; an error
-// is written before the call returns, everything else soon after.
+// The log: the journal when standard error is connected to it, else a line for each entry on standard error. Private
+// arguments are redacted in both, and nothing in an argument can begin a line. Any thread may log. An error is written
+// before the call returns, everything else soon after.
 #pragma once
 
 #include "vrx/host/log/log_writer.h"
@@ -16,7 +16,7 @@ public:
     bool isOn(platform::Level level) const override { return level >= lowest_; }
     void write(const platform::LogEntry& entry) override;
 
-    // Writes what was logged before: for what ends the process without a word.
+    // Writes what is pending. For code that is about to end the process abruptly.
     void flush() { writer_.flush(); }
 
 private:

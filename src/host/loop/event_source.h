@@ -1,4 +1,4 @@
-// A source of events on the main loop, which goes with its owner.
+// Event sources of the main loop, each removed when its owner is destroyed.
 #pragma once
 
 #include <systemd/sd-event.h>
@@ -17,14 +17,32 @@ struct EventSourceRelease {
 };
 using EventSource = std::unique_ptr<sd_event_source, EventSourceRelease>;
 
+struct EventLoopRelease {
+    void operator()(sd_event* loop) const { sd_event_unref(loop); }
+};
+using EventLoop = std::unique_ptr<sd_event, EventLoopRelease>;
+
 inline void checkEventCall(int result, const char* what) {
     if (result < 0) throw std::system_error(-result, std::generic_category(), what);
+}
+
+inline EventLoop makeEventLoop() {
+    sd_event* loop = nullptr;
+    checkEventCall(sd_event_new(&loop), "event loop");
+    return EventLoop(loop);
 }
 
 // Calls whenever there is something to read.
 inline EventSource addReadSource(sd_event* loop, int file, sd_event_io_handler_t handler, void* userdata) {
     sd_event_source* source = nullptr;
     checkEventCall(sd_event_add_io(loop, &source, file, EPOLLIN, handler, userdata), "event source");
+    return EventSource(source);
+}
+
+// Calls at the signal, which must be blocked.
+inline EventSource addSignalSource(sd_event* loop, int signal, sd_event_signal_handler_t handler, void* userdata) {
+    sd_event_source* source = nullptr;
+    checkEventCall(sd_event_add_signal(loop, &source, signal, handler, userdata), "signal");
     return EventSource(source);
 }
 
@@ -38,7 +56,7 @@ inline EventSource addBootTimer(sd_event* loop, sd_event_time_handler_t handler,
     return owner;
 }
 
-// Once, at a time since boot; what has no sensible end is some centuries.
+// Fires once, at a time since boot; after some 300 years at the latest.
 inline void armTimer(const EventSource& timer, platform::Duration sinceBoot) {
     constexpr platform::Duration longest{1e10};
     const auto microseconds = std::chrono::ceil<std::chrono::microseconds>(std::min(sinceBoot, longest));

@@ -35,7 +35,7 @@ FileWatch::FileWatch(sd_event* loop, std::vector<std::string> paths, platform::D
       onChange_(std::move(onChange)),
       file_(inotify_init1(IN_NONBLOCK | IN_CLOEXEC)) {
     pauseSource_ = addBootTimer(loop, onPause, this);
-    if (!file_) {  // the user's programs have used up what there is of them
+    if (!file_) {  // the user's limit of inotify instances is reached
         log(platform::Level::Error, "Changes of %@ go unnoticed: %@", paths_.front(), std::strerror(errno));
         return;
     }
@@ -48,7 +48,7 @@ void FileWatch::callIn(platform::Duration delay) {
     armTimer(pauseSource_, bootTime() + delay);
 }
 
-// Which folders these are changes with what happens in them.
+// Done anew after each event: links and missing folders change which folders there are.
 void FileWatch::watchFolders() {
     std::set<int> watches;
     for (const std::string& path : paths_) addFolders(path, watches);
@@ -57,8 +57,8 @@ void FileWatch::watchFolders() {
     watches_ = std::move(watches);
 }
 
-// A folder that goes away tells so itself; that one comes, or that a link leads to another, is told by the one above,
-// which may be a busy place: it is watched only for that.
+// A folder reports its own removal. That it appears, or that a link to it changes, is reported by the folder above,
+// which is watched for nothing else because it may be busy.
 void FileWatch::addFolders(const std::string& path, std::set<int>& watches) const {
     constexpr std::uint32_t coming = IN_CREATE | IN_MOVED_TO;
     constexpr std::uint32_t anything =
@@ -72,19 +72,19 @@ void FileWatch::addFolders(const std::string& path, std::set<int>& watches) cons
     std::error_code none;
     if (!add(folder, anything) || std::filesystem::is_symlink(folder, none)) {
         add(folderOf(folder), coming);
-        add(folder, anything);  // it may have come meanwhile
+        add(folder, anything);  // it may have appeared meanwhile
     }
     add(folderOf(resolved(path)), anything);
 }
 
-// What exactly happened doesn't matter: there may have been too much of it to be told.
+// Ignores what exactly happened: some events may have been lost.
 int FileWatch::onEvents(sd_event_source*, int file, std::uint32_t, void* userdata) {
     alignas(inotify_event) std::array<char, 16384> events;
     while (read(file, events.data(), events.size()) > 0) {
     }
     auto& self = *static_cast<FileWatch*>(userdata);
     self.watchFolders();
-    // The pause begins with the first of several changes: it ends, however many follow.
+    // The pause starts with the first change and is not prolonged by others, so that it ends.
     if (!std::exchange(self.isPausing_, true)) armTimer(self.pauseSource_, bootTime() + self.pause_);
     return 0;
 }

@@ -1,7 +1,6 @@
-// Tells when one of some files may have changed: whether it is written in place, replaced by another of its name,
-// removed, or comes and goes with its folder. It is told by what happens in the folder, by whatever name, because that
-// is where editors do what they do; and says so only after a short pause, so that many changes in a row are one. It
-// costs nothing while nothing happens. Main thread.
+// Calls when one of some files may have changed: was written in place, replaced or removed, or came or went with its
+// folder. It watches the folders, because editors replace files by renaming. It calls after a short pause, so that a
+// row of changes makes one call. Costs nothing while nothing happens. Main thread.
 #pragma once
 
 #include <functional>
@@ -22,7 +21,7 @@ public:
     FileWatch(const FileWatch&) = delete;
     FileWatch& operator=(const FileWatch&) = delete;
 
-    // Calls as if something had changed, after that time, or sooner if something does.
+    // Calls after the delay as if something had changed, or sooner if something does.
     void callIn(platform::Duration delay);
 
 private:

@@ -1,13 +1,10 @@
 #include "vrx/host/loop/main_loop.h"
 
 #include <sys/eventfd.h>
-#include <unistd.h>
 
 #include <algorithm>
-#include <cerrno>
 #include <ctime>
 #include <iterator>
-#include <system_error>
 
 namespace vrx::host {
 
@@ -22,61 +19,46 @@ std::uint64_t bootMicroseconds() {
     return static_cast<std::uint64_t>(now.tv_sec) * 1'000'000 + static_cast<std::uint64_t>(now.tv_nsec) / 1'000;
 }
 
-// Later than now by the delay, rounded up; what has no sensible end is a century.
+// Now plus the delay, rounded up; a century at most.
 std::uint64_t dueTime(Duration delay) {
     constexpr double century = 100.0 * 366 * 86400;
     double seconds = delay.count() < century ? delay.count() : century;
     return bootMicroseconds() + static_cast<std::uint64_t>(seconds * 1e6) + 1;
 }
 
-void check(int result, const char* what) {
-    if (result < 0) throw std::system_error(-result, std::generic_category(), what);
-}
-
 }  // namespace
 
-MainLoop::MainLoop() {
+MainLoop::BlockedSignals::BlockedSignals() {
     sigset_t stopping;
     sigemptyset(&stopping);
     sigaddset(&stopping, SIGTERM);
     sigaddset(&stopping, SIGINT);
-    pthread_sigmask(SIG_BLOCK, &stopping, &previousSignals_);
-
-    check(sd_event_new(&event_), "event loop");
-    auto onSignal = [](sd_event_source*, const signalfd_siginfo*, void* self) {
-        static_cast<MainLoop*>(self)->wasStoppedBySignal_ = true;
-        static_cast<MainLoop*>(self)->stop();
-        return 0;
-    };
-    check(sd_event_add_signal(event_, nullptr, SIGTERM, onSignal, this), "SIGTERM");
-    check(sd_event_add_signal(event_, nullptr, SIGINT, onSignal, this), "SIGINT");
-
-    wakeFile_ = eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK);
-    check(wakeFile_ < 0 ? -errno : 0, "eventfd");
-    check(sd_event_add_io(event_, &wakeSource_, wakeFile_, EPOLLIN, onWake, this), "eventfd");
-    // Accurate to a millisecond, and never early.
-    check(sd_event_add_time(event_, &timerSource_, CLOCK_BOOTTIME, 0, 1000, onTimer, this), "timer");
-    check(sd_event_source_set_enabled(timerSource_, SD_EVENT_OFF), "timer");
+    pthread_sigmask(SIG_BLOCK, &stopping, &previous_);
 }
 
+MainLoop::BlockedSignals::~BlockedSignals() {
+    pthread_sigmask(SIG_SETMASK, &previous_, nullptr);
+}
+
+MainLoop::MainLoop()
+    : event_(makeEventLoop()),
+      wakeFile_(makeEventFile()),
+      sigtermSource_(addSignalSource(event_.get(), SIGTERM, onSignal, this)),
+      sigintSource_(addSignalSource(event_.get(), SIGINT, onSignal, this)),
+      timerSource_(addBootTimer(event_.get(), onTimer, this)),
+      wakeSource_(addReadSource(event_.get(), wakeFile_.number(), onWake, this)) {}
+
 MainLoop::~MainLoop() {
-    {
-        // A task that is let go may post again while it goes.
-        platform::ShutdownScope shutdown;
-        while (true) {
-            std::deque<Task> posted;
-            std::multimap<std::uint64_t, Timer> timers;
-            std::lock_guard lock(mutex_);
-            posted.swap(posted_);
-            timers.swap(timers_);
-            if (posted.empty() && timers.empty()) break;
-        }
+    // Repeats, because destroying a task may post another.
+    platform::ShutdownScope shutdown;
+    while (true) {
+        std::deque<Task> posted;
+        std::multimap<std::uint64_t, Timer> timers;
+        std::lock_guard lock(mutex_);
+        posted.swap(posted_);
+        timers.swap(timers_);
+        if (posted.empty() && timers.empty()) break;
     }
-    sd_event_source_unref(timerSource_);
-    sd_event_source_unref(wakeSource_);
-    sd_event_unref(event_);
-    ::close(wakeFile_);
-    pthread_sigmask(SIG_SETMASK, &previousSignals_, nullptr);
 }
 
 void MainLoop::run() {
@@ -85,7 +67,7 @@ void MainLoop::run() {
             std::lock_guard lock(mutex_);
             if (std::exchange(isStopping_, false)) return;
         }
-        check(sd_event_run(event_, UINT64_MAX), "event loop");
+        checkEventCall(sd_event_run(event_.get(), UINT64_MAX), "event loop");
     }
 }
 
@@ -123,7 +105,13 @@ void MainLoop::postAfter(Duration delay, std::shared_ptr<Queue> queue, Task task
 
 void MainLoop::wake() {
     // It can only fail when the counter is full, and then the loop is awake.
-    [[maybe_unused]] int result = eventfd_write(wakeFile_, 1);
+    [[maybe_unused]] int result = eventfd_write(wakeFile_.number(), 1);
+}
+
+int MainLoop::onSignal(sd_event_source*, const signalfd_siginfo*, void* self) {
+    static_cast<MainLoop*>(self)->wasStoppedBySignal_ = true;
+    static_cast<MainLoop*>(self)->stop();
+    return 0;
 }
 
 int MainLoop::onWake(sd_event_source*, int file, unsigned, void* self) {
@@ -140,7 +128,7 @@ int MainLoop::onTimer(sd_event_source*, std::uint64_t, void* self) {
     return 0;
 }
 
-// Only what was posted by now: what the tasks post runs in the next round, after other events had their turn.
+// Runs only what has been posted so far. What these tasks post runs in the next round, after other events.
 void MainLoop::runPosted() {
     std::deque<Task> tasks;
     std::unique_lock lock(mutex_);
@@ -177,8 +165,9 @@ void MainLoop::armTimer() {
     const bool isNeeded = !timers_.empty();
     const std::uint64_t due = isNeeded ? timers_.begin()->first : 0;
     lock.unlock();
-    if (isNeeded) check(sd_event_source_set_time(timerSource_, due), "timer");
-    check(sd_event_source_set_enabled(timerSource_, isNeeded ? SD_EVENT_ONESHOT : SD_EVENT_OFF), "timer");
+    if (isNeeded) checkEventCall(sd_event_source_set_time(timerSource_.get(), due), "timer");
+    checkEventCall(sd_event_source_set_enabled(timerSource_.get(), isNeeded ? SD_EVENT_ONESHOT : SD_EVENT_OFF),
+                   "timer");
 }
 
 }  // namespace vrx::host

@@ -1,8 +1,6 @@
-// The event loop of the main thread, on sd-event: the main queue, and the timers of every queue. Made, run and taken
-// down on the main thread; everything else any thread may call. It sleeps without a time limit while nothing is due.
+// The event loop of the main thread, on sd-event: the main queue, and the timers of every queue. Made, run and
+// destroyed on the main thread; any thread may call the rest. Sleeps without a time limit while nothing is due.
 #pragma once
-
-#include <systemd/sd-event.h>
 
 #include <csignal>
 #include <deque>
@@ -10,20 +8,22 @@
 #include <memory>
 #include <mutex>
 
+#include "vrx/host/base/descriptor.h"
+#include "vrx/host/loop/event_source.h"
 #include "vrx/platform/queue.h"
 
 namespace vrx::host {
 
 class MainLoop final : public platform::Queue {
 public:
-    // Takes over SIGTERM and SIGINT, which stop the loop; threads made from now on leave them to it.
+    // Takes over SIGTERM and SIGINT, which stop the loop. Threads made from now on have them blocked.
     MainLoop();
-    // What has not run is discarded.
+    // Discards tasks that have not run.
     ~MainLoop() override;
     MainLoop(const MainLoop&) = delete;
     MainLoop& operator=(const MainLoop&) = delete;
 
-    // Runs until stopped: by stop(), also before the call, or by a signal. It can be run again.
+    // Runs until stop() is called, which may be before run(), or a signal comes. It can be run again.
     void run();
     void stop();
     // Whether a signal has ever stopped it.
@@ -35,7 +35,7 @@ public:
     void postAfter(platform::Duration delay, std::shared_ptr<platform::Queue> queue, platform::Task task);
 
     // For other sources of events, which belong to the main thread.
-    sd_event* event() const { return event_; }
+    sd_event* event() const { return event_.get(); }
 
 private:
     struct Timer {
@@ -43,6 +43,19 @@ private:
         platform::Task task;
     };
 
+    // SIGTERM and SIGINT, blocked for as long as it lives.
+    class BlockedSignals {
+    public:
+        BlockedSignals();
+        ~BlockedSignals();
+        BlockedSignals(const BlockedSignals&) = delete;
+        BlockedSignals& operator=(const BlockedSignals&) = delete;
+
+    private:
+        sigset_t previous_;
+    };
+
+    static int onSignal(sd_event_source*, const signalfd_siginfo*, void* self);
     static int onWake(sd_event_source*, int file, unsigned events, void* self);
     static int onTimer(sd_event_source*, std::uint64_t due, void* self);
     void wake();
@@ -50,11 +63,13 @@ private:
     void postDueTimers();
     void armTimer();
 
-    sd_event* event_ = nullptr;
-    sd_event_source* wakeSource_ = nullptr;
-    sd_event_source* timerSource_ = nullptr;
-    int wakeFile_ = -1;
-    sigset_t previousSignals_;
+    const BlockedSignals blockedSignals_;
+    const EventLoop event_;
+    const Descriptor wakeFile_;
+    const EventSource sigtermSource_;
+    const EventSource sigintSource_;
+    const EventSource timerSource_;
+    const EventSource wakeSource_;
     bool wasStoppedBySignal_ = false;
 
     std::mutex mutex_;

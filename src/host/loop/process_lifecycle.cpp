@@ -46,7 +46,7 @@ WorkInFlight ProcessLifecycle::begin(const std::shared_ptr<State>& state) {
             }};
 }
 
-// On the main thread, and after what is posted already: it may begin work.
+// Decides on the main thread, after the tasks that are posted already: they may begin work.
 void ProcessLifecycle::considerEnd(const std::shared_ptr<State>& state) {
     if (state->isExitWanted && state->inFlight == 0 && state->mainLoop)
         state->mainLoop->post([state] { endIfIdle(*state); });

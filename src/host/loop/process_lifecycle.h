@@ -1,5 +1,5 @@
-// When the agent may end without loss: once that was asked for and nothing is under way. It then stops the main loop,
-// and the program ends. Any thread may use it, where nothing else is said.
+// Ends the process without loss: once the end is asked for and no work is in flight, it stops the main loop. Any thread
+// may use it, except where noted.
 #pragma once
 
 #include <functional>
@@ -13,7 +13,7 @@ namespace vrx::host {
 
 class ProcessLifecycle final : public platform::ProcessLifecycle {
 public:
-    // The loop must outlive the lifecycle, which pieces of work may outlive.
+    // The loop must outlive the lifecycle; pieces of work may outlive both.
     explicit ProcessLifecycle(MainLoop& mainLoop) : state_(std::make_shared<State>(mainLoop)) {}
     ~ProcessLifecycle() override;
     ProcessLifecycle(const ProcessLifecycle&) = delete;
@@ -21,13 +21,13 @@ public:
 
     void exitCleanWhenIdle() override;
     platform::WorkInFlight beginWork() override;
-    // Null once the end is decided on: what has been sent to this process then is left to the next one.
+    // Returns null once the end is decided: what arrives then is left to the next process.
     platform::WorkInFlight beginWorkUnlessEnding();
-    // Asked on the main thread, when no work is in flight and none can begin, whether something has come in that is yet
-    // to be looked at: whoever does so will begin work. Main thread.
+    // Sets the question that is asked before the end: has something arrived that nobody has read? Whoever reads it
+    // begins work. It is asked on the main thread while no work is in flight and none can begin. Main thread.
     void setUnreadQuestion(std::function<bool()> hasUnread);
 
-    // Whether the end is decided on.
+    // Whether the end is decided.
     bool isEnding() const;
 
 private:
@@ -35,7 +35,7 @@ private:
         explicit State(MainLoop& mainLoop) : mainLoop(&mainLoop) {}
 
         std::mutex mutex;
-        MainLoop* mainLoop;  // none when the lifecycle has gone
+        MainLoop* mainLoop;  // null once the lifecycle is gone
         std::function<bool()> hasUnread;
         int inFlight = 0;
         bool isExitWanted = false;

@@ -51,7 +51,7 @@ std::size_t WorkerPool::threadCount() const {
     return threads_.size();
 }
 
-// A thread that was told of work counts as idle until it has it, hence the comparison with all that is pending.
+// A notified thread counts as idle until it runs: hence the comparison of idle threads with all pending tasks.
 void WorkerPool::addThreadIfNeeded() {
     if (isStopping_ || pending() <= idle_ || active() >= size_) return;
     try {
@@ -75,7 +75,7 @@ void WorkerPool::work() {
         task = nullptr;
         lock.lock();
     }
-    // Nobody waits for this thread but the next one to end, or the end of the pool.
+    // This thread is joined by the next one that ends, or by stop().
     auto own = threads_.find(std::this_thread::get_id());
     std::thread previous = std::exchange(ended_, std::move(own->second));
     threads_.erase(own);
@@ -84,7 +84,8 @@ void WorkerPool::work() {
     if (previous.joinable()) previous.join();
 }
 
-// False when the thread is to end.
+// Takes the next task, user-initiated ones first, and waits for one if need be. Returns false when the thread is to
+// end.
 bool WorkerPool::takeTask(std::unique_lock<std::mutex>& lock, Task& task) {
     bool wasLongIdle = false;
     while (!isStopping_) {
@@ -124,7 +125,7 @@ WorkerPool::WaitingScope::~WaitingScope() {
 
 namespace {
 
-// One task at a time, in the order of posting, on whatever worker is free.
+// Runs one task at a time, in the order of posting, on whatever worker is free.
 class SerialQueue final : public platform::Queue, public std::enable_shared_from_this<SerialQueue> {
 public:
     SerialQueue(std::weak_ptr<WorkerPool> pool, MainLoop& mainLoop) : pool_(std::move(pool)), mainLoop_(mainLoop) {}
@@ -147,8 +148,8 @@ public:
     }
 
 private:
-    // The queue's turn on a worker. One that the pool discards at its end, unrun, lets the tasks go: they may hold what
-    // holds the queue.
+    // The queue's turn on a worker. One that a stopping pool discards destroys the queue's tasks, which may own the
+    // queue.
     class Turn {
     public:
         explicit Turn(std::shared_ptr<SerialQueue> queue) : queue_(std::move(queue)) {}
@@ -169,7 +170,7 @@ private:
 
     void discardAll() {
         platform::ShutdownScope shutdown;
-        std::deque<Task> discarded;  // goes outside the lock: what it holds may post here
+        std::deque<Task> discarded;  // destroyed outside the lock: a task's destruction may post here
         std::lock_guard lock(mutex_);
         discarded.swap(tasks_);
         isRunning_ = false;
@@ -203,7 +204,7 @@ public:
     void set() override {
         std::lock_guard lock(mutex_);
         isSet_ = true;
-        // Under the lock: who waited may let go of the event at once.
+        // Under the lock: the waiting thread may destroy the event as soon as it wakes.
         changed_.notify_all();
     }
 
@@ -218,7 +219,7 @@ public:
     }
 
     bool waitFor(Duration limit) override {
-        // Long enough for ever, short enough for the clock.
+        // A longer time would overflow the clock.
         constexpr Duration longest = std::chrono::hours(24 * 365);
         std::unique_lock lock(mutex_);
         if (isSet_) return true;

@@ -18,15 +18,15 @@ namespace vrx::host {
 
 class WorkerPool {
 public:
-    // Threads come with the first work. Surplus ones go when they found nothing to do for the given time.
+    // Threads start with the first work. Surplus ones end after the given time without work.
     explicit WorkerPool(std::size_t size, platform::Duration surplusIdleTime = std::chrono::seconds(5));
-    // Waits for the tasks that run; what has not begun is discarded.
+    // Waits for running tasks; discards those that have not begun.
     ~WorkerPool();
     WorkerPool(const WorkerPool&) = delete;
     WorkerPool& operator=(const WorkerPool&) = delete;
 
     void post(platform::Priority priority, platform::Task task);
-    // Discards what has not begun, now and from now on, and waits for the rest.
+    // Discards tasks that have not begun, also those posted from now on, and waits for running ones.
     void stop();
     std::size_t threadCount() const;
 
@@ -59,7 +59,7 @@ private:
     std::condition_variable hasEnded_;
     std::array<std::deque<platform::Task>, 2> tasks_;  // by priority
     std::map<std::thread::id, std::thread> threads_;
-    std::thread ended_;  // the last one that did
+    std::thread ended_;  // the thread that ended last, for the next one to join
     std::size_t idle_ = 0;
     std::size_t waiting_ = 0;  // for events
     bool isStopping_ = false;
@@ -68,7 +68,7 @@ private:
 class Queues final : public platform::Queues {
 public:
     explicit Queues(MainLoop& mainLoop, std::size_t size = std::thread::hardware_concurrency());
-    // Waits for the tasks that run; what has not begun is discarded.
+    // Waits for running tasks; discards those that have not begun.
     ~Queues() override;
 
     platform::Queue& mainQueue() override { return mainLoop_; }
@@ -76,7 +76,7 @@ public:
     platform::Queue& workers(platform::Priority priority) override;
     std::shared_ptr<platform::Event> makeEvent() override;
 
-    // Ends the work of the pool, before the end of what the tasks use.
+    // Ends the pool's work. To be called before anything that tasks use is destroyed.
     void stop() { pool_->stop(); }
 
 private:

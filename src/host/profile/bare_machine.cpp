@@ -18,7 +18,7 @@ namespace {
 using OptionalText = std::optional<std::string>;
 using File = platform::Result<FileContent>;
 
-// What firmware says when its maker filled in nothing counts as nothing.
+// Placeholders that firmware gives when its maker filled in nothing count as nothing.
 std::shared_ptr<const OptionalText> firmwareText(const File& file, std::shared_ptr<const OptionalText>) {
     OptionalText result;
     if (file) {
@@ -40,7 +40,7 @@ std::shared_ptr<const OptionalText> firmwareText(const File& file, std::shared_p
     return std::make_shared<const OptionalText>(std::move(result));
 }
 
-// The value of a line NAME=value, which may stand in quotation marks.
+// The value of the first line NAME=value, without its quotation marks.
 OptionalText assignment(std::string_view text, std::string_view name) {
     while (!text.empty()) {
         const std::size_t end = text.find('\n');
@@ -55,7 +55,7 @@ OptionalText assignment(std::string_view text, std::string_view name) {
     return std::nullopt;
 }
 
-// The first of the names that the file assigns a value to.
+// Reads the value of the first name that the file assigns one to.
 auto assignedText(std::initializer_list<const char*> names) {
     return [names = std::vector<std::string>(names.begin(), names.end())](const File& file,
                                                                           std::shared_ptr<const OptionalText>) {
@@ -91,7 +91,7 @@ std::optional<std::string> BareMachine::serialNumber() const {
     if (OptionalText serial = *firmwareSerial_.get()) return serial;
     OptionalText machineId = *machineId_.get();
     if (!machineId) return std::nullopt;
-    // As long as a serial number is, and of its characters.
+    // Twelve characters, digits and capitals, like a serial number.
     std::string derived = platform::sha256Hash(platform::vendorIdentifier(platform::serviceNameRemainder) + *machineId);
     derived.resize(12);
     for (char& c : derived)

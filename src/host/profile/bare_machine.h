@@ -1,5 +1,5 @@
-// The facts of the machine itself: what holds where no device profile says otherwise. Any thread may ask; each call
-// gives the present fact.
+// The machine's own facts, which hold where the device profile says nothing else. Each call returns the present fact.
+// Any thread may ask.
 #pragma once
 
 #include <memory>
@@ -14,11 +14,11 @@ namespace vrx::host {
 
 class BareMachine {
 public:
-    // The root is another than "/" in tests.
+    // Tests pass another root than "/".
     explicit BareMachine(const std::string& root = "");
 
-    // The serial number of the firmware where it may be read and means something, else one derived from the machine
-    // identifier, which itself is confidential. Nothing when the machine has neither.
+    // The firmware's serial number where it is readable and meaningful, else one derived from the machine identifier,
+    // which is confidential itself. Nothing when the machine has neither.
     std::optional<std::string> serialNumber() const;
     std::string name() const;            // the host name
     std::string productType() const;     // the firmware's product name, else the processor architecture

@@ -1,55 +1,19 @@
 #include "vrx/host/profile/bundle_file.h"
 
-#include <sys/stat.h>
 #include <toml++/toml.h>
-#include <unistd.h>
 
 #include <cerrno>
-#include <sstream>
 
 #include "vrx/host/base/files.h"
+#include "vrx/host/base/trust.h"
+#include "vrx/host/profile/toml_value.h"
 
 namespace vrx::host {
 
-using platform::Array;
-using platform::Dictionary;
 using platform::Error;
-using platform::MaybeError;
 using platform::Result;
-using platform::Value;
 
 namespace {
-
-bool isOpenToOthers(const struct stat& status) {
-    if (status.st_uid != 0 && status.st_uid != geteuid()) return true;
-    const bool isSticky = S_ISDIR(status.st_mode) && (status.st_mode & S_ISVTX) != 0;
-    return (status.st_mode & (S_IWGRP | S_IWOTH)) != 0 && !isSticky;
-}
-
-Error notBelieved(const std::string& path) {
-    return {"bundle", EPERM, path + " can be changed by others than root and the agent's user"};
-}
-
-// Dates and times are given as their text.
-Value toValue(const toml::node& node) {
-    if (const auto* flag = node.as_boolean()) return flag->get();
-    if (const auto* integer = node.as_integer()) return integer->get();
-    if (const auto* number = node.as_floating_point()) return number->get();
-    if (const auto* text = node.as_string()) return text->get();
-    if (const auto* array = node.as_array()) {
-        Array elements;
-        for (const toml::node& element : *array) elements.push_back(toValue(element));
-        return elements;
-    }
-    if (const auto* table = node.as_table()) {
-        Dictionary entries;
-        for (const auto& [key, entry] : *table) entries[std::string(key.str())] = toValue(entry);
-        return entries;
-    }
-    std::ostringstream text;
-    node.visit([&](const auto& value) { text << value; });
-    return text.str();
-}
 
 std::optional<std::string> text(const toml::table& table, const char* key) {
     return table[key].value_exact<std::string>();
@@ -57,25 +21,15 @@ std::optional<std::string> text(const toml::table& table, const char* key) {
 
 }  // namespace
 
-MaybeError isKeptFromOthers(const std::string& path) {
-    for (std::string part = path; !part.empty(); part.resize(part.rfind('/'))) {
-        struct stat status;
-        if (lstat(part.c_str(), &status) != 0) return systemError("examine", part, errno);
-        // Behind a link stands another path.
-        if (S_ISLNK(status.st_mode) || isOpenToOthers(status)) return notBelieved(part);
-    }
-    return std::nullopt;
-}
-
+// Examines the file as it was opened and the path to it: another file may be at the path by now.
 Result<BundleFile> readBundleFile(const std::string& folder) {
     const std::string path = folder + "/" + bundleFileName;
     Result<FileContent> content = readFile(path);
     if (!content) return content.error();
-    if (isOpenToOthers(content->status)) return notBelieved(path);
-    if (MaybeError error = isKeptFromOthers(path)) return *error;
+    if (auto open = findOpenToOthers(path, content->status)) return open->error;
+    if (auto open = findOpenToOthers(path, Links::Refused)) return open->error;
     try {
-        const toml::table table = toml::parse(
-            std::string_view(reinterpret_cast<const char*>(content->bytes.data()), content->bytes.size()), path);
+        const toml::table table = toml::parse(content->text(), path);
         BundleFile file;
         file.folder = folder;
         file.identifier = text(table, "identifier");
@@ -83,7 +37,7 @@ Result<BundleFile> readBundleFile(const std::string& folder) {
         file.vendor = text(table, "vendor");
         file.group = text(table, "group");
         if (const toml::table* entitlements = table["entitlements"].as_table())
-            file.entitlements = *toValue(*entitlements).asDictionary();
+            file.entitlements = *valueOf(*entitlements).asDictionary();
         return file;
     } catch (const toml::parse_error& error) {
         return Error{"bundle", EINVAL,

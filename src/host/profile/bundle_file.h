@@ -29,13 +29,8 @@ struct BundleFile {
 
 inline constexpr const char* bundleFileName = "bundle.toml";
 
-// The file of a folder, believed only as isKeptFromOthers() says. An error's text is for people; its code is ENOENT
-// when there is no file.
+// The file of a folder, believed only while others can change neither it nor a folder above it (trust.h). An error's
+// text is for people; its code is ENOENT when there is no file.
 platform::Result<BundleFile> readBundleFile(const std::string& folder);
-
-// Nothing when only root and the agent's own user can change what stands at the absolute path: they own the file and
-// every folder above it, and nobody else may write to any of them. Others may write to a folder with the sticky bit,
-// such as /tmp: it keeps them from replacing what is not theirs. An error tells what is open to others.
-platform::MaybeError isKeptFromOthers(const std::string& path);
 
 }  // namespace vrx::host

@@ -11,9 +11,10 @@ platform::Date Clock::now() const {
 }
 
 std::chrono::seconds Clock::timeZoneOffset() const {
-    if (const std::shared_ptr<const ProfileFacts> facts = profile_.facts(); facts->timeZone)
-        if (std::optional<std::chrono::seconds> offset = codec::timeZoneOffset(*facts->timeZone, now())) return *offset;
-    // localtime_r alone would never notice that the system's zone was changed.
+    if (const std::shared_ptr<const ProfileContent> content = profile_.content(); content->timeZone)
+        if (std::optional<std::chrono::seconds> offset = codec::timeZoneOffset(*content->timeZone, now()))
+            return *offset;
+    // localtime_r alone does not notice a change of the system's zone.
     tzset();
     const std::time_t present = std::time(nullptr);
     std::tm fields{};

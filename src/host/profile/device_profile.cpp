@@ -1,13 +1,12 @@
 #include "vrx/host/profile/device_profile.h"
 
-#include <unistd.h>
-
-#include <toml++/toml.h>
+#include <algorithm>
 #include <cerrno>
 #include <set>
 
 #include "vrx/codec/core/number_format.h"
 #include "vrx/host/base/text.h"
+#include "vrx/host/profile/toml_value.h"
 #include "vrx/platform/log.h"
 
 namespace vrx::host {
@@ -17,17 +16,16 @@ using platform::Error;
 using platform::Level;
 using platform::PairedWatch;
 using platform::Result;
-using platform::Value;
 
 namespace {
 
-// Where the profile is wrong, and how.
+// A mistake in the profile, thrown at its line.
 struct ProfileError {
     toml::source_index line;
     std::string text;
 };
 
-// One table of the profile: hands out its entries by type, and knows in the end which ones nobody asked for.
+// One table of the profile. Returns its entries by type, and reports in the end the keys that nobody asked for.
 class Table {
 public:
     using Unknown = std::function<void(toml::source_index line, const std::string& name)>;
@@ -54,7 +52,8 @@ public:
         return *text;
     }
 
-    // A string that may be sent in a header or in a line of its own; an empty one counts as none.
+    // A string without control characters, which may stand in a header or on a line of its own. An empty one counts as
+    // absent.
     std::optional<std::string> line(const char* key) {
         std::optional<std::string> text = string(key);
         if (text && !isOneLine(*text)) reject(key, *find(key), "without control characters");
@@ -80,7 +79,7 @@ public:
         return node && node->is_boolean() && !**node->as_boolean();
     }
 
-    // A date, with or without a time; one without an offset is in UTC.
+    // A date, with or without a time. Without an offset it is in UTC.
     std::optional<Date> date(const char* key) {
         const toml::node* node = find(key);
         if (!node) return std::nullopt;
@@ -111,7 +110,7 @@ public:
         return result;
     }
 
-    // Calls with the table under the key, if there is one.
+    // Calls with the table under the key, if there is one, and reports its unknown keys.
     template <class F>
     void table(const char* key, F read) {
         const toml::node* node = find(key);
@@ -132,7 +131,7 @@ public:
         }
     }
 
-    // Calls with every key and node.
+    // Calls with every key and its node.
     template <class F>
     void each(F read) {
         for (const auto& [key, node] : table_) {
@@ -193,19 +192,11 @@ platform::Carrier readCarrier(Table& table) {
     return {.mobileCountryCode = table.string("mcc"), .mobileNetworkCode = table.string("mnc")};
 }
 
-std::optional<Value> entitlementValue(const toml::node& node) {
-    if (const auto* flag = node.as_boolean()) return flag->get();
-    if (const auto* number = node.as_integer()) return number->get();
-    if (const auto* number = node.as_floating_point()) return number->get();
-    if (const auto* text = node.as_string()) return text->get();
-    const toml::array* array = node.as_array();
-    if (!array) return std::nullopt;
-    platform::Array list;
-    for (const toml::node& element : *array) {
-        if (!element.is_string()) return std::nullopt;
-        list.emplace_back(**element.as_string());
-    }
-    return list;
+bool isEntitlementValue(const toml::node& node) {
+    const auto isString = [](const toml::node& element) { return element.is_string(); };
+    const toml::array* list = node.as_array();
+    return node.is_boolean() || node.is_number() || node.is_string() ||
+           (list && std::all_of(list->begin(), list->end(), isString));
 }
 
 ProfileBundle readBundle(Table& table) {
@@ -217,9 +208,9 @@ ProfileBundle readBundle(Table& table) {
     bundle.group = table.string("group");
     table.table("entitlements", [&](Table& entitlements) {
         entitlements.each([&](const std::string& name, const toml::node& node) {
-            std::optional<Value> value = entitlementValue(node);
-            if (!value) entitlements.reject(name, node, "a boolean, number, string or list of strings");
-            bundle.entitlements[name] = std::move(*value);
+            if (!isEntitlementValue(node))
+                entitlements.reject(name, node, "a boolean, number, string or list of strings");
+            bundle.entitlements[name] = valueOf(node);
         });
     });
     return bundle;
@@ -236,7 +227,7 @@ platform::HttpHeaders readHeaders(Table& table) {
     return headers;
 }
 
-// Nothing when it has no identifier: nobody is signed in then.
+// Nothing without an identifier: nobody is signed in then.
 std::optional<ProfileAccount> readAccount(Table& table) {
     ProfileAccount account;
     account.identifier = table.line("identifier").value_or("");
@@ -257,93 +248,92 @@ std::optional<ProfileAccount> readAccount(Table& table) {
     return account.identifier.empty() ? std::nullopt : std::optional(std::move(account));
 }
 
-ProfileFacts readFacts(Table& root) {
-    ProfileFacts facts;
+ProfileContent readContent(Table& root) {
+    ProfileContent content;
     root.table("device", [&](Table& device) {
-        facts.serialNumber = device.string("serial_number");
-        facts.name = device.string("name");
-        facts.productType = device.line("product_type");
-        facts.productVersion = device.line("product_version");
-        facts.isInternal = device.boolean("internal").value_or(false);
-        facts.contentSizeCategory = device.string("content_size");
+        content.serialNumber = device.string("serial_number");
+        content.name = device.string("name");
+        content.productType = device.line("product_type");
+        content.productVersion = device.line("product_version");
+        content.isInternal = device.boolean("internal").value_or(false);
+        content.contentSizeCategory = device.string("content_size");
     });
     root.table("features", [&](Table& features) {
         features.each([&](const std::string& domain, const toml::node& node) {
             if (!node.is_table()) features.reject(domain, node, "a table of flags, [features." + domain + "]");
             for (const auto& [flag, value] : *node.as_table()) {
                 if (!value.is_boolean()) features.reject(domain + "." + std::string(flag), value, "true or false");
-                facts.featureFlags[domain][std::string(flag)] = **value.as_boolean();
+                content.featureFlags[domain][std::string(flag)] = **value.as_boolean();
             }
         });
     });
-    root.tables("watches", [&](Table& watch) { facts.watches.push_back(readWatch(watch)); });
-    root.table("account", [&](Table& account) { facts.account = readAccount(account); });
+    root.tables("watches", [&](Table& watch) { content.watches.push_back(readWatch(watch)); });
+    root.table("account", [&](Table& account) { content.account = readAccount(account); });
     root.table("http", [&](Table& http) {
-        facts.http.caFile = http.absolutePath("ca_file");
-        facts.http.namesApplications = http.boolean("source_application_header").value_or(false);
+        content.http.caFile = http.absolutePath("ca_file");
+        content.http.namesApplications = http.boolean("source_application_header").value_or(false);
     });
     root.table("locale", [&](Table& locale) {
         if (std::optional<std::string> language = locale.string("language"))
-            facts.language = localeIdentifierFromPosix(*language);
-        facts.timeZone = locale.string("time_zone");
+            content.language = localeIdentifierFromPosix(*language);
+        content.timeZone = locale.string("time_zone");
     });
     root.table("store", [&](Table& store) {
-        facts.storeLookupURL = store.string("lookup_url");
-        facts.purchaseHistoryURL = store.string("purchase_history_url");
+        content.storeLookupURL = store.string("lookup_url");
+        content.purchaseHistoryURL = store.string("purchase_history_url");
     });
     root.table("applications", [&](Table& applications) {
-        facts.applicationFolders = applications.strings("folders");
-        if (auto folder = applications.string("companion")) facts.companionFolder = *folder;
+        content.applicationFolders = applications.strings("folders");
+        if (auto folder = applications.string("companion")) content.companionFolder = *folder;
     });
     root.tables("carriers", [&](Table& carrier) {
-        const std::string slot = "slot " + std::to_string(facts.carriers.size() + 1);
-        facts.carriers[carrier.string("service").value_or(slot)] = readCarrier(carrier);
+        const std::string slot = "slot " + std::to_string(content.carriers.size() + 1);
+        content.carriers[carrier.string("service").value_or(slot)] = readCarrier(carrier);
     });
-    root.table("network", [&](Table& network) { facts.networkAvailable = network.boolean("available"); });
+    root.table("network", [&](Table& network) { content.networkAvailable = network.boolean("available"); });
     root.table("activities", [&](Table& activities) {
-        facts.shouldDefer = activities.boolean("should_defer");
-        facts.minimumInterval = activities.duration("minimum_interval");
+        content.shouldDefer = activities.boolean("should_defer");
+        content.minimumInterval = activities.duration("minimum_interval");
     });
-    root.tables("bundles", [&](Table& bundle) { facts.bundles.push_back(readBundle(bundle)); });
-    return facts;
+    root.tables("bundles", [&](Table& bundle) { content.bundles.push_back(readBundle(bundle)); });
+    return content;
 }
 
-bool isWrittenByTrusted(const struct stat& status) {
-    return (status.st_uid == 0 || status.st_uid == geteuid()) && (status.st_mode & 0022) == 0;
+bool needsTrust(const ProfileContent& content) {
+    return !content.bundles.empty() || content.http.caFile ||
+           (content.account && !content.account->credentialHelper.empty());
 }
 
-bool needsTrust(const ProfileFacts& facts) {
-    return !facts.bundles.empty() || facts.http.caFile || (facts.account && !facts.account->credentialHelper.empty());
-}
-
-// Reads the file afresh, and says each thing about it once: while the file is new, it is read more than once.
+// Reads the file. Reports each thing once, although a file that has just changed is read several times.
 class ProfileReader {
 public:
     explicit ProfileReader(std::string path) : path_(std::move(path)) {}
 
-    std::shared_ptr<const ProfileFacts> operator()(const Result<FileContent>& file,
-                                                   std::shared_ptr<const ProfileFacts> last) {
+    // Without a file the content is empty. A file that cannot be understood leaves the last content in place.
+    std::shared_ptr<const ProfileContent> operator()(const Result<FileContent>& file,
+                                                     std::shared_ptr<const ProfileContent> last) {
         if (!last) {
-            ProfileFacts substitute;
+            ProfileContent substitute;
             substitute.isSubstitute = true;
-            last = std::make_shared<const ProfileFacts>(substitute);
+            last = std::make_shared<const ProfileContent>(substitute);
         }
-        if (!file && file.error().code == ENOENT) return std::make_shared<const ProfileFacts>();
+        if (!file && file.error().code == ENOENT) return std::make_shared<const ProfileContent>();
         Result<ProfileReading> reading = file ? parseProfile(file->text(), path_) : file.error();
         if (!reading) {
             report(Level::Error, reading.error().text + "; the device profile is not taken over");
             return last;
         }
-        std::string warnings;
-        for (const std::string& warning : reading->warnings) warnings += (warnings.empty() ? "" : "; ") + warning;
-        ProfileFacts facts = std::move(reading).value().facts;
-        facts.isTrusted = isWrittenByTrusted(file->status);
-        if (!facts.isTrusted && needsTrust(facts))
-            warnings +=
-                (warnings.empty() ? "" : "; ") + path_ +
-                ": others can write it; its bundles, http.ca_file and account.credential_helper are not believed";
-        report(Level::Default, warnings);
-        return std::make_shared<const ProfileFacts>(std::move(facts));
+        auto [content, warnings] = std::move(reading).value();
+        content.path = path_;
+        content.wasOpenToOthers = findOpenToOthers(path_, file->status).has_value();
+        if (const auto open = needsTrust(content) ? content.findOpenToOthers() : std::nullopt)
+            warnings.push_back(open->path +
+                               ": others can write it; the bundles, http.ca_file and account.credential_helper of " +
+                               path_ + " are not believed");
+        std::string text;
+        for (const std::string& warning : warnings) text += (text.empty() ? "" : "; ") + warning;
+        report(Level::Default, text);
+        return std::make_shared<const ProfileContent>(std::move(content));
     }
 
 private:
@@ -357,6 +347,13 @@ private:
 
 }  // namespace
 
+std::optional<OpenToOthers> ProfileContent::findOpenToOthers() const {
+    if (path.empty()) return std::nullopt;
+    std::optional<OpenToOthers> open = host::findOpenToOthers(path, Links::Followed);
+    if (!open && wasOpenToOthers) open = {path, Error{"profile", EPERM, path + " could be changed by others"}};
+    return open;
+}
+
 Result<ProfileReading> parseProfile(std::string_view document, const std::string& path) {
     auto place = [&](toml::source_index line) { return path + ":" + std::to_string(line) + ": "; };
     ProfileReading reading;
@@ -366,7 +363,7 @@ Result<ProfileReading> parseProfile(std::string_view document, const std::string
     try {
         const toml::table root = toml::parse(document);
         Table table(root, "", unknown);
-        reading.facts = readFacts(table);
+        reading.content = readContent(table);
         table.reportUnknown();
         return reading;
     } catch (const toml::parse_error& error) {
@@ -377,7 +374,7 @@ Result<ProfileReading> parseProfile(std::string_view document, const std::string
 }
 
 DeviceProfile::DeviceProfile(std::string path, std::string machineRoot)
-    : path_(std::move(path)), machine_(machineRoot), facts_(path_, ProfileReader(path_)) {}
+    : path_(std::move(path)), machine_(machineRoot), content_(path_, ProfileReader(path_)) {}
 
 std::vector<std::string> DeviceProfile::sources() const {
     std::vector<std::string> files = machine_.localeFiles();
@@ -386,37 +383,37 @@ std::vector<std::string> DeviceProfile::sources() const {
 }
 
 std::optional<std::string> DeviceProfile::string(std::string_view key) const {
-    const std::shared_ptr<const ProfileFacts> facts = this->facts();
-    if (key == "SerialNumber") return facts->serialNumber ? facts->serialNumber : machine_.serialNumber();
-    if (key == "UserAssignedDeviceName") return facts->name ? facts->name : machine_.name();
-    if (key == "ProductType") return facts->productType ? facts->productType : machine_.productType();
-    if (key == "ProductVersion") return facts->productVersion ? facts->productVersion : machine_.productVersion();
+    const std::shared_ptr<const ProfileContent> content = this->content();
+    if (key == "SerialNumber") return content->serialNumber ? content->serialNumber : machine_.serialNumber();
+    if (key == "UserAssignedDeviceName") return content->name ? content->name : machine_.name();
+    if (key == "ProductType") return content->productType ? content->productType : machine_.productType();
+    if (key == "ProductVersion") return content->productVersion ? content->productVersion : machine_.productVersion();
     return std::nullopt;
 }
 
 bool DeviceProfile::isInternalInstall() const {
-    return facts()->isInternal;
+    return content()->isInternal;
 }
 
 std::optional<std::string> DeviceProfile::preferredContentSizeCategory() const {
-    return facts()->contentSizeCategory;
+    return content()->contentSizeCategory;
 }
 
 bool DeviceProfile::isEnabled(std::string_view domain, std::string_view flag) const {
-    const std::shared_ptr<const ProfileFacts> facts = this->facts();
-    auto flags = facts->featureFlags.find(std::string(domain));
-    if (flags == facts->featureFlags.end()) return false;
+    const std::shared_ptr<const ProfileContent> content = this->content();
+    auto flags = content->featureFlags.find(std::string(domain));
+    if (flags == content->featureFlags.end()) return false;
     auto entry = flags->second.find(std::string(flag));
     return entry != flags->second.end() && entry->second;
 }
 
 std::vector<PairedWatch> DeviceProfile::watches() const {
-    return facts()->watches;
+    return content()->watches;
 }
 
 std::string DeviceProfile::preferredLocaleIdentifier() const {
-    const std::shared_ptr<const ProfileFacts> facts = this->facts();
-    return facts->language ? *facts->language : machine_.localeIdentifier();
+    const std::shared_ptr<const ProfileContent> content = this->content();
+    return content->language ? *content->language : machine_.localeIdentifier();
 }
 
 std::string DeviceProfile::decimalText(std::uint64_t number) const {

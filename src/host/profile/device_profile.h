@@ -1,7 +1,7 @@
 // The device profile, device.toml: who this device is, which watches are paired with it, the user's account and
-// language, and what a tester wants different from the bare machine. Every fact can be left out; what is left out is
-// the machine's own. Each read gives what the file says now; a file that cannot be understood is reported once, with
-// its line, and the last good one stays. Any thread may ask.
+// language, and what a tester wants different from the machine. Every key can be left out; the machine's own fact holds
+// then. Each read returns what the file says now. A file that cannot be understood is reported once, with its line, and
+// the last good content stays. Any thread may ask.
 #pragma once
 
 #include <map>
@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "vrx/host/base/current_copy.h"
+#include "vrx/host/base/trust.h"
 #include "vrx/host/profile/bare_machine.h"
 #include "vrx/platform/account_store.h"
 #include "vrx/platform/device_properties.h"
@@ -40,7 +41,7 @@ struct ProfileAccount {
     std::vector<std::string> credentialHelper;  // the program, an absolute path, and its arguments; empty for none
     std::optional<std::string> storefront;
     std::optional<std::int64_t> storeAccountIdentifier;
-    // What its requests carry; made of the device's facts where they are absent.
+    // What the account's requests carry. Made of the device's properties where absent.
     std::optional<std::string> clientInformation;
     std::optional<std::string> deviceIdentifier;
     std::optional<platform::HttpHeaders> headers;
@@ -52,7 +53,7 @@ struct ProfileHttp {
 };
 
 // What the file says.
-struct ProfileFacts {
+struct ProfileContent {
     std::optional<std::string> serialNumber;
     std::optional<std::string> name;
     std::optional<std::string> productType;
@@ -75,11 +76,16 @@ struct ProfileFacts {
     std::optional<bool> shouldDefer;                    // else its power supply
     std::optional<platform::Duration> minimumInterval;  // between the runs of an activity that schedules itself
 
-    // Whether these are not the file's, because nobody has understood it since the process began.
+    // Whether this stands in for the file's content, because no version of the file could be read since the process
+    // began.
     bool isSubstitute = false;
-    // Whether root or the agent's own user owns the file and nobody else can write it: only then may what it says
-    // about bundles, authorities and helper programs be believed.
-    bool isTrusted = false;
+    std::string path;              // of the file; empty when there is none
+    bool wasOpenToOthers = false;  // the file itself, when it was read
+
+    // Nothing while only root and the agent's own user can change the file. Only then may its bundles, http.ca_file and
+    // account.credential_helper be believed. Each call examines the file and every folder above it.
+    std::optional<OpenToOthers> findOpenToOthers() const;
+    bool isTrusted() const { return !findOpenToOthers(); }
 };
 
 class DeviceProfile final : public platform::DeviceProperties,
@@ -87,13 +93,13 @@ class DeviceProfile final : public platform::DeviceProperties,
                             public platform::PairedDeviceRegistry,
                             public platform::Locale {
 public:
-    // An empty path, and a file that is not there, leave the bare machine's facts.
+    // With an empty path, or without a file, all facts are the machine's.
     explicit DeviceProfile(std::string path, std::string machineRoot = "");
 
-    // The present facts of the file, never null.
-    std::shared_ptr<const ProfileFacts> facts() const { return facts_.get(); }
+    // What the file says now. Never null.
+    std::shared_ptr<const ProfileContent> content() const { return content_.get(); }
     const std::string& path() const { return path_; }
-    // The files that say which watches are paired and which language holds.
+    // The files that the paired watches and the language come from.
     std::vector<std::string> sources() const;
 
     std::optional<std::string> string(std::string_view key) const override;
@@ -107,15 +113,15 @@ public:
 private:
     const std::string path_;
     const BareMachine machine_;
-    const CurrentCopy<ProfileFacts> facts_;
+    const CurrentCopy<ProfileContent> content_;
 };
 
 struct ProfileReading {
-    ProfileFacts facts;
-    std::vector<std::string> warnings;  // of keys that mean nothing: "PATH:LINE: …"
+    ProfileContent content;
+    std::vector<std::string> warnings;  // of unknown keys: "PATH:LINE: …"
 };
 
-// The facts in a document; an error's text begins "PATH:LINE: ".
+// Reads a document. The text of an error begins "PATH:LINE: ".
 platform::Result<ProfileReading> parseProfile(std::string_view document, const std::string& path);
 
 }  // namespace vrx::host

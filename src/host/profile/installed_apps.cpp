@@ -11,7 +11,7 @@ using platform::InstalledAppRecord;
 
 namespace {
 
-// The folder, and those in it in the order of their names.
+// The folder itself, and the folders in it by name.
 std::vector<std::string> candidates(const std::string& folder) {
     std::set<std::string> inner;
     std::error_code error;
@@ -28,8 +28,8 @@ std::vector<std::string> candidates(const std::string& folder) {
 }  // namespace
 
 InstalledAppRecord InstalledApps::record(const std::string& bundleIdentifier) const {
-    const std::shared_ptr<const ProfileFacts> facts = profile_.facts();
-    for (const std::string& folder : facts->applicationFolders) {
+    const std::shared_ptr<const ProfileContent> content = profile_.content();
+    for (const std::string& folder : content->applicationFolders) {
         for (const std::string& candidate : candidates(folder)) {
             platform::Result<BundleFile> bundle = readBundleFile(candidate);
             if (bundle && bundle->identifier == bundleIdentifier)

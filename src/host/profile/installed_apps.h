@@ -1,5 +1,5 @@
-// The applications of this machine, told by the bundle.toml files of the profile's application folders and of the
-// folders in them. A bundle that others can change is not believed. Read afresh at each call; any thread may ask.
+// The applications of this machine, found by the bundle.toml files in the profile's application folders and one folder
+// below. A bundle that others can change is ignored. Read afresh at each call; any thread may ask.
 #pragma once
 
 #include "vrx/host/profile/device_profile.h"
@@ -11,7 +11,7 @@ class InstalledApps final : public platform::InstalledApps {
 public:
     explicit InstalledApps(const DeviceProfile& profile) : profile_(profile) {}
 
-    // Of several bundles with the identifier the first counts, in the order of the folders and of their names.
+    // Of several bundles with the identifier the first one counts, by the order of the folders and then of their names.
     platform::InstalledAppRecord record(const std::string& bundleIdentifier) const override;
 
 private:

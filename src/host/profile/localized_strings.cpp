@@ -9,10 +9,10 @@ namespace vrx::host {
 
 namespace {
 
-// "zh_Hant_TW" gives itself, "zh_Hant" and "zh"; then English.
+// For "zh_Hant_TW": itself, "zh_Hant", "zh" and "en".
 std::vector<std::string> languages(std::string identifier) {
     std::vector<std::string> result;
-    // It becomes the name of a folder.
+    // The identifier becomes the name of a folder.
     if (identifier.find_first_of("/.") != std::string::npos) identifier.clear();
     while (!identifier.empty()) {
         result.push_back(identifier);
@@ -39,7 +39,7 @@ std::optional<std::string> textIn(const std::string& path, std::string_view key)
 
 std::string LocalizedStrings::localizedString(std::string_view key, std::string_view defaultText,
                                               std::string_view table) const {
-    const std::string folder = profile_.facts()->companionFolder;
+    const std::string folder = profile_.content()->companionFolder;
     for (const std::string& language : languages(profile_.preferredLocaleIdentifier()))
         if (auto text = textIn(folder + "/" + language + "/" + std::string(table) + ".toml", key)) return *text;
     return std::string(defaultText);

@@ -1,6 +1,6 @@
-// The texts of the companion UI bundle: LANGUAGE/TABLE.toml below the profile's companion folder, a text a key, for
-// translators to edit. The language is the preferred locale's, with its region before without ("de_AT", then "de"), and
-// English where a translation is missing. Read afresh at each call; any thread may ask.
+// The texts of the companion UI bundle: LANGUAGE/TABLE.toml below the profile's companion folder, a text for each key,
+// for translators to edit. The language is the preferred locale's, first with its region, then without ("de_AT", then
+// "de"), then English. Read afresh at each call; any thread may ask.
 #pragma once
 
 #include "vrx/host/profile/device_profile.h"

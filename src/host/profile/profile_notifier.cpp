@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <set>
 
-#include "vrx/host/home/host_facts.h"
+#include "vrx/host/home/stored_facts.h"
 #include "vrx/platform/log.h"
 #include "vrx/platform/sha256_hash.h"
 #include "vrx/platform/vendor.h"
@@ -17,8 +17,8 @@ namespace {
 
 constexpr platform::Duration retryAfterFailure{60.0};
 
-// A line for each watch that is paired, told apart by its serial number, else by its names; one that is paired anew
-// counts as another. Serial numbers are never stored as such.
+// A line for each paired watch, told apart by its serial number, else by its names. A watch that is paired anew counts
+// as another. Only hashes of serial numbers are stored.
 std::set<std::string> pairedWatches(const DeviceProfile& profile) {
     std::set<std::string> lines;
     for (const PairedWatch& watch : profile.watches()) {
@@ -57,25 +57,25 @@ void ProfileNotifier::start(sd_event* loop, std::function<void()> onEdit, platfo
     compare();
 }
 
-// What has been stored is what has been raised: were it raised first, a database that cannot be written would have it
-// raised at every start. The first profile of a home is only stored.
+// Stores before it raises: in the opposite order a database that cannot be written would have the same notifications
+// raised at every start. The first profile of a home is stored only.
 void ProfileNotifier::compare() {
-    if (profile_.facts()->isSubstitute) return;  // of a file that nobody understands there is nothing to tell
+    if (profile_.content()->isSubstitute) return;  // the file could not be read
     const std::string language = profile_.preferredLocaleIdentifier();
     const std::set<std::string> watches = pairedWatches(profile_);
     std::vector<std::string_view> raised;
     const MaybeError error = database_.write([&](Connection& connection) {
         raised.clear();
-        const std::optional<std::string> lastLanguage = hostFact(connection, facts::language);
-        const std::optional<std::string> lastWatches = hostFact(connection, facts::pairedWatches);
+        const std::optional<std::string> lastLanguage = storedFact(connection, stored_facts::language);
+        const std::optional<std::string> lastWatches = storedFact(connection, stored_facts::pairedWatches);
         if (lastLanguage && *lastLanguage != language) raised.push_back(platform::languageChangedNotification);
         if (lastWatches && !includes(linesOf(*lastWatches), watches))
             raised.push_back(platform::devicePairedNotification);
         if (lastWatches && !includes(watches, linesOf(*lastWatches)))
             raised.push_back(platform::deviceUnpairedNotification);
         if (lastLanguage && lastWatches && raised.empty()) return;
-        setHostFact(connection, facts::language, language);
-        setHostFact(connection, facts::pairedWatches, textOf(watches));
+        setStoredFact(connection, stored_facts::language, language);
+        setStoredFact(connection, stored_facts::pairedWatches, textOf(watches));
     });
     if (error) {
         log(platform::Level::Error, "Cannot tell what has changed in the profile, trying again: %@", error->text);

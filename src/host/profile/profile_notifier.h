@@ -1,6 +1,6 @@
-// Raises the system's notifications when the device profile pairs or unpairs a watch, or when it or the machine's own
-// settings change the language: compared are the present facts with those for which notifications were last raised,
-// which host.db keeps. So a change that is made while no agent runs is told to the next one. Main thread.
+// Raises the system's notifications when the device profile pairs or unpairs a watch, or when the language changes in
+// it or in the machine's settings. It compares the present state with the one for which notifications were last raised,
+// which host.db keeps, so that a change made while no agent runs is told to the next one. Main thread.
 #pragma once
 
 #include <functional>
@@ -15,14 +15,14 @@ namespace vrx::host {
 
 class ProfileNotifier {
 public:
-    // None is owned.
+    // All must outlive the notifier.
     ProfileNotifier(const DeviceProfile& profile, Database& database, NotificationCenter& center)
         : profile_(profile), database_(database), center_(center) {}
 
-    // Compares, and watches the files from now on: when whoever listens has registered. Calls after each edit, once
-    // notifications have been raised. The pause gathers edits that come together.
+    // Compares, and watches the files from now on. To be called once all listeners have registered. After each edit it
+    // raises the notifications and then calls onEdit. The pause joins edits that come together.
     void start(sd_event* loop, std::function<void()> onEdit, platform::Duration pause = std::chrono::milliseconds(100));
-    // Raises what is due. For a start, and for tests.
+    // Raises what is due. For start(), and for tests.
     void compare();
 
 private:

@@ -11,7 +11,7 @@ public:
     // The profile must outlive it.
     explicit TelephonyNetworkInfo(const DeviceProfile& profile) : profile_(profile) {}
     std::map<std::string, platform::Carrier> serviceSubscriberCellularProviders() const override {
-        return profile_.facts()->carriers;
+        return profile_.content()->carriers;
     }
     std::string description() const override;
 

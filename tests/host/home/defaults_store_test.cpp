@@ -244,7 +244,7 @@ TEST_F(DefaultsStoreTest, LookingReadsWhatIsThereAndChangesNothing) {
     };
     auto expectLook = [&](const char* when) {
         const Dictionary before = contents();
-        Database database = Database::toLookAt(path());
+        Database database = Database::readOnly(path());
         DefaultsStore store(database);
         EXPECT_EQ(store.get("key"), Value(when));
         store.set("key", "looked");
@@ -276,10 +276,10 @@ TEST_F(DefaultsStoreTest, LookingReadsWhatIsThereAndChangesNothing) {
 
     std::vector<const char*> next(Database::currentSchema.begin(), Database::currentSchema.end());
     next.push_back("CREATE TABLE more (x)");
-    EXPECT_THAT(Database::toLookAt(path(), next).open()->text, HasSubstr("older version"));
+    EXPECT_THAT(Database::readOnly(path(), next).open()->text, HasSubstr("older version"));
     writeFile(folder / "damaged 1%?#.db", std::string(8192, 'x'));
     for (const char* name : {"absent.db", "damaged 1%?#.db"})
-        EXPECT_TRUE(Database::toLookAt(folder / name).open()) << name;
+        EXPECT_TRUE(Database::readOnly(folder / name).open()) << name;
     EXPECT_THAT(folder.names(), ElementsAre("damaged 1%?#.db", "host.db"));
 }
 

@@ -1,5 +1,5 @@
 // The Marketplace, the installed applications and the companion's texts, as the device profile names them.
-#include "vrx/host/http/store.h"
+#include "vrx/host/http/marketplace.h"
 
 #include <gmock/gmock.h>
 

@@ -93,12 +93,15 @@ TEST_F(BundleLookupTest, ReadsEntitlementsOfAnyType) {
 }
 
 TEST_F(BundleLookupTest, TakesTestersBundlesFromATrustedProfile) {
-    auto facts = std::make_shared<ProfileFacts>();
+    auto facts = std::make_shared<ProfileContent>();
     std::filesystem::create_symlink(folder + "/app/bin/viewer", folder + "/other-name");
     facts->bundles.push_back({{"/nowhere", folder + "/other-name"}, "com.example.tester", {}, {}, {}, {}});
     BundleLookup lookup([facts] { return facts; });
+    facts->path = folder + "/device.toml";
+    write("device.toml", "");
+    makeMode("device.toml", 0666);
     EXPECT_EQ(identifier(lookup), "com.example.viewer");
-    facts->isTrusted = true;
+    makeMode("device.toml", 0644);
     EXPECT_EQ(identifier(lookup), "com.example.tester");
 }
 
@@ -129,8 +132,7 @@ TEST_F(BundleLookupTest, EntitlesThePeerByItsProgramAndGroup) {
     EXPECT_EQ(BundleLookup().entitlement(peer, "e"), Value(true));
     requireGroup("nogroup");
     EXPECT_TRUE(BundleLookup().entitlement(peer, "e").isNull());
-    auto facts = std::make_shared<ProfileFacts>();
-    facts->isTrusted = true;
+    auto facts = std::make_shared<ProfileContent>();
     facts->bundles.push_back({{program}, "com.example.tester", {}, {}, "nogroup", {{"e", true}}});
     BundleLookup tester([facts] { return facts; });
     EXPECT_TRUE(tester.entitlement(peer, "e").isNull());

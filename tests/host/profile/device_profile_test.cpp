@@ -110,7 +110,7 @@ TEST_F(DeviceProfileTest, GivesEveryFactOfTheFile) {
     EXPECT_EQ(carriers.at("roaming").mobileNetworkCode, std::nullopt);
     EXPECT_EQ(telephony.description(), "telephony (roaming: carrier 02 (null), slot 1: carrier 310 410)");
 
-    const auto facts = profile.facts();
+    const auto facts = profile.content();
     const ProfileAccount account = facts->account.value();
     EXPECT_EQ(account.identifier + *account.altDSID, "adaA1");
     EXPECT_EQ(account.authentication, (platform::AuthenticationAccount{"ada", "A2"}));
@@ -121,14 +121,14 @@ TEST_F(DeviceProfileTest, GivesEveryFactOfTheFile) {
     ASSERT_EQ(facts->bundles.size(), 1u);
     EXPECT_THAT(facts->bundles[0].executables, ElementsAre("/usr/bin/busctl"));
     EXPECT_EQ(facts->bundles[0].entitlements.at("com.example.flag"), Value(true));
-    EXPECT_TRUE(facts->isTrusted);
+    EXPECT_TRUE(facts->isTrusted());
     EXPECT_THAT(log.lines(), ElementsAre());
     chmod(path().c_str(), 0664);  // somebody else may write it now
-    EXPECT_FALSE(profile.facts()->isTrusted);
+    EXPECT_FALSE(profile.content()->isTrusted());
     EXPECT_THAT(log.lines(), ElementsAre(HasSubstr("others can write it")));
 
     writeFile(path(), "account = { identifier = 'ada', authentication = false }");
-    EXPECT_FALSE(profile.facts()->account->authentication);
+    EXPECT_FALSE(profile.content()->account->authentication);
 }
 
 TEST_F(DeviceProfileTest, EachReadSeesTheFileAsItIsEvenWithinOneTickOfTheClock) {
@@ -143,7 +143,7 @@ TEST_F(DeviceProfileTest, EachReadSeesTheFileAsItIsEvenWithinOneTickOfTheClock) 
         }
         ASSERT_EQ(profile.string("SerialNumber"), serial);
     }
-    const auto facts = profile.facts();
+    const auto facts = profile.content();
     std::filesystem::remove(path());
     EXPECT_EQ(profile.string("SerialNumber"), std::nullopt);  // and the bare machine has none
     EXPECT_EQ(facts->serialNumber, "SN299");
@@ -207,6 +207,36 @@ TEST(BareMachine, TakesItsFactsFromTheSystemsFiles) {
     EXPECT_NE(machine.productType(), "Default string");
     EXPECT_FALSE(machine.productType().empty());
     EXPECT_FALSE(machine.name().empty());
+}
+
+TEST_F(DeviceProfileTest, IsBelievedOnlyWhileEveryFolderOnTheWayIsKeptFromOthers) {
+    std::filesystem::create_directories(folder / "open/inner");
+    const std::string inner = folder / "open/inner/device.toml", link = folder / "link.toml";
+    writeFile(inner, everything);
+    for (const std::string& name : {inner, folder / "open/inner"}) chmod(name.c_str(), 0755);
+    std::filesystem::create_symlink("open/inner/../inner/device.toml", link);
+    const std::filesystem::path before = std::filesystem::current_path();
+    std::filesystem::current_path(folder.path());
+    for (const std::string& path : {inner, link, std::string("open/inner/device.toml")}) {
+        const DeviceProfile profile(path);
+        chmod((folder / "open").c_str(), 0755);
+        EXPECT_TRUE(profile.content()->isTrusted()) << path;
+        chmod((folder / "open").c_str(), 0777);
+        EXPECT_EQ(profile.content()->findOpenToOthers().value().path, folder / "open") << path;
+        chmod((folder / "open").c_str(), 01777);
+        EXPECT_TRUE(profile.content()->isTrusted()) << path;
+    }
+    std::filesystem::current_path(before);
+    EXPECT_THAT(log.lines(), ElementsAre());
+    chmod((folder / "open").c_str(), 0775);
+    EXPECT_EQ(DeviceProfile(inner).string("SerialNumber"), "SN1") << "this is believed all the same";
+    EXPECT_THAT(log.lines(), ElementsAre(StartsWith(folder / "open: others can write it; the bundles, ")));
+
+    chmod((folder / "open").c_str(), 0755);
+    std::filesystem::create_directory(folder / "shared");
+    chmod((folder / "shared").c_str(), 0777);
+    std::filesystem::create_symlink(inner, folder / "shared/link.toml");
+    EXPECT_EQ(DeviceProfile(folder / "shared/link.toml").content()->findOpenToOthers().value().path, folder / "shared");
 }
 
 }  // namespace

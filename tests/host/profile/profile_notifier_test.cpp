@@ -7,7 +7,7 @@
 
 #include "host/support.h"
 #include "vrx/codec/codec.h"
-#include "vrx/host/home/host_facts.h"
+#include "vrx/host/home/stored_facts.h"
 #include "vrx/host/loop/main_loop.h"
 #include "vrx/platform/vendor.h"
 
@@ -82,7 +82,7 @@ TEST_F(ProfileNotifierTest, TellsWhatEachEditHasChanged) {
     writeFile(folder / "place/.device.toml.swp", language("fr") + watch("B") + watch("A", "archived = true"));
     std::filesystem::rename(folder / "place/.device.toml.swp", path);
     EXPECT_THAT(raisedUntil("unpaired"), ElementsAre("language", "unpaired"));
-    EXPECT_EQ(hostFact(database, facts::language), "fr");
+    EXPECT_EQ(storedFact(database, stored_facts::language), "fr");
 
     writeFile(path, "[[watches]");
     notifier->compare();
@@ -99,7 +99,7 @@ TEST_F(ProfileNotifierTest, TellsWhatEachEditHasChanged) {
 
     std::filesystem::remove(path);
     EXPECT_THAT(raisedUntil("unpaired"), ElementsAre("language", "unpaired"));
-    EXPECT_EQ(hostFact(database, facts::language), "nl_NL") << "the machine's";
+    EXPECT_EQ(storedFact(database, stored_facts::language), "nl_NL") << "the machine's";
     writeFile(folder / "machine/etc/locale.conf", "LANG=sv_SE.UTF-8\n");
     EXPECT_THAT(raisedUntil("language"), ElementsAre("language"));
 }

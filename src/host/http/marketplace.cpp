@@ -1,4 +1,4 @@
-#include "vrx/host/http/store.h"
+#include "vrx/host/http/marketplace.h"
 
 #include <utility>
 
@@ -21,7 +21,7 @@ using platform::Value;
 
 namespace {
 
-// The addresses at the time of opening.
+// The lookup's address at the time of opening.
 struct Bag final : platform::StoreBag {
     explicit Bag(std::optional<std::string> lookupURL) : lookupURL(std::move(lookupURL)) {}
     const std::optional<std::string> lookupURL;
@@ -53,7 +53,7 @@ private:
     char separator_;
 };
 
-// The list that an answer holds under a key. An answer without it is as wrong as none.
+// The list under a key of an answer. An answer without it is an error.
 Result<platform::Array> listOf(const HttpResponse& response, const char* key) {
     if (response.error) return *response.error;
     if (response.status != 200) return Error{"store", response.status, "status " + std::to_string(response.status)};
@@ -79,7 +79,7 @@ StoreItem itemOf(const Value& entry) {
     return item;
 }
 
-// Nothing that was answered before counts: what was not to be had may have been bought meanwhile.
+// Always asks the server: what was missing before may have been bought meanwhile.
 void get(const std::string& url, platform::OnceCallback<HttpResponse> completion) {
     platform::HttpRequest request;
     request.url = url;
@@ -92,6 +92,7 @@ public:
     Lookup(std::shared_ptr<platform::StoreBag> bag, std::string callerName)
         : bag_(std::move(bag)), callerName_(std::move(callerName)) {}
 
+    // Fails on a worker, like any answer, when no address is configured.
     void lookUp(const std::vector<std::string>& bundleIdentifiers, const std::vector<std::string>& itemIdentifiers,
                 Completion completion) override {
         const auto* bag = dynamic_cast<const Bag*>(bag_.get());
@@ -122,22 +123,23 @@ private:
 
 }  // namespace
 
-platform::StoreProfile Store::lookupProfile() const {
+platform::StoreProfile Marketplace::lookupProfile() const {
     return {.name = "lookup", .version = "1", .bagKeys = {"lookup-url"}};
 }
 
-std::shared_ptr<platform::StoreBag> Store::openBag(const std::string&, const std::string&) {
-    return std::make_shared<Bag>(profile_.facts()->storeLookupURL);
+std::shared_ptr<platform::StoreBag> Marketplace::openBag(const std::string&, const std::string&) {
+    return std::make_shared<Bag>(profile_.content()->storeLookupURL);
 }
 
-std::unique_ptr<platform::StoreLookup> Store::makeLookup(std::shared_ptr<platform::StoreBag> bag,
-                                                         std::string callerName, platform::StoreKeyProfile) {
+std::unique_ptr<platform::StoreLookup> Marketplace::makeLookup(std::shared_ptr<platform::StoreBag> bag,
+                                                               std::string callerName, platform::StoreKeyProfile) {
     return std::make_unique<Lookup>(std::move(bag), std::move(callerName));
 }
 
+// Without an address, or after a failure, the history is empty.
 void PurchaseHistory::runQuery(platform::PurchaseQuery query,
                                platform::OnceCallback<std::vector<platform::Purchase>> resultHandler) {
-    const std::optional<std::string> address = profile_.facts()->purchaseHistoryURL;
+    const std::optional<std::string> address = profile_.content()->purchaseHistoryURL;
     if (!address) {
         auto none = [resultHandler = std::move(resultHandler)]() mutable { resultHandler({}); };
         return Platform::current().queues().workers(platform::Priority::UserInitiated).post(std::move(none));

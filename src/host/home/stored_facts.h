@@ -1,5 +1,4 @@
-// What the host keeps in host.db from one process to the next, and what the agent lets its tools know: one text by
-// name.
+// Facts that the host stores in host.db, by name: for the next process, and for the tools beside the agent.
 #pragma once
 
 #include <optional>
@@ -10,18 +9,18 @@
 
 namespace vrx::host {
 
-namespace facts {
+namespace stored_facts {
 inline constexpr std::string_view agentVersion = "agentVersion";    // for which the upgrade activity was fired
 inline constexpr std::string_view boot = "boot";                    // for which the boot activity was fired
 inline constexpr std::string_view language = "language";            // the effective one, as last notified
 inline constexpr std::string_view profile = "profile";              // the agent's device profile, a path; may be empty
 inline constexpr std::string_view pairedWatches = "pairedWatches";  // a line for each watch, as last notified
-}  // namespace facts
+}  // namespace stored_facts
 
-// For tools: nothing when it can't be read, either.
-std::optional<std::string> hostFact(Database& database, std::string_view name);
+// For tools. Nothing also when it cannot be read.
+std::optional<std::string> storedFact(Database& database, std::string_view name);
 // Within a transaction.
-std::optional<std::string> hostFact(Connection& connection, std::string_view name);
-void setHostFact(Connection& connection, std::string_view name, std::string_view value);
+std::optional<std::string> storedFact(Connection& connection, std::string_view name);
+void setStoredFact(Connection& connection, std::string_view name, std::string_view value);
 
 }  // namespace vrx::host

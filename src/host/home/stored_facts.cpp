@@ -1,21 +1,21 @@
-#include "vrx/host/home/host_facts.h"
+#include "vrx/host/home/stored_facts.h"
 
 namespace vrx::host {
 
-std::optional<std::string> hostFact(Database& database, std::string_view name) {
+std::optional<std::string> storedFact(Database& database, std::string_view name) {
     std::optional<std::string> value;
-    database.read([&](Connection& connection) { value = hostFact(connection, name); });
+    database.read([&](Connection& connection) { value = storedFact(connection, name); });
     return value;
 }
 
-std::optional<std::string> hostFact(Connection& connection, std::string_view name) {
+std::optional<std::string> storedFact(Connection& connection, std::string_view name) {
     Statement& query = connection.statement("SELECT value FROM host_facts WHERE name = ?");
     if (!query.bind(0, name).step()) return std::nullopt;
     return std::string(query.text(0));
 }
 
-// What is there already is not written: at most starts that spares the disk's syncs.
-void setHostFact(Connection& connection, std::string_view name, std::string_view value) {
+// An equal value is not written, which spares most starts a sync of the disk.
+void setStoredFact(Connection& connection, std::string_view name, std::string_view value) {
     connection
         .statement(
             "INSERT INTO host_facts VALUES (?, ?) ON CONFLICT (name) DO UPDATE SET value = excluded.value "

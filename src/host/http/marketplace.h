@@ -1,6 +1,6 @@
 // The Marketplace over HTTP: the catalogue's lookup and the account's purchase history, each a GET that is answered
-// with a JSON object. Their addresses come from the device profile, read for each question; docs/formats.md describes
-// both exchanges. Any thread may ask; answers come on workers.
+// with a JSON object. The device profile gives their addresses, read for each request; docs/formats.md describes both
+// exchanges. Any thread may ask; answers come on workers.
 #pragma once
 
 #include "vrx/host/profile/device_profile.h"
@@ -9,12 +9,12 @@
 
 namespace vrx::host {
 
-class Store final : public platform::Store {
+class Marketplace final : public platform::Store {
 public:
-    explicit Store(const DeviceProfile& profile) : profile_(profile) {}
+    explicit Marketplace(const DeviceProfile& profile) : profile_(profile) {}
 
     platform::StoreProfile lookupProfile() const override;
-    // All keys are to be had always.
+    // No-op: every key is always available.
     void registerBagKeys(const platform::StoreProfile&) override {}
     std::shared_ptr<platform::StoreBag> openBag(const std::string& profile, const std::string& version) override;
     std::unique_ptr<platform::StoreLookup> makeLookup(std::shared_ptr<platform::StoreBag> bag, std::string callerName,
