@@ -64,7 +64,7 @@ Explanation explainWithoutRecord(const Circumstances& device) {
 
 // The rule that sets the date before which it is not posted.
 Explanation explainPostDate(const Circumstances& device) {
-    const PostDate& date = *device.post.postDate;
+    const DueDate& date = *device.post.dueDate;
     Explanation explanation{Waiting, "", ""};
     if (date.isInitial) {
         explanation.rule = "outreach-delay";
@@ -82,7 +82,7 @@ Explanation explainPostDate(const Circumstances& device) {
 // There is an offer, and nobody has dismissed it.
 Explanation explainUnposted(const Circumstances& device) {
     const Date end = *device.eligibleUntil;
-    const Date day = device.post.postDate->date;
+    const Date day = device.post.dueDate->date;
     if (day >= end) return {NotOffered, "ends-first", "the offer ends before the day on which it would be shown"};
     const NextStep next = nextConsideration(device);
     const std::string posted = device.wasPosted ? ": it was posted before" : "";

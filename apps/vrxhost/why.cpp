@@ -193,7 +193,7 @@ Findings examine(AgentView& view, const std::string& serialNumber, const std::se
     findings.inputs = {{"now", facts.now},
                        {"activationDate", valueOf(device->activationDate())},
                        {"PostUpgradeOutreachDelay", settings.dates.outreachDelay.count()},
-                       {"postDate", facts.post.postDate ? Value(facts.post.postDate->date) : Value()},
+                       {"postDate", facts.post.dueDate ? Value(facts.post.dueDate->date) : Value()},
                        {"pending", facts.isPending},
                        {"posted", facts.wasPosted},
                        {"dismissed", settings.dismissed.contains(platform::sha256Hash(serialNumber))}};

@@ -39,7 +39,7 @@ std::string outcomeText(bool success, const MaybeError& error) {
 }
 
 void logDecision(const PostDecision& decision, const SharedDevice& device) {
-    if (decision.postDate && decision.postDate->isInitial)
+    if (decision.dueDate && decision.dueDate->isInitial)
         log(Level::Default, "Using initial postdate as it is later than FollowupDisplay Date");
     switch (decision.reason) {
         case PostReason::NoRecord:
@@ -55,7 +55,7 @@ void logDecision(const PostDecision& decision, const SharedDevice& device) {
         case PostReason::DueLater:
             return log(Level::Default,
                        "Device eligible with future post date. Cannot post followup for %{private}@ on: %@", device,
-                       decision.postDate->date);
+                       decision.dueDate->date);
     }
 }
 

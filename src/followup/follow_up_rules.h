@@ -15,6 +15,7 @@ class Clock;
 namespace vrx {
 
 class VRXDeviceInfo;
+class VRXWarranty;
 
 // Whether a follow-up is posted: the first of these that holds, in this order, and only Due is.
 enum class PostReason : std::uint8_t { NoRecord, NoOffer, NoLongerEligible, Dismissed, Due, DueLater };
@@ -25,15 +26,23 @@ struct PostCircumstances {
     platform::Duration outreachDelay{0};  // after the device's activation, before which nothing is posted
 };
 
-struct PostDate {
+// From when on a device's follow-up may be posted: dueDateInRecord(), but never before the outreach delay is over. It
+// says when one follow-up is due; nextPostDate() in scheduling/post_date.h says when the post activity runs next. That
+// rule differs: it does not count back from the offer's end, takes a missing activation date for an outreach delay that
+// ends now, and leaves out devices whose follow-up was posted before.
+struct DueDate {
     platform::Date date;
-    bool isInitial = false;  // the device's first days end later than the record would have it shown
+    bool isInitial = false;  // the outreach delay ends later than the date in the record
 };
 
 struct PostDecision {
     PostReason reason;
-    std::optional<PostDate> postDate{};  // of Due and DueLater
+    std::optional<DueDate> dueDate{};  // for Due and DueLater
 };
+
+// The due date that a record itself gives: the day it names, else its duration before the end of the offer. Null when
+// the record names no day and its offer has no end; no follow-up is ever posted for such a record.
+std::optional<platform::Date> dueDateInRecord(const VRXWarranty& record);
 
 PostDecision decidePost(const VRXDeviceInfo& info, const PostCircumstances& circumstances,
                         const platform::Clock& clock);

@@ -9,6 +9,7 @@
 #include "vrx/coverage/warranty_downloader.h"
 #include "vrx/devices/devices_manager.h"
 #include "vrx/devices/records/device.h"
+#include "vrx/followup/follow_up_rules.h"
 #include "vrx/platform/completion_group.h"
 #include "vrx/platform/log.h"
 #include "vrx/platform/platform.h"
@@ -54,15 +55,8 @@ DeviceList allDevices() {
     return devices;
 }
 
-// When the follow-up of a record that asks for the offer is due. Nothing when it tells neither a date nor its end: no
-// follow-up is ever posted for it, so it must not take the place of another device's date.
-std::optional<Date> dueDate(const VRXWarranty& warranty) {
-    if (auto date = warranty.qxOfferFollowupDisplayDate()) return date;
-    std::optional<Date> until = warranty.qxOfferEligibleUntil();
-    return until ? std::optional(*until - warranty.qxOfferDurationBeforeEndDate()) : std::nullopt;
-}
-
-// The due date that a device's download gives, if any.
+// The due date of a device's follow-up, read from its downloaded record. Null when the record asks for no follow-up
+// here, or tells no due date: such a record must not take the place of another device's date.
 std::optional<Date> dueDateFromDownload(const std::optional<std::string>& serialNumber, bool success,
                                         const std::shared_ptr<VRXWarranty>& warranty) {
     log(Level::Default, "serialNumber: %@ success: %d", serialNumber, success);
@@ -81,7 +75,7 @@ std::optional<Date> dueDateFromDownload(const std::optional<std::string>& serial
             "Configuration does not support current device. Complete activity without scheduling followup");
         return std::nullopt;
     }
-    return dueDate(*warranty);
+    return dueDateInRecord(*warranty);
 }
 
 // The workers as a group's queue; they belong to the platform.

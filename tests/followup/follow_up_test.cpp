@@ -120,8 +120,8 @@ TEST_F(FollowUpTest, APostWaitsForItsDate) {
         a->device()->setActivationDate(date(activated));
         const PostDecision decision = decidePost(*a, {.outreachDelay = Duration(2 * day)}, host.clock);
         EXPECT_EQ(decision.reason, postDate > 0 ? PostReason::DueLater : PostReason::Due);
-        EXPECT_EQ(decision.postDate.value().date, date(postDate));
-        EXPECT_EQ(decision.postDate->isInitial, isInitial);
+        EXPECT_EQ(decision.dueDate.value().date, date(postDate));
+        EXPECT_EQ(decision.dueDate->isInitial, isInitial);
     }
 }
 
