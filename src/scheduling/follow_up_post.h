@@ -10,7 +10,7 @@
 #include "vrx/platform/property.h"
 #include "vrx/platform/timer.h"
 #include "vrx/scheduling/activity_collaborators.h"
-#include "vrx/scheduling/activity_run.h"
+#include "vrx/scheduling/deferrable_run.h"
 #include "vrx/scheduling/scheduler_activity_delegate.h"
 
 namespace vrx {
@@ -39,9 +39,9 @@ public:
     }
 
 private:
-    void finish(ActivityRun& run, const std::optional<DeviceInfoList>& deviceInfos);
+    void finish(DeferrableRun& run, const std::optional<DeviceInfoList>& deviceInfos);
     void post(const DeviceInfoList& deviceInfos);
-    void end(ActivityRun& run, platform::BackgroundActivityResult result);
+    void end(DeferrableRun& run, platform::BackgroundActivityResult result);
 
     const ActivityCollaborators collaborators_;
     std::atomic<bool> followUpPostInProgress_ = false;

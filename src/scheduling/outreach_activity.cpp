@@ -16,7 +16,7 @@
 #include "vrx/platform/queue.h"
 #include "vrx/platform/telephony_network_info.h"
 #include "vrx/platform/vendor.h"
-#include "vrx/scheduling/activity_run.h"
+#include "vrx/scheduling/deferrable_run.h"
 #include "vrx/scheduling/follow_up_post.h"
 #include "vrx/scheduling/scheduler.h"
 
@@ -28,9 +28,9 @@ using platform::Level;
 using platform::Platform;
 
 // A run, with the earliest due date that its downloads have found. They may end at the same time.
-class VRXOutreachActivity::Run : public ActivityRun {
+class VRXOutreachActivity::Run : public DeferrableRun {
 public:
-    using ActivityRun::ActivityRun;
+    using DeferrableRun::DeferrableRun;
 
     // Of equal dates, the one that was first stays.
     void addDueDate(Date date) {
@@ -93,13 +93,10 @@ void VRXOutreachActivity::performActivityForScheduler(const std::shared_ptr<VRXS
                                                       CompletionHandler completionHandler) {
     setOutreachInProgress(true);
     auto run = std::make_shared<Run>(std::move(completionHandler));
-    // The watch, which the activity holds, holds it weakly, and the run as well, which its work keeps.
-    setOutReachTimer(makeDeferralWatch(scheduler, [activity = weak_from_this(), watched = std::weak_ptr(run)] {
-        auto self = activity.lock();
-        auto run = watched.lock();
-        if (!self || !self->outreachInProgress() || !run) return;
+    setOutReachTimer(makeDeferralWatch(scheduler, weak_from_this(), run, [](const auto& activity, Run& watched) {
+        if (!activity->outreachInProgress()) return;
         log(Level::Default, "Warranty download activity deferred.");
-        end(*run, activity, BackgroundActivityResult::Deferred);
+        end(watched, activity, BackgroundActivityResult::Deferred);
     }));
     DeviceList devices = allDevices();
     log(Level::Default, "%s: devices: %@", "-[VRXOutreachActivity performActivityForScheduler:withCompletionHandler:]",
