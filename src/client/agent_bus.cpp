@@ -33,7 +33,7 @@ bool meansEnded(int error) {
 }
 
 MaybeError cannotConnect(const std::string& path, int error) {
-    return Error{"client", error, "no agent answers at " + path + ": " + std::strerror(error)};
+    return Error{platform::error_domain::client, error, "no agent answers at " + path + ": " + std::strerror(error)};
 }
 
 // Releases what sd-bus fills in while it is alive.

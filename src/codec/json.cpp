@@ -97,7 +97,7 @@ private:
 };
 
 Error invalidAt(std::size_t byte, const std::string& reason) {
-    return {"json", EBADMSG, "invalid JSON at byte " + std::to_string(byte) + ": " + reason};
+    return {platform::error_domain::json, EBADMSG, "invalid JSON at byte " + std::to_string(byte) + ": " + reason};
 }
 
 // How the two kinds of JSON text differ.
@@ -136,7 +136,7 @@ public:
     }
 
     std::string takeText() { return std::move(text_); }
-    Error failure() const { return {"json", EINVAL, "JSON cannot hold " + unwritable_}; }
+    Error failure() const { return {platform::error_domain::json, EINVAL, "JSON cannot hold " + unwritable_}; }
 
 private:
     template <class List, class WriteItem>

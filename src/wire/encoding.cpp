@@ -314,7 +314,7 @@ Result<Value> readReply(sd_bus_message* message) {
     try {
         return Reader(message).reply();
     } catch (const Malformed& malformed) {
-        return Error{"wire", EBADMSG, malformed.text};
+        return Error{platform::error_domain::wire, EBADMSG, malformed.text};
     }
 }
 

@@ -170,7 +170,7 @@ bool isTooDeep(const Value& archive, Rejection& rejection) {
 void Rejection::note(const std::string& place, const std::string& reason) {
     if (error_) return;
     const std::string where = place.empty() ? "the root" : "key \"" + place + "\"";
-    error_ = platform::Error{"archive", EBADMSG, "archive rejected at " + where + ": " + reason};
+    error_ = platform::Error{platform::error_domain::archive, EBADMSG, "archive rejected at " + where + ": " + reason};
 }
 
 const platform::Error& Rejection::error() {

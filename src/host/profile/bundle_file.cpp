@@ -27,7 +27,7 @@ bool isOpenToOthers(const struct stat& status) {
 }
 
 Error notBelieved(const std::string& path) {
-    return {"bundle", EPERM, path + " can be changed by others than root and the agent's user"};
+    return {platform::error_domain::bundle, EPERM, path + " can be changed by others than root and the agent's user"};
 }
 
 // Dates and times are given as their text.
@@ -86,7 +86,7 @@ Result<BundleFile> readBundleFile(const std::string& folder) {
             file.entitlements = *toValue(*entitlements).asDictionary();
         return file;
     } catch (const toml::parse_error& error) {
-        return Error{"bundle", EINVAL,
+        return Error{platform::error_domain::bundle, EINVAL,
                      path + ":" + std::to_string(error.source().begin.line) + ": " + std::string(error.description())};
     }
 }

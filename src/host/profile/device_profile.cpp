@@ -370,9 +370,10 @@ Result<ProfileReading> parseProfile(std::string_view document, const std::string
         table.reportUnknown();
         return reading;
     } catch (const toml::parse_error& error) {
-        return Error{"profile", 0, place(error.source().begin.line) + std::string(error.description())};
+        return Error{platform::error_domain::profile, 0,
+                     place(error.source().begin.line) + std::string(error.description())};
     } catch (const ProfileError& error) {
-        return Error{"profile", 0, place(error.line) + error.text};
+        return Error{platform::error_domain::profile, 0, place(error.line) + error.text};
     }
 }
 
