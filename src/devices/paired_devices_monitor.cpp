@@ -46,7 +46,7 @@ void VRXPairedDevicesMonitor::_pairedOrActiveDevicesDidChange(std::nullptr_t /*n
     _updatePariedDevicesFollowUp();
 }
 
-// The process must not end before the reply: nothing would tell its successor of the change.
+// Keeps the process from ending before the reply: nothing would tell the next process of the change.
 void VRXPairedDevicesMonitor::_updatePariedDevicesFollowUp() {
     auto work = Platform::current().processLifecycle().beginWork();
     auto schedulePost = [posts = posts_, work = std::move(work)](const DeviceInfoList& deviceInfos) {
