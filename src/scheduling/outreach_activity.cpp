@@ -27,12 +27,12 @@ using platform::Date;
 using platform::Level;
 using platform::Platform;
 
-// A run, with the earliest due date that its downloads have found. They may end at the same time.
+// A run, with the earliest due date that its downloads have found. Downloads may end at the same time.
 class VRXOutreachActivity::Run : public DeferrableRun {
 public:
     using DeferrableRun::DeferrableRun;
 
-    // Of equal dates, the one that was first stays.
+    // Of equal dates, the first one stays.
     void addDueDate(Date date) {
         std::lock_guard lock(mutex_);
         if (!earliestDueDate_ || date < *earliestDueDate_) earliestDueDate_ = date;
@@ -78,7 +78,7 @@ std::optional<Date> dueDateFromDownload(const std::optional<std::string>& serial
     return dueDateInRecord(*warranty);
 }
 
-// The workers as a group's queue; they belong to the platform.
+// The workers as a queue for a group. The pointer owns nothing: the platform owns the workers.
 std::shared_ptr<platform::Queue> backgroundQueue() {
     return {std::shared_ptr<void>(), &Platform::current().queues().workers(platform::Priority::Background)};
 }
@@ -98,6 +98,7 @@ void VRXOutreachActivity::performActivityForScheduler(const std::shared_ptr<VRXS
         log(Level::Default, "Warranty download activity deferred.");
         end(watched, activity, BackgroundActivityResult::Deferred);
     }));
+    // All devices at once. The group's last step, when no download is left, schedules the post and ends the run.
     DeviceList devices = allDevices();
     log(Level::Default, "%s: devices: %@", "-[VRXOutreachActivity performActivityForScheduler:withCompletionHandler:]",
         devices);
@@ -125,7 +126,7 @@ void VRXOutreachActivity::performActivityForScheduler(const std::shared_ptr<VRXS
     });
 }
 
-// The activity may be gone; its system waits for the result all the same.
+// The activity may be gone; the system waits for the result all the same.
 void VRXOutreachActivity::end(Run& run, const std::weak_ptr<VRXOutreachActivity>& activity,
                               BackgroundActivityResult result) {
     CompletionHandler completionHandler = run.end();
@@ -142,6 +143,7 @@ bool VRXOutreachActivity::currentDeviceShouldReceiveOutreachForWarranty(const VR
     const platform::TelephonyNetworkInfo& networkInfo = Platform::current().telephonyNetworkInfo();
     const platform::Value toggle = warranty.qxOfferToggle();
     const platform::Array* excluded = toggle.asArray();
+    // The first carrier on the record's list decides. A carrier without both codes is on no list.
     for (const auto& [service, carrier] : networkInfo.serviceSubscriberCellularProviders()) {
         if (!carrier.mobileCountryCode)
             log(Level::Error, "No mobileCountryCode for networkInfo: %@, carrier: %@", networkInfo, carrier);

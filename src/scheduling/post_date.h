@@ -13,10 +13,10 @@
 namespace vrx {
 
 struct PostDateSettings {
-    std::set<std::string> postedSerialNumberHashes;  // of the devices whose follow-up has been posted before
+    std::set<std::string> postedSerialNumberHashes;  // of the devices whose follow-up was posted before
     platform::Duration outreachDelay{};              // after a device's activation
 
-    // As they are stored now.
+    // The settings as they are stored now.
     static PostDateSettings read();
 };
 

@@ -1,4 +1,4 @@
-// Decides about each new client connection: only callers that hold the agent's entitlement are served, each by an agent
+// Decides about each new client connection. Only callers that hold the agent's entitlement are served, each by an agent
 // of its own that knows the caller's bundle identifier. Called on the listener's thread.
 #pragma once
 
@@ -13,13 +13,13 @@ namespace vrx {
 
 class ServiceDelegate final : public platform::ServiceListenerDelegate {
 public:
-    // The collaborators go to every agent.
+    // Every agent gets the collaborators.
     explicit ServiceDelegate(AgentCollaborators collaborators) : collaborators_(std::move(collaborators)) {}
 
     bool shouldAcceptNewConnection(platform::ServiceListener& listener,
                                    platform::ServiceConnection& connection) override;
 
-    // The bundle that holds the process's executable, or nothing.
+    // The bundle that holds the process's executable; null when there is none.
     std::optional<platform::Bundle> _bundleForPID(std::int32_t processIdentifier) const;
 
 private:
