@@ -86,6 +86,7 @@ std::shared_ptr<VRXWarranty> VRXWarranty::migrateLegacyCachedWarrantyIfNeededFor
     if (!serialNumber) return nullptr;
     auto warranty = warrantyWithDictionary(propertyListAt(_legacyWarrantyPath()));
     if (!warranty) return nullptr;
+    // The two dots are there on purpose.
     log(Level::Default, "Migrating legacy warranty..");
     warranty->cacheWarranty(serialNumber);
     DefaultsStore& defaults = Platform::current().defaultsStore();

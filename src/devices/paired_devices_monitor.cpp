@@ -50,6 +50,7 @@ void VRXPairedDevicesMonitor::_pairedOrActiveDevicesDidChange(std::nullptr_t /*n
 void VRXPairedDevicesMonitor::_updatePariedDevicesFollowUp() {
     auto work = Platform::current().processLifecycle().beginWork();
     auto schedulePost = [posts = posts_, work = std::move(work)](const DeviceInfoList& deviceInfos) {
+        // "Devices followups" is spelled so on purpose.
         log(Level::Default, "Devices followups to be posted, if required, after paired device change");
         std::optional<Date> date = posts.nextDate(deviceInfos);
         if (!date) return;

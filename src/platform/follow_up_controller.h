@@ -30,7 +30,8 @@ inline constexpr std::uint64_t notification = 2;  // every item that the agent p
 inline constexpr std::uint64_t withoutRowBadge = 16;
 }  // namespace follow_up_style
 
-// User-info keys from which the settings app itself renders the days until the item's expiration date.
+// User-info keys from which the settings app itself renders the days until the item's expiration date. The constants
+// have the names that the settings app gives them.
 inline constexpr std::string_view DaysLeftRoundsUpKey = "DaysLeftRoundsUp";  // boolean: a day that has begun counts
 inline constexpr std::string_view OneDayLeftTextKey = "OneDayLeftText";      // the text while at most one day is left
 inline constexpr std::string_view DaysLeftFormatKey = "DaysLeftFormat";  // the text otherwise, with "%@" for the number

@@ -38,6 +38,7 @@ std::optional<CachedRecordFlaw> flawOfCachedRecord(VRXAgentWarrantyProvider& pro
         log(Level::Default, "user is signed out of Nimbus, cached warranty not allowed");
         return CachedRecordFlaw::SignedOut;
     }
+    // The text is spelled so on purpose.
     log(Level::Default, "cached warranty is for locale ('%@') and version ('%@') match system, consider it valid",
         locale, version);
     return std::nullopt;

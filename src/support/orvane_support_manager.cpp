@@ -63,6 +63,7 @@ Dictionary offeredAnswer(const platform::StoreItem& item) {
 
 Dictionary purchasedAnswer(const platform::Purchase& purchase) {
     return {{linkURLKey, withCampaign(purchase.productURL)},
+            // The texts that stand for a missing one are spelled so on purpose.
             {titleKey, purchase.title.value_or("== Orvane Support ==")},
             {vendorNameKey, purchase.developerName.value_or("== Orvane ==")},
             {availabilityTextKey, "DOWNLOAD"},
@@ -166,6 +167,7 @@ void VRXOrvaneSupportManager::appSupportAvailability(std::string bundleIdentifie
 
     checkIsAvailableInStore(bundleIdentifier,
                             [answer = std::move(answer), reply = std::move(reply)](Value offer) mutable {
+                                // "MarketplaceApp -->" is spelled so on purpose.
                                 log(Level::Default, "MarketplaceApp --> appSupportAvailability %@.", offer);
                                 if (const Dictionary* entries = offer.asDictionary())
                                     answer.insert(entries->begin(), entries->end());
