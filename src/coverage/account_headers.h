@@ -1,6 +1,7 @@
 // What a request carries for the coverage server: the headers that sign it with the user's accounts, the body that asks
 // for one device's coverage, and the descriptions of both for the log. Any thread may call. Signing may block its
 // thread while a credential is renewed, so it belongs on a worker.
+// A leading "vrx_" or "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <optional>

@@ -1,6 +1,7 @@
 // Fetches devices' coverage records, caches them with their metadata and completes with them. Made for one piece of
 // work and kept alive by its downloads, which run side by side. Any thread may start one. The process does not exit
 // while one runs.
+// A leading "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <cstdint>

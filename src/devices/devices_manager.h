@@ -1,6 +1,7 @@
 // The inventory: this device and the watches paired with it. It has no state: each call reads the platform afresh and
 // returns new device objects. Any thread may call it. The dictionaries leave out a device without a serial number,
 // because they have no key for it.
+// A leading "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <memory>

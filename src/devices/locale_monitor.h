@@ -2,6 +2,7 @@
 // up, which downloads them anew, and the follow-ups refreshed. Then it lets the process end, so that the next one
 // begins in the new language. Started once; it listens until it is destroyed. It belongs to the main thread; replies
 // may come on any thread.
+// A leading "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <cstdint>

@@ -1,6 +1,7 @@
 // Reacts to a watch that is paired or unpaired. It has every device's record looked up and all follow-ups refreshed,
 // and schedules the follow-up post when a device now waits for its post. Started once; it listens until it is
 // destroyed. It belongs to the main thread; replies may come on any thread.
+// A leading "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <cstddef>

@@ -1,6 +1,7 @@
 // The follow-up manager. It decides for each device whether its follow-up is posted, updated or removed, and has its
 // provider do that. Made afresh for each piece of work; it runs on its caller's thread and is done when it returns. A
 // failure is logged and does not stop the rest. Device infos are never null, but may lack device and record.
+// A leading "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <memory>

@@ -2,6 +2,7 @@
 // so outlives the process. A firing before the target date is deferred and changes nothing; a firing at or after it, or
 // without one, runs the activity. The system keeps the scheduler alive, through the handler, until another scheduler
 // takes the identifier. Only one thread may schedule; everything else any thread may do.
+// A leading "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <memory>

@@ -1,6 +1,7 @@
 // Which protocol versions the coverage server and this agent share. The server publishes its versions in a small
 // document on the configuration CDN. The agent's versions are in the defaults, where the last document is kept as well.
 // Any thread may ask. An answer that needs the network comes on a worker, every other one before the call returns.
+// A leading "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <cstdint>

@@ -1,6 +1,7 @@
 // The object through which every request reaches devices and coverage records. Each client connection has one, and so
 // have start-up and each activity that works through one. It has no state between requests. Requests may come on any
 // thread; a request under way keeps the agent alive until its reply is sent.
+// A leading "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <memory>

@@ -1,5 +1,6 @@
 // The warranty provider of an agent that serves an application. It reads the cache and the defaults afresh and makes a
 // new worker for each piece of work, so that the providers of several agents never disagree. Any thread may call it.
+// A leading "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <string>

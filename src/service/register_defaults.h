@@ -1,4 +1,5 @@
 // The settings that apply until others are written.
+// A leading "vrx_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 namespace vrx::platform {

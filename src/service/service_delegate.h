@@ -1,5 +1,6 @@
 // Decides about each new client connection. Only callers that hold the agent's entitlement are served, each by an agent
 // of its own that knows the caller's bundle identifier. Called on the listener's thread.
+// A leading "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <cstdint>

@@ -1,6 +1,7 @@
 // A device's coverage record: the server's answer for one serial number, and the typed fields read from it once, at
 // construction. Shared by reference, and the agent does not change it after construction. Derived texts and day counts
 // are computed on each read, from the clock. Any thread may read or replace a field.
+// A leading "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <cstdint>
