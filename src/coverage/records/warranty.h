@@ -233,7 +233,7 @@ public:
 
     // The cache of records on disk: a file for each serial number or, without a serial number, the one file of the
     // older single-device layout. No operation reports a failure: a failed write keeps the earlier file, and a file
-    // that cannot be read is no record.
+    // that cannot be read reads as null.
     // These need facilities that only the agent has, so they are defined in the agent's own layer
     // (coverage/warranty_cache.cpp): a client program that calls one of them does not link.
     static std::string _legacyWarrantyPath();
