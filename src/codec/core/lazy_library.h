@@ -31,7 +31,7 @@ public:
     // A function by its name:
     //     decltype(&::unum_open) open = icu().function("unum_open");
     Function function(const char* name) const;
-    // As function(), for one that some releases of the library do not have: its absence is nothing missing.
+    // Like function(), for a function that some releases of the library lack: missing() does not report it.
     Function optionalFunction(const char* name) const;
 
     // A text that names what was missing first, the library or a function; empty when nothing was.
