@@ -64,7 +64,7 @@ Explanation explainWithoutRecord(const Circumstances& device) {
 
 // Explains the date before which it is not posted.
 Explanation explainPostDate(const Circumstances& device) {
-    const PostDate& date = *device.post.postDate;
+    const DueDate& date = *device.post.dueDate;
     Explanation explanation{Waiting, "", ""};
     if (date.isInitial) {
         explanation.rule = "outreach-delay";
@@ -83,7 +83,7 @@ Explanation explainPostDate(const Circumstances& device) {
 // scheduled, the carrier, the date of the run.
 Explanation explainUnposted(const Circumstances& device) {
     const Date end = *device.eligibleUntil;
-    const Date day = device.post.postDate->date;
+    const Date day = device.post.dueDate->date;
     if (day >= end) return {NotOffered, "ends-first", "the offer ends before the day on which it would be shown"};
     const NextStep next = nextConsideration(device);
     const std::string posted = device.wasPosted ? ": it was posted before" : "";

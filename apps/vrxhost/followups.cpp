@@ -197,7 +197,9 @@ Result<std::string> readAll(const std::string& file) {
 // Reads an item in the form that the listing prints. The expiration date may also be a text. Values that an item cannot
 // have are rejected.
 Result<FollowUpItem> readItem(const std::string& file) {
-    const auto mistake = [&](const std::string& what) { return platform::Error{"follow-up", 0, file + ": " + what}; };
+    const auto mistake = [&](const std::string& what) {
+        return platform::Error{platform::error_domain::followUp, 0, file + ": " + what};
+    };
     const Result<std::string> text = readAll(file);
     if (!text) return text.error();
     Result<Value> root = codec::parseJson(*text);
@@ -231,7 +233,8 @@ Outcome post(Home& home, const std::string& file) {
     if (!before) return databaseFailure(before.error(), "not-read");
     const bool isReplaced = isPending(*before, item->uniqueIdentifier);
     if (const MaybeError error = controller->postFollowUpItem(*item)) {
-        if (error->domain == "property list") return failed(ExitCode::Usage, file + ": " + error->text, advice);
+        if (error->domain == platform::error_domain::propertyList)
+            return failed(ExitCode::Usage, file + ": " + error->text, advice);
         return databaseFailure(*error, "not-written");
     }
     return {.document = {{"uniqueIdentifier", item->uniqueIdentifier}, {"replaced", isReplaced}},

@@ -194,7 +194,7 @@ Findings examine(AgentView& view, const std::string& serialNumber, const std::se
     findings.inputs = {{"now", state.now},
                        {"activationDate", valueOf(device->activationDate())},
                        {"PostUpgradeOutreachDelay", settings.dates.outreachDelay.count()},
-                       {"postDate", state.post.postDate ? Value(state.post.postDate->date) : Value()},
+                       {"postDate", state.post.dueDate ? Value(state.post.dueDate->date) : Value()},
                        {"pending", state.isPending},
                        {"posted", state.wasPosted},
                        {"dismissed", settings.dismissed.contains(platform::sha256Hash(serialNumber))}};

@@ -20,7 +20,7 @@ using wire::MessagePointer;
 
 namespace {
 
-// Never 0, which the calls below take for "no limit" or "the usual one".
+// Never 0, because the calls below take 0 for "no limit" or "the default".
 std::uint64_t microsecondsUntil(Deadline deadline) {
     using namespace std::chrono;
     return static_cast<std::uint64_t>(
@@ -33,10 +33,10 @@ bool meansEnded(int error) {
 }
 
 MaybeError cannotConnect(const std::string& path, int error) {
-    return Error{"client", error, "no agent answers at " + path + ": " + std::strerror(error)};
+    return Error{platform::error_domain::client, error, "no agent answers at " + path + ": " + std::strerror(error)};
 }
 
-// Releases what sd-bus fills in while it is alive.
+// Owns what sd-bus fills in.
 struct BusError {
     sd_bus_error error{};
     ~BusError() { sd_bus_error_free(&error); }
@@ -66,12 +66,12 @@ MaybeError AgentBus::open(const std::string& path, Deadline deadline) {
 
     const int file = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
     if (file < 0) return cannotConnect(path, errno);
-    // An agent that is busy lets clients wait in its queue; one whose queue is full, before it.
+    // A busy agent lets clients wait in its queue; when that is full, connect() waits up to this limit.
     const std::uint64_t wait = microsecondsUntil(deadline);
     const timeval limit{static_cast<time_t>(wait / 1'000'000), static_cast<suseconds_t>(wait % 1'000'000)};
     setsockopt(file, SOL_SOCKET, SO_SNDTIMEO, &limit, sizeof limit);
     int r = connect(file, reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0 ? 0 : -errno;
-    if (r == -EAGAIN) r = -ETIMEDOUT;  // the limit's own error
+    if (r == -EAGAIN) r = -ETIMEDOUT;  // this is how the limit shows
     if (r >= 0) r = sd_bus_new(&bus_);
     if (r >= 0) r = sd_bus_set_fd(bus_, file, file);
     if (r < 0) {
@@ -92,6 +92,7 @@ int AgentBus::authenticate(Deadline deadline) {
     return r;
 }
 
+// Order: authenticate, append, send. The first failure ends the call; a refused argument never reaches the agent.
 CallResult AgentBus::call(const wire::Operation& operation, const CallArguments& arguments, Deadline deadline) {
     BusError error;
     if (int r = authenticate(deadline); r < 0) return failed(r, error);

@@ -1,4 +1,4 @@
-// One connection to the agent, for one call at a time. One thread uses it; interrupt() may come from any.
+// One connection to the agent, for one call at a time. It belongs to one thread; interrupt() may come from any.
 #pragma once
 
 #include <systemd/sd-bus.h>
@@ -16,7 +16,7 @@ namespace vrx::client {
 
 using Deadline = std::chrono::steady_clock::time_point;
 
-// An operation takes one of each at the most.
+// Each operation takes at most one of each.
 struct CallArguments {
     std::string_view text = {};
     VRXWarrantyLookupPolicy policy = VRXWarrantyLookupPolicyDefault;
@@ -37,11 +37,11 @@ public:
     AgentBus(const AgentBus&) = delete;
     AgentBus& operator=(const AgentBus&) = delete;
 
-    // Opens the socket: an error's text is for people, and its code ETIMEDOUT when no place came free in the agent's
-    // queue. What follows may be interrupted.
+    // Opens the socket. An error's text is for people; its code is ETIMEDOUT when no place came free in the agent's
+    // queue. Only calls after this one may be interrupted.
     platform::MaybeError open(const std::string& socketPath, Deadline deadline);
 
-    // The archived root of the operation's reply. After anything else the connection is of no more use.
+    // Returns the archived root of the operation's reply. After any other result the connection is useless.
     CallResult call(const wire::Operation& operation, const CallArguments& arguments, Deadline deadline);
 
     // Ends the connection and the call under way.

@@ -18,7 +18,7 @@ Failure badReply(std::string text) {
     return {Failure::Kind::BadReply, std::move(text)};
 }
 
-// Each reply decoded as what the operation gives and nothing else.
+// Decodes each reply as the type that the operation returns and no other.
 template <class T>
 struct Decoder;
 
@@ -82,7 +82,7 @@ public:
           workers_(options.connections) {
         installPlatformIfNone();
     }
-    // The workers then run to their end without waiting.
+    // The workers can then end without waiting for replies.
     ~Implementation() { pool_.close(); }
 
     template <class T>
@@ -92,7 +92,7 @@ public:
         return Decoder<T>::decode(*root);
     }
 
-    // The text is the caller's string argument, if the operation has one.
+    // The text is the operation's string argument, if it has one. The task owns it until the call has ended.
     template <class T>
     void callLater(OperationIndex operation, Reply<T> reply, std::string text = {}, CallArguments arguments = {}) {
         workers_.post([this, operation, reply = std::move(reply), text = std::move(text), arguments]() mutable {

@@ -7,21 +7,21 @@
 //     else if (auto warranty = (*info)->warranty())
 //         show(warranty->coverageLocalizedLabel());  // else there is no coverage record for that device
 //
-// Each operation comes in two forms. The one without a reply waits on the calling thread and gives the answer or, in
-// its place, why there is none. The one with a reply is VRXAgentProtocol's: it returns at once, and the reply comes
-// later on a thread of the library; what cannot be had is absent there, and the failure handler is told why just
-// before.
+// Each operation comes in two forms. The form without a reply waits on the calling thread and returns the answer or the
+// reason why there is none. The form with a reply is VRXAgentProtocol's: it returns at once, and the reply comes later
+// on a thread of the library. An answer that is not available is null there, and just before the reply the failure
+// handler gets the reason.
 //
-// Threads: any number of threads may use one object at the same time. Calls under way at the same time use a connection
-// each, up to `connections`; connections are kept for later calls and are opened when first needed, so that making an
-// object cannot fail. Calls do not wait for one another as long as there are that many.
+// Threads: any number of threads may use one object at the same time. Each call under way uses a connection of its own,
+// up to `connections`; only calls beyond that number wait for one another. Connections are opened when first needed and
+// kept for later calls, so that making an object cannot fail.
 //
-// The agent may end while it has nothing to do: a call whose connection ended before its reply is sent again, once, on
+// The agent may end while it has nothing to do. A call whose connection ended before its reply is sent again, once, on
 // a new connection. All operations may be sent twice without harm.
 //
-// Texts and day counts of a VRXWarranty are derived where they are read. When the program has set no
-// platform::Platform, the library installs a small one with the first object: the system's clock, the locale of the
-// process's environment, and a day of 86400 seconds.
+// Texts and day counts of a VRXWarranty are derived when they are read. When the program has set no platform::Platform,
+// the first object installs a small one: the system's clock, the locale of the process's environment, and a day of
+// 86400 seconds.
 #pragma once
 
 #include <functional>
@@ -39,26 +39,26 @@
 
 namespace vrx::client {
 
-// Why the agent gave no answer.
+// Why there is no answer.
 struct Failure {
     enum class Kind {
-        NotReachable,  // nobody answers at the socket, or the connection ended twice
+        NotReachable,  // no agent answers at the socket, or the connection ended twice
         Refused,       // see Refusal
         TimedOut,      // no reply within the time limit; the agent may still do what was asked
-        BadReply,      // the answer is not what the operation gives: agent and library do not fit each other
+        BadReply,      // the answer is not of the operation's type: agent and library do not fit each other
     };
     enum class Refusal {
-        Entitlement,  // the caller does not hold it
-        Limit,        // too much at a time: connections, requests, or the size of the reply
-        Argument,     // one is too long, or no text
+        Entitlement,  // the caller does not hold the entitlement
+        Limit,        // too many connections or requests at the same time, or a reply that is too large
+        Argument,     // an argument is too long, or is not text
     };
     Kind kind;
-    std::string text;                        // for people; of a refusal, the agent's own words
-    Refusal refusal = Refusal::Entitlement;  // when it is one
+    std::string text;                        // for people; after a refusal, the agent's own words
+    Refusal refusal = Refusal::Entitlement;  // only when the kind is Refused
 };
 
-// What the agent answered, or why it did not. The answer itself may be nothing, such as a null pointer. value() and
-// failure() may only be asked for what is there.
+// The agent's answer, or why there is none. The answer itself may be null. Callers may ask value() and failure() only
+// for what is there.
 template <class T>
 class Answer {
 public:
@@ -76,23 +76,24 @@ private:
 };
 
 struct ConnectionOptions {
-    std::string socketPath = {};          // empty: where wire::findLocations() says
-    platform::Duration timeLimit{420.0};  // of a call, in seconds: longer than any download of the agent
+    std::string socketPath = {};          // empty: the one of wire::findLocations()
+    platform::Duration timeLimit{420.0};  // the limit of a call; longer than any download of the agent
     std::size_t connections = 8;
 };
 
 class AgentConnection final : public VRXAgentProtocol {
 public:
-    // Told of each failed call that had a reply, on the thread of that reply; the operation goes by its name.
+    // Called for each failed call that had a reply, on the thread of that reply, with the operation's name.
     using FailureHandler = std::function<void(std::string_view operation, const Failure& failure)>;
 
     explicit AgentConnection(ConnectionOptions options = {}, FailureHandler failureHandler = nullptr);
-    // Calls under way end as NotReachable; no reply comes after the destructor has returned. Not from within a reply.
+    // Calls under way end as NotReachable, and no reply comes after the destructor has returned. It must not run within
+    // a reply.
     ~AgentConnection() override;
     AgentConnection(const AgentConnection&) = delete;
     AgentConnection& operator=(const AgentConnection&) = delete;
 
-    // Waiting on the calling thread. What each gives is told in protocols/agent_protocol.h.
+    // These wait on the calling thread. protocols/agent_protocol.h says what each returns.
     Answer<bool> scheduleOutreachWithReply();
     Answer<platform::Value> checkIsAvailableInStore(const std::string& bundleIdentifier);
     Answer<platform::Value> appSupportAvailability(const std::string& bundleIdentifier);
@@ -105,7 +106,7 @@ public:
     Answer<DeviceInfoList> getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicy policy, bool updateFollowUps);
     Answer<bool> dismissFollowUpForSerialNumber(const std::string& serialNumber);
 
-    // Replying later.
+    // These reply later.
     void scheduleOutreachWithReply(Reply<bool> reply) override;
     void checkIsAvailableInStore(std::string bundleIdentifier, Reply<platform::Value> reply) override;
     void appSupportAvailability(std::string bundleIdentifier, Reply<platform::Value> reply) override;

@@ -16,7 +16,7 @@ Failure closed() {
 
 Answer<Value> BusPool::call(const wire::Operation& operation, const CallArguments& arguments, Deadline deadline) {
     CallResult result = callOnce(operation, arguments, deadline, Age::Any);
-    // An agent that had nothing to do may have ended since the last call; the next one answers on a new connection.
+    // An idle agent may have ended since the last call; the next agent answers on a new connection.
     if (std::holds_alternative<ConnectionEnded>(result)) result = callOnce(operation, arguments, deadline, Age::New);
     if (auto* root = std::get_if<Value>(&result)) return std::move(*root);
     if (auto* failure = std::get_if<Failure>(&result)) return std::move(*failure);
@@ -43,21 +43,21 @@ CallResult BusPool::callOnce(const wire::Operation& operation, const CallArgumen
     return result;
 }
 
-// The right to use a connection, with one that is idle if there is one of that age.
+// Takes the right to use a connection, with an idle one if there is one of that age.
 std::variant<BusPool::Bus, Failure> BusPool::take(Deadline deadline, Age age) {
     std::unique_lock lock(mutex_);
     if (!isFree_.wait_until(lock, deadline, [&] { return isClosed_ || taken_ < connections_; }))
         return Failure{Failure::Kind::TimedOut, "all connections were busy"};
     if (isClosed_) return closed();
     ++taken_;
-    if (age == Age::New) idle_.clear();  // they have ended with the one that is to be replaced
+    if (age == Age::New) idle_.clear();  // they ended with the connection that is to be replaced
     if (idle_.empty()) return Bus();
     Bus bus = std::move(idle_.back());  // the one used last
     idle_.pop_back();
     return bus;
 }
 
-// From here on close() interrupts it; false when that has happened already.
+// Lets close() interrupt the connection from now on; false when close() has been called already.
 bool BusPool::beginUse(AgentBus& bus) {
     std::lock_guard lock(mutex_);
     if (isClosed_) return false;

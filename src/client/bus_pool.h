@@ -1,4 +1,4 @@
-// The connections of one client object: makes each call on one that is free, or on a new one. Any thread may call.
+// The connections of one client object. Makes each call on a free connection, or on a new one. Any thread may call.
 #pragma once
 
 #include <condition_variable>
@@ -16,8 +16,8 @@ public:
     BusPool(std::string socketPath, std::size_t connections)
         : socketPath_(std::move(socketPath)), connections_(connections) {}
 
-    // The archived root of the operation's reply. A call whose connection ended before the reply is sent again, once,
-    // on a new one.
+    // Returns the archived root of the operation's reply. A call whose connection ended before the reply is sent again,
+    // once, on a new connection.
     Answer<platform::Value> call(const wire::Operation& operation, const CallArguments& arguments, Deadline deadline);
 
     // Ends the calls under way; later ones fail.

@@ -48,7 +48,7 @@ class EnvironmentLocale final : public platform::Locale {
     }
 };
 
-// The agent's registered defaults that records read; nothing is stored.
+// The registered defaults that records read. Nothing is stored.
 class FixedDefaults final : public platform::DefaultsStore {
     Value get(std::string_view key) const override { return values_[key]; }
     void set(std::string_view, Value) override {}
@@ -78,7 +78,7 @@ void installPlatformIfNone() {
     static std::mutex mutex;
     std::lock_guard lock(mutex);
     if (Platform::hasCurrent()) return;
-    // It stays to the end of the process: records may be read by then still.
+    // Never destroyed: records may still be read while the process ends.
     static LocalPlatform& local = *new LocalPlatform;
     Platform::setCurrent(&local.platform);
 }

@@ -3,7 +3,7 @@
 
 namespace vrx::client {
 
-// Makes it the current platform if there is none. Any thread may call; the first call comes before records are read.
+// Makes it the current platform if there is none. Any thread may call this. Call it before any record is read.
 void installPlatformIfNone();
 
 }  // namespace vrx::client

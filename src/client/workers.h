@@ -1,4 +1,4 @@
-// Threads on which replies come: made as they are needed, up to a number, and kept. Any thread may post.
+// The threads on which replies come. They are made when they are needed, up to a number, and kept. Any thread may post.
 #pragma once
 
 #include <condition_variable>
@@ -14,7 +14,7 @@ namespace vrx::client {
 class Workers {
 public:
     explicit Workers(std::size_t most) : most_(most) {}
-    // Runs what has been posted, and waits for it.
+    // Waits until everything that was posted has run.
     ~Workers();
     Workers(const Workers&) = delete;
     Workers& operator=(const Workers&) = delete;

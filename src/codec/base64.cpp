@@ -36,7 +36,7 @@ std::optional<platform::Data> dataFromBase64(std::string_view text) {
     platform::Data data;
     data.reserve(characters.size() / 4 * 3 + 2);
     std::uint32_t bits = 0;
-    int waiting = 0;  // bits that make no byte yet
+    int waiting = 0;  // bits that do not fill a byte yet
     for (char c : characters) {
         const std::size_t digit = alphabet.find(c);
         if (digit == alphabet.npos) return std::nullopt;

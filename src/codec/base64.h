@@ -10,8 +10,7 @@
 namespace vrx::codec {
 
 std::string base64FromData(const platform::Data& data);
-// White space between the characters counts for nothing. Nothing for another character, or where characters are
-// missing.
+// Ignores white space between the characters. Null for any other character, and when characters are missing.
 std::optional<platform::Data> dataFromBase64(std::string_view text);
 
 }  // namespace vrx::codec

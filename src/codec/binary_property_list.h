@@ -1,7 +1,7 @@
-// The binary form of property lists; what both forms have in common is in property_list.h. Any thread may call.
+// The binary form of property lists; property_list.h says what both forms have in common. Any thread may call.
 //
-// A document is a header, objects, a table of the objects' offsets, and a trailer that says where the table is, how
-// wide its entries and the references to objects are, and which object is the root. Objects refer to each other by
+// A document is a header, objects, a table of the objects' offsets, and a trailer. The trailer says where the table is,
+// how wide its entries and the references to objects are, and which object is the root. Objects refer to each other by
 // number.
 #pragma once
 

@@ -10,7 +10,7 @@ namespace vrx::codec::binary_property_list {
 inline constexpr std::string_view family = "bplist";
 inline constexpr std::string_view header = "bplist00";
 
-// The trailer ends the document: five bytes unused, the sort version, then these. All numbers are big-endian.
+// The trailer ends the document: five unused bytes, the sort version, then these. All numbers are big-endian.
 inline constexpr std::size_t trailerBytes = 32;
 inline constexpr std::size_t offsetWidthAt = 6;
 inline constexpr std::size_t refWidthAt = 7;
@@ -18,11 +18,12 @@ inline constexpr std::size_t objectCountAt = 8;
 inline constexpr std::size_t rootAt = 16;
 inline constexpr std::size_t offsetTableAt = 24;
 
-// An object begins with a byte of kind and length; the length countFollows says that an integer object holds it.
+// An object begins with a byte that holds its kind and its length. The length countFollows means that an integer object
+// with the length follows.
 inline constexpr std::uint8_t falseObject = 0x08, trueObject = 0x09, dateObject = 0x33;
 inline constexpr std::uint8_t countFollows = 0x0F;
 enum Kind : std::uint8_t {
-    Integer = 0x10,  // the length is the logarithm of the bytes
+    Integer = 0x10,  // the length is the binary logarithm of the number of bytes
     Real = 0x20,
     Data = 0x40,
     AsciiString = 0x50,

@@ -24,8 +24,8 @@ namespace {
 //
 // Objects may share others, overlap, and refer in circles. Each use of an object counts as a value, so that circles and
 // sharing end at the limits of depth and count. Texts and data are made once for each place in the document and then
-// shared; a key, which the dictionary copies, counts at each use. Their bytes together are held to what a document may
-// have, so that neither overlapping contents nor shared keys grow beyond it.
+// shared; a key, which the dictionary copies, counts at each use. All their bytes together are limited, so that neither
+// overlapping contents nor shared keys use more memory than a document may.
 class BinaryReader {
 public:
     explicit BinaryReader(const platform::Data& document) : document_(document) {}
@@ -41,12 +41,12 @@ public:
     }
 
 private:
-    // What stands at an object's offset: its kind, and the bytes or references that its first byte and count announce.
+    // What is at an object's offset: its kind, and the bytes or references that its first byte and count announce.
     struct Object {
         std::size_t offset;
         std::uint8_t marker;
         std::size_t count;    // elements, characters or bytes
-        std::size_t content;  // where they begin
+        std::size_t content;  // where the elements, characters or bytes begin
 
         Kind kind() const { return static_cast<Kind>(marker & 0xF0); }
     };
@@ -82,7 +82,7 @@ private:
         return true;
     }
 
-    // Where the object stands; complains at the reference.
+    // Finds the object's offset; complains at the reference.
     bool locate(std::uint64_t object, std::size_t referredAt, std::size_t& offset) {
         if (object >= objectCount_) return complain(referredAt, "a reference to no object");
         const std::size_t entry = offsetTable_ + static_cast<std::size_t>(object) * offsetWidth_;
@@ -108,7 +108,7 @@ private:
         return true;
     }
 
-    // Whether count units of that width lie within the objects; the count may be any number up to the document's size.
+    // Whether so many units of the width lie within the objects. The count may be any number up to the document's size.
     bool fits(const Object& object, std::size_t count, std::size_t width) {
         if (count <= (offsetTable_ - object.content) / width) return true;
         return complain(object.offset, "contents that end beyond the objects");
@@ -118,6 +118,7 @@ private:
         Object object;
         std::size_t offset = 0;
         if (!locate(reference, referredAt, offset) || !open(offset, object)) return {};
+        // Counted before anything is made of it, so that objects which share or contain each other end at the limit.
         if (++values_ > limits::documentValues) {
             complain(object.offset, "too many values");
             return {};
@@ -157,7 +158,7 @@ private:
         if (object.count > 4) {
             complain(object.offset, "an integer too wide");
         } else if (fits(object, 1, width)) {
-            // Narrower ones are unsigned; those of sixteen bytes hold what is beyond int64.
+            // Up to four bytes are unsigned, eight are signed, and sixteen hold what is beyond int64.
             if (width < 16) return static_cast<std::int64_t>(number(object.content, width));
             if (number(object.content, 8) == 0) return number(object.content + 8, 8);
             complain(object.offset, "an integer out of range");
@@ -173,6 +174,7 @@ private:
 
     Value makeBytes(const Object& object) {
         const std::size_t width = object.kind() == Utf16String ? 2 : 1;
+        // Checked and paid for before any memory is taken.
         if (!fits(object, object.count, width) || !spend(object, object.count * width)) return {};
         const std::uint8_t* begin = document_.data() + object.content;
         const std::uint8_t* end = begin + object.count * width;
@@ -208,7 +210,7 @@ private:
             const Value key = readKey(object, i);
             const std::string* name = key.asString();
             if (!name) break;
-            // Most writers, ours among them, write keys in order: they belong at the end.
+            // Most writers, ours among them, write keys in order, so that each belongs at the end.
             entries.insert_or_assign(entries.end(), *name, readReferred(object, object.count + i, depth + 1));
         }
         return entries;

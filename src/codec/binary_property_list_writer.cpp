@@ -22,12 +22,12 @@ std::size_t widthOf(std::uint64_t largest) {
 }
 
 // First numbers the objects, a container's children together, then writes them in that order. Equal texts are one
-// object, as are the two booleans.
+// object, and so are equal booleans.
 class BinaryWriter {
 public:
     Result<platform::Data> write(const Value& root) {
         objectOf(root);
-        // The list grows while it is gone through: each container adds its children at the end.
+        // The list grows during the loop: each container appends its children.
         for (std::size_t i = 0; i < objects_.size(); ++i) numberChildren(i);
         refWidth_ = widthOf(objects_.size() - 1);
 

@@ -9,7 +9,7 @@
 
 namespace vrx::codec {
 
-// A fraction of a second is dropped. Nothing outside of the years 1 to 9999.
+// A fraction of a second is dropped. Null outside the years 1 to 9999.
 std::optional<std::string> isoTextFromDate(platform::Date date);
 std::optional<platform::Date> dateFromIsoText(std::string_view text);
 

@@ -21,7 +21,7 @@ using platform::Value;
 
 namespace {
 
-// An iterator over the document that leaves a trace of how far the parser has read, for the error's text.
+// An iterator over the document that records how far the parser has read, for the error's text.
 class TracedByte {
 public:
     using iterator_category = std::input_iterator_tag;
@@ -83,8 +83,8 @@ private:
         return within;
     }
 
-    // The library says "… while parsing value - REASON; last read: '…'; expected …"; of a number out of range, which is
-    // the only failure without a dash, it quotes the number.
+    // The library says "… while parsing value - REASON; last read: '…'; expected …". Only for a number out of range
+    // does it write no dash, and quotes the number.
     static std::string reason(std::string_view what) {
         const std::size_t dash = what.find(" - ");
         if (dash == what.npos) return "number out of range";
@@ -97,12 +97,12 @@ private:
 };
 
 Error invalidAt(std::size_t byte, const std::string& reason) {
-    return {"json", EBADMSG, "invalid JSON at byte " + std::to_string(byte) + ": " + reason};
+    return {platform::error_domain::json, EBADMSG, "invalid JSON at byte " + std::to_string(byte) + ": " + reason};
 }
 
 // How the two kinds of JSON text differ.
 struct Style {
-    bool strict;  // fails for what JSON does not have, where the other kind puts something in its place
+    bool strict;  // fails for what JSON does not have; the other kind puts something in its place
     JsonLayout layout;
 };
 
@@ -136,7 +136,7 @@ public:
     }
 
     std::string takeText() { return std::move(text_); }
-    Error failure() const { return {"json", EINVAL, "JSON cannot hold " + unwritable_}; }
+    Error failure() const { return {platform::error_domain::json, EINVAL, "JSON cannot hold " + unwritable_}; }
 
 private:
     template <class List, class WriteItem>
@@ -183,6 +183,8 @@ private:
         text_ += '"';
         while (!rest.empty()) {
             const std::string_view before = rest;
+            // Character by character, so that the text is checked and escaped in one pass; a lax writer replaces each
+            // wrong byte.
             std::optional<char32_t> character = takeCharacter(rest);
             if (!character) {
                 if (style_.strict) return fail("text that is not UTF-8");
@@ -223,7 +225,7 @@ private:
 Result<Value> parseJson(std::string_view document) {
     if (document.size() > platform::limits::documentBytes)
         return invalidAt(platform::limits::documentBytes, "document too large");
-    // The library takes a NUL for the end of the document, and would not look behind it.
+    // The library takes a NUL for the end of the document and would ignore what follows.
     if (const std::size_t nul = document.find('\0'); nul != document.npos) return invalidAt(nul, "NUL");
 
     const char* begin = document.data();

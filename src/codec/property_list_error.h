@@ -9,11 +9,11 @@
 namespace vrx::codec {
 
 inline platform::Error invalidPropertyList(const std::string& place, const std::string& reason) {
-    return {"property list", EBADMSG, "invalid property list at " + place + ": " + reason};
+    return {platform::error_domain::propertyList, EBADMSG, "invalid property list at " + place + ": " + reason};
 }
 
 inline platform::Error unwritablePropertyList(const std::string& what) {
-    return {"property list", EINVAL, "a property list cannot hold " + what};
+    return {platform::error_domain::propertyList, EINVAL, "a property list cannot hold " + what};
 }
 
 }  // namespace vrx::codec

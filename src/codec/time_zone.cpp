@@ -25,11 +25,11 @@ struct Functions {
 std::optional<std::chrono::seconds> timeZoneOffset(const std::string& zone, platform::Date at) {
     static const Functions functions;
     if (!functions.areThere()) return std::nullopt;
-    const std::u16string name(zone.begin(), zone.end());  // names are ASCII; another character matches none
+    const std::u16string name(zone.begin(), zone.end());  // names are ASCII; any other character matches no zone
     const auto length = static_cast<std::int32_t>(name.size());
     UErrorCode status = U_ZERO_ERROR;
 
-    // An unknown zone would silently be taken for GMT, but has no canonical name.
+    // An unknown zone would silently count as GMT, but it has no canonical name.
     char16_t canonical[128];
     UBool isSystem = false;
     functions.getCanonicalID(name.data(), length, canonical, 128, &isSystem, &status);

@@ -9,8 +9,7 @@
 
 namespace vrx::codec {
 
-// How far the local time of a zone such as "Europe/Berlin" is ahead of GMT at the date; nothing for a name that is no
-// zone's.
+// How far the local time of a zone such as "Europe/Berlin" is ahead of GMT at the date; null for an unknown name.
 std::optional<std::chrono::seconds> timeZoneOffset(const std::string& zone, platform::Date at);
 
 }  // namespace vrx::codec

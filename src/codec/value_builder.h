@@ -1,5 +1,5 @@
-// Builds a value from the events of a document that is read from front to back, within the limits of documents. One
-// thread uses a builder.
+// Builds a value from the events of a document that is read from front to back, within the limits of documents. A
+// builder belongs to one thread.
 #pragma once
 
 #include <cstddef>
@@ -12,14 +12,14 @@ namespace vrx::codec {
 
 class ValueBuilder {
 public:
-    // A value or a container stands here next: at the root, in an array, or after a key.
+    // Whether a value or a container comes next: at the root, in an array, or after a key.
     bool expectsValue() const;
-    // A key or the end of the dictionary stands here next.
+    // Whether a key or the end of the dictionary comes next.
     bool expectsKey() const;
     bool isInArray() const { return !open_.empty() && !open_.back().isDictionary; }
     bool isComplete() const { return count_ > 0 && open_.empty(); }
 
-    // These return false when a limit is passed; complaint() says which.
+    // These return false when a limit is exceeded; complaint() says which.
     bool add(platform::Value&& value);
     bool beginArray() { return begin(false); }
     bool beginDictionary() { return begin(true); }

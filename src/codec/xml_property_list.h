@@ -1,4 +1,4 @@
-// The XML form of property lists; what both forms have in common is in property_list.h. Any thread may call.
+// The XML form of property lists; property_list.h says what both forms have in common. Any thread may call.
 #pragma once
 
 #include "vrx/platform/error.h"

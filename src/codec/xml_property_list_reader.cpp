@@ -20,7 +20,7 @@ using platform::Value;
 
 namespace {
 
-// A line or a column. Newer releases of expat deprecate the name without a width, older ones have no other.
+// Tells a line or a column. Newer releases of expat deprecate the name without a width; older ones have only that name.
 class PlaceFunction {
 public:
     PlaceFunction(const LazyLibrary& library, const char* wide, const char* narrow)
@@ -35,7 +35,7 @@ private:
     XML_Size (*narrow_)(XML_Parser) = nullptr;
 };
 
-// Opened when the first document is read: what the agent keeps itself is binary.
+// Opened when the first XML document is read: the agent's own files are binary.
 struct Expat {
     const LazyLibrary library{"libexpat.so.1"};
     decltype(&::XML_ParserCreate) parserCreate = library.function("XML_ParserCreate");
@@ -66,7 +66,7 @@ std::string_view trimmed(std::string_view text) {
     return text.substr(begin, text.find_last_not_of(whiteSpace) + 1 - begin);
 }
 
-// The whole text as a number in that form; nothing when it is none, or out of range.
+// The whole text as a number in that form; null when it is not one or is out of range.
 template <class Number, class... Form>
 std::optional<Number> parsed(std::string_view text, Form... form) {
     Number number{};
@@ -75,7 +75,7 @@ std::optional<Number> parsed(std::string_view text, Form... form) {
     return number;
 }
 
-// Decimal, or hexadecimal after 0x, which is how some tools write flags.
+// Decimal, or hexadecimal after 0x, as some tools write flags.
 std::optional<Value> integerValue(std::string_view text) {
     const bool negative = text.starts_with('-');
     if (negative || text.starts_with('+')) text.remove_prefix(1);
@@ -114,7 +114,7 @@ public:
         expat().setCharacterDataHandler(parser_.get(), [](void* self, const char* text, int length) {
             of(self).characters({text, static_cast<std::size_t>(length)});
         });
-        // Entities can make a small document a huge one, or drop out of it unseen; property lists have no use for them.
+        // Entities can make a small document a huge one, or vanish from it unseen; property lists do not need them.
         expat().setEntityDeclHandler(
             parser_.get(), [](void* self, const char*, int, const char*, int, const char*, const char*, const char*,
                               const char*) { of(self).complain("entities are not supported"); });
@@ -147,7 +147,8 @@ private:
         if (!within) complain(builder_.complaint());
     }
 
-    // Expat may still hand over an event or two after the parse was ended.
+    // Order of the checks: place in the document, then kind of element. Expat may still report an event or two after
+    // the parse was stopped.
     void begin(std::string_view name) {
         if (!complaint_.empty()) return;
         if (!leaf_.empty()) return complain("an element within <" + leaf_ + ">");

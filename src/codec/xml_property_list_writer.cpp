@@ -92,7 +92,7 @@ private:
                 case '<': escaped += "&lt;"; break;
                 case '>': escaped += "&gt;"; break;
                 case '&': escaped += "&amp;"; break;
-                case '\r': escaped += "&#13;"; break;  // as it stands it would be read as a line feed
+                case '\r': escaped += "&#13;"; break;  // unescaped it would be read as a line feed
                 default: escaped += before.substr(0, before.size() - rest.size());
             }
         }

@@ -39,9 +39,10 @@ constexpr const char* contentTypeHeader = "Content-Type";
 constexpr const char* tokenHeader = "X-Orvane-KS-Token";
 constexpr const char* altDSIDHeader = "altDSID";
 constexpr const char* userAgentHeader = "User-Agent";
-constexpr const char* storefrontHeader = "storefrontLocale";  // also the defaults key of what replaces its value
+constexpr const char* storefrontHeader =
+    "storefrontLocale";  // also the defaults key of a value that replaces the account's
 
-// No value leaves the header unset.
+// A null value removes the header.
 void setHeader(HttpRequest& request, const char* name, const std::optional<std::string>& value) {
     if (value)
         request.headers[name] = *value;
@@ -49,13 +50,13 @@ void setHeader(HttpRequest& request, const char* name, const std::optional<std::
         request.headers.erase(name);
 }
 
-// The token after a renewal: the renewed one, or where it failed the one from before.
+// The token after a renewal: the renewed one, or the earlier one when the renewal failed.
 std::optional<std::string> tokenAfterRenewal(AccountStore& store, const AuthenticationAccount& account,
                                              const std::string& service, std::optional<std::string> token,
                                              bool avoidUI) {
     log(Level::Default, "Reprovision KS tokens");
     auto hasEnded = Platform::current().queues().makeEvent();
-    // This stack outlives the completion's use of it: only its last step releases the wait, which has no other end.
+    // The completion may refer to this stack: the wait ends only by the completion's last step.
     auto takeToken = [&, hasEnded](const RenewalResult& result) {
         if (result.code == RenewalResult::renewed)
             token = store.credentialToken(account, service);
@@ -69,28 +70,29 @@ std::optional<std::string> tokenAfterRenewal(AccountStore& store, const Authenti
     return token;
 }
 
-// The storefront that stands in the defaults, in place of the account's.
+// The storefront in the defaults, which replaces the account's; null when none is set.
 std::optional<std::string> storefrontOverride() {
     return Platform::current().defaultsStore().string(storefrontHeader);
 }
 
-// The one place that logs the storefront: one line for each set of headers.
+// Sets and logs the storefront. Each set of headers calls it once and so logs one line.
 void setStorefront(HttpRequest& request, const std::optional<std::string>& storefront) {
     setHeader(request, storefrontHeader, storefront);
     log(Level::Default, "storeLocale %@", storefront);
 }
 
-// Milliseconds since 1970, a fraction cut off; a clock before that year shows its beginning.
+// Milliseconds since 1970, without a fraction; 0 when the clock stands before 1970.
 std::int64_t timestamp(platform::Date date) {
     return std::max<std::int64_t>(0, platform::clampedInteger(platform::epochSeconds(date) * 1000.0));
 }
 
-// Whole hours east of GMT, cut off towards zero.
+// Whole hours east of GMT, rounded towards zero.
 std::int32_t hours(std::chrono::seconds timeZoneOffset) {
     return static_cast<std::int32_t>(std::chrono::duration_cast<std::chrono::hours>(timeZoneOffset).count());
 }
 
-// The token is a secret, and any header that account services add may be one: shown are those that are known.
+// The token is a secret, and so may be any header that account services add. A log shows only the headers that are
+// known to hold none.
 bool isShownInLogs(const std::string& header) {
     static const std::set<std::string_view, platform::HeaderNameOrder> shown{contentTypeHeader, altDSIDHeader,
                                                                              userAgentHeader, storefrontHeader};
@@ -107,6 +109,7 @@ bool vrx_signWithAccountHeaders(HttpRequest& request, bool forceReprovisioning, 
         log(Level::Default, "No primary Nimbus account, can't sign this request");
         return false;
     }
+    // The token comes first: without one, the request stays as it was.
     if (!_addKSHeadersForAccount(request, *account, store, forceReprovisioning, avoidUI)) {
         log(Level::Default, "Failed to add KS headers, can't sign this request");
         return false;
@@ -131,6 +134,7 @@ bool _addKSHeadersForAccount(HttpRequest& request, const CloudAccount& account, 
         return false;
     }
     if (!keystoneAccount->altDSID) {
+        // The text is spelled so on purpose.
         log(Level::Error, "Keystone signing failed because no there's no altDSID on the account.");
         return false;
     }
@@ -157,7 +161,7 @@ void vrx_setCoverageRequestBodyWithSerialNumber(HttpRequest& request, const std:
         {"requestTimestamp", timestamp(platform.clock().now())},
         {"requestTimezone", hours(platform.clock().timeZoneOffset())},
     };
-    // Fails only for a serial number that is no text; the server refuses the request that then has no body.
+    // Fails only for a serial number that is not UTF-8. The request then has no body, and the server refuses it.
     if (auto json = platform.json().serialize(body)) request.body.assign(json->begin(), json->end());
 }
 
@@ -194,7 +198,7 @@ std::optional<std::string> bodyDescription(const HttpRequest& request) {
     return text;
 }
 
-// A part that the device does not tell reads (null), as it does in the log.
+// A fact that the device does not know reads (null), as it does in the log.
 std::string _userAgent() {
     const platform::DeviceProperties& device = Platform::current().deviceProperties();
     const std::string version = platform::describe(device.string("ProductVersion"));

@@ -1,5 +1,5 @@
-// What the defaults keep beside a cached record: when it was stored, for which locale and in which format. One value
-// each for a serial number, under its hash.
+// What the defaults hold about a cached record: when it was stored, for which locale and in which format. Each serial
+// number has one value of each kind, under its hash.
 #pragma once
 
 #include <string>
@@ -10,7 +10,7 @@
 
 namespace vrx {
 
-// Keys with a "%@" for the hash.
+// Keys; the "%@" stands for the hash.
 inline constexpr std::string_view cachedWarrantyLastUpdatedDateKey = "%@_CachedWarrantyLastUpdatedDate";
 inline constexpr std::string_view cachedWarrantyLocaleKey = "%@_CachedWarrantyLocale";
 inline constexpr std::string_view cachedWarrantyVersionKey = "%@_CachedWarrantyVersion";
@@ -22,7 +22,7 @@ inline std::string cacheMetadataKey(std::string_view serialNumber, std::string_v
     return platform::filled(key, {platform::sha256Hash(serialNumber)});
 }
 
-// The key of the older single-device layout, which named no device.
+// The same key in the older single-device layout, which named no device.
 constexpr std::string_view legacyCacheMetadataKey(std::string_view key) {
     return key.substr(std::string_view("%@_").size());
 }

@@ -31,11 +31,11 @@ std::string cacheDirectory() {
 
 std::string pathForSerialNumber(const std::optional<std::string>& serialNumber) {
     if (!serialNumber) return VRXWarranty::_legacyWarrantyPath();
-    // Filled behind the directory, whose name may hold a "%@" of its own.
+    // Only the file's name is filled: the directory's name may hold a "%@" of its own.
     return cacheDirectory() + platform::filled(deviceFile, {platform::sha256Hash(*serialNumber)});
 }
 
-// Null for a file that is missing or no property list.
+// Null when the file is missing or is not a property list.
 Value propertyListAt(const std::string& path) {
     Platform& platform = Platform::current();
     Result<Data> document = platform.files().read(path);
@@ -66,8 +66,8 @@ void VRXWarranty::cacheWarranty(const std::optional<std::string>& serialNumber) 
     log(Level::Default, "%s -> %@", "-[VRXWarranty cacheWarranty:]", path);
     Platform& platform = Platform::current();
     platform.files().createDirectories(cacheDirectory());
-    // Binary: its strings may hold any character. A dictionary that holds a null makes no document, and the earlier
-    // file stays.
+    // Binary, because its strings may hold any character. A dictionary that holds a null makes no document, so the
+    // earlier file stays.
     Result<Data> document =
         platform.propertyList().serialize(dictionaryRepresentation(), platform::PropertyListFormat::Binary);
     if (document) platform.files().replace(path, *document);
@@ -86,11 +86,13 @@ std::shared_ptr<VRXWarranty> VRXWarranty::migrateLegacyCachedWarrantyIfNeededFor
     if (!serialNumber) return nullptr;
     auto warranty = warrantyWithDictionary(propertyListAt(_legacyWarrantyPath()));
     if (!warranty) return nullptr;
+    // The two dots are there on purpose.
     log(Level::Default, "Migrating legacy warranty..");
     warranty->cacheWarranty(serialNumber);
     DefaultsStore& defaults = Platform::current().defaultsStore();
     for (std::string_view key : {cachedWarrantyLastUpdatedDateKey, cachedWarrantyLocaleKey, cachedWarrantyVersionKey})
         moveDefault(defaults, legacyCacheMetadataKey(key), cacheMetadataKey(*serialNumber, key));
+    // Last, so that a migration that was cut short begins anew.
     Platform::current().files().remove(_legacyWarrantyPath());
     return warranty;
 }

@@ -40,7 +40,7 @@ constexpr platform::Duration attemptTimeout = std::chrono::seconds(30);
 constexpr int ok = 200;
 constexpr int unauthorized = 401;
 
-// The file's content; nothing when it cannot be read or is empty.
+// The file's content; null when it cannot be read or is empty.
 std::optional<Data> dataAt(const Url& url) {
     std::optional<std::string> path = url.filePath();
     if (!path) return std::nullopt;
@@ -49,8 +49,8 @@ std::optional<Data> dataAt(const Url& url) {
     return std::move(data).value();
 }
 
-// The JSON of an answer; null when there is none, and the log says why. Of the two failures that may have come together
-// the transport's is the cause.
+// The JSON of an answer. Without any, the result is null and the log says why. When transport and parser both failed,
+// the transport's failure is the cause.
 Value jsonFrom(const HttpResponse& response) {
     Value json;
     platform::MaybeError error = response.error;
@@ -94,7 +94,7 @@ void VRXWarrantyDownloader::downloadWarrantyForSerialNumber(const std::optional<
     log(Level::Default, "%s: %{private}@",
         "-[VRXWarrantyDownloader downloadWarrantyForSerialNumber:completionHandler:]", serialNumber);
     Platform::current().defaultsStore().remove(serverVersionCacheKey);  // so that the versions are negotiated afresh
-    // The process doesn't exit before the completion has run.
+    // Keeps the process from exiting before the completion has run.
     Completion completeInFlight =
         [work = Platform::current().processLifecycle().beginWork(), completion = std::move(completionHandler)](
             bool success, std::shared_ptr<VRXWarranty> warranty) mutable { completion(success, std::move(warranty)); };
@@ -110,8 +110,9 @@ void VRXWarrantyDownloader::downloadWarrantyForSerialNumber(const std::optional<
             self->_downloadWarrantyForSerialNumber(*serialNumber, std::move(completion));
         }
     };
-    // Asked on a worker: an override is answered before the question returns, and the first attempt runs on the thread
-    // of the answer. The caller's, a connection's or the main thread, must not be held while a credential is renewed.
+    // Asked on a worker, because the first attempt runs on the thread that brings the answer, and an override is
+    // answered before the call returns. The caller's thread, a connection's or the main thread, must not wait for a
+    // credential's renewal.
     Platform::current()
         .queues()
         .workers(Priority::UserInitiated)
@@ -127,7 +128,7 @@ void VRXWarrantyDownloader::_downloadWarrantyForSerialNumber(const std::string& 
     };
     std::optional<Url> url =
         Url::parse(Platform::current().defaultsStore().string(platform::settings::warrantyURL).value_or(""));
-    if (!url) return finishWith(nullptr);  // as a request there would end, but no credential is renewed for it
+    if (!url) return finishWith(nullptr);  // a request there would fail too, but only after renewing a credential
     if (url->isFile()) return finishWith(dictionaryFromURL(*url, serialNumber));
     _downloadWarrantyFromServerURL(*url, serialNumber, mostRetries, std::move(finishWith));
 }
@@ -141,11 +142,13 @@ void VRXWarrantyDownloader::_downloadWarrantyFromServerURL(const Url& url, const
     request.timeout = attemptTimeout;
     const bool forceReprovisioning = retries != mostRetries;  // the server has refused the token that is stored
     constexpr bool avoidUI = true;
+    // Signed anew at each attempt. "load sign request" below is spelled so on purpose.
     if (!vrx_signWithAccountHeaders(request, forceReprovisioning, avoidUI)) {
         log(Level::Default, "Unable to load sign request, failing warranty download");
         return completionBlock(nullptr);
     }
     vrx_setCoverageRequestBodyWithSerialNumber(request, serialNumber);
+    // The first attempt says so as well, on purpose.
     log(Level::Default, "Retrying request:");
     log(Level::Default, "Headers: %@", headerDescription(request));
     log(Level::Default, "Body: %@", bodyDescription(request));
@@ -164,7 +167,7 @@ void VRXWarrantyDownloader::_downloadWarrantyFromServerURL(const Url& url, const
 void VRXWarrantyDownloader::finish(const std::string& serialNumber, Value coverage, Completion completion) const {
     auto buildAndCache = [self = shared_from_this(), serialNumber, coverage = std::move(coverage),
                           completion = std::move(completion)]() mutable {
-        // An answer of another kind than an object holds no coverage.
+        // An answer that is not an object holds no coverage.
         if (!coverage.asDictionary()) {
             log(Level::Error, "vrxagent failed to load warranty");
             return completion(false, nullptr);
@@ -179,6 +182,7 @@ void VRXWarrantyDownloader::finish(const std::string& serialNumber, Value covera
 
 Value VRXWarrantyDownloader::dictionaryFromURL(const Url& url, const std::string& serialNumber) const {
     Url deviceUrl = url.withPathExtension(platform::filled("%@.%@", {serialNumber, url.pathExtension()}));
+    // The device's own file first, then the URL's.
     std::optional<Data> data = dataAt(deviceUrl);
     if (data) {
         log(Level::Default, "loading warranty from: %@", deviceUrl);

@@ -27,7 +27,7 @@ constexpr std::string_view serialNumberKey = "SerialNumber";
 constexpr std::string_view deviceNameKey = "UserAssignedDeviceName";
 constexpr std::string_view activationIntervalSuffix = ".activationInterval";
 constexpr std::string_view featureDomain = "Vireo";
-constexpr std::string_view pairedDevicesFlag = "Meridian_3_0";
+constexpr std::string_view pairedDevicesFlag = "Meridian_3_0";  // spelled so on purpose; log texts say "Meridian 3.0"
 
 std::optional<std::string> defaultSerialNumber() {
     if (VRXUtilities::isInternal()) {

@@ -1,6 +1,7 @@
-// The inventory: this device and the watches paired with it. It has no state; each call reads the platform afresh and
-// gives new device objects. Any thread may call it. A device without a serial number is left out of the dictionaries,
-// which have no key for it.
+// The inventory: this device and the watches paired with it. It has no state: each call reads the platform afresh and
+// returns new device objects. Any thread may call it. The dictionaries leave out a device without a serial number,
+// because they have no key for it.
+// A leading "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <memory>
@@ -13,7 +14,7 @@ namespace vrx {
 
 class VRXDevicesManager final : public VRXAgentDeviceProvider {
 public:
-    // The one that all agents share.
+    // The manager that all agents share.
     static std::shared_ptr<VRXDevicesManager> sharedManager();
 
     std::shared_ptr<VRXDevice> defaultDevice() override;

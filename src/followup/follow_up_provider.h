@@ -13,12 +13,12 @@ namespace vrx {
 class VRXFollowUpProvider {
 public:
     virtual ~VRXFollowUpProvider() = default;
-    // Each sets the error, if the caller passes one, exactly when it fails. Whether the service accepted the item, and
-    // whether it cleared them all.
+    // Both return whether the service accepted the request, and set the error, if the caller passes one, exactly when
+    // it did not.
     virtual bool postFollowUpItem(const platform::FollowUpItem& item, platform::MaybeError* error) = 0;
     virtual bool clearPendingFollowUpItemsWithUniqueIdentifiers(const std::vector<std::string>& uniqueIdentifiers,
                                                                 platform::MaybeError* error) = 0;
-    // What is pending, in the order of first posting; with an error, whatever could be had.
+    // The pending items, in the order of first posting; with an error, those that could be listed.
     virtual std::vector<platform::FollowUpItem> pendingFollowUpItems(platform::MaybeError* error) = 0;
 };
 

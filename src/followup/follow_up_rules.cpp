@@ -15,26 +15,31 @@ bool isLaterThanNow(const std::optional<Date>& date, const Clock& clock) {
     return date && *date - clock.now() > Duration::zero();
 }
 
-PostDate postDate(const VRXWarranty& record, Date eligibleUntil, const std::optional<Date>& activationDate,
-                  Duration outreachDelay) {
-    const Date named =
-        record.qxOfferFollowupDisplayDate().value_or(eligibleUntil - record.qxOfferDurationBeforeEndDate());
-    if (activationDate && *activationDate + outreachDelay > named) return {*activationDate + outreachDelay, true};
-    return {named};
+// The later of the record's own due date and the end of the outreach delay. A device without an activation date has no
+// outreach delay.
+DueDate dueDate(Date inRecord, const std::optional<Date>& activationDate, Duration outreachDelay) {
+    if (activationDate && *activationDate + outreachDelay > inRecord) return {*activationDate + outreachDelay, true};
+    return {inRecord};
 }
 
 }  // namespace
+
+std::optional<Date> dueDateInRecord(const VRXWarranty& record) {
+    if (auto named = record.qxOfferFollowupDisplayDate()) return named;
+    const std::optional<Date> until = record.qxOfferEligibleUntil();
+    return until ? std::optional(*until - record.qxOfferDurationBeforeEndDate()) : std::nullopt;
+}
 
 PostDecision decidePost(const VRXDeviceInfo& info, const PostCircumstances& circumstances, const Clock& clock) {
     const auto record = info.warranty();
     if (!record) return {PostReason::NoRecord};
     if (!record->qxOfferDisplay()) return {PostReason::NoOffer};
-    const std::optional<Date> eligibleUntil = record->qxOfferEligibleUntil();
-    if (!isLaterThanNow(eligibleUntil, clock)) return {PostReason::NoLongerEligible};
+    if (!isLaterThanNow(record->qxOfferEligibleUntil(), clock)) return {PostReason::NoLongerEligible};
     if (circumstances.isDismissed && !circumstances.isRepostAllowed) return {PostReason::Dismissed};
     const auto device = info.device();
-    const PostDate date = postDate(*record, *eligibleUntil, device ? device->activationDate() : std::nullopt,
-                                   circumstances.outreachDelay);
+    // An offer that has an end has a due date.
+    const DueDate date = dueDate(*dueDateInRecord(*record), device ? device->activationDate() : std::nullopt,
+                                 circumstances.outreachDelay);
     return {isLaterThanNow(date.date, clock) ? PostReason::DueLater : PostReason::Due, date};
 }
 

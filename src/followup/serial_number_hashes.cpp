@@ -25,7 +25,7 @@ enum class WhenPresent { AppendAgain, LeaveAsIs };
 void append(std::string_view key, const Value& hash, WhenPresent whenPresent) {
     Platform::current().defaultsStore().update(key, [&](const Value& stored) -> Value {
         Array list = listFrom(stored);
-        // Another thread or process may have added it since it was looked for.
+        // Another thread or process may have added the hash meanwhile.
         if (whenPresent == WhenPresent::LeaveAsIs && std::ranges::find(list, hash) != list.end()) return stored;
         list.push_back(hash);
         return list;
@@ -47,7 +47,7 @@ void appendSerialNumberHash(std::string_view key, const std::string& serialNumbe
 
 void appendMissingSerialNumberHash(std::string_view key, const std::string& serialNumber) {
     const std::string hash = platform::sha256Hash(serialNumber);
-    if (serialNumberHashes(key).contains(hash)) return;  // the usual case, which is to write nothing
+    if (serialNumberHashes(key).contains(hash)) return;  // the usual case, in which nothing is written
     append(key, hash, WhenPresent::LeaveAsIs);
 }
 

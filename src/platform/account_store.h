@@ -1,5 +1,5 @@
 // The user's cloud accounts, their credentials and the standard headers of their requests. Each call reads the present
-// state, as a fresh store would; any thread may ask.
+// state and remembers nothing. Any thread may call.
 #pragma once
 
 #include <cstdint>
@@ -41,21 +41,22 @@ struct RenewalResult {
 class AccountStore {
 public:
     virtual ~AccountStore() = default;
-    // Nothing when the user is signed out.
+    // Null when the user is signed out.
     virtual std::optional<CloudAccount> primaryCloudAccount() const = 0;
     virtual std::optional<AuthenticationAccount> authenticationAccount(const CloudAccount& account) const = 0;
-    // The token of the stored credential for a service.
+    // The token of the stored credential for a service; null when none is stored.
     virtual std::optional<std::string> credentialToken(const AuthenticationAccount& account,
                                                        std::string_view service) const = 0;
-    // Completes once, on a thread of its own, never before it returns; by then a renewed token is stored.
+    // Completes once, on a thread of its own, never before this call has returned. A renewed token is stored before the
+    // completion runs.
     virtual void renewCredentials(const AuthenticationAccount& account, RenewalOptions options,
                                   OnceCallback<RenewalResult> completion) = 0;
-    // Of the media-store account that belongs to a cloud account.
+    // The storefront and the identifier of the media-store account that belongs to a cloud account.
     virtual std::optional<std::string> storefront(const CloudAccount& account) const = 0;
     virtual std::optional<std::int64_t> storeAccountIdentifier(const CloudAccount& account) const = 0;
 };
 
-// The headers that account services expect of every request. Their names and values are the platform's.
+// The headers that account services expect of every request. The platform decides their names and values.
 class AccountSession {
 public:
     virtual ~AccountSession() = default;

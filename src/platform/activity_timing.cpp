@@ -33,6 +33,7 @@ DueTime carriedOver(const DueTime& due, const Moment& now) {
     const bool isOfThisBoot = due.boot == now.boot;
     if (isOfThisBoot && !due.isCarriedOver) return due;
     Duration left = leftOnTheWall(due, now);
+    // Setting the wall clock may bring a due time nearer, but never puts it off.
     if (isOfThisBoot) left = std::min(left, timeLeft(due, now));
     DueTime carried = due;
     carried.boot = now.boot;
@@ -61,7 +62,7 @@ FiringDecision decideFiring(const DueTime& due, const ActivityCriteria& criteria
                             bool isNetworkAvailable, bool shouldDefer) {
     if (const Duration left = timeLeft(due, now); left > none) return {.askAgainIn = left};
     if (criteria.requiresNetwork && !isNetworkAvailable) return {.isWaitingForNetwork = true};
-    // The grace period is there to be used only while something speaks against running.
+    // The grace period is used only while the system asks for deferral.
     const Duration spent = due.boot == now.boot ? now.sinceBoot - due.sinceBoot : none;
     const Duration grace(static_cast<double>(criteria.gracePeriod));
     if (shouldDefer && spent < grace) return {.askAgainIn = grace - spent};

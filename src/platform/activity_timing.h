@@ -1,5 +1,5 @@
-// When background activities fire: the rules that every registry of them follows, as pure functions of what was
-// registered and of the present moment.
+// When a background activity fires. Every registry of activities follows these rules. They are pure functions of what
+// was registered and of the present moment.
 #pragma once
 
 #include <optional>
@@ -13,53 +13,53 @@ namespace vrx::platform {
 
 // The clocks at one moment.
 struct Moment {
-    std::string boot;      // which one it is: another after each
+    std::string boot;      // identifies the boot
     Duration sinceBoot{};  // time asleep included
     Date wall{};
 };
 
-// A moment to come. A delay is elapsed time: within the boot that it began in, the boot clock tells its end, whatever
-// is done to the wall clock. Over a boot only the wall clock tells.
+// A future moment. Within the boot in which a delay began, the boot clock tells when it ends, so setting the wall clock
+// changes nothing. After another boot only the wall clock can tell.
 struct DueTime {
     std::string boot;
     Duration sinceBoot{};
     Date wall{};
-    Duration wait{};             // from its registration on: the most that can be left
+    Duration wait{};             // the whole delay; no more than that can be left
     bool isCarriedOver = false;  // it was registered in an earlier boot
 
     bool operator==(const DueTime&) const = default;
 };
 
 DueTime dueAfter(Duration wait, const Moment& now);
-// 0 when it is due.
+// The time until it is due; 0 once it is.
 Duration timeLeft(const DueTime& due, const Moment& now);
-// That moment, or the one after the wait if that comes later.
+// The later of the due time and the end of a wait that begins now.
 DueTime noSoonerThan(const DueTime& due, Duration wait, const Moment& now);
-// The same moment on the present boot's clock: to be asked at each start, and again whenever the wall clock was set,
-// which can bring it nearer: a device may start with a clock that is wrong, and learn the time later.
+// The due time as the present boot's clock shows it. Call this at each start, and again whenever the wall clock was
+// set: a device may start with a wrong clock and learn the time later, which can bring the due time nearer.
 DueTime carriedOver(const DueTime& due, const Moment& now);
 
-// Delays arrive truncated to whole seconds: what fires this much later is never early.
+// Delays are truncated to whole seconds. An activity fires this much later, so that it is never early.
 inline constexpr Duration firingMargin{1.0};
-// From an activity's run to the next one that it registers itself. An activity that asks for no delay over and over
-// costs a run now and then, not a processor.
+// The least time between a run of an activity and the next run that it registers itself. An activity that keeps asking
+// for no delay costs a run now and then instead of a whole processor.
 inline constexpr Duration minimumInterval{15.0 * 60};
 
-// When a registration falls due. The interval is 0 for one that no run of the activity itself makes.
+// When a registration falls due. The interval is minimumInterval if a run of the activity itself registers it, else 0.
 DueTime dueTime(const ActivityCriteria& criteria, Duration interval, const Moment& now);
 
-// From an activity's result to the next attempt, after so many deferred results in a row: soon at first, hourly at
-// last.
+// The time from a deferred result to the next attempt, by the number of deferred results in a row: a second at first,
+// an hour in the end.
 Duration retryDelay(int deferrals);
 
-// Whether an activity is held until the boot activity, once a boot, has taken up what was scheduled before: all are but
-// those that the system fires on its own.
+// Whether an activity waits, after each boot, until the boot activity has taken up what was scheduled before. All do,
+// except those that the system fires on its own.
 bool waitsForBootActivity(std::string_view identifier);
 
-// Whether an activity that is registered fires at a moment.
+// Whether a registered activity fires now and, if not, what it waits for.
 struct FiringDecision {
     bool isFired = false;
-    std::optional<Duration> askAgainIn{};  // none: there is nothing but the network to wait for
+    std::optional<Duration> askAgainIn{};  // null when it fires, and while it waits for the network alone
     bool isWaitingForNetwork = false;
 };
 FiringDecision decideFiring(const DueTime& due, const ActivityCriteria& criteria, const Moment& now,

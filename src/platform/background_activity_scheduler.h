@@ -1,5 +1,5 @@
 // Background activities: work that the system starts by itself, once, when its delay has passed and its conditions
-// hold. They survive the process: the system starts a new one for an activity that is due.
+// hold. They outlive the process: the system starts a new process for an activity that is due.
 #pragma once
 
 #include <cstdint>
@@ -13,8 +13,8 @@
 
 namespace vrx::platform {
 
-// Activities that the system fires on its own, after the vendor prefix: at the first start of each version of the
-// agent, and once a boot.
+// Identifiers, after the vendor prefix, of the activities that the system fires on its own: the upgrade activity at the
+// first start of each version of the agent, the boot activity once a boot.
 inline constexpr std::string_view upgradeActivityRemainder = ".vrxagent.upgrade";
 inline constexpr std::string_view bootActivityRemainder = ".vrxagent.boot";
 
@@ -23,12 +23,13 @@ enum class BackgroundActivityResult {
     Deferred = 2,  // the system runs it again later
 };
 
-// Runs an activity that fires, on a thread of the system's; it must answer once. May be called again after it has.
+// Runs an activity that fires, on one of the system's threads. It must call the completion once; after that it may be
+// called again.
 using ActivityHandler = std::function<void(OnceCallback<BackgroundActivityResult> completion)>;
 
 struct ActivityCriteria {
-    std::int64_t delay = 0;        // seconds from now before which it doesn't run
-    std::int64_t gracePeriod = 0;  // seconds after these within which it should
+    std::int64_t delay = 0;        // in seconds from now; the activity does not run earlier
+    std::int64_t gracePeriod = 0;  // in seconds after the delay; the activity should run within it
     bool requiresNetwork = false;
 
     bool operator==(const ActivityCriteria&) const = default;
@@ -39,14 +40,14 @@ enum class QualityOfService { Default = 21, Background = 9 };
 // What the system is told about an activity.
 struct ActivityRegistration {
     std::string identifier;
-    // The system holds the activity already, or fires it on its own: only the handler is attached to it. Otherwise the
-    // activity is registered afresh, in place of an earlier one of that identifier, with the criteria.
+    // The system already holds the activity, or fires it on its own, so that only the handler is attached. Otherwise
+    // the activity is registered afresh with the criteria, and replaces an earlier one of the same identifier.
     bool isPreregistered = false;
     bool repeats = false;
     QualityOfService qualityOfService = QualityOfService::Default;
     std::optional<ActivityCriteria> criteria{};
-    // A run of the activity registers it for its next one. So that a rule that gives "at once" over and over is no hot
-    // loop, that comes no sooner than activity_timing.h's minimum interval after the run.
+    // A run of the activity registers it for its next run. The next run then comes no sooner than minimumInterval
+    // (activity_timing.h) after this one, so that a rule which keeps answering "at once" does not become a busy loop.
     bool isByOwnRun = false;
 };
 
@@ -57,13 +58,13 @@ public:
     virtual void schedule(const ActivityRegistration& registration, ActivityHandler handler) = 0;
     // Whether an activity under way should stop and be deferred.
     virtual bool shouldDefer(std::string_view identifier) const = 0;
-    // Makes the handler of an activity that an earlier process scheduled and this one has not checked in for, when it
-    // falls due; a null handler leaves it alone. Before the first activity fires.
+    // Sets the factory of handlers for activities that are due but have no handler yet, because an earlier process
+    // scheduled them. A null handler leaves the activity alone. Call this before the first activity fires.
     virtual void setHandlerFactory(std::function<ActivityHandler(const std::string& identifier)> factory) = 0;
 };
 
-// One activity's side of the system's registry, under an identifier that is fixed. Its attributes belong to the thread
-// that schedules.
+// One activity's access to the system's registry, under a fixed identifier. Only the thread that schedules may set the
+// attributes.
 class BackgroundActivityScheduler {
 public:
     explicit BackgroundActivityScheduler(std::string identifier) { registration_.identifier = std::move(identifier); }

@@ -1,4 +1,4 @@
-// From a process to the application bundle that holds its executable. Any thread may ask.
+// Finds the application bundle that holds a process's executable. Any thread may ask.
 #pragma once
 
 #include <cstdint>

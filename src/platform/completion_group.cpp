@@ -13,7 +13,7 @@ void CompletionGroup::leave() {
     std::lock_guard lock(mutex_);
     assert(count_ > 0);
     if (--count_ > 0) return;
-    // Posted under the lock, which keeps the order between notifications of several threads; posting runs nothing.
+    // Posted under the lock, so that notifications keep their order across threads. Posting does not run the task.
     for (auto& [queue, task] : waiting_) queue->post(std::move(task));
     waiting_.clear();
 }

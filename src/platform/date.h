@@ -18,13 +18,13 @@ constexpr double epochSeconds(Date date) {
     return date.time_since_epoch().count();
 }
 
-// A date in the calendar, in UTC and to the second below it.
+// A date in the UTC calendar, rounded down to a second.
 struct CalendarTime {
     int year;
     unsigned month, day;
     int hour, minute, second;
 };
-// Nothing outside of the years 1 to 9999, where the calendar of std::chrono ends; those are dates all the same.
+// Null outside the years 1 to 9999; such dates are valid all the same.
 std::optional<CalendarTime> calendarTime(Date date);
 
 }  // namespace vrx::platform

@@ -22,18 +22,19 @@ struct FollowUpAction {
     bool operator==(const FollowUpAction&) const = default;
 };
 
-// How an item is shown: bits of its display style, which is kept whole. An item that was filled at different times may
-// say both of its row; then it carries the badge.
+// Bits of an item's display style. Filling an item anew clears no bit, so an item may hold both row bits; then it shows
+// the badge.
 namespace follow_up_style {
 inline constexpr std::uint64_t withRowBadge = 1;
-inline constexpr std::uint64_t notification = 2;  // every item of the agent's
+inline constexpr std::uint64_t notification = 2;  // every item that the agent posts has it
 inline constexpr std::uint64_t withoutRowBadge = 16;
 }  // namespace follow_up_style
 
-// Keys of an item's user info by which the settings app renders the days until its expiration date itself.
-inline constexpr std::string_view DaysLeftRoundsUpKey = "DaysLeftRoundsUp";  // boolean: a day begun counts
-inline constexpr std::string_view OneDayLeftTextKey = "OneDayLeftText";      // the text while one day or none is left
-inline constexpr std::string_view DaysLeftFormatKey = "DaysLeftFormat";      // else, with "%@" for the number
+// User-info keys from which the settings app itself renders the days until the item's expiration date. The constants
+// have the names that the settings app gives them.
+inline constexpr std::string_view DaysLeftRoundsUpKey = "DaysLeftRoundsUp";  // boolean: a day that has begun counts
+inline constexpr std::string_view OneDayLeftTextKey = "OneDayLeftText";      // the text while at most one day is left
+inline constexpr std::string_view DaysLeftFormatKey = "DaysLeftFormat";  // the text otherwise, with "%@" for the number
 
 struct FollowUpItem {
     std::string uniqueIdentifier;
@@ -54,11 +55,11 @@ struct FollowUpItem {
 class FollowUpController {
 public:
     virtual ~FollowUpController() = default;
-    // Replaces a pending item of the same unique identifier in its place; an error leaves that one as it was.
+    // Posts the item in the place of a pending one with the same unique identifier; an error leaves that one as it was.
     virtual MaybeError postFollowUpItem(const FollowUpItem& item) = 0;
-    // All of them or, with an error, none. An identifier under which nothing is pending is no error.
+    // Clears all of them or, with an error, none. An identifier under which no item is pending is not an error.
     virtual MaybeError clearPendingFollowUpItems(const std::vector<std::string>& uniqueIdentifiers) = 0;
-    // What was posted and not yet cleared, whether or not it has expired, in the order of first posting.
+    // The items that were posted and not yet cleared, expired ones included, in the order of first posting.
     virtual Result<std::vector<FollowUpItem>> pendingFollowUpItems() = 0;
 };
 

@@ -24,21 +24,22 @@ struct HttpRequest {
     std::string method = "GET";
     HttpHeaders headers;
     Data body;
-    std::optional<Duration> timeout;  // total, from resolving to the last byte; the session's own when absent
+    std::optional<Duration>
+        timeout;  // for the whole exchange, from name resolution to the last byte; null: the session's own
     std::optional<std::string> sourceApplication{};  // the bundle identifier of the application that the traffic is for
 };
 
 struct HttpResponse {
-    int status = 0;  // 0 when there is no HTTP response; that of one which broke off comes with the error
+    int status = 0;  // 0 without an HTTP response; a response that broke off has its status and an error
     HttpHeaders headers{};
-    std::optional<Data> body{};  // absent when none arrived
-    MaybeError error{};          // of the transport
+    std::optional<Data> body{};  // null when none arrived
+    MaybeError error{};          // the transport's failure
 };
 
 class HttpSession {
 public:
     virtual ~HttpSession() = default;
-    // Answers once, on a worker, never on the calling thread and never on the one that moves the bytes.
+    // Answers once, on a worker: never on the calling thread, nor on the thread that moves the bytes.
     virtual void send(HttpRequest request, OnceCallback<HttpResponse> completion) = 0;
 };
 
@@ -47,8 +48,8 @@ public:
     virtual ~HttpSessions() = default;
     // The process-wide session, with ordinary caching.
     virtual HttpSession& shared() = 0;
-    // A new session whose requests reload from the origin, whatever is cached. It may be let go at once: what it has
-    // under way ends as it would have.
+    // A new session whose requests reload from the origin, whatever is cached. The caller may release it at once:
+    // requests under way still complete.
     virtual std::shared_ptr<HttpSession> makeUncached() = 0;
 };
 

@@ -1,6 +1,6 @@
 // Keyed archiving with secure decoding: how records cross the IPC boundary. An object is archived as a set of keys
-// under the name of its class; decoding asks for each key with the class or the kinds of values it admits, and anything
-// else found there rejects the whole archive. One thread uses an encoder or decoder.
+// under the name of its class. Decoding names for each key the class, or the kinds of values, that it admits; anything
+// else rejects the whole archive. An encoder or decoder belongs to one thread.
 #pragma once
 
 #include <cstdint>
@@ -27,8 +27,8 @@ public:
 class KeyedEncoder {
 public:
     virtual ~KeyedEncoder() = default;
-    // A null value or absent object leaves the key out. Nulls and data inside a value, which decoding would refuse, are
-    // left out.
+    // A null value or object leaves the key out. Nulls and data inside a value are left out as well, because decoding
+    // would refuse them.
     virtual void encodeObject(std::string_view key, const Value& value) = 0;
     virtual void encodeObject(std::string_view key, const Archivable* object) = 0;
     virtual void encodeInteger(std::string_view key, std::int64_t value) = 0;
@@ -41,6 +41,7 @@ public:
     constexpr AllowedKinds(std::initializer_list<Kind> kinds) {
         for (Kind kind : kinds) kinds_ |= kind;
     }
+    // Whether the value, and everything in it, is of an allowed kind. Nulls and data never are.
     bool admit(const Value& value) const;
 
 private:
@@ -67,13 +68,13 @@ public:
         return decoded;
     }
 
-    // A rejected archive gives no object, whatever was decoded from it.
+    // A rejected archive makes no object, whatever was decoded from it.
     void reject() { rejected_ = true; }
     bool isRejected() const { return rejected_; }
 
 protected:
-    // The decoder of the object under the key; none when the key is absent or its object is of another class (which
-    // rejects).
+    // The decoder of the object under the key. Null when the key is absent; null, and the archive rejected, when the
+    // object is of another class.
     virtual std::unique_ptr<KeyedDecoder> openObject(std::string_view key, std::string_view className) = 0;
 
 private:

@@ -1,4 +1,4 @@
-// The system log. Call sites give a format string as it stands in the system's documents:
+// The system log. Every line has a fixed format string, by which people find it:
 //     log(Level::Default, "%{private}@ : warranty download attempt (%d/%d)", serialNumber, 0, 2);
 // Placeholders: %@ any describable value, %{private}@ the same, redacted by the sink, %s an operation's full name, %d a
 // flag or a 32-bit integer, %ld a signed and %lu an unsigned 64-bit integer, %.02f seconds. A format that does not fit
@@ -19,7 +19,7 @@ enum class Level { Debug, Default, Error };
 
 struct LogArgument {
     std::string text;
-    std::optional<std::string> redacted{};  // what a log shows in its place; the text itself when absent
+    std::optional<std::string> redacted{};  // what a log shows instead; null: the text itself
 };
 
 inline constexpr std::string_view redactedMark = "<private>";
@@ -40,7 +40,7 @@ struct LogEntry {
     const char* file;
     int line;
 
-    // The line with its arguments, in their redacted form unless what is private is to be revealed.
+    // The line with its arguments. Private arguments are redacted unless they are to be revealed.
     std::string message(bool revealPrivate = false) const;
 };
 
@@ -48,7 +48,7 @@ struct LogEntry {
 class SystemLog {
 public:
     virtual ~SystemLog() = default;
-    // Asked before a line is put together.
+    // Asked before a line is composed.
     virtual bool isOn(Level level) const = 0;
     virtual void write(const LogEntry& entry) = 0;
 };
@@ -61,7 +61,7 @@ SystemLog& systemLog();
 
 namespace log_detail {
 
-// Not constexpr: reaching one of them while compiling is the error message.
+// Not constexpr: reaching one of them at compile time is an error, and its name is the message.
 void format_has_fewer_placeholders_than_arguments();
 void format_has_more_placeholders_than_arguments();
 void format_has_an_unknown_placeholder();
@@ -71,8 +71,8 @@ enum class Kind { Object, Private, Name, Int, Long, UnsignedLong, Seconds, End }
 
 struct Placeholder {
     Kind kind;
-    std::size_t begin;  // of the "%"
-    std::size_t end;    // behind it
+    std::size_t begin;  // position of the "%"
+    std::size_t end;    // position behind the placeholder
 };
 
 // The next placeholder at or behind a position.

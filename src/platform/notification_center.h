@@ -10,7 +10,7 @@ namespace vrx::platform {
 
 class Queue;
 
-// Names, after the vendor prefix.
+// Names of notifications, after the vendor prefix.
 inline constexpr std::string_view devicePairedNotification = ".paireddevice.paired";
 inline constexpr std::string_view deviceUnpairedNotification = ".paireddevice.unpaired";
 inline constexpr std::string_view languageChangedNotification = ".language.changed";
@@ -18,10 +18,11 @@ inline constexpr std::string_view languageChangedNotification = ".language.chang
 class NotificationCenter {
 public:
     virtual ~NotificationCenter() = default;
-    // Posts the handler to the queue at each notification of that name; gives the token that ends it, never 0. The
-    // queue must outlive the registration.
+    // Posts the handler to the queue at each notification of that name. Returns the token that ends the registration,
+    // never 0. The queue must outlive the registration.
     virtual std::int32_t registerForNotification(std::string name, Queue& queue, std::function<void()> handler) = 0;
-    // The handler is not run any more once this returns on the queue's own thread. An unknown token does nothing.
+    // Ends a registration. Called on the queue's own thread, it lets no handler run afterwards. An unknown token has no
+    // effect.
     virtual void cancel(std::int32_t token) = 0;
 };
 

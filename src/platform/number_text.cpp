@@ -24,7 +24,8 @@ bool beginsWithDigits(std::string_view text) {
     return !text.empty() && text[0] >= '0' && text[0] <= '9';
 }
 
-// Whether the first digit of a number that is not 0 stands behind the decimal point, its exponent counted in.
+// Whether a number that is not 0 is below 1 in magnitude: with the exponent applied, its first digit other than 0
+// stands behind the decimal point.
 bool isBelowOne(std::string_view number) {
     std::size_t exponentMark = std::min(number.find_first_of("eE"), number.size());
     std::string_view digits = number.substr(0, exponentMark);
@@ -42,7 +43,7 @@ double leadingDecimal(std::string_view text) {
     double number = 0;
     auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), number);
     if (error != std::errc::result_out_of_range) return number;
-    // from_chars leaves the number alone: too large, or too close to zero.
+    // Out of range: from_chars does not say whether the number is too large or too close to zero.
     std::string_view digits = text.substr(0, static_cast<std::size_t>(end - text.data()));
     double magnitude = isBelowOne(digits) ? 0.0 : std::numeric_limits<double>::max();
     return digits.starts_with('-') ? -magnitude : magnitude;

@@ -17,9 +17,9 @@ struct PairedWatch {
     bool isPaired = false;
     bool isArchived = false;
 
-    // Paired now, and not only once.
+    // Paired now, not only in the past.
     bool isActive() const { return isPaired && !isArchived; }
-    // The user's name for it, else its model's.
+    // The user's name for the watch, else its model's name.
     const std::optional<std::string>& displayName() const { return name ? name : localizedModelName; }
     std::string description() const { return name.value_or("(null)") + " (" + serialNumber.value_or("(null)") + ")"; }
 };
@@ -27,7 +27,7 @@ struct PairedWatch {
 class PairedDeviceRegistry {
 public:
     virtual ~PairedDeviceRegistry() = default;
-    // Every watch it knows, archived ones and those of alternate accounts included.
+    // Every known watch, archived ones and those of alternate accounts included.
     virtual std::vector<PairedWatch> watches() const = 0;
 };
 

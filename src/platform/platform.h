@@ -34,7 +34,7 @@ class UuidSource;
 
 class Platform {
 public:
-    // A platform need not have all of them: a client that only reads records does without most.
+    // A platform need not have all of them: a client that only reads records needs few.
     struct Facilities {
         AccountSession* accountSession = nullptr;
         AccountStore* accountStore = nullptr;
@@ -68,13 +68,13 @@ public:
     // The facilities are not owned and must outlive the platform.
     explicit Platform(const Facilities& facilities) : facilities_(facilities) {}
 
-    // Ends the program when none is set.
+    // Ends the program when no platform is set.
     static Platform& current();
     static bool hasCurrent();
-    // For a program's start; null takes it away again.
+    // Called when a program starts; null removes the platform again.
     static void setCurrent(Platform* platform);
 
-    // Each ends the program when the platform does not have the facility.
+    // Each accessor ends the program when the platform lacks the facility.
     AccountSession& accountSession() const { return need(facilities_.accountSession, "AccountSession"); }
     AccountStore& accountStore() const { return need(facilities_.accountStore, "AccountStore"); }
     BackgroundActivities& backgroundActivities() const {
@@ -126,8 +126,8 @@ private:
     Facilities facilities_;
 };
 
-// Makes a platform the current one while it is alive, and then the one before again. Not while other threads use the
-// current one.
+// Makes a platform the current one for as long as this object lives, then restores the one before. No other thread may
+// use the current platform at these two moments.
 class ScopedPlatform {
 public:
     explicit ScopedPlatform(Platform& platform);

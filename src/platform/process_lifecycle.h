@@ -1,4 +1,4 @@
-// The end of the process, which comes without loss: what the process is needed for, the system starts it anew for. Any
+// Lets the process end while it is idle. Nothing is lost: the system starts a new process when one is needed. Any
 // thread may use it.
 #pragma once
 
@@ -6,14 +6,14 @@
 
 namespace vrx::platform {
 
-// While one is alive the process has something under way and doesn't exit.
+// While one is alive, work is in flight and the process does not exit.
 using WorkInFlight = std::shared_ptr<void>;
 
 class ProcessLifecycle {
 public:
     virtual ~ProcessLifecycle() = default;
-    // Lets the process end, with success, as soon as nothing is under way. Requests and running activities count by
-    // themselves.
+    // Ends the process, with success, as soon as no work is in flight. Requests and running activities count as work in
+    // flight by themselves.
     virtual void exitCleanWhenIdle() = 0;
     // Never null.
     virtual WorkInFlight beginWork() = 0;

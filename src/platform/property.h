@@ -15,7 +15,7 @@ public:
         std::lock_guard lock(mutex_);
         return value_;
     }
-    // What was there is released outside of the lock, with the argument.
+    // The old value is released outside the lock, together with the argument.
     void set(T value) {
         std::lock_guard lock(mutex_);
         std::swap(value_, value);

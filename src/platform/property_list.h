@@ -13,9 +13,9 @@ enum class PropertyListFormat { Xml, Binary };
 class PropertyList {
 public:
     virtual ~PropertyList() = default;
-    // Reads either form. The error's text says where in the document it lies.
+    // Reads either form. The error's text says where in the document the mistake is.
     virtual Result<Value> parse(const Data& document) const = 0;
-    // Fails for a value that a property list cannot hold: a null, wherever it stands.
+    // Fails for a value that a property list cannot hold, such as a null at any depth.
     virtual Result<Data> serialize(const Value& root, PropertyListFormat format) const = 0;
 };
 

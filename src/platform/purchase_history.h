@@ -25,7 +25,8 @@ struct Purchase {
 class PurchaseHistory {
 public:
     virtual ~PurchaseHistory() = default;
-    // Hands the purchases over once, at any time, on another thread; none when they cannot be had.
+    // Calls the handler once, at any later time, on another thread. The list is empty when the purchases are not
+    // available.
     virtual void runQuery(PurchaseQuery query, OnceCallback<std::vector<Purchase>> resultHandler) = 0;
 };
 

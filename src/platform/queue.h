@@ -25,7 +25,7 @@ public:
     virtual ~Event() = default;
     virtual void set() = 0;
     virtual void wait() = 0;
-    // True when it was set within the time.
+    // Returns whether the flag was set within the time.
     virtual bool waitFor(Duration limit) = 0;
 };
 
@@ -37,11 +37,12 @@ public:
     virtual ~Queues() = default;
     // The queue of the main thread's event loop.
     virtual Queue& mainQueue() = 0;
-    // A serial queue of its own; work already posted keeps it alive until it has run.
+    // A new serial queue. Posted work keeps it alive until that work has run.
     virtual std::shared_ptr<Queue> makeSerialQueue(std::string label) = 0;
     // Workers that run tasks side by side. A task that waits for an Event never starves the others.
     virtual Queue& workers(Priority priority) = 0;
-    // To be waited for on workers and connection threads, not on a serial queue whose tasks would have to set it.
+    // Wait for an event on workers and connection threads, never on a serial queue whose own tasks would have to set
+    // it.
     virtual std::shared_ptr<Event> makeEvent() = 0;
 };
 

@@ -1,5 +1,5 @@
-// The named IPC service. The listener asks its delegate about each new connection; an accepted connection serves the
-// requests of its client, in the order in which they come, on a thread of its own by calling the exported object.
+// The named IPC service. The listener asks its delegate about each new connection. An accepted connection has a thread
+// of its own, on which it serves its client's requests in their order by calling the exported object.
 #pragma once
 
 #include <cstdint>
@@ -21,7 +21,7 @@ public:
     virtual std::int32_t processIdentifier() const = 0;
     // Null when the caller does not hold the entitlement.
     virtual Value valueForEntitlement(std::string_view name) const = 0;
-    // The interface is named after the protocol; the connection keeps the object alive. Both before resume().
+    // Call both before resume(). The interface is named after the protocol; the connection keeps the object alive.
     virtual void setExportedInterface(std::string_view protocolName) = 0;
     virtual void setExportedObject(std::shared_ptr<VRXAgentProtocol> object) = 0;
     // Starts to serve requests.
@@ -33,14 +33,14 @@ class ServiceListener;
 class ServiceListenerDelegate {
 public:
     virtual ~ServiceListenerDelegate() = default;
-    // True accepts the connection, which the delegate has resumed by then; false refuses it. Called on any thread.
+    // Returns true to accept the connection, after resuming it; false to refuse it. Called on any thread.
     virtual bool shouldAcceptNewConnection(ServiceListener& listener, ServiceConnection& connection) = 0;
 };
 
 class ServiceListener {
 public:
     virtual ~ServiceListener() = default;
-    // Before resume(); the listener does not own it, and it must outlive the listener.
+    // Call this before resume(). The listener does not own the delegate, which must outlive it.
     virtual void setDelegate(ServiceListenerDelegate* delegate) = 0;
     // Starts to accept connections.
     virtual void resume() = 0;

@@ -1,11 +1,11 @@
-// The keys of the agent's settings that more than one part of it uses; a key that a single part uses stands there.
+// The settings keys that several parts of the agent use. A key that only one part uses is declared in that part.
 #pragma once
 
 #include <string_view>
 
 namespace vrx::platform::settings {
 
-// These have a registered value, which holds while none is stored. Durations are in seconds.
+// These keys have a registered value, which holds while none is stored. Durations are in seconds.
 inline constexpr std::string_view cachedWarrantyValidityDuration = "CachedWarrantyValidityDuration";
 inline constexpr std::string_view highServerVersion = "HighServerVersion";
 inline constexpr std::string_view lowServerVersion = "LowServerVersion";
@@ -15,7 +15,7 @@ inline constexpr std::string_view serverVersionURL = "ServerVersionURL";
 inline constexpr std::string_view warrantyURL = "WarrantyURL";
 
 inline constexpr std::string_view defaultDeviceActivationDate = "DefaultDeviceActivationDate";
-// A tester's watches, and by which serial number each is asked for: a dictionary.
+// Set by testers: a dictionary from the serial number in a request to that of the test watch that stands for it.
 inline constexpr std::string_view pairedWatchesSerialNumbers = "PairedWatchesSerialNumbers";
 
 }  // namespace vrx::platform::settings

@@ -12,7 +12,7 @@
 
 namespace vrx::platform {
 
-// What a store's client asks the configuration for.
+// What a client of the store asks its configuration for.
 struct StoreProfile {
     std::string name;
     std::string version;
@@ -36,14 +36,14 @@ struct StoreItem {
     std::optional<std::string> productPageURL{};
 };
 
-// How much a lookup gives of each item.
+// How much a lookup returns about each item.
 enum class StoreKeyProfile { Lockup };  // the compact one
 
 class StoreLookup {
 public:
     virtual ~StoreLookup() = default;
     using Completion = OnceCallback<Result<std::vector<StoreItem>>>;
-    // Completes once, on a thread of the platform's choosing; the lookup may be let go meanwhile.
+    // Completes once, on a thread of the platform's choosing. The caller may release the lookup meanwhile.
     virtual void lookUp(const std::vector<std::string>& bundleIdentifiers,
                         const std::vector<std::string>& itemIdentifiers, Completion completion) = 0;
 };
@@ -51,9 +51,9 @@ public:
 class Store {
 public:
     virtual ~Store() = default;
-    // The profile that a lookup needs of the configuration.
+    // The profile that a lookup needs in the configuration.
     virtual StoreProfile lookupProfile() const = 0;
-    // The keys are to be had in a bag that is opened for the profile from now on.
+    // Makes the profile's keys available in every bag that is opened for it from now on.
     virtual void registerBagKeys(const StoreProfile& profile) = 0;
     virtual std::shared_ptr<StoreBag> openBag(const std::string& profile, const std::string& version) = 0;
     virtual std::unique_ptr<StoreLookup> makeLookup(std::shared_ptr<StoreBag> bag, std::string callerName,

@@ -9,7 +9,7 @@
 
 namespace vrx::platform {
 
-// A move-only function: what a closure becomes that owns move-only things, such as a reply.
+// A move-only function, for closures that own move-only objects such as a reply.
 template <class Signature>
 class UniqueFunction;
 
@@ -42,8 +42,8 @@ private:
 
 using Task = UniqueFunction<void()>;
 
-// While one is alive on a thread, callbacks may be dropped there unanswered: queues hold one while they discard, at the
-// end of the process, what they have not run.
+// While one is alive on a thread, that thread may drop callbacks unanswered. Queues hold one while they discard, at the
+// end of the process, the tasks that have not run.
 class ShutdownScope {
 public:
     ShutdownScope() { ++depth(); }
@@ -59,12 +59,12 @@ private:
     }
 };
 
-// A callback that must be called exactly once. Debug builds stop on a second call and on one that is dropped
-// unanswered, unless it was let go or an exception is passing. Its owner calls it on any one thread.
+// A callback that must be called exactly once. Debug builds stop on a second call, and on a callback that is dropped
+// unanswered unless letGo() was called or an exception is passing. Its owner may call it on any thread.
 template <class... Args>
 class OnceCallback {
 public:
-    OnceCallback() = default;  // none: bool reads false, nothing to answer
+    OnceCallback() = default;  // empty: there is nothing to call
     OnceCallback(std::nullptr_t) {}
     template <class F>
     requires(!std::same_as<std::remove_cvref_t<F>, OnceCallback> && std::is_invocable_v<F&, Args...>)
@@ -87,7 +87,7 @@ public:
         function(std::forward<Args>(args)...);
     }
 
-    // Gives the callback up unanswered: whoever waits for it is gone.
+    // Drops the callback unanswered, because nobody waits for the answer any more.
     void letGo() { function_ = nullptr; }
 
 private:

@@ -1,4 +1,4 @@
-// The text that "%@" gives for a value: nothing as (null), a date as 2026-01-31 12:00:00 +0000, lists as (a, b),
+// The text that "%@" prints for a value: null as (null), a date as 2026-01-31 12:00:00 +0000, lists as (a, b),
 // dictionaries as {key = value; ...} in the order of their keys.
 #pragma once
 
@@ -95,7 +95,7 @@ std::string describe(const std::map<K, T, Compare>& dictionary) {
     return text + "}";
 }
 
-// The format with each "%@" replaced by the next text; what has no text stays.
+// The format with each "%@" replaced by the next text; a placeholder without a text stays.
 std::string filled(std::string_view format, std::initializer_list<std::string_view> texts);
 
 template <class T>

@@ -12,13 +12,13 @@ std::shared_ptr<RepeatingTimer> RepeatingTimer::schedule(Queue& queue, Duration 
 }
 
 void RepeatingTimer::invalidate() {
-    std::function<void()> released;  // outside the lock: it may hold whoever calls
+    std::function<void()> released;  // released after the lock: the function may own the caller
     std::lock_guard lock(mutex_);
     released.swap(fire_);
 }
 
-// A queue can't take a delayed task back: what stays there once nobody holds the timer is an empty hull. It stays a day
-// at most, however long the interval is, so that hulls don't pile up.
+// A queue cannot take a delayed task back, so a released timer leaves an empty task behind. A long interval is waited
+// for in steps of at most a day, so that such tasks do not pile up.
 void RepeatingTimer::wait(Duration left) {
     constexpr Duration longestStep{86400.0};
     const Duration step = std::min(left, longestStep);

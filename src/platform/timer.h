@@ -1,5 +1,5 @@
-// Calls again and again, an interval apart, on a queue, first when one interval has passed, until it is invalidated or
-// its last holder lets it go.
+// Calls a function on a queue once every interval, the first time after one interval. It ends when it is invalidated or
+// its last holder releases it.
 #pragma once
 
 #include <functional>
@@ -15,7 +15,7 @@ public:
     // The queue must outlive the timer.
     static std::shared_ptr<RepeatingTimer> schedule(Queue& queue, Duration interval, std::function<void()> fire);
 
-    // Any thread may call it, also from within the call.
+    // Any thread may call this, and so may the function itself.
     void invalidate();
 
 private:
@@ -27,7 +27,7 @@ private:
     Queue& queue_;
     const Duration interval_;
     std::mutex mutex_;
-    std::function<void()> fire_;  // none once invalidated
+    std::function<void()> fire_;  // empty once invalidated
 };
 
 }  // namespace vrx::platform

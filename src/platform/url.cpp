@@ -37,7 +37,7 @@ std::string escaped(std::string_view text, std::string_view kept) {
     return result;
 }
 
-// Nothing for an escape that is broken.
+// Null when an escape is broken.
 std::optional<std::string> unescaped(std::string_view text) {
     std::string result;
     for (std::size_t i = 0; i < text.size(); ++i) {
@@ -103,7 +103,7 @@ std::pair<std::size_t, std::size_t> Url::extensionRange() const {
     std::size_t slash = text_.rfind('/', end);
     std::size_t component = slash == std::string::npos ? 0 : slash + 1;
     std::size_t dot = end > 0 ? text_.rfind('.', end - 1) : std::string::npos;
-    // A dot that begins the component hides a file, it starts no extension.
+    // A dot at the beginning of a component marks a hidden file, not an extension.
     if (dot == std::string::npos || dot <= component) dot = end;
     return {dot, end};
 }

@@ -9,15 +9,15 @@ namespace vrx::platform {
 
 class Url {
 public:
-    // Nothing for a text that has no scheme.
+    // Null for a text that has no scheme or holds a control character.
     static std::optional<Url> parse(std::string_view text);
     static Url forFile(std::string_view path);
 
     bool isFile() const;
-    // The path of a file URL, its percent escapes resolved; nothing when it names no local file. An escaped slash or
-    // NUL, which no file name holds, makes it name none.
+    // The path of a file URL, with its percent escapes resolved. Null when the URL does not name a local file; an
+    // escaped slash or NUL, which no file name can hold, makes it name none.
     std::optional<std::string> filePath() const;
-    // What follows the last dot of the last path component, its percent escapes resolved; empty when there is none.
+    // What follows the last dot of the last path component, with its percent escapes resolved; empty without a dot.
     std::string pathExtension() const;
     // The same URL with another extension, added if it had none; the extension is given unescaped.
     Url withPathExtension(std::string_view extension) const;
@@ -27,7 +27,8 @@ public:
 
 private:
     explicit Url(std::string text) : text_(std::move(text)) {}
-    // Where the dot of the path extension stands, or the end of the path, and the end of the path.
+    // The position of the extension's dot, or of the path's end when there is no extension, and the position of the
+    // path's end.
     std::pair<std::size_t, std::size_t> extensionRange() const;
 
     std::string text_;

@@ -28,6 +28,7 @@ std::optional<char32_t> takeCharacter(std::string_view& rest) {
         if ((byte(i) & 0xC0u) != 0x80) return std::nullopt;
         character = character << 6 | (byte(i) & 0x3Fu);
     }
+    // A character that would fit into fewer bytes is an overlong form, which is not valid.
     const char32_t least = length == 4 ? firstOfFour : length == 3 ? firstOfThree : firstOfTwoBytes;
     if (character < least || character > last || isSurrogate(character)) return std::nullopt;
     rest.remove_prefix(length);

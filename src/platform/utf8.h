@@ -7,7 +7,8 @@
 
 namespace vrx::platform {
 
-// Takes the first character off the text; nothing, and the text as it was, where it does not begin with valid UTF-8.
+// Removes the first character from the text and returns it. A text that does not begin with valid UTF-8 stays as it is,
+// and the result is null.
 std::optional<char32_t> takeCharacter(std::string_view& rest);
 void appendUtf8(std::string& text, char32_t character);
 bool isUtf8(std::string_view text);

@@ -1,7 +1,7 @@
 // A property value: what JSON, property lists, the defaults, the keyed archive and the IPC encoding all speak.
 // Immutable and cheaply shared: a copy of a string, data, array or dictionary shares its content. Any thread may read
-// it. A null value stands both for a JSON null and for "nothing"; reading a value as another type than it has gives
-// nothing.
+// it. A null value stands both for a JSON null and for an absent value. Reading a value as a type that it does not have
+// returns null.
 #pragma once
 
 #include <concepts>
@@ -30,7 +30,7 @@ public:
 
     Value() = default;
     Value(std::nullptr_t) {}
-    // Constrained, so that no pointer turns into a bool.
+    // Constrained, so that a pointer does not turn into a bool.
     template <std::same_as<bool> B>
     Value(B value) : content_(value) {}
     template <std::integral I>
@@ -59,13 +59,13 @@ public:
     const platform::Array* asArray() const;
     const platform::Dictionary* asDictionary() const;
 
-    // The entry of a dictionary; null when there is none or this is no dictionary.
+    // The entry of a dictionary; null when there is no such entry or this is not a dictionary.
     const Value& operator[](std::string_view key) const;
 
-    // Deep; numbers compare by their numeric value, and a boolean is not a number.
+    // Compares deeply. Numbers compare by their numeric value; a boolean is not a number.
     bool operator==(const Value& other) const;
 
-    // The text that "%@" gives: a string as it stands, nothing as (null), dictionaries in the order of their keys.
+    // The text that "%@" prints: a string as it is, null as (null), dictionaries in the order of their keys.
     std::string description() const;
 
 private:
@@ -79,7 +79,8 @@ private:
         content_;
 };
 
-// Containers nested in a value, itself included: 0 for a scalar, 1 for a flat array. Stops counting above the limit.
+// How deeply containers are nested in a value, itself included: 0 for a scalar, 1 for a flat array. Stops counting
+// above the limit.
 int nestingDepth(const Value& value, int limit);
 
 }  // namespace vrx::platform

@@ -14,7 +14,7 @@ inline std::string vendorIdentifier(std::string_view remainder) {
 }
 
 inline constexpr std::string_view serviceNameRemainder = ".vrxagent";          // also the agent's bundle identifier
-inline constexpr std::string_view entitlementRemainder = ".private.vrxagent";  // a boolean true
+inline constexpr std::string_view entitlementRemainder = ".private.vrxagent";  // must be the boolean true
 inline constexpr std::string_view settingsAppRemainder = ".Preferences";       // the caller when no other is known
 
 }  // namespace vrx::platform

@@ -1,5 +1,5 @@
-// What an agent needs of parts that need the agent in turn. Start-up, which knows them all, hands the factories in; one
-// that is not there leaves the agent without that ability: it then does nothing and replies that there is nothing.
+// What an agent needs of parts that need the agent in turn. Start-up, which knows all parts, passes the factories in.
+// Without one of them the agent lacks that ability: it does nothing and replies with an empty result.
 #pragma once
 
 #include <cstddef>
@@ -19,19 +19,20 @@ namespace vrx {
 class VRXFollowUpManaging {
 public:
     virtual ~VRXFollowUpManaging() = default;
-    // Both give the device infos whose follow-up is shown afterwards.
+    // Both return the device infos whose follow-up is shown afterwards. "Followup" is spelled so on purpose.
     virtual DeviceInfoList refreshFollowupWithDeviceInfos(const DeviceInfoList& deviceInfos) = 0;
     virtual DeviceInfoList refreshFollowupWithDeviceInfo(const std::shared_ptr<VRXDeviceInfo>& deviceInfo,
                                                          bool allowForcePost) = 0;
-    // Posts what is due. Whether any was, posted or not.
+    // Posts the follow-ups that are due. Returns whether any was due, even if the service refused it. "DevicesInfo" is
+    // spelled so on purpose.
     virtual bool postFollowUpWithDevicesInfo(const DeviceInfoList& deviceInfos) = 0;
     virtual void dismissFollowUpForSerialNumber(const std::string& serialNumber) = 0;
     virtual void migrateLegacyFollowUpIfNeededWithDeviceInfo(const std::shared_ptr<VRXDeviceInfo>& deviceInfo) = 0;
-    // How many are shown; 0 when that cannot be told.
+    // How many follow-ups are shown; 0 when the service does not tell.
     virtual std::size_t pendingFollowUpCount() = 0;
 };
 
-// Answers whether an application is to be had. Made afresh for each question; it calls the reply exactly once.
+// Answers whether an application is available. Made afresh for each question; it calls the reply exactly once.
 class VRXSupportManaging {
 public:
     virtual ~VRXSupportManaging() = default;

@@ -1,4 +1,5 @@
-// Where an agent has its devices from. Each call asks afresh and gives new device objects; any thread may call it.
+// The source of an agent's devices. Each call reads the platform afresh and returns new device objects. Any thread may
+// call it.
 #pragma once
 
 #include <map>
@@ -16,7 +17,7 @@ public:
     virtual ~VRXAgentDeviceProvider() = default;
     virtual std::shared_ptr<VRXDevice> defaultDevice() = 0;
     virtual DevicesBySerialNumber pairedDevices() = 0;
-    // This device included.
+    // The paired devices and this device.
     virtual DevicesBySerialNumber allDevices() = 0;
 };
 

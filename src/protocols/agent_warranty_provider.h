@@ -1,5 +1,5 @@
-// Where an agent has coverage records, downloads and follow-ups from. Any thread may call it. A serial number is
-// nothing for a device that has none.
+// The source of an agent's coverage records, downloads and follow-ups. Any thread may call it. The serial number is
+// null for a device that has none.
 #pragma once
 
 #include <cstdint>
@@ -16,12 +16,12 @@ namespace vrx {
 class VRXAgentWarrantyProvider {
 public:
     using SerialNumber = std::optional<std::string>;
-    // Success, exactly when there is a record, and the record. Called once.
+    // Called once, with success and the record; success is true exactly when there is a record.
     using DownloadCompletion = platform::OnceCallback<bool, std::shared_ptr<VRXWarranty>>;
 
     virtual ~VRXAgentWarrantyProvider() = default;
 
-    // Both give the device infos whose follow-up is shown afterwards.
+    // Both return the device infos whose follow-up is shown afterwards. "Followup" is spelled so on purpose.
     virtual DeviceInfoList refreshFollowupWithDeviceInfos(const DeviceInfoList& deviceInfos) = 0;
     virtual DeviceInfoList refreshFollowupWithDeviceInfo(const std::shared_ptr<VRXDeviceInfo>& deviceInfo) = 0;
     virtual void dismissFollowUpForSerialNumber(const std::string& serialNumber) = 0;

@@ -1,4 +1,4 @@
-// The names that protocols speak of, declared only.
+// Forward declarations of the types that protocols name.
 #pragma once
 
 #include <cstdint>
@@ -14,7 +14,7 @@ class VRXWarranty;
 using DeviceList = std::vector<std::shared_ptr<VRXDevice>>;
 using DeviceInfoList = std::vector<std::shared_ptr<VRXDeviceInfo>>;
 
-// Which coverage record a caller wants. Any other value is as CachedOnly.
+// Which coverage record a caller wants. Any other value means CachedOnly.
 using VRXWarrantyLookupPolicy = std::uint64_t;
 inline constexpr VRXWarrantyLookupPolicy VRXWarrantyLookupPolicyDefault = 0;  // cached while fresh, else downloaded
 inline constexpr VRXWarrantyLookupPolicy VRXWarrantyLookupPolicyCachedOnly =

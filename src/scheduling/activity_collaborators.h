@@ -1,4 +1,4 @@
-// What activities need of parts that make activities in turn. Start-up, which knows them all, hands the factories in.
+// What activities need of parts that make activities in turn. Start-up, which knows all parts, passes the factories in.
 #pragma once
 
 #include <functional>
@@ -10,8 +10,8 @@
 namespace vrx {
 
 struct ActivityCollaborators {
-    // A new agent for the settings app. Null when none is to be had any more, because the process is ending: device
-    // infos can't be loaded then, and what needs them is deferred to the next process.
+    // A new agent for the settings app. Null while the process is ending: device infos cannot be loaded then, and what
+    // needs them is deferred to the next process.
     std::function<std::shared_ptr<VRXAgentProtocol>()> makeAgent;
     std::function<std::shared_ptr<VRXFollowUpManaging>()> makeFollowUp;
 };

@@ -32,15 +32,13 @@ std::string VRXFollowUpPost::identifier() const {
 void VRXFollowUpPost::performActivityForScheduler(const std::shared_ptr<VRXScheduler>& scheduler,
                                                   CompletionHandler completionHandler) {
     setFollowUpPostInProgress(true);
-    auto run = std::make_shared<ActivityRun>(std::move(completionHandler));
-    // The watch, which the activity holds, holds it weakly, and the run as well, which its work keeps.
-    setFollowUpPostTimer(makeDeferralWatch(scheduler, [activity = weak_from_this(), watched = std::weak_ptr(run)] {
-        auto self = activity.lock();
-        auto run = watched.lock();
-        if (!self || !self->followUpPostInProgress() || !run) return;
-        log(Level::Default, "FollowUp Post activity deferred.");
-        self->end(*run, BackgroundActivityResult::Deferred);
-    }));
+    auto run = std::make_shared<DeferrableRun>(std::move(completionHandler));
+    setFollowUpPostTimer(
+        makeDeferralWatch(scheduler, weak_from_this(), run, [](const auto& activity, DeferrableRun& watched) {
+            if (!activity->followUpPostInProgress()) return;
+            log(Level::Default, "FollowUp Post activity deferred.");
+            activity->end(watched, BackgroundActivityResult::Deferred);
+        }));
     auto agent = collaborators_.makeAgent();
     if (!agent) return finish(*run, std::nullopt);
     constexpr bool updateFollowUps = false;
@@ -49,7 +47,7 @@ void VRXFollowUpPost::performActivityForScheduler(const std::shared_ptr<VRXSched
         [self = shared_from_this(), run](DeviceInfoList deviceInfos) { self->finish(*run, deviceInfos); });
 }
 
-void VRXFollowUpPost::finish(ActivityRun& run, const std::optional<DeviceInfoList>& deviceInfos) {
+void VRXFollowUpPost::finish(DeferrableRun& run, const std::optional<DeviceInfoList>& deviceInfos) {
     log(Level::Default, "%s -> %@", performName, deviceInfos);
     if (deviceInfos) {
         post(*deviceInfos);
@@ -74,7 +72,7 @@ void VRXFollowUpPost::post(const DeviceInfoList& deviceInfos) {
         ->scheduleActivityForDate(date);
 }
 
-void VRXFollowUpPost::end(ActivityRun& run, BackgroundActivityResult result) {
+void VRXFollowUpPost::end(DeferrableRun& run, BackgroundActivityResult result) {
     CompletionHandler completionHandler = run.end();
     if (!completionHandler) return;
     setFollowUpPostInProgress(false);

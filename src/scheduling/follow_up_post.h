@@ -1,4 +1,4 @@
-// Has the follow-ups that are due posted, and works out when it is to run again and, if any was due, when the shown
+// Has the follow-ups posted that are due, and works out when it is to run again and, if any was due, when the shown
 // ones are first to be refreshed. Any thread may use it.
 #pragma once
 
@@ -10,7 +10,7 @@
 #include "vrx/platform/property.h"
 #include "vrx/platform/timer.h"
 #include "vrx/scheduling/activity_collaborators.h"
-#include "vrx/scheduling/activity_run.h"
+#include "vrx/scheduling/deferrable_run.h"
 #include "vrx/scheduling/scheduler_activity_delegate.h"
 
 namespace vrx {
@@ -22,26 +22,26 @@ public:
 
     std::string identifier() const override;
     bool requiresNetwork() const override { return true; }
-    // Deferred when no device infos can be loaded, else finished.
+    // Ends as deferred when no device infos can be loaded, else as finished.
     void performActivityForScheduler(const std::shared_ptr<VRXScheduler>& scheduler,
                                      CompletionHandler completionHandler) override;
 
-    // The rule of post_date.h, with the present settings and now.
+    // The rule of post_date.h, with the present settings and time. "DevicesInfo" is spelled so on purpose.
     static std::optional<platform::Date> nextFollowUpPostDateWithDevicesInfo(const DeviceInfoList& deviceInfos);
 
-    // From a run's start to its end.
+    // True from a run's start to its end.
     bool followUpPostInProgress() const { return followUpPostInProgress_; }
     void setFollowUpPostInProgress(bool followUpPostInProgress) { followUpPostInProgress_ = followUpPostInProgress; }
-    // The deferral watch of the run under way, else null.
+    // The deferral watch of the run under way; null without a run.
     std::shared_ptr<platform::RepeatingTimer> followUpPostTimer() const { return followUpPostTimer_.get(); }
     void setFollowUpPostTimer(std::shared_ptr<platform::RepeatingTimer> timer) {
         followUpPostTimer_.set(std::move(timer));
     }
 
 private:
-    void finish(ActivityRun& run, const std::optional<DeviceInfoList>& deviceInfos);
+    void finish(DeferrableRun& run, const std::optional<DeviceInfoList>& deviceInfos);
     void post(const DeviceInfoList& deviceInfos);
-    void end(ActivityRun& run, platform::BackgroundActivityResult result);
+    void end(DeferrableRun& run, platform::BackgroundActivityResult result);
 
     const ActivityCollaborators collaborators_;
     std::atomic<bool> followUpPostInProgress_ = false;

@@ -1,5 +1,5 @@
-// Has the shown follow-ups brought up to date, from cached records only, and schedules itself for the next moment at
-// which a text or the eligibility changes, until none is shown. No state; any thread may use it.
+// Has the shown follow-ups brought up to date, from cached records only. It schedules itself for the next moment at
+// which a text or the eligibility changes, until none is shown. It has no state; any thread may use it.
 #pragma once
 
 #include <memory>
@@ -18,11 +18,11 @@ public:
 
     std::string identifier() const override;
     bool requiresNetwork() const override { return false; }
-    // Deferred when no device infos can be loaded, else finished.
+    // Ends as deferred when no device infos can be loaded, else as finished.
     void performActivityForScheduler(const std::shared_ptr<VRXScheduler>& scheduler,
                                      CompletionHandler completionHandler) override;
 
-    // The rule of refresh_date.h, with the present settings and now.
+    // The rule of refresh_date.h, with the present settings and time. "DevicesInfo" is spelled so on purpose.
     static std::optional<platform::Date> nextFollowUpRefreshDateWithDevicesInfo(const DeviceInfoList& deviceInfos,
                                                                                 bool isInitialCall);
 

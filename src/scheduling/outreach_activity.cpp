@@ -9,13 +9,14 @@
 #include "vrx/coverage/warranty_downloader.h"
 #include "vrx/devices/devices_manager.h"
 #include "vrx/devices/records/device.h"
+#include "vrx/followup/follow_up_rules.h"
 #include "vrx/platform/completion_group.h"
 #include "vrx/platform/log.h"
 #include "vrx/platform/platform.h"
 #include "vrx/platform/queue.h"
 #include "vrx/platform/telephony_network_info.h"
 #include "vrx/platform/vendor.h"
-#include "vrx/scheduling/activity_run.h"
+#include "vrx/scheduling/deferrable_run.h"
 #include "vrx/scheduling/follow_up_post.h"
 #include "vrx/scheduling/scheduler.h"
 
@@ -26,12 +27,12 @@ using platform::Date;
 using platform::Level;
 using platform::Platform;
 
-// A run, with the earliest due date that its downloads have found. They may end at the same time.
-class VRXOutreachActivity::Run : public ActivityRun {
+// A run, with the earliest due date that its downloads have found. Downloads may end at the same time.
+class VRXOutreachActivity::Run : public DeferrableRun {
 public:
-    using ActivityRun::ActivityRun;
+    using DeferrableRun::DeferrableRun;
 
-    // Of equal dates, the one that was first stays.
+    // Of equal dates, the first one stays.
     void addDueDate(Date date) {
         std::lock_guard lock(mutex_);
         if (!earliestDueDate_ || date < *earliestDueDate_) earliestDueDate_ = date;
@@ -54,15 +55,8 @@ DeviceList allDevices() {
     return devices;
 }
 
-// When the follow-up of a record that asks for the offer is due. Nothing when it tells neither a date nor its end: no
-// follow-up is ever posted for it, so it must not take the place of another device's date.
-std::optional<Date> dueDate(const VRXWarranty& warranty) {
-    if (auto date = warranty.qxOfferFollowupDisplayDate()) return date;
-    std::optional<Date> until = warranty.qxOfferEligibleUntil();
-    return until ? std::optional(*until - warranty.qxOfferDurationBeforeEndDate()) : std::nullopt;
-}
-
-// The due date that a device's download gives, if any.
+// The due date of a device's follow-up, read from its downloaded record. Null when the record asks for no follow-up
+// here, or tells no due date: such a record must not take the place of another device's date.
 std::optional<Date> dueDateFromDownload(const std::optional<std::string>& serialNumber, bool success,
                                         const std::shared_ptr<VRXWarranty>& warranty) {
     log(Level::Default, "serialNumber: %@ success: %d", serialNumber, success);
@@ -81,10 +75,10 @@ std::optional<Date> dueDateFromDownload(const std::optional<std::string>& serial
             "Configuration does not support current device. Complete activity without scheduling followup");
         return std::nullopt;
     }
-    return dueDate(*warranty);
+    return dueDateInRecord(*warranty);
 }
 
-// The workers as a group's queue; they belong to the platform.
+// The workers as a queue for a group. The pointer owns nothing: the platform owns the workers.
 std::shared_ptr<platform::Queue> backgroundQueue() {
     return {std::shared_ptr<void>(), &Platform::current().queues().workers(platform::Priority::Background)};
 }
@@ -99,14 +93,12 @@ void VRXOutreachActivity::performActivityForScheduler(const std::shared_ptr<VRXS
                                                       CompletionHandler completionHandler) {
     setOutreachInProgress(true);
     auto run = std::make_shared<Run>(std::move(completionHandler));
-    // The watch, which the activity holds, holds it weakly, and the run as well, which its work keeps.
-    setOutReachTimer(makeDeferralWatch(scheduler, [activity = weak_from_this(), watched = std::weak_ptr(run)] {
-        auto self = activity.lock();
-        auto run = watched.lock();
-        if (!self || !self->outreachInProgress() || !run) return;
+    setOutReachTimer(makeDeferralWatch(scheduler, weak_from_this(), run, [](const auto& activity, Run& watched) {
+        if (!activity->outreachInProgress()) return;
         log(Level::Default, "Warranty download activity deferred.");
-        end(*run, activity, BackgroundActivityResult::Deferred);
+        end(watched, activity, BackgroundActivityResult::Deferred);
     }));
+    // All devices at once. The group's last step, when no download is left, schedules the post and ends the run.
     DeviceList devices = allDevices();
     log(Level::Default, "%s: devices: %@", "-[VRXOutreachActivity performActivityForScheduler:withCompletionHandler:]",
         devices);
@@ -134,7 +126,7 @@ void VRXOutreachActivity::performActivityForScheduler(const std::shared_ptr<VRXS
     });
 }
 
-// The activity may be gone; its system waits for the result all the same.
+// The activity may be gone; the system waits for the result all the same.
 void VRXOutreachActivity::end(Run& run, const std::weak_ptr<VRXOutreachActivity>& activity,
                               BackgroundActivityResult result) {
     CompletionHandler completionHandler = run.end();
@@ -151,6 +143,7 @@ bool VRXOutreachActivity::currentDeviceShouldReceiveOutreachForWarranty(const VR
     const platform::TelephonyNetworkInfo& networkInfo = Platform::current().telephonyNetworkInfo();
     const platform::Value toggle = warranty.qxOfferToggle();
     const platform::Array* excluded = toggle.asArray();
+    // The first carrier on the record's list decides. A carrier without both codes is on no list.
     for (const auto& [service, carrier] : networkInfo.serviceSubscriberCellularProviders()) {
         if (!carrier.mobileCountryCode)
             log(Level::Error, "No mobileCountryCode for networkInfo: %@, carrier: %@", networkInfo, carrier);

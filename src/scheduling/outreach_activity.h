@@ -1,6 +1,6 @@
-// Decides whether, and from when, the user is offered the plan: downloads the record of every device, keeps those that
-// ask for the offer on a carrier that allows it, and schedules the follow-up post for the earliest due date. It posts
-// nothing itself. Any thread may use it.
+// Decides whether, and from when on, the user is offered the plan. It downloads the record of every device, keeps those
+// that ask for the offer on a carrier that allows it, and schedules the follow-up post for the earliest due date. It
+// posts nothing itself. Any thread may use it.
 #pragma once
 
 #include <atomic>
@@ -20,18 +20,18 @@ public:
 
     std::string identifier() const override;
     bool requiresNetwork() const override { return true; }
-    // Finished in the end, whatever the downloads gave.
+    // Ends as finished, whatever the downloads brought, unless the system asks for deferral.
     void performActivityForScheduler(const std::shared_ptr<VRXScheduler>& scheduler,
                                      CompletionHandler completionHandler) override;
 
-    // Whether none of this device's carriers is one for which the record suppresses the offer. The record may be a
-    // watch's: the carriers are this device's all the same.
+    // Whether the record suppresses the offer for none of this device's carriers. Even for a watch's record these are
+    // the carriers of this device.
     static bool currentDeviceShouldReceiveOutreachForWarranty(const VRXWarranty& warranty);
 
-    // From a run's start to its end.
+    // True from a run's start to its end.
     bool outreachInProgress() const { return outreachInProgress_; }
     void setOutreachInProgress(bool outreachInProgress) { outreachInProgress_ = outreachInProgress; }
-    // The deferral watch of the run under way, else null.
+    // The deferral watch of the run under way; null without a run. "outReach" is spelled so on purpose.
     std::shared_ptr<platform::RepeatingTimer> outReachTimer() const { return outReachTimer_.get(); }
     void setOutReachTimer(std::shared_ptr<platform::RepeatingTimer> timer) { outReachTimer_.set(std::move(timer)); }
 

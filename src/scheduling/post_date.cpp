@@ -20,7 +20,7 @@ bool isPosted(const VRXDeviceInfo& info, const PostDateSettings& settings) {
     return serialNumber && settings.postedSerialNumberHashes.contains(platform::sha256Hash(*serialNumber));
 }
 
-// The next date once an offer of the record is taken into account.
+// The next date after an offer of the record is taken into account.
 std::optional<Date> withOffer(const std::optional<Date>& next, const VRXDeviceInfo& info, const VRXWarranty& warranty,
                               const PostDateSettings& settings, Date now) {
     std::optional<Date> until = warranty.qxOfferEligibleUntil();
@@ -30,8 +30,8 @@ std::optional<Date> withOffer(const std::optional<Date>& next, const VRXDeviceIn
         bool isFirst = !result || isEarlier(candidate, result, now);
         if (candidate && isFuture(candidate, now) && isFirst) result = candidate;
     }
-    // As long as there is no date yet, only an end in the past is earlier. An end that nobody knows counts as now, and
-    // so takes away a date to come.
+    // Without a date so far, only an end in the past is earlier. An unknown end counts as now, and so replaces a date
+    // that lies ahead by null.
     if (isEarlier(until, result, now)) result = until;
     return result;
 }

@@ -13,21 +13,22 @@ using platform::Duration;
 
 namespace {
 
-// The next date once an offer of the record is taken into account.
+// The next date after an offer of the record is taken into account.
 std::optional<Date> withOffer(const std::optional<Date>& next, const VRXDeviceInfo& info, const VRXWarranty& warranty,
                               const RefreshDateSettings& settings, Date now) {
     std::optional<Date> until = warranty.qxOfferEligibleUntil();
-    // An offer whose end nobody knows counts no days and is not shown, so it sets no date.
+    // An offer without a known end counts no days and is not shown, so it sets no date.
     if (!until) return next;
     std::uint32_t daysEligible = VRXWarranty::daysEligible(until, settings.oneDay, now);
-    // An ended offer that is still asked for is due at its end, whatever the others say: its follow-up is to go.
+    // An offer that has ended but is still asked for is due at its end, whatever the other devices say: its follow-up
+    // has to go.
     if (daysEligible == 0) return until;
 
     std::optional<Date> result = next;
     Duration span = settings.oneDay * (daysEligible - 1.0);
     if (span > Duration(0)) {
         std::optional<Date> firstDisplay = firstDisplayDate(info, warranty, settings.outreachDelay, now);
-        Date countdown = *until - span;  // within a day from now: the number of days left drops by one
+        Date countdown = *until - span;  // within a day from now, when the number of days left drops by one
         if (isEarlier(countdown, result, now) || (!result && isPast(firstDisplay, now))) result = countdown;
         bool isFirst = !result || isEarlier(firstDisplay, result, now);
         if (firstDisplay && isFuture(firstDisplay, now) && isFirst) result = firstDisplay;

@@ -1,6 +1,6 @@
 // When shown follow-ups are to be refreshed next: when a day count changes, when one is first shown, when an offer
-// ends. The rule of the follow-up refresh activity, of the post activity for the first refresh, and of whoever explains
-// them. A pure function of the devices with their records, the settings and the clock.
+// ends. This is the rule of the follow-up refresh activity, of the post activity for the first refresh, and of the
+// program that explains them. A pure function of the devices with their records, the settings and the clock.
 #pragma once
 
 #include <optional>
@@ -14,12 +14,12 @@ struct RefreshDateSettings {
     platform::Duration oneDay{};
     platform::Duration outreachDelay{};  // after a device's activation
 
-    // As they are stored now.
+    // The settings as they are stored now.
     static RefreshDateSettings read();
 };
 
-// Nothing when no device sets a date, which is so throughout a lone device's last day; a date in the past when an offer
-// has ended. The initial call begins without a date, any other with a refresh a day from now.
+// Null when no device sets a date, as during a lone device's last day. A date in the past when an offer has ended. The
+// initial call begins without a date, any other call with a refresh a day from now.
 std::optional<platform::Date> nextRefreshDate(const DeviceInfoList& deviceInfos, bool isInitialCall,
                                               const RefreshDateSettings& settings, platform::Date now);
 

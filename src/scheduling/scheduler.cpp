@@ -22,16 +22,16 @@ using platform::Platform;
 namespace {
 
 constexpr std::string_view targetDateSuffix = ".TargetDate";
-// The system hears of a result this much later than the activity gave it.
+// The delay between an activity's result and its hand-back to the system.
 constexpr Duration handBackDelay{1.0};
 
-// A duration that is not negative, truncated; one that is too long for the system is the longest there is.
+// A duration of at least 0, truncated to whole seconds and to the largest number that the system takes.
 std::int64_t wholeSeconds(Duration duration) {
     constexpr double most = 9223372036854774784.0;  // the largest double below 2^63
     return static_cast<std::int64_t>(std::min(duration.count(), most));
 }
 
-// Takes the result of a run: a finished one has no target date any longer, and in every case the system is told.
+// Takes the result of a run. A finished run loses its target date; in every case the system is told.
 VRXScheduler::CompletionHandler resultHandler(std::string targetDateKey, VRXScheduler::CompletionHandler block,
                                               std::shared_ptr<void> run) {
     return [key = std::move(targetDateKey), block = std::move(block),

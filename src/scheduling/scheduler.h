@@ -1,7 +1,8 @@
-// Binds an activity to the system's background activities and adds a target date, which is kept in the settings and so
-// outlives the process: a firing before it is put off and changes nothing, a firing at or after it, or without one,
-// runs the activity. The system keeps the scheduler, by the handler, until another one takes the identifier. Scheduling
-// belongs to one thread; everything else any thread may do.
+// Binds an activity to the system's background activities and adds a target date. The date is kept in the settings and
+// so outlives the process. A firing before the target date is deferred and changes nothing; a firing at or after it, or
+// without one, runs the activity. The system keeps the scheduler alive, through the handler, until another scheduler
+// takes the identifier. Only one thread may schedule; everything else any thread may do.
+// A leading "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <memory>
@@ -20,29 +21,30 @@ class VRXScheduler final : public platform::BackgroundActivityScheduler,
 public:
     using CompletionHandler = VRXSchedulerActivityDelegate::CompletionHandler;
 
-    // For the activity, under its identifier. Nothing is scheduled yet.
+    // Makes a scheduler for the activity, under its identifier. It schedules nothing yet.
     static std::shared_ptr<VRXScheduler> newSchedulerWithActivityDelegate(
         std::shared_ptr<VRXSchedulerActivityDelegate> activityDelegate);
     // Removes the target dates of all activities.
     static void clearScheduledActivities();
 
-    // Checks in for an activity that the system holds or fires by itself, leaving its criteria and its target date.
+    // Attaches a handler to an activity that the system already holds or fires by itself; criteria and target date
+    // stay.
     void monitorForScheduledActivity();
-    // Both set the target date and register the activity afresh. No date is as good as now, and leaves no target date.
+    // Both set the target date and register the activity afresh. A null date means now, and removes the target date.
     void scheduleActivityWithDelay(platform::Duration delay);
     void scheduleActivityForDate(std::optional<platform::Date> date);
 
     std::optional<platform::Date> scheduledActivityDate() const;
-    // Of the setting that keeps an activity's target date.
+    // The key of the setting that holds an activity's target date.
     static std::string targetDateKey(const std::string& identifier);
 
-    // What a firing of any activity does; the block is the system's completion handler. It gets the result a second
-    // after the activity has given it, on the main queue.
+    // Handles a firing of the activity. The block is the system's completion handler. It gets the result on the main
+    // queue, a second after the activity has given it.
     void performScheduledOutreachWithBlock(CompletionHandler block);
-    // Does that at each firing and keeps the scheduler alive.
+    // A handler that does so at each firing and keeps the scheduler alive.
     platform::ActivityHandler firingHandler();
 
-    // Read and replaced whole.
+    // Read and replaced whole, from any thread.
     std::shared_ptr<VRXSchedulerActivityDelegate> activityDelegate() const { return activityDelegate_.get(); }
     void setActivityDelegate(std::shared_ptr<VRXSchedulerActivityDelegate> activityDelegate) {
         activityDelegate_.set(std::move(activityDelegate));

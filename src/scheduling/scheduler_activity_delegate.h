@@ -17,20 +17,20 @@ public:
     using CompletionHandler = platform::OnceCallback<platform::BackgroundActivityResult>;
 
     virtual ~VRXSchedulerActivityDelegate() = default;
-    // The activity's identifier, also the stem of its target date's key.
+    // The activity's identifier, with which the key of its target date begins.
     virtual std::string identifier() const = 0;
     virtual bool requiresNetwork() const = 0;
-    // Runs the work, on a thread of the system's, and answers once, on any thread.
+    // Runs the work, on one of the system's threads. It answers once, on any thread.
     virtual void performActivityForScheduler(const std::shared_ptr<VRXScheduler>& scheduler,
                                              CompletionHandler completionHandler) = 0;
 
-    // Whether a run is under way, from its firing until the system has its result: what schedules the activity by this
-    // object meanwhile is the run itself.
+    // Whether a run is under way, from its firing until the system has its result. Scheduling the activity by this
+    // object meanwhile is done by the run itself.
     bool isRunning() const { return !run_.get().expired(); }
 
 private:
     friend class VRXScheduler;
-    platform::Property<std::weak_ptr<void>> run_;  // its owner is what hands the result back
+    platform::Property<std::weak_ptr<void>> run_;  // owned by the handler that returns the result
 };
 
 }  // namespace vrx

@@ -53,7 +53,7 @@ void VRXPostUpgradeActivity::performActivityForScheduler(const std::shared_ptr<V
     completionHandler(BackgroundActivityResult::Finished);
 }
 
-// The flag comes last: work that a crash cut short is done again from the beginning.
+// The flag comes last, so that work which a crash cut short is done again from the beginning.
 void VRXPostUpgradeActivity::performUpgrade() const {
     DefaultsStore& defaults = Platform::current().defaultsStore();
     VRXScheduler::clearScheduledActivities();

@@ -1,5 +1,6 @@
-// The two activities that the system fires by itself: one starts the agent's work when it first runs, the other takes
-// up after each boot what was scheduled before it. No state; both always finish. Any thread may use them.
+// The two activities that the system fires by itself. One starts the agent's work when the agent first runs; the other
+// takes up, after each boot, what was scheduled before it. They have no state and always finish. Any thread may use
+// them.
 #pragma once
 
 #include "vrx/scheduling/activity_collaborators.h"
@@ -7,7 +8,7 @@
 
 namespace vrx {
 
-// Its work is done once in the life of the settings; later firings do nothing.
+// Does its work once in the life of the settings; later firings do nothing.
 class VRXPostUpgradeActivity final : public VRXSchedulerActivityDelegate {
 public:
     explicit VRXPostUpgradeActivity(ActivityCollaborators collaborators) : collaborators_(std::move(collaborators)) {}
@@ -23,7 +24,7 @@ private:
     const ActivityCollaborators collaborators_;
 };
 
-// Registers outreach and refresh anew when their target dates are still stored. The follow-up post stays as it is.
+// Registers outreach and refresh anew when their target dates are still stored. It leaves the follow-up post alone.
 class VRXPostBootActivity final : public VRXSchedulerActivityDelegate {
 public:
     explicit VRXPostBootActivity(ActivityCollaborators collaborators) : collaborators_(std::move(collaborators)) {}

@@ -28,6 +28,8 @@ namespace {
 
 namespace settings = platform::settings;
 
+// The log texts in this file are spelled so on purpose: some have a space too many, and "serializing" means reading.
+
 constexpr std::string_view serverVersionOverrideKey = "ServerVersionOverride";
 constexpr std::string_view webFlowURLKey = "WebFlowURL";
 
@@ -50,11 +52,12 @@ void storeServerVersionCache(const Value& dictionary) {
     log(Level::Default, "Caching Server version  %@", dictionary);
 }
 
-// A version of a version dictionary: a number as it is, a string's integer; nothing for what is missing or neither.
+// A version in a version dictionary: a number as it is, a string by the integer that it begins with. Null when it is
+// missing or of another type.
 std::optional<double> versionFrom(const Value& dictionary, std::string_view key) {
     const Value& value = dictionary[key];
     if (const std::string* text = value.asString()) return static_cast<double>(platform::leadingInteger(*text));
-    // What is no number at all, NaN, has no place in an ordered set, and is as good as missing.
+    // NaN has no place in an ordered set and counts as missing.
     if (auto number = value.asNumber(); number && !std::isnan(*number)) return number;
     log(Level::Error, "Server version dictionary missing key '%@'", key);
     return std::nullopt;
@@ -86,7 +89,7 @@ std::optional<VersionSet> versionsSharedWith(const Value& server) {
     return shared;
 }
 
-// The dictionary of an answer to a document's request. A root of another kind comes back as it is.
+// The root of the document in an answer, whatever its type; null when there is no document.
 Value rootOfDocument(const std::string& url, const HttpResponse& response) {
     if (!response.body) {
         log(Level::Error, "Failed to fetch plist data from URL '%@' with error: %@", url, response.error);
@@ -104,6 +107,7 @@ Value rootOfDocument(const std::string& url, const HttpResponse& response) {
 
 void VRXServerVersionUtilities::_dictionaryFromURL(std::string url, bool shouldRetry, Completion<Value> completion) {
     auto& sessions = Platform::current().httpSessions();
+    // The second attempt goes past the caches: they may hold the document that is not a dictionary.
     auto uncached = shouldRetry ? nullptr : sessions.makeUncached();
     platform::HttpSession& session = shouldRetry ? sessions.shared() : *uncached;
     HttpRequest request;
@@ -152,8 +156,7 @@ void VRXServerVersionUtilities::_supportedVersionsForClientAndServer(VRXServerLo
     }
     if (!isRefresh && !cache.isNull()) return completion(versionsSharedWith(cache));
 
-    // A refresh stores whatever it ends with; a default lookup only what it fetched, so that it asks again the next
-    // time.
+    // A refresh stores whatever it uses. A default lookup stores only what it fetched, so that the next one asks again.
     auto finish = [isRefresh, cache, completion = std::move(completion)](Value fetched) mutable {
         Value used = !fetched.isNull() ? fetched : !cache.isNull() ? cache : clientVersionDictionary();
         if (isRefresh || !fetched.isNull()) storeServerVersionCache(used);

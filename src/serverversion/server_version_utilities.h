@@ -1,6 +1,7 @@
-// Which protocol versions the coverage server and this agent share. The server's stand in a small document on the
-// configuration CDN, the client's in the defaults; the last document is kept in the defaults. Any thread may ask; what
-// needs the network is answered on a worker, everything else before the call returns.
+// Which protocol versions the coverage server and this agent share. The server publishes its versions in a small
+// document on the configuration CDN. The agent's versions are in the defaults, where the last document is kept as well.
+// Any thread may ask. An answer that needs the network comes on a worker, every other one before the call returns.
+// A leading "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <cstdint>
@@ -14,7 +15,7 @@
 
 namespace vrx {
 
-// Where the server's versions may come from. Any other value is as Default.
+// Where the server's versions may come from. Any other value means Default.
 using VRXServerLookupPolicy = std::int64_t;
 inline constexpr VRXServerLookupPolicy VRXServerLookupPolicyDefault = 0;  // the cache, else the network
 inline constexpr VRXServerLookupPolicy VRXServerLookupPolicyLocal = 1;    // the cache, never the network
@@ -25,17 +26,17 @@ inline constexpr std::string_view serverVersionCacheKey = "ServerVersionCache";
 
 class VRXServerVersionUtilities {
 public:
-    // At most two versions, the low and the high one; those between them are no members.
+    // At most two versions, the low and the high one; the versions between them are not members.
     using VersionSet = std::set<double>;
     template <class T>
     using Completion = platform::OnceCallback<T>;
 
     VRXServerVersionUtilities() = delete;
 
-    // Refreshes the server's versions, then: is any version shared?
+    // Refreshes the server's versions, then answers whether any version is shared.
     static void serverVersionSupported(Completion<bool> completion);
 
-    // Is the client's high version shared?
+    // Answers whether the client's high version is shared. "Featureset" is spelled so on purpose.
     static void isHighServerVersionFeaturesetEnabled(VRXServerLookupPolicy policy, Completion<bool> completion);
     static void isHighServerVersionFeaturesetEnabled(Completion<bool> completion);
     static bool isHighServerVersionFeaturesetEnabled();  // answers at once, from what is stored
@@ -43,13 +44,13 @@ public:
     // The override of the web-flow URL; null when there is none.
     static platform::Value readWebURLOverride();
 
-    // The versions that both sides share; nothing when the server's cannot be read.
+    // The versions that both sides share; null when the server's cannot be read.
     static void _supportedVersionsForClientAndServer(VRXServerLookupPolicy policy,
                                                      Completion<std::optional<VersionSet>> completion);
-    // The dictionary of a property-list document, null when it cannot be had. A document that is no dictionary is, with
-    // shouldRetry, fetched once more past all caches.
+    // Completes with the dictionary of a property-list document, or with null when there is none. With shouldRetry, a
+    // document that is not a dictionary is fetched once more, past all caches.
     static void _dictionaryFromURL(std::string url, bool shouldRetry, Completion<platform::Value> completion);
-    // The stored version dictionary, null when there is none; anything else stored there is removed.
+    // The stored version dictionary, or null when there is none. Anything else that is stored there is removed.
     static platform::Value _getValidServerVersionCache();
 };
 

@@ -26,7 +26,7 @@ namespace {
 
 constexpr platform::Duration outreachDelay{1.0};
 
-// The tables by which testers let one serial number stand for another, the first that knows it.
+// The tables in which testers let one serial number stand for another. The first that holds the serial number counts.
 constexpr std::string_view overrideTables[] = {platform::settings::pairedWatchesSerialNumbers,
                                                "PairedBluetoothDevicesSerialNumbers"};
 
@@ -56,7 +56,7 @@ public:
         std::lock_guard lock(mutex_);
         infos_.push_back(std::move(info));
     }
-    // Once all lookups have ended.
+    // Called once all lookups have ended.
     DeviceInfoList take() {
         std::lock_guard lock(mutex_);
         return std::move(infos_);
@@ -119,7 +119,7 @@ void VRXAgent::readWebURLOverride(Reply<std::optional<std::string>> reply) {
     if (VRXUtilities::isInternal()) {
         Value override = VRXServerVersionUtilities::readWebURLOverride();
         log(Level::Default, "readWebURLOverride = %@", override);
-        if (const std::string* text = override.asString()) url = *text;  // the reply carries a string or nothing
+        if (const std::string* text = override.asString()) url = *text;  // the reply carries a string or null
     }
     if (reply) reply(std::move(url));
 }
@@ -168,7 +168,8 @@ void VRXAgent::getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicy policy, bool
     auto collected = std::make_shared<CollectedInfos>();
     for (auto& [key, device] : deviceProvider()->allDevices()) {
         _group.enter();
-        // Left when the reply has run, or is let go at the end of the process: the group's task holds the agent.
+        // The group is left when the reply has run, or was dropped at the end of the process: the group's task holds
+        // the agent.
         std::shared_ptr<void> membership(nullptr, [self](void*) { self->_group.leave(); });
         getWarrantyUsingPolicy(
             policy, device->serialNumber(),

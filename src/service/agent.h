@@ -1,6 +1,7 @@
-// The object through which every request reaches devices and coverage records: each client connection has one of its
-// own, as have start-up and the activities that work through one. It has no state between requests. Requests may come
-// on any thread; a request under way keeps the agent alive until its reply is sent.
+// The object through which every request reaches devices and coverage records. Each client connection has one, and so
+// have start-up and each activity that works through one. It has no state between requests. Requests may come on any
+// thread; a request under way keeps the agent alive until its reply is sent.
+// A leading "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <memory>
@@ -22,8 +23,7 @@ public:
     using SerialNumber = VRXAgentWarrantyProvider::SerialNumber;
     using WarrantyReply = Reply<std::shared_ptr<VRXWarranty>>;
 
-    // An agent for the application with that bundle identifier, the settings app when there is none, with the default
-    // providers.
+    // An agent with the default providers, for the application of that bundle identifier; null means the settings app.
     static std::shared_ptr<VRXAgent> initWithCallingProcessBundleID(const std::optional<std::string>& bundleIdentifier,
                                                                     AgentCollaborators collaborators = {});
     static std::shared_ptr<VRXAgent> initWithWarrantyProvider(
@@ -40,20 +40,21 @@ public:
                                          Reply<std::shared_ptr<VRXDeviceInfo>> reply) override;
     void getDeviceInfoForSerialNumber(std::string serialNumber, VRXWarrantyLookupPolicy policy,
                                       Reply<std::shared_ptr<VRXDeviceInfo>> reply) override;
-    // On the agent's policy queue; overlapping requests of one agent are answered when the lookups of all of them have
-    // ended.
+    // Replies on the agent's policy queue. Overlapping requests of one agent are answered when the lookups of all of
+    // them have ended.
     void getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicy policy, bool updateFollowUps,
                                       Reply<DeviceInfoList> reply) override;
     void dismissFollowUpForSerialNumber(std::string serialNumber, Reply<bool> completion) override;
 
-    // The coverage record that the policy gives, null when it gives none: at once when no download is needed.
+    // Replies with the coverage record that the policy selects, or null. Replies at once when no download is needed.
     void getWarrantyUsingPolicy(VRXWarrantyLookupPolicy policy, WarrantyReply reply);
     void getWarrantyUsingPolicy(VRXWarrantyLookupPolicy policy, const SerialNumber& serialNumber, WarrantyReply reply);
 
-    // Moves what the older single-device layout left to this device, once: for start-up, before anything else uses it.
+    // Moves what the older single-device layout left behind to this device, once. Start-up calls it before anything
+    // else uses that data.
     void performMigrationIfNeeded();
 
-    // Read and replaced whole; each step of a request asks the present one.
+    // Read and replaced whole. Each step of a request asks the present provider.
     std::shared_ptr<VRXAgentWarrantyProvider> warrantyProvider() const { return warrantyProvider_.get(); }
     void setWarrantyProvider(std::shared_ptr<VRXAgentWarrantyProvider> provider) {
         warrantyProvider_.set(std::move(provider));
@@ -68,7 +69,7 @@ private:
              std::shared_ptr<VRXAgentDeviceProvider> deviceProvider, AgentCollaborators collaborators);
 
     std::shared_ptr<platform::Queue> _policyLookupQueue;
-    platform::CompletionGroup _group;  // of the lookups of all-devices requests
+    platform::CompletionGroup _group;  // the lookups of all-devices requests
     platform::Property<std::shared_ptr<VRXAgentWarrantyProvider>> warrantyProvider_;
     platform::Property<std::shared_ptr<VRXAgentDeviceProvider>> deviceProvider_;
     const AgentCollaborators collaborators_;

@@ -99,7 +99,7 @@ bool VRXAgentDefaultWarrantyProvider::isSignedInToNimbus() {
     return Platform::current().accountStore().primaryCloudAccount().has_value();
 }
 
-// A stored number beyond 32 bits counts as the nearest one within.
+// A stored number beyond 32 bits counts as the nearest one within them.
 std::int32_t VRXAgentDefaultWarrantyProvider::migrationVersion() {
     std::int64_t version = Platform::current().defaultsStore().integer(migrationVersionKey);
     return static_cast<std::int32_t>(std::clamp<std::int64_t>(version, INT32_MIN, INT32_MAX));

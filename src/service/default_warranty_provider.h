@@ -1,5 +1,6 @@
-// The warranty provider of an agent that serves an application: reads the cache and the defaults afresh and makes a new
-// worker for each piece of work, so that the providers of several agents never disagree. Any thread may call it.
+// The warranty provider of an agent that serves an application. It reads the cache and the defaults afresh and makes a
+// new worker for each piece of work, so that the providers of several agents never disagree. Any thread may call it.
+// A leading "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <string>
@@ -11,7 +12,7 @@ namespace vrx {
 
 class VRXAgentDefaultWarrantyProvider final : public VRXAgentWarrantyProvider {
 public:
-    // On behalf of the application with that bundle identifier.
+    // Works on behalf of the application with that bundle identifier.
     VRXAgentDefaultWarrantyProvider(std::string callingProcessBundleID, AgentCollaborators collaborators);
 
     DeviceInfoList refreshFollowupWithDeviceInfos(const DeviceInfoList& deviceInfos) override;

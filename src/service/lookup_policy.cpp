@@ -1,4 +1,4 @@
-// The lookup policy of VRXAgent: which coverage record answers a request, the cached one, a downloaded one or none.
+// The lookup policy of VRXAgent: whether the cached coverage record, a downloaded one or none answers a request.
 
 #include <utility>
 
@@ -38,6 +38,7 @@ std::optional<CachedRecordFlaw> flawOfCachedRecord(VRXAgentWarrantyProvider& pro
         log(Level::Default, "user is signed out of Nimbus, cached warranty not allowed");
         return CachedRecordFlaw::SignedOut;
     }
+    // The text is spelled so on purpose.
     log(Level::Default, "cached warranty is for locale ('%@') and version ('%@') match system, consider it valid",
         locale, version);
     return std::nullopt;
@@ -47,8 +48,8 @@ namespace {
 
 using SerialNumber = VRXAgent::SerialNumber;
 
-// Whether a valid cached record is still fresh. One that was stored in the future, by a clock that has been set back,
-// is.
+// Whether a valid cached record is still fresh. A record with a date in the future, from a clock that was set back, is
+// fresh.
 bool isFresh(VRXAgentWarrantyProvider& provider, const SerialNumber& serialNumber) {
     std::optional<Date> lastUpdated = provider.lastUpdatedDateForSerialNumber(serialNumber).asDate();
     if (!lastUpdated) {
@@ -60,7 +61,7 @@ bool isFresh(VRXAgentWarrantyProvider& provider, const SerialNumber& serialNumbe
         log(Level::Default, "warranty valid for %.02f seconds", remaining);
         return true;
     }
-    // The negated duration, without a sign when it is 0.
+    // Subtracted from zero rather than negated, so that 0 has no sign.
     log(Level::Default, "warranty validity expired %.02f seconds ago, refresh it", Duration::zero() - remaining);
     return false;
 }
@@ -84,7 +85,7 @@ void VRXAgent::getWarrantyUsingPolicy(VRXWarrantyLookupPolicy policy, const Seri
     log(Level::Default, "getting warranty using policy %@: %lu", serialNumber, policy);
     auto provider = warrantyProvider();
 
-    // The cached record, if it may be the answer.
+    // The cached record, unless it has a flaw.
     std::shared_ptr<VRXWarranty> cached = provider->cachedWarrantyForSerialNumber(serialNumber);
     if (!cached) {
         log(Level::Default, "no cached warranty : %@", serialNumber);
@@ -96,7 +97,7 @@ void VRXAgent::getWarrantyUsingPolicy(VRXWarrantyLookupPolicy policy, const Seri
     const bool isDownloading = shouldDownload(policy, cached != nullptr, *provider, serialNumber);
     log(Level::Default, "%s: shouldDownloadWarranty: %d", "-[VRXAgent getWarrantyUsingPolicy:serialNumber:withReply:]",
         isDownloading);
-    if (policy == VRXWarrantyLookupPolicyRefresh) cached = nullptr;  // who asks for a new record gets no old one
+    if (policy == VRXWarrantyLookupPolicyRefresh) cached = nullptr;  // a refresh never answers with an old record
 
     auto answer = [serialNumber, cached = std::move(cached),
                    reply = std::move(reply)](std::shared_ptr<VRXWarranty> downloaded) mutable {

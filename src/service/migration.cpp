@@ -1,4 +1,4 @@
-// The one-time move of VRXAgent from the older layout, which had one record and one follow-up and named no device.
+// VRXAgent's one-time move from the older layout, which had one record and one follow-up and named no device.
 
 #include <utility>
 
@@ -17,11 +17,11 @@ void VRXAgent::performMigrationIfNeeded() {
     auto provider = warrantyProvider();
     if (provider->migrationVersion() >= currentMigrationVersion) return;
     auto device = deviceProvider()->defaultDevice();
-    // The record first: it is what the follow-up is filled from.
+    // The record first, because the follow-up is filled from it.
     auto warranty = provider->migrateLegacyCachedWarrantyIfNeededForSerialNumber(device->serialNumber());
     provider->migrateLegacyFollowUpIfNeededWithDeviceInfo(
         VRXDeviceInfo::deviceInfoWithDevice(std::move(device), std::move(warranty)));
-    // It is not tried again, whatever came of it.
+    // Recorded whatever the outcome: the move is not tried again.
     provider->setMigrationVersion(currentMigrationVersion);
 }
 

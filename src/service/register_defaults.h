@@ -1,4 +1,5 @@
-// The settings that apply until someone writes others.
+// The settings that apply until others are written.
+// A leading "vrx_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 namespace vrx::platform {
@@ -7,7 +8,7 @@ class DefaultsStore;
 
 namespace vrx {
 
-// Registers all of them with the store; to be done at every start, before anything reads it.
+// Registers all of them with the store. Call this at every start, before anything reads the store.
 void vrx_registerDefaults(platform::DefaultsStore& defaults);
 
 }  // namespace vrx

@@ -22,7 +22,7 @@ constexpr std::size_t callerPathBytes = 4096;
 bool ServiceDelegate::shouldAcceptNewConnection(platform::ServiceListener& /*listener*/,
                                                 platform::ServiceConnection& connection) {
     const std::string entitlement = platform::vendorIdentifier(platform::entitlementRemainder);
-    // Only the boolean counts: a string or a number that looks true is a mistake in the caller's bundle.
+    // Only the boolean counts: a string or number that looks true is a mistake in the caller's bundle.
     if (!connection.valueForEntitlement(entitlement).asBool().value_or(false)) {
         log(Level::Error, "Rejecting connection to vrxagent: missing entitlement '%@'", entitlement);
         return false;
@@ -41,7 +41,7 @@ std::optional<Bundle> ServiceDelegate::_bundleForPID(std::int32_t processIdentif
     std::array<char, callerPathBytes> buffer;
     std::size_t length = Platform::current().bundleLookup().executablePath(processIdentifier, buffer);
     const std::string path(buffer.data(), length);
-    if (path.empty() || !platform::isUtf8(path)) return std::nullopt;  // no URL could be made of it
+    if (path.empty() || !platform::isUtf8(path)) return std::nullopt;  // such a path makes no URL
     return Platform::current().bundleLookup().bundleContaining(path);
 }
 

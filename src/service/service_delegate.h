@@ -1,5 +1,6 @@
-// Decides about each new client connection: only callers that hold the agent's entitlement are served, each by an agent
+// Decides about each new client connection. Only callers that hold the agent's entitlement are served, each by an agent
 // of its own that knows the caller's bundle identifier. Called on the listener's thread.
+// A leading "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <cstdint>
@@ -13,13 +14,13 @@ namespace vrx {
 
 class ServiceDelegate final : public platform::ServiceListenerDelegate {
 public:
-    // The collaborators go to every agent.
+    // Every agent gets the collaborators.
     explicit ServiceDelegate(AgentCollaborators collaborators) : collaborators_(std::move(collaborators)) {}
 
     bool shouldAcceptNewConnection(platform::ServiceListener& listener,
                                    platform::ServiceConnection& connection) override;
 
-    // The bundle that holds the process's executable, or nothing.
+    // The bundle that holds the process's executable; null when there is none.
     std::optional<platform::Bundle> _bundleForPID(std::int32_t processIdentifier) const;
 
 private:

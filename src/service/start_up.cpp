@@ -53,7 +53,8 @@ AgentCollaborators agentCollaborators(const ActivityCollaborators& activities) {
             .makeSupportManager = [] { return std::make_shared<VRXOrvaneSupportManager>(); }};
 }
 
-// For the agents of activities, which need to make activities in turn; none once start-up's objects are gone.
+// For the agents of activities, which make activities in turn. There are no such agents once start-up's objects are
+// gone.
 ActivityCollaborators activityCollaborators(const std::shared_ptr<void>& lifetime) {
     ActivityCollaborators collaborators{.makeAgent = nullptr, .makeFollowUp = makeFollowUp};
     collaborators.makeAgent = [lifetime = std::weak_ptr(lifetime)]() -> std::shared_ptr<VRXAgentProtocol> {
@@ -70,6 +71,8 @@ ActivityCollaborators activityCollaborators(const std::shared_ptr<void>& lifetim
 StartUp::StartUp()
     : activityCollaborators_(activityCollaborators(lifetime_)),
       agentCollaborators_(agentCollaborators(activityCollaborators_)) {
+    // The order matters: defaults before anything reads them, the migration before monitors and clients use its data,
+    // the listener last.
     log(platform::Level::Default, "launched");
     vrx_registerDefaults(Platform::current().defaultsStore());
     monitorActivities();
@@ -81,8 +84,8 @@ StartUp::StartUp()
 
 StartUp::~StartUp() = default;
 
-// The follow-up post isn't monitored: it is scheduled when it is needed, and one that an earlier process scheduled gets
-// its handler when it falls due.
+// The follow-up post is not monitored: it is scheduled when it is needed, and one that an earlier process scheduled
+// gets its handler when it falls due.
 void StartUp::monitorActivities() {
     Platform::current().backgroundActivities().setHandlerFactory(
         [collaborators = activityCollaborators_](const std::string& identifier) -> platform::ActivityHandler {

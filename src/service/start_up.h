@@ -1,5 +1,5 @@
-// The one place that knows all parts of the agent: it makes them at the start of the process, in a fixed order, and
-// keeps them until its end. Main thread.
+// The one place that knows all parts of the agent. It makes them at the start of the process, in a fixed order, and
+// keeps them until its end. It belongs to the main thread.
 #pragma once
 
 #include <array>
@@ -20,7 +20,7 @@ class VRXScheduler;
 
 class StartUp {
 public:
-    // Does all of start-up up to the open listener; the program then runs its main loop. The current platform must be
+    // Does everything up to opening the listener; the program then runs its main loop. The current platform must be
     // set.
     StartUp();
     ~StartUp();
@@ -32,7 +32,7 @@ private:
     void startMonitors();
     void openListener();
 
-    // While it lives, activities are given agents.
+    // While this lives, activities get agents.
     const std::shared_ptr<void> lifetime_ = std::make_shared<int>();
     const ActivityCollaborators activityCollaborators_;
     const AgentCollaborators agentCollaborators_;

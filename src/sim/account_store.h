@@ -1,4 +1,4 @@
-// The simulated user's accounts, each fact set by the test. Renewals answer as scripted and are written down.
+// The simulated user's accounts. The test sets each fact. Renewals answer as scripted and are recorded.
 #pragma once
 
 #include <cstdint>
@@ -49,7 +49,7 @@ public:
     std::optional<std::string> mediaStorefront;
     std::optional<std::int64_t> mediaAccountIdentifier;
 
-    // What a renewal answers, when, and the token that it stores when it succeeds.
+    // What a renewal answers, after which delay, and the token that it stores when it succeeds.
     platform::RenewalResult renewalResult{};
     platform::Duration renewalDelay{1.0};
     std::optional<std::string> renewedToken;

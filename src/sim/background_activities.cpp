@@ -19,14 +19,14 @@ constexpr Duration atOnce{0.0};
 
 }  // namespace
 
-// Boots are told apart by their number; the clock that counts through them all serves as each one's.
+// A boot is identified by its number. One clock counts through all boots and serves as the clock of each.
 platform::Moment BackgroundActivities::now() const {
     return {std::to_string(boot_), clock_.elapsed(), clock_.now()};
 }
 
 void BackgroundActivities::schedule(const platform::ActivityRegistration& registration, ActivityHandler handler) {
     Attachment& attachment = attachments_[registration.identifier];
-    attachment.handler.swap(handler);  // the old one is let go at the end
+    attachment.handler.swap(handler);  // the old handler is released at the end
     if (!registration.isPreregistered) {
         ActivityCriteria criteria = registration.criteria.value_or(ActivityCriteria());
         Duration interval = registration.isByOwnRun ? platform::minimumInterval : atOnce;
@@ -98,13 +98,13 @@ void BackgroundActivities::considerLater(const std::string& identifier, Duration
     lane_->postAfter(delay, [this, identifier] { consider(identifier); });
 }
 
-// Until the boot activity has taken up what was scheduled before the boot.
+// Whether an activity has to wait until the boot activity has taken up what was scheduled before the boot.
 bool BackgroundActivities::isHeldForBoot(const std::string& identifier) {
     const std::string boot = platform::vendorIdentifier(platform::bootActivityRemainder);
     return platform::waitsForBootActivity(identifier) && rows_.contains(boot) && attachments_[boot].handler;
 }
 
-// Asked whenever something has changed and when time has come, and also when neither is so any more.
+// Called whenever something may have changed: a firing's time may have come, or the activity may be gone.
 void BackgroundActivities::consider(const std::string& identifier) {
     auto row = rows_.find(identifier);
     if (row == rows_.end() || attachments_[identifier].runningGeneration || isHeldForBoot(identifier)) return;
@@ -120,10 +120,10 @@ void BackgroundActivities::consider(const std::string& identifier) {
 void BackgroundActivities::fire(const std::string& identifier, int generation) {
     Attachment& attachment = attachments_[identifier];
     if (!attachment.handler && factory_) attachment.handler = factory_(identifier);
-    if (!attachment.handler) return;  // until a process checks in for it
+    if (!attachment.handler) return;  // waits until a process attaches a handler
     attachment.runningGeneration = generation;
     firings_.push_back({identifier, clock_.now()});
-    ActivityHandler handler = attachment.handler;  // another one may take its place during the run
+    ActivityHandler handler = attachment.handler;  // another handler may take its place during the run
     handler([this, identifier](BackgroundActivityResult result) { takeResult(identifier, result); });
 }
 
@@ -140,7 +140,7 @@ void BackgroundActivities::takeResult(const std::string& identifier, BackgroundA
         rows_.erase(entry);
     else
         row.due = platform::dueAfter(platform::retryDelay(++row.deferrals), now());
-    considerAll();  // others may have been held
+    considerAll();  // other activities may have waited for this run
 }
 
 }  // namespace vrx::sim

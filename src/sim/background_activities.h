@@ -1,12 +1,12 @@
-// The system's registry of activities under virtual time. What is registered is stored: it outlives the simulated
-// process and, counted on by the wall clock, a boot. Handlers are the process's. Everything happens on a queue of the
-// system's own, "activities".
+// The system's registry of activities under virtual time. Registrations are stored: they outlive the simulated process
+// and, by the wall clock, a boot. Handlers belong to the process. Everything happens on the system's own queue,
+// "activities".
 //
-// An activity fires a second after its delay at the earliest, once there is network if it needs any; while the system
-// asks for deferral, its grace period is waited for. It is never fired while a run of it has not handed back its
-// result, and no sooner than the minimum interval after a run that registered it itself. The system itself fires the
-// upgrade activity at the first start of each version of the agent, and the boot activity once a boot, before all that
-// was scheduled.
+// An activity fires a second after its delay at the earliest, and if it needs a network not before there is one. While
+// the system asks for deferral, an activity waits for its grace period to end. It never fires while a run of it has not
+// returned its result, and no sooner than the minimum interval after a run that registered it itself. The system itself
+// fires the upgrade activity at the first start of each version of the agent, and the boot activity once a boot, before
+// everything that was scheduled.
 #pragma once
 
 #include <map>
@@ -37,13 +37,13 @@ public:
     void setShouldDefer(bool shouldDefer);
     void wallClockWasSet() { considerAll(); }
 
-    // What happens to the process. It begins with the first start.
+    // What happens to the process. Its life begins with the first start.
     void processStarted(const std::string& agentVersion);
-    // Takes the handlers and the runs with it. A run that was under way begins anew in the next process.
+    // Drops the handlers and the runs. A run that was under way begins anew in the next process.
     void processEnded();
     void booted();
 
-    // What is registered: nothing once an activity has finished.
+    // What is registered; null once an activity has finished.
     std::optional<platform::ActivityCriteria> criteria(const std::string& identifier) const;
     std::optional<platform::Duration> timeLeft(const std::string& identifier) const;
     bool isRunning() const;
@@ -53,7 +53,7 @@ public:
         platform::Date date;
         bool operator==(const Firing&) const = default;
     };
-    // All there were, in order.
+    // All firings, in order.
     const std::vector<Firing>& firings() const { return firings_; }
     int firingCount(std::string_view identifier) const;
 
@@ -68,8 +68,8 @@ private:
     // In memory.
     struct Attachment {
         platform::ActivityHandler handler;
-        std::optional<int> runningGeneration;  // while a run is under way
-        bool isRegisteredByOwnRun = false;     // that is under way
+        std::optional<int> runningGeneration;  // null without a run under way
+        bool isRegisteredByOwnRun = false;     // by the run that is under way
     };
 
     platform::Moment now() const;

@@ -1,4 +1,4 @@
-// Processes and their bundles, as the test lays them out.
+// Processes and their bundles, as the test sets them up.
 #pragma once
 
 #include <algorithm>
@@ -21,7 +21,7 @@ public:
         return bundle == bundles.end() ? std::nullopt : std::optional(bundle->second);
     }
 
-    // A process whose executable lies in a bundle of the identifier.
+    // Adds a process whose executable lies in a bundle of the identifier.
     void addApplication(std::int32_t processIdentifier, const std::string& bundleIdentifier) {
         std::string bundlePath = "/Applications/" + bundleIdentifier;
         executables[processIdentifier] = bundlePath + "/main";

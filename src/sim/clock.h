@@ -1,4 +1,4 @@
-// Virtual time. It passes only when the queues let it: as work that is due later gets its turn.
+// Virtual time. It passes only when the queues run work that is due later.
 #pragma once
 
 #include <algorithm>
@@ -14,7 +14,7 @@ public:
     platform::Date now() const override { return start_ + elapsed_; }
     std::chrono::seconds timeZoneOffset() const override { return timeZoneOffset_; }
 
-    // Sets the wall clock, as a user may. What is waiting for its time still waits as long as before.
+    // Sets the wall clock, as a user may. Work that waits for its time still waits as long as before.
     void set(platform::Date now) { start_ = now - elapsed_; }
     void setTimeZoneOffset(std::chrono::seconds offset) { timeZoneOffset_ = offset; }
 

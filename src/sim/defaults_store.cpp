@@ -32,7 +32,7 @@ void DefaultsStore::set(std::string_view key, Value value) {
 MaybeError DefaultsStore::writeError(const Value& value) {
     if (failingWrites_ > 0) {
         --failingWrites_;
-        return Error{"system", ENOSPC, "no space left"};
+        return Error{platform::error_domain::system, ENOSPC, "no space left"};
     }
     if (value.isNull() || value.isNumber() || value.asString()) return std::nullopt;
     auto stored = codec::serializePropertyList(value, platform::PropertyListFormat::Binary);

@@ -1,4 +1,4 @@
-// The settings in memory. What is stored survives a restart of the simulated process, what is registered does not.
+// The settings in memory. Stored values survive a restart of the simulated process, registered ones do not.
 #pragma once
 
 #include <string>
@@ -21,14 +21,16 @@ public:
     platform::Dictionary dictionaryRepresentation() const override;
 
     const platform::Dictionary& stored() const { return stored_; }
-    // The keys of all writes that were tried, in order, removals included.
+    // The keys of all attempted writes, in order, removals included.
     const std::vector<std::string>& writes() const { return writes_; }
 
-    // As many writes fail from now on, as one does whose value cannot be stored: it is logged and changes nothing.
+    // The next writes fail, so many of them, as a write of a value that cannot be stored does: it is logged and changes
+    // nothing.
     void failWrites(int count) { failingWrites_ = count; }
-    // Another process writes to the key of the next update() while its function is at work, which makes it begin anew.
+    // Another process writes to the key of the next update() while its function runs, which makes the function run
+    // again.
     void interfereWithNextUpdate(platform::Value value) { interference_ = std::move(value); }
-    // What the end of the process takes with it.
+    // Removes what ends with the process.
     void forgetRegistered() { registered_.clear(); }
 
 private:

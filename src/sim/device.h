@@ -1,4 +1,4 @@
-// Facts about the simulated device and its user, each set by the test.
+// Facts about the simulated device and its user. The test sets each of them.
 #pragma once
 
 #include <map>
@@ -52,7 +52,7 @@ public:
     std::map<std::string, platform::Carrier> serviceSubscriberCellularProviders() const override { return carriers; }
     std::string description() const override { return "simulated telephony"; }
 
-    std::map<std::string, platform::Carrier> carriers;  // by service; none without a SIM
+    std::map<std::string, platform::Carrier> carriers;  // by service; empty without a SIM
 };
 
 }  // namespace vrx::sim

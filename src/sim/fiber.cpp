@@ -8,7 +8,7 @@
 #include <new>
 #include <utility>
 
-// The sanitizers' interface. Weak: in a program that is built without a sanitizer, its functions are null.
+// The sanitizers' interface. It is weak: in a program without a sanitizer these functions are null.
 extern "C" {
 [[gnu::weak]] void __sanitizer_start_switch_fiber(void** fakeStack, const void* stack, std::size_t bytes);
 [[gnu::weak]] void __sanitizer_finish_switch_fiber(void* fakeStack, const void** stack, std::size_t* bytes);
@@ -22,14 +22,14 @@ namespace vrx::sim {
 
 namespace {
 
-// Only what is touched of it takes memory.
+// Only the pages that are touched take memory.
 constexpr std::size_t stackBytes = 512 * 1024;
 
 std::size_t pageBytes() {
     return static_cast<std::size_t>(sysconf(_SC_PAGESIZE));
 }
 
-// A context's first function takes no pointer.
+// The fiber that is being entered, because a context's first function takes no pointer.
 thread_local Fiber* beginning = nullptr;
 
 }  // namespace
@@ -72,13 +72,13 @@ void Fiber::main() noexcept {
     self.hasStarted_ = true;
     self.arrive();
     self.runTasks();
-    self.leave();  // for good
+    self.leave();  // never returns
     std::abort();
 }
 
 void Fiber::runTasks() {
     while (!isEnding_) {
-        // Whatever the task holds goes on its own stack, too.
+        // The task and all that it owns are destroyed on this stack as well.
         std::exchange(task_, nullptr)();
         isBusy_ = false;
         leave();

@@ -1,4 +1,4 @@
-// A call stack besides the thread's own, on which one task at a time runs and can be suspended halfway. Used by one
+// A call stack besides the thread's own, on which one task at a time runs and can be suspended. It belongs to one
 // thread. The address and thread sanitizers are told of each switch.
 #pragma once
 
@@ -13,16 +13,16 @@ namespace vrx::sim {
 class Fiber {
 public:
     Fiber();
-    // It must be idle.
+    // The fiber must be idle.
     ~Fiber();
     Fiber(const Fiber&) = delete;
     Fiber& operator=(const Fiber&) = delete;
 
     // Runs the task until it suspends or ends. An exception that leaves the task ends the program.
     void start(platform::Task task);
-    // Goes on with the suspended task until it suspends again or ends.
+    // Continues the suspended task until it suspends again or ends.
     void resume() { enter(); }
-    // Called by the task: goes back to where start() or resume() was called.
+    // Called by the task: returns to where start() or resume() was called.
     void suspend() { leave(); }
     // Whether it has no task.
     bool isIdle() const { return !isBusy_; }
@@ -34,7 +34,7 @@ private:
     void leave();
     void arrive();
 
-    std::byte* mapping_;  // a page that nobody may touch, and above it the stack
+    std::byte* mapping_;  // a page that must not be touched, and above it the stack
     std::byte* stack_;
     ucontext_t inside_;
     ucontext_t outside_;
@@ -43,7 +43,7 @@ private:
     bool hasStarted_ = false;
     bool isEnding_ = false;
 
-    // What the sanitizers want to have back.
+    // What the sanitizers must be told at the next switch.
     const void* outsideStack_ = nullptr;
     std::size_t outsideStackBytes_ = 0;
     void* outsideFakeStack_ = nullptr;

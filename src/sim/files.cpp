@@ -20,7 +20,8 @@ std::string folderOf(const std::string& path) {
 }
 
 Error fileError(const char* what, const std::string& path, int number) {
-    return Error{"system", number, std::string("cannot ") + what + " " + path + ": " + std::strerror(number)};
+    return Error{platform::error_domain::system, number,
+                 std::string("cannot ") + what + " " + path + ": " + std::strerror(number)};
 }
 
 }  // namespace

@@ -23,7 +23,7 @@ public:
     platform::MaybeError createDirectories(const std::string& path) override;
     platform::MaybeError remove(const std::string& path) override;
 
-    // For tests, past all scripted faults: puts a file there, with the directories that it needs.
+    // For tests, regardless of scripted faults: puts a file in place and makes the directories that it needs.
     void put(const std::string& path, std::string_view content);
     std::optional<std::string> content(const std::string& path) const;
     bool contains(const std::string& path) const { return files_.contains(path) || directories_.contains(path); }
@@ -36,7 +36,7 @@ public:
     // The next calls of the operation fail with an errno, such as ENOSPC, and change nothing.
     void fail(Operation operation, int error, int count = 1);
     // The next replace() gets as far as a power cut before its last step: the old file is still there, and beside it
-    // what was to replace it. The process would have ended there; here, the call gives an error.
+    // the new content. A real process would have ended there; here the call returns an error.
     void crashNextReplace() { crashesNextReplace_ = true; }
 
 private:

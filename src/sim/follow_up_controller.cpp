@@ -58,7 +58,8 @@ MaybeError FollowUpControllers::begin(Request request, std::string text) {
     int& failures = failures_[request];
     if (failures == 0) return std::nullopt;
     --failures;
-    return Error{"followup", EIO, "failed to " + asked_.back().substr(0, asked_.back().find(' '))};
+    return Error{platform::error_domain::followUp, EIO,
+                 "failed to " + asked_.back().substr(0, asked_.back().find(' '))};
 }
 
 }  // namespace vrx::sim

@@ -1,5 +1,5 @@
 // The simulated follow-up service: items by client, in memory, where they survive a restart of the simulated process.
-// Each request is written down and may be made to fail.
+// Each request is recorded and may be made to fail.
 #pragma once
 
 #include <map>
@@ -21,11 +21,11 @@ public:
 
     std::string settingsApp = platform::vendorIdentifier(platform::settingsAppRemainder);
 
-    // What is pending for a client, in the order of posting. A test may lay out what it likes.
+    // The items pending for a client, in the order of posting. A test may change them as it likes.
     std::vector<platform::FollowUpItem>& pending(const std::string& clientIdentifier) {
         return pending_[clientIdentifier];
     }
-    // As many requests of the kind fail from now on and change nothing; the error's text says "failed to post".
+    // The next requests of the kind fail, so many of them, and change nothing; the error's text says "failed to post".
     void fail(Request request, int count = 1) { failures_[request] = count; }
     // Every request of every client, failed ones included: "list", "post IDENTIFIER", "clear IDENTIFIER IDENTIFIER".
     const std::vector<std::string>& asked() const { return asked_; }
@@ -34,7 +34,7 @@ public:
 private:
     class Controller;
 
-    // Writes the request down and gives the failure that is scripted for it.
+    // Records the request and returns the failure that is scripted for it.
     platform::MaybeError begin(Request request, std::string text);
 
     std::map<std::string, std::vector<platform::FollowUpItem>> pending_;

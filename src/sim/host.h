@@ -1,5 +1,5 @@
 // A whole host in memory, under virtual time: what tests and simulations run the agent on. One thread drives it, the
-// test's body; it is the current platform for as long as it lives.
+// test's body. It is the current platform for as long as it lives.
 //
 //     sim::Host host;
 //     host.http.answer(url, sim::HttpAnswer::ok("{}").after(2s));
@@ -7,7 +7,8 @@
 //     host.runFor(2s);
 //     EXPECT_TRUE(host.log.contains("…"));
 //
-// Declare it before whatever uses it. At its end no task may wait any longer; what has not begun is discarded.
+// Declare it before everything that uses it. When it ends, no task may still be waiting; tasks that have not begun are
+// discarded.
 #pragma once
 
 #include "vrx/codec/codec.h"

@@ -17,7 +17,7 @@ namespace {
 
 HttpAnswer transportError(int code, std::string text) {
     HttpAnswer answer;
-    answer.response.error = Error{"http", code, std::move(text)};
+    answer.response.error = Error{platform::error_domain::http, code, std::move(text)};
     return answer;
 }
 

@@ -1,6 +1,6 @@
-// HTTP with scripted answers. A test lays down what is answered at a URL and reads afterwards what was sent. A URL for
-// which nothing is laid down refuses connections; a file URL reads the simulated files. Answers arrive on a worker,
-// after their delay in virtual time. Nothing is cached.
+// HTTP with scripted answers. A test scripts the answer at a URL and afterwards reads what was sent. A URL without an
+// answer refuses connections; a file URL reads the simulated files. Answers arrive on a worker, after their delay in
+// virtual time. Nothing is cached.
 #pragma once
 
 #include <deque>
@@ -26,7 +26,7 @@ struct HttpAnswer {
     static HttpAnswer status(int status, std::string_view body = {});
     // The transport fails.
     static HttpAnswer failure(std::string text = "connection lost");
-    // No answer ever comes; the request times out.
+    // No answer ever comes, so the request times out.
     static HttpAnswer silence();
 
     HttpAnswer after(platform::Duration time) const {
@@ -38,7 +38,7 @@ struct HttpAnswer {
 
 struct SentRequest {
     platform::HttpRequest request;
-    bool isShared;        // through the shared session, else through one that bypasses caches
+    bool isShared;        // through the shared session; otherwise through one that bypasses caches
     platform::Date date;  // when it was sent
     std::string_view body() const { return {reinterpret_cast<const char*>(request.body.data()), request.body.size()}; }
 };
@@ -53,10 +53,10 @@ public:
     std::shared_ptr<platform::HttpSession> makeUncached() override;
 
     using Server = std::function<HttpAnswer(const platform::HttpRequest&)>;
-    // The standing answer at a URL, in place of the one before.
+    // Sets the standing answer at a URL.
     void answer(std::string url, HttpAnswer answer);
     void answer(std::string url, Server server) { standing_[std::move(url)] = std::move(server); }
-    // Answers given before the standing one, each once, in the order in which they are laid down.
+    // Answers that come before the standing one, each once, in the order in which they were set.
     void answerOnce(std::string url, HttpAnswer answer) { once_[std::move(url)].push_back(std::move(answer)); }
 
     // All requests, file URLs included, in the order in which they were sent.

@@ -1,4 +1,4 @@
-// The user's language, set by the test.
+// The user's language. The test sets it.
 #pragma once
 
 #include "vrx/codec/core/number_format.h"

@@ -27,7 +27,7 @@ void NotificationCenter::raise(std::string_view nameRemainder) {
     if (!isHeard) missed_.insert(name);
 }
 
-// One that is cancelled before its turn comes is not called any more.
+// A registration that is cancelled before its turn is not called.
 void NotificationCenter::deliver(const std::shared_ptr<Registration>& registration) {
     registration->queue.post([weak = std::weak_ptr(registration)] {
         if (auto registered = weak.lock()) registered->handler();

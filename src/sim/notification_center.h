@@ -1,4 +1,5 @@
-// Notifications that the test raises. One that no process listens for is kept, and raised when the next one does.
+// Notifications that the test raises. A notification for which no process listens is kept and raised when the next one
+// listens.
 #pragma once
 
 #include <map>
@@ -16,7 +17,7 @@ public:
                                          std::function<void()> handler) override;
     void cancel(std::int32_t token) override { registrations_.erase(token); }
 
-    // By what follows the vendor prefix in its name.
+    // Raises the notification whose name is the vendor prefix and the remainder.
     void raise(std::string_view nameRemainder);
     std::size_t registrationCount() const { return registrations_.size(); }
     void processEnded() { registrations_.clear(); }

@@ -44,7 +44,7 @@ bool Process::isIdle() const {
     return inFlight_.use_count() == 1 && !activities_.isRunning();
 }
 
-// Asked between two tasks, when none is due.
+// Called between two tasks, when none is due.
 void Process::exitIfWanted() {
     if (!isExitWanted_ || !isIdle()) return;
     ++cleanExits_;

@@ -1,6 +1,6 @@
-// The life of the simulated process. It can be killed at any moment, with everything in memory gone and everything
-// stored kept, started anew, and taken through a boot. When it asks to exit and nothing is under way any more, it ends
-// and, as a service manager would, the host starts it anew.
+// The life of the simulated process. It can be killed at any moment, started anew, and taken through a boot; everything
+// in memory is then lost and everything stored kept. When it asks to exit and no work is in flight any more, it ends
+// and the host starts it anew, as a service manager would.
 //
 //     host.process.launch([] { return std::make_shared<StartUp>(); });
 //     host.runFor(1h);
@@ -27,12 +27,12 @@ public:
     void exitCleanWhenIdle() override { isExitWanted_ = true; }
     platform::WorkInFlight beginWork() override { return inFlight_; }
 
-    // Makes what lives as long as the process.
+    // Makes the object that lives as long as the process.
     using Main = std::function<std::shared_ptr<void>()>;
     void launch(Main main);
-    // At once, whatever is under way.
+    // Ends the process at once, whatever is under way.
     void kill();
-    // What comes after a kill: another process with the same main.
+    // After a kill, starts another process with the same main.
     void relaunch();
     void restart() {
         kill();
@@ -41,10 +41,10 @@ public:
     void reboot(platform::Duration downTime = platform::Duration(60));
 
     bool isRunning() const { return content_ != nullptr; }
-    // How often it has ended because it asked to.
+    // How often the process ended because it asked to.
     int cleanExits() const { return cleanExits_; }
 
-    // Of the agent that is started next.
+    // The version of the agent that is started next.
     std::string agentVersion = "1";
 
 private:
@@ -57,8 +57,8 @@ private:
     NotificationCenter& notifications_;
     Main main_;
     std::shared_ptr<void> content_;
-    // Each piece of work in flight holds a share in it. Another one for each process: what a killed one held is nothing
-    // to the next.
+    // Each piece of work in flight holds a share of it. Each process has another one, so that what a killed process
+    // held does not count for the next.
     platform::WorkInFlight inFlight_ = std::make_shared<int>();
     bool isExitWanted_ = false;
     int cleanExits_ = 0;

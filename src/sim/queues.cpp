@@ -13,10 +13,10 @@ using platform::Task;
 namespace {
 
 constexpr Duration forever = Duration::max();
-// Work that keeps posting more without letting time pass is taken for a loop.
+// Work that keeps posting more work without letting time pass counts as a loop.
 constexpr int mostWorkAtOneTime = 100'000;
 
-// Unwinds the stack of a task whose wait nobody will end.
+// Thrown to unwind the stack of a task whose wait nobody will end.
 struct Abandoned {};
 
 }  // namespace
@@ -33,7 +33,7 @@ public:
 
     const std::string label;
     const bool isSerial;
-    bool isBusy = false;  // a serial one with a task under way
+    bool isBusy = false;  // a serial lane with a task under way
 
 private:
     Queues& queues_;
@@ -59,8 +59,8 @@ private:
 
 struct Queues::Strand {
     Fiber fiber;
-    std::shared_ptr<Lane> lane;  // none while it has no task
-    std::optional<Key> wakeUp;   // the work that ends its wait
+    std::shared_ptr<Lane> lane;  // null while it has no task
+    std::optional<Key> wakeUp;   // the pending work that ends its wait
     platform::Date waitingSince{};
     bool isAbandoned = false;
 };
@@ -112,7 +112,7 @@ Queues::Key Queues::add(Duration delay, Work work) {
         work.task = nullptr;
         return {};
     }
-    // Not every double is a time: what is no number counts as none.
+    // A delay of NaN, or less than 0, counts as 0.
     Duration due = clock_.elapsed() + (delay > Duration(0) ? delay : Duration(0));
     return pending_.emplace(Key(due, ++lastNumber_), std::move(work)).first->first;
 }
@@ -148,6 +148,8 @@ void Queues::countWork(Duration due) {
     failures_.report("work goes on without end and lets no time pass");
 }
 
+// Runs a task on an idle strand's stack, or continues a strand, until it suspends or ends. Only an ended one frees its
+// lane and its strand.
 void Queues::execute(Work work) {
     if (work.strand) {
         current_ = work.strand;
@@ -182,7 +184,7 @@ bool Queues::wait(Event& event, std::optional<Duration> limit) {
 
     Strand& strand = *current_;
     if (!strand.isAbandoned) {
-        std::shared_ptr<Event> kept = event.shared_from_this();  // also when the simulation ends meanwhile
+        std::shared_ptr<Event> kept = event.shared_from_this();  // keeps it alive even if the simulation ends meanwhile
         event.waiting.push_back(&strand);
         if (limit) strand.wakeUp = add(*limit, {strand.lane, nullptr, &strand});
         strand.waitingSince = clock_.now();

@@ -1,11 +1,11 @@
-// The queues under virtual time: one thread runs all work, in the order in which it is due and, of what is due at the
-// same time, in the order in which it was posted. Two runs of the same program do the same in the same order.
+// The queues under virtual time. One thread runs all work in the order in which it is due; work that is due at the same
+// time runs in the order in which it was posted. Two runs of the same program do the same in the same order.
 //
-// Each task has a stack of its own: one that waits for an event is suspended while other work goes on and time passes,
-// just as a thread would be. A serial queue whose task waits, the main queue too, starts nothing meanwhile.
+// Each task has a stack of its own. A task that waits for an event is suspended while other work runs and time passes,
+// just as a thread would be. A serial queue whose task waits, the main queue included, starts nothing meanwhile.
 //
-// The thread that owns the simulation is the test's body: it runs the queues, and where it waits for an event itself,
-// they run until the event is set.
+// The thread that owns the simulation is the test's body. It runs the queues; when it waits for an event itself, they
+// run until the event is set.
 #pragma once
 
 #include <cstdint>
@@ -35,33 +35,34 @@ public:
     platform::Queue& workers(platform::Priority priority) override;
     std::shared_ptr<platform::Event> makeEvent() override;
 
-    // For the test's body. Run the work that is due now, by the end of a duration, or by a date; then it is that late.
+    // For the test's body. These run the work that is due now, within a duration, or by a date; then it is that late.
     void run() { runWork(clock_.elapsed()); }
     void runFor(platform::Duration duration) { runWork(clock_.elapsed() + duration); }
     void runUntil(platform::Date date) { runWork(clock_.elapsedAt(date)); }
 
-    // Runs the next piece of work that is due by the date, after which the process may be killed. False when there is
-    // none.
+    // Runs the next piece of work that is due by the date, after which the process may be killed. Returns false when
+    // there is none.
     bool runOne(platform::Date until) { return runNext(clock_.elapsedAt(until)); }
 
-    // The label of the queue whose task is running: "main", "background", "userInitiated", a serial queue's own, and
-    // nothing in the test's body.
+    // The label of the queue whose task is running: "main", "background", "userInitiated" or a serial queue's own;
+    // empty in the test's body.
     std::string currentLabel() const;
     // Tasks that have not begun, delayed ones included.
     std::size_t pendingCount() const;
     // Tasks that wait for an event.
     std::size_t waitingCount() const;
 
-    // Called between two tasks when nothing is due at present, before time passes, while the queues are run.
+    // The handler is called while the queues are run, between two tasks, when nothing is due now and before time
+    // passes.
     void setIdleHandler(std::function<void()> handler) { idleHandler_ = std::move(handler); }
-    // What the end of a process does to its work: the stacks of tasks that wait are unwound, what has not begun is
-    // discarded, and so is what is posted meanwhile.
+    // Does what the end of a process does to its work: unwinds the stacks of waiting tasks, and discards the tasks that
+    // have not begun and those that are posted meanwhile.
     void discardWork();
 
-    // Ends the simulation's work: a task that still waits is a failure, unless it was let go. Its wait never returns;
-    // the stack is unwound. What has not begun is discarded, and so is what is posted from now on.
+    // Ends the simulation's work. A task that still waits is a failure, unless letWaitingTasksGo() was called; its wait
+    // never returns, and its stack is unwound. Tasks that have not begun, or are posted from now on, are discarded.
     void close();
-    // Tasks that wait when the simulation ends are none of this test's business.
+    // Lets tasks wait when the simulation ends: this test does not care about them.
     void letWaitingTasksGo() { areWaitingTasksLetGo_ = true; }
 
 private:

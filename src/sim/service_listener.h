@@ -1,4 +1,5 @@
-// The IPC service without a wire: tests connect to it as a process of their choice and call what the agent exported.
+// The IPC service without a wire. Tests connect to it as a process of their choice and call the object that the agent
+// exported.
 #pragma once
 
 #include <functional>
@@ -14,7 +15,7 @@
 
 namespace vrx::sim {
 
-// Requests run in their order, on a queue of the connection's own.
+// Requests run in order, on the connection's own queue.
 class ServiceConnection final : public platform::ServiceConnection {
 public:
     ServiceConnection(std::int32_t processIdentifier, platform::Dictionary entitlements,
@@ -50,8 +51,8 @@ public:
 
     std::unique_ptr<platform::ServiceListener> makeListener(std::string serviceName) override;
 
-    // Connects to the service as the process; null when it was refused, or when no listener has resumed. The object is
-    // served for as long as the connection is kept.
+    // Connects to the service as the process. Null when the connection was refused, or when no listener has resumed.
+    // The connection is served for as long as the caller keeps it.
     std::shared_ptr<ServiceConnection> connect(std::int32_t processIdentifier, platform::Dictionary entitlements);
     // The name of the service that takes connections; empty when there is none.
     std::string serviceName() const;

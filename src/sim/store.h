@@ -1,5 +1,5 @@
-// The simulated Marketplace, purchase history, installed applications and texts, each set by the test; what was asked
-// is written down.
+// The simulated Marketplace, purchase history, installed applications and texts. The test sets each of them; all
+// requests are recorded.
 #pragma once
 
 #include <map>

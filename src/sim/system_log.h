@@ -14,13 +14,13 @@ public:
     bool isOn(platform::Level level) const override { return level >= lowest; }
     void write(const platform::LogEntry& entry) override { entries_.push_back(entry); }
 
-    // Entries below it are not even put together.
+    // Entries below this level are not even composed.
     platform::Level lowest = platform::Level::Debug;
 
     const std::vector<platform::LogEntry>& entries() const { return entries_; }
     // The lines of a level or above, in order, with their private arguments revealed.
     std::vector<std::string> messages(platform::Level minimum = platform::Level::Debug) const;
-    // How many lines have the format; and whether any has.
+    // How many lines have the format, and whether any has.
     int count(std::string_view format) const;
     bool contains(std::string_view format) const { return count(format) > 0; }
     // The last line of the format, with its private arguments revealed; empty when there is none.

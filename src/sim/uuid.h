@@ -1,4 +1,4 @@
-// Identifiers counted up from the same one in every simulation.
+// Identifiers that count up from the same one in every simulation.
 #pragma once
 
 #include <array>

@@ -24,7 +24,7 @@ using platform::Value;
 
 namespace {
 
-// Keys of an answer, spelled as clients know them.
+// Keys of an answer. "Availablity" and the key of the title are spelled so on purpose: clients know them.
 constexpr const char* bundleIDKey = "AppBundleID";
 constexpr const char* titleKey = "AppTitleKey";
 constexpr const char* vendorNameKey = "AppVendorName";
@@ -33,7 +33,7 @@ constexpr const char* iconURLKey = "AppIconURL";
 constexpr const char* availabilityTextKey = "AppAvailablityText";
 constexpr const char* availabilityTypeKey = "AppAvailabilityType";
 
-// Classes of an answer.
+// Values of "AppAvailabilityType".
 constexpr int notFound = 0;
 constexpr int installed = 1;
 constexpr int purchased = 2;
@@ -42,7 +42,7 @@ constexpr int offered = 3;
 constexpr std::string_view overrideSetting = "AppSupportAvailability";
 constexpr platform::Duration purchaseWait{5.0};
 
-// The address as the store's own campaign is to see it, appended as it stands even behind a query.
+// The address with the store's campaign appended as it is, even behind a query.
 std::string withCampaign(const std::optional<std::string>& address) {
     return address.value_or("").empty() ? std::string() : *address + "?pt=2003&ct=coverage.settings&mt=8";
 }
@@ -63,6 +63,7 @@ Dictionary offeredAnswer(const platform::StoreItem& item) {
 
 Dictionary purchasedAnswer(const platform::Purchase& purchase) {
     return {{linkURLKey, withCampaign(purchase.productURL)},
+            // The texts that stand for a missing one are spelled so on purpose.
             {titleKey, purchase.title.value_or("== Orvane Support ==")},
             {vendorNameKey, purchase.developerName.value_or("== Orvane ==")},
             {availabilityTextKey, "DOWNLOAD"},
@@ -71,7 +72,7 @@ Dictionary purchasedAnswer(const platform::Purchase& purchase) {
 
 void addTexts(Dictionary& answer, const platform::InstalledAppRecord& app) {
     auto add = [&](const char* key, const std::optional<std::string>& text) {
-        if (text) answer[key] = *text;  // a reply holds no nulls
+        if (text) answer[key] = *text;  // a reply must not hold nulls
     };
     add(titleKey, app.localizedName);
     add(vendorNameKey, app.vendorName);
@@ -83,8 +84,8 @@ std::int64_t storeAccountIdentifier() {
     return account ? accounts.storeAccountIdentifier(*account).value_or(0) : 0;
 }
 
-// Handed from the thread that has the purchases to the one that waits for them. What comes once the wait is over finds
-// nobody: the waiting side takes its copy, and this lives on alone.
+// Passed from the thread that has the purchases to the thread that waits for them. The waiting side takes a copy, so
+// purchases that arrive after the wait change nothing.
 class PurchaseAnswer {
 public:
     void give(const std::vector<platform::Purchase>& purchases, const std::string& bundleIdentifier) {
@@ -115,6 +116,7 @@ void VRXOrvaneSupportManager::checkIsAvailableInStore(std::string bundleIdentifi
     log(Level::Default, "Checking for %@ in the Marketplace", bundleIdentifier);
     if (Platform::current().defaultsStore().boolean(overrideSetting)) return reply(overrideAnswer());
 
+    // The keys are registered before the bag is opened, which otherwise would lack them.
     platform::Store& store = Platform::current().store();
     const platform::StoreProfile profile = store.lookupProfile();
     store.registerBagKeys(profile);
@@ -145,6 +147,7 @@ Dictionary VRXOrvaneSupportManager::checkAppIsPurchased(const std::string& bundl
 
 void VRXOrvaneSupportManager::appSupportAvailability(std::string bundleIdentifier, Reply reply) {
     Dictionary answer{{bundleIDKey, bundleIdentifier}};
+    // Asked in this order, and the first that answers counts: installed, purchased, offered.
     const platform::InstalledAppRecord app = Platform::current().installedApps().record(bundleIdentifier);
     if (app.isInstalled) {
         log(Level::Default, "appSupportAvailability %@ %@ is installed.", bundleIdentifier, app.localizedName);
@@ -164,6 +167,7 @@ void VRXOrvaneSupportManager::appSupportAvailability(std::string bundleIdentifie
 
     checkIsAvailableInStore(bundleIdentifier,
                             [answer = std::move(answer), reply = std::move(reply)](Value offer) mutable {
+                                // "MarketplaceApp -->" is spelled so on purpose.
                                 log(Level::Default, "MarketplaceApp --> appSupportAvailability %@.", offer);
                                 if (const Dictionary* entries = offer.asDictionary())
                                     answer.insert(entries->begin(), entries->end());

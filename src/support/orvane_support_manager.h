@@ -17,12 +17,14 @@ class VRXOrvaneSupportManager final : public VRXSupportManaging {
 public:
     using Reply = platform::OnceCallback<platform::Value>;
 
-    // Whether the Marketplace offers the application. Null when the lookup failed; replies on any thread.
+    // Whether the Marketplace offers the application. Replies null when the lookup failed, on any thread.
     void checkIsAvailableInStore(std::string bundleIdentifier, Reply reply) override;
-    // Installed, else purchased, else offered. Holds the calling thread while the purchases are asked for.
+    // Whether the application is installed, else purchased, else offered. Blocks the calling thread while it asks for
+    // the purchases.
     void appSupportAvailability(std::string bundleIdentifier, Reply reply) override;
 
-    // Whether the user's account has bought it: what is known within 5 seconds, for which the calling thread waits.
+    // Whether the user's account has bought the application, as far as that is known within 5 seconds, for which the
+    // calling thread waits.
     platform::Dictionary checkAppIsPurchased(const std::string& bundleIdentifier) const;
 };
 

@@ -25,7 +25,7 @@ constexpr std::string_view escapedKeyPrefix = "$x";
 constexpr const char* dateTag = "$date";
 constexpr const char* stringTag = "$string";
 
-// Values in a reply: a list holds a document for each device.
+// Values in a reply. A list holds a document for each device.
 constexpr std::size_t replyValues = 10 * platform::limits::documentValues;
 
 std::string escapedKey(std::string_view key) {
@@ -45,7 +45,7 @@ std::optional<unsigned> hexDigit(char digit) {
     return std::nullopt;
 }
 
-// The key behind an escaped one; nothing when it is not what escapedKey() makes.
+// The key that was escaped; null when escapedKey() does not make such a text.
 std::optional<std::string> unescapedKey(std::string_view escaped) {
     std::string_view digits = escaped.substr(escapedKeyPrefix.size());
     if (digits.size() % 2 != 0) return std::nullopt;
@@ -69,12 +69,12 @@ bool isLeftOut(const Value& value) {
     return value.isNull() || value.type() == Value::Type::Data;
 }
 
-// Appends values to a message; each step gives a negative errno when it fails.
+// Appends values to a message. Each step returns a negative errno when it fails.
 class Writer {
 public:
     explicit Writer(sd_bus_message* message) : message_(message) {}
 
-    // An array of dictionary entries.
+    // Appends an array of dictionary entries.
     template <class Entries>
     int dictionary(Entries appendEntries) {
         if (int r = sd_bus_message_open_container(message_, 'a', "{sv}"); r < 0) return r;
@@ -90,6 +90,7 @@ public:
     }
 
 private:
+    // Each value is a variant that names its own type, so that the reader needs no other description.
     int variant(const Value& value, int depthLeft) {
         switch (value.type()) {
             case Value::Type::Bool: {
@@ -134,7 +135,7 @@ private:
         return inside(type, [&] { return sd_bus_message_append_basic(message_, type[0], value); });
     }
 
-    // A struct of the tag and what it says of the content.
+    // Appends a struct of the tag and the content.
     template <class Append>
     int tagged(const char* signature, const char* tag, Append append) {
         return inside(signature, [&] {
@@ -172,12 +173,12 @@ private:
     sd_bus_message* const message_;
 };
 
-// Why a message is no reply. Never leaves this file.
+// Why a message is not a reply. It never leaves this file.
 struct Malformed {
     const char* text;
 };
 
-// Reads values from a message, which sd-bus has checked to be well-formed D-Bus when it came; throws Malformed.
+// Reads values from a message, which sd-bus has checked to be well-formed when it arrived. Throws Malformed.
 class Reader {
 public:
     explicit Reader(sd_bus_message* message) : message_(message) {}
@@ -195,7 +196,7 @@ public:
     }
 
 private:
-    // Whether there was one more to enter.
+    // Enters the next container; false when there is none left.
     bool enter(char type, const char* content) {
         int r = sd_bus_message_enter_container(message_, type, content);
         if (r < 0) throw Malformed{"a container is not of the type that belongs there"};
@@ -283,7 +284,7 @@ private:
             std::string key = unescaped(name);
             const std::size_t before = entries.size();
             Value value = variant(depthLeft - 1);
-            // Keys come in order, as a rule.
+            // Keys usually come in order.
             entries.emplace_hint(entries.end(), std::move(key), std::move(value));
             if (entries.size() == before) throw Malformed{"a key stands twice in a dictionary"};
             exit();
@@ -314,7 +315,7 @@ Result<Value> readReply(sd_bus_message* message) {
     try {
         return Reader(message).reply();
     } catch (const Malformed& malformed) {
-        return Error{"wire", EBADMSG, malformed.text};
+        return Error{platform::error_domain::wire, EBADMSG, malformed.text};
     }
 }
 
@@ -322,7 +323,7 @@ bool isCarriedAsString(std::string_view bytes) {
     constexpr std::uint64_t ones = 0x0101010101010101u;
     constexpr std::uint64_t highs = 0x8080808080808080u;
     while (!bytes.empty()) {
-        // Eight bytes at once, as long as they are plain ASCII without NUL.
+        // Eight bytes at a time, as long as they are plain ASCII without NUL.
         if (bytes.size() >= 8) {
             std::uint64_t eight;
             std::memcpy(&eight, bytes.data(), 8);

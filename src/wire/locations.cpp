@@ -31,7 +31,7 @@ std::string userHome(const Surroundings& surroundings) {
 
 Location findHome(const LocationOverrides& overrides, const Surroundings& surroundings) {
     if (overrides.home) return {*overrides.home, "--home"};
-    // systemd separates several with colons; the first is the agent's.
+    // systemd separates several folders with colons; the first is the agent's.
     if (auto state = absoluteVariable(surroundings, "STATE_DIRECTORY"))
         return {state->substr(0, state->find(':')), "$STATE_DIRECTORY"};
     if (auto state = absoluteVariable(surroundings, "XDG_STATE_HOME"))

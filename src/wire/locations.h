@@ -1,5 +1,5 @@
-// Where things are: the agent's home, its device profile and its socket. Every program finds them here, so that they
-// find each other. Any thread may ask.
+// Where the agent's home, its device profile and its socket are. All programs find them here, and so find each other.
+// Any thread may ask.
 #pragma once
 
 #include <functional>
@@ -8,7 +8,7 @@
 
 namespace vrx::wire {
 
-// What the command line says: --home, --device, --socket.
+// What the command line names: --home, --device, --socket.
 struct LocationOverrides {
     std::optional<std::string> home = {};
     std::optional<std::string> profile = {};
@@ -22,23 +22,24 @@ struct Location {
 
 struct Locations {
     Location home;
-    Location profile;  // an empty path when there is none: the bare machine's facts hold
+    Location profile;  // the path is empty when there is none: the machine's own facts then hold
     Location socket;
 };
 
-// What the choice depends on. The defaults are this process's.
+// What the choice depends on. ofProcess() returns this process's.
 struct Surroundings {
-    std::function<std::optional<std::string>(const char* name)> variable;  // an environment variable, if set
+    // An environment variable; null when it is not set.
+    std::function<std::optional<std::string>(const char* name)> variable;
     std::function<bool(const std::string& path)> exists;
     static Surroundings ofProcess();
 };
 
 //     home     --home, else $STATE_DIRECTORY, else $XDG_STATE_HOME/vrxagent, else ~/.local/state/vrxagent
-//     profile  --device, else $XDG_CONFIG_HOME/vrxagent/device.toml, else /etc/vrxagent/device.toml, of these the first
-//              that exists, else none
+//     profile  --device, else the first that exists of $XDG_CONFIG_HOME/vrxagent/device.toml and
+//              /etc/vrxagent/device.toml, else none
 //     socket   --socket, else in $XDG_RUNTIME_DIR, else in /run/vrxagent if that exists, else in the home
 //
-// A variable that is empty or no absolute path counts as not set. Overrides are taken as they are.
+// A variable that is empty or not an absolute path counts as not set. Overrides are taken as they are.
 Locations findLocations(const LocationOverrides& overrides = {},
                         const Surroundings& surroundings = Surroundings::ofProcess());
 

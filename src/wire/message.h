@@ -1,4 +1,4 @@
-// A message of sd-bus, held. One thread uses it and its bus.
+// Owns a message of sd-bus. A message and its bus belong to one thread.
 #pragma once
 
 #include <systemd/sd-bus.h>

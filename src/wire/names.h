@@ -1,5 +1,5 @@
-// What the agent's service is called on the wire. It is spoken peer to peer over a Unix stream socket, in D-Bus's
-// protocol: one object with one interface, whose members are the operations of VRXAgentProtocol by their first keyword.
+// The names of the agent's service on the wire. It speaks D-Bus's protocol peer to peer over a Unix stream socket: one
+// object with one interface, whose members are the operations of VRXAgentProtocol by their first keyword.
 #pragma once
 
 #include <array>
@@ -23,7 +23,7 @@ inline constexpr const char* replySignature = "a{sv}";
 struct Operation {
     const char* member;
     const char* signature;
-    const char* argumentNames;  // each ends with a NUL, the last with two; then the reply's
+    const char* argumentNames;  // each ends with a NUL, the last with two; the reply's is the last
 };
 
 enum class OperationIndex {
@@ -56,10 +56,10 @@ constexpr const Operation& operation(OperationIndex index) {
     return operations[static_cast<std::size_t>(index)];
 }
 
-// Error names: of the bus where it has one that fits.
+// Names of errors: the bus's own where one fits.
 inline constexpr const char* accessDenied = "org.freedesktop.DBus.Error.AccessDenied";      // not entitled
-inline constexpr const char* limitsExceeded = "org.freedesktop.DBus.Error.LimitsExceeded";  // too much at a time
+inline constexpr const char* limitsExceeded = "org.freedesktop.DBus.Error.LimitsExceeded";  // too much at the same time
 inline constexpr const char* invalidArguments = "org.freedesktop.DBus.Error.InvalidArgs";
-inline constexpr const char* noReply = "org.freedesktop.DBus.Error.NoReply";  // the agent gave the request up
+inline constexpr const char* noReply = "org.freedesktop.DBus.Error.NoReply";  // the agent dropped the request
 
 }  // namespace vrx::wire

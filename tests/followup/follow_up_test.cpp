@@ -120,8 +120,8 @@ TEST_F(FollowUpTest, APostWaitsForItsDate) {
         a->device()->setActivationDate(date(activated));
         const PostDecision decision = decidePost(*a, {.outreachDelay = Duration(2 * day)}, host.clock);
         EXPECT_EQ(decision.reason, postDate > 0 ? PostReason::DueLater : PostReason::Due);
-        EXPECT_EQ(decision.postDate.value().date, date(postDate));
-        EXPECT_EQ(decision.postDate->isInitial, isInitial);
+        EXPECT_EQ(decision.dueDate.value().date, date(postDate));
+        EXPECT_EQ(decision.dueDate->isInitial, isInitial);
     }
 }
 
@@ -182,7 +182,7 @@ TEST_F(FollowUpTest, PostsWhatIsDue) {
     EXPECT_THAT(host.log.messages(),
                 testing::IsSupersetOf({"Device eligible with future post date. Cannot post followup for " +
                                            c->device()->description() + " on: 2026-02-01 12:00:00 +0000",
-                                       std::string("Posted follow-up: serialNumber:A -> failed to post (followup 5)"),
+                                       std::string("Posted follow-up: serialNumber:A -> failed to post (follow-up 5)"),
                                        std::string("Failed to post follow-up:<Missing serial number>")}));
     EXPECT_EQ(host.defaults.get(postedSerialNumberHashesKey), Value(Array{sha256Hash("D")}));
 
@@ -208,7 +208,7 @@ TEST_F(FollowUpTest, RefreshesRemovalsFirstThenUpdatesThenReposts) {
     // A refresh of one device leaves the others alone, and posts nothing that is not there.
     host.followUps.fail(Request::Post);
     EXPECT_THAT(VRXFollowUp().refreshFollowupWithDeviceInfo(a, false), ElementsAre(a)) << "though the post failed";
-    EXPECT_EQ(host.log.messages().back(), "Updated follow-up: failed to post (followup 5)");
+    EXPECT_EQ(host.log.messages().back(), "Updated follow-up: failed to post (follow-up 5)");
     for (const auto& other : {info("D", offer()), unknown})
         EXPECT_THAT(VRXFollowUp().refreshFollowupWithDeviceInfo(other, false), IsEmpty());
     // What cannot be listed is not known. What is to go goes all the same.
@@ -230,7 +230,7 @@ TEST_F(FollowUpTest, RemembersWhatWasDismissed) {
     host.defaults.set(dismissedSerialNumberHashesKey, "no list");
     host.followUps.fail(Request::Clear);
     VRXFollowUp().dismissFollowUpForSerialNumber("A");
-    EXPECT_EQ(host.log.messages().back(), "Dismissed follow-up: failed to clear (followup 5)");
+    EXPECT_EQ(host.log.messages().back(), "Dismissed follow-up: failed to clear (follow-up 5)");
     EXPECT_EQ(host.defaults.get(dismissedSerialNumberHashesKey), Value("no list"));
     for (int i = 0; i < 2; ++i) VRXFollowUp().dismissFollowUpForSerialNumber("A");
     EXPECT_EQ(host.defaults.get(dismissedSerialNumberHashesKey), Value(Array{sha256Hash("A"), sha256Hash("A")}));
@@ -254,10 +254,10 @@ TEST_F(FollowUpTest, MigratesTheOneItemOfTheOlderLayout) {
     EXPECT_EQ(migrate({itemOf("B")}, a), "list -> B");
     for (const auto& [failing, after, line] :
          {std::tuple(Request::List, std::string("list -> com.orvane.Vireo"),
-                     "Error loading pending follow-ups: failed to list (followup 5)"),
-          {Request::Post, moving, "Error posting migrated follow-up: failed to post (followup 5)"},
+                     "Error loading pending follow-ups: failed to list (follow-up 5)"),
+          {Request::Post, moving, "Error posting migrated follow-up: failed to post (follow-up 5)"},
           {Request::Clear, moving + " com.orvane.Vireo A",
-           "Error clearing legacy follow-up: failed to clear (followup 5)"}}) {
+           "Error clearing legacy follow-up: failed to clear (follow-up 5)"}}) {
         host.followUps.fail(failing);
         EXPECT_EQ(migrate({legacy}, a), after);
         EXPECT_EQ(host.log.messages(Level::Error).back(), line);

@@ -1,4 +1,4 @@
-// ICU, opened when a number or a time zone is first asked for: with its data it would be most of a small process.
+// ICU, opened when a number or a time zone is first asked for: its data would make up most of a small process.
 #pragma once
 
 #include <unicode/uvernum.h>
@@ -7,7 +7,7 @@
 
 namespace vrx::codec {
 
-// The library of the headers' version, whose functions all carry it at the end of their names.
+// The library in the version of the headers. All its functions carry that version at the end of their names.
 inline const LazyLibrary& icu() {
     static const LazyLibrary library("libicui18n.so." U_ICU_VERSION_SHORT,
                                      "_" + std::to_string(U_ICU_VERSION_MAJOR_NUM));

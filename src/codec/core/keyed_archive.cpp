@@ -16,10 +16,10 @@ using platform::Value;
 
 namespace {
 
-// A document's containers within objects within a list: an info in a list, a record in the info.
+// The depth of a document, within a record, within an info, within a list.
 constexpr int archiveDepth = platform::limits::documentDepth + 4;
 
-// What begins with it is ours: the class, and escaped keys.
+// Keys that begin with it belong to the archive: the class, and escaped keys.
 constexpr char reserved = '$';
 
 bool isLeftOut(const Value& value) {
@@ -32,7 +32,7 @@ bool hasReservedKey(const Dictionary& dictionary) {
     return first != dictionary.end() && first->first.starts_with(reserved);
 }
 
-// Whether a value stands in the archive as it is. One pass, and nothing is made.
+// Whether a value is archived unchanged. One pass, which makes nothing.
 bool isArchivedAsIs(const Value& value) {
     if (const Array* elements = value.asArray()) return std::ranges::all_of(*elements, isArchivedAsIs);
     if (const Dictionary* entries = value.asDictionary())
@@ -64,7 +64,8 @@ private:
     Dictionary entries_;
 };
 
-// Finds what no archived value can hold: an object, or another unescaped key. Says whether there are escaped ones.
+// Looks for what an archived value cannot hold: an object, or another unescaped key. Also says whether there are
+// escaped keys.
 enum class ReservedKeys { None, Escaped, Foreign };
 ReservedKeys reservedKeys(const Value& value) {
     auto found = ReservedKeys::None;
@@ -96,7 +97,7 @@ Value withoutEscapes(const Value& value) {
     return value;
 }
 
-// What stands in a rejected archive, for people: the class of an object, the kind of another value.
+// What was found in a rejected archive, for people: the class of an object, the kind of another value.
 std::string kindOf(const Value& value) {
     switch (value.type()) {
         case Value::Type::Null: return "a null";
@@ -170,7 +171,7 @@ bool isTooDeep(const Value& archive, Rejection& rejection) {
 void Rejection::note(const std::string& place, const std::string& reason) {
     if (error_) return;
     const std::string where = place.empty() ? "the root" : "key \"" + place + "\"";
-    error_ = platform::Error{"archive", EBADMSG, "archive rejected at " + where + ": " + reason};
+    error_ = platform::Error{platform::error_domain::archive, EBADMSG, "archive rejected at " + where + ": " + reason};
 }
 
 const platform::Error& Rejection::error() {

@@ -1,8 +1,8 @@
 // Keyed archives as property values: how records cross the IPC boundary. Any thread may call.
 //
-// An archived object is a dictionary of its keys, with the name of its class under "$class". Values that objects hold
-// are data of others, such as a server: in their dictionaries a key that begins with "$" gets one more in front, so
-// that no data can pass for an object. Nulls and data, which decoding refuses, are left out of values.
+// An archived object is a dictionary of its keys, with the name of its class under "$class". The values in objects come
+// from others, such as a server. In their dictionaries a key that begins with "$" gets a second one in front, so that
+// no value can pass for an object. Nulls and data are left out of values, because decoding refuses them.
 #pragma once
 
 #include <memory>
@@ -30,17 +30,18 @@ platform::Value archive(const std::vector<std::shared_ptr<T>>& objects) {
     return list;
 }
 
-// A value on its own, as it stands within an object. Shares what needs no change. Null for a null and for data.
+// A value by itself, archived as within an object. It shares what needs no change. Null for a null and for data.
 platform::Value archiveValue(const platform::Value& value);
-// An error for what is not allowed, at any depth, and for an object in it.
+// The value in an archive. Anything that is not allowed, at any depth, is an error, and so is an object.
 platform::Result<platform::Value> unarchiveValue(const platform::Value& archive, platform::AllowedKinds allowed);
 
-// What rejected an archive first, with the keys that lead to it. Shared by the decoders of an archive.
+// The first reason for which an archive was rejected, with the keys that lead to the place. The decoders of an archive
+// share one.
 class Rejection {
 public:
     // The place is empty at the root.
     void note(const std::string& place, const std::string& reason);
-    // For an object whose class refused to be made, when no reason was noted.
+    // The first reason; a general one if the class refused to make an object without a reason.
     const platform::Error& error();
 
 private:
@@ -49,7 +50,8 @@ private:
 
 class KeyedUnarchiver final : public platform::KeyedDecoder {
 public:
-    // Decodes an object of exactly that class; any other value rejects at once. Refers to archive and rejection.
+    // Decodes an object of exactly that class; any other value rejects at once. Archive and rejection must outlive
+    // this.
     KeyedUnarchiver(const platform::Value& archive, std::string_view className, std::string place,
                     Rejection& rejection);
 
@@ -66,10 +68,10 @@ private:
     Rejection& rejection_;
 };
 
-// Whether an archive is nested deeper than one that was made here; noted when it is.
+// Whether an archive is nested deeper than any that is made here; if so, notes that.
 bool isTooDeep(const platform::Value& archive, Rejection& rejection);
 
-// The object of exactly class T; null when the archive does not make one. Anything that the class does not admit
+// The object of exactly class T; null when the class makes none of the archive. Anything that the class does not admit
 // rejects the whole archive, and the error names key and class.
 template <class T>
 platform::Result<std::shared_ptr<T>> unarchive(const platform::Value& archive) {
@@ -81,7 +83,7 @@ platform::Result<std::shared_ptr<T>> unarchive(const platform::Value& archive) {
     return object;
 }
 
-// A list of objects, each of exactly class T. One that does not make an object rejects the list.
+// A list of objects, each of exactly class T. An element that makes no object rejects the list.
 template <class T>
 platform::Result<std::vector<std::shared_ptr<T>>> unarchiveList(const platform::Value& archive) {
     Rejection rejection;

@@ -1,5 +1,5 @@
-// A shared library that is opened when its first function is asked for, and stays open: what a process may never need
-// costs it nothing. Any thread may ask.
+// A shared library that is opened when its first function is asked for, and stays open. A process that never needs it
+// does not pay for it. Any thread may ask.
 #pragma once
 
 #include <mutex>
@@ -9,7 +9,7 @@ namespace vrx::codec {
 
 class LazyLibrary {
 public:
-    // A function, which becomes the type that it is put into; null when it is not there.
+    // A function, which converts to the type of the pointer that takes it; null when it is missing.
     class Function {
     public:
         explicit Function(void* address) : address_(address) {}
@@ -22,20 +22,19 @@ public:
         void* address_;
     };
 
-    // The library's file name, found where the linker would find it. What its functions are called ends with the
-    // suffix.
+    // The library's file name, which is looked up as the linker does. The suffix ends the names of its functions.
     explicit LazyLibrary(std::string fileName, std::string suffix = "")
         : fileName_(std::move(fileName)), suffix_(std::move(suffix)) {}
     LazyLibrary(const LazyLibrary&) = delete;
     LazyLibrary& operator=(const LazyLibrary&) = delete;
 
-    // By its name:
+    // A function by its name:
     //     decltype(&::unum_open) open = icu().function("unum_open");
     Function function(const char* name) const;
-    // As function(), for one that some releases of the library do not have: its absence is nothing missing.
+    // Like function(), for a function that some releases of the library lack: missing() does not report it.
     Function optionalFunction(const char* name) const;
 
-    // What was not there, the library or the first such function, as a text that names it; empty when all was.
+    // A text that names what was missing first, the library or a function; empty when nothing was.
     std::string missing() const;
 
 private:

@@ -49,8 +49,8 @@ Format openFormat(const char* locale) {
     return U_SUCCESS(status) ? std::move(format) : nullptr;
 }
 
-// For a language it does not know, the library turns to that of the process's environment, and does not say so. It may
-// also answer with the present name of a language that was asked for by an old one.
+// For an unknown language, the library silently uses the language of the process's environment. For the old name of a
+// language it may answer with the present one.
 bool isOfEnvironment(const Format& format, const std::string& locale) {
     UErrorCode status = U_ZERO_ERROR;
     const char* valid = functions().getLocale(static_cast<UNumberFormat*>(format.get()), ULOC_VALID_LOCALE, &status);
@@ -77,8 +77,8 @@ std::string text(const Format& format, std::uint64_t number) {
     return utf8FromUtf16({units, static_cast<std::size_t>(length)}).value_or(digits);
 }
 
-// The format that was used last: opening one takes ten times as long as using it, and it is nearly always the same
-// language again.
+// The format that was used last: opening one takes ten times as long as using it, and nearly always the same language
+// comes again.
 struct LastFormat {
     std::mutex mutex;
     std::string locale;
@@ -88,7 +88,7 @@ struct LastFormat {
 }  // namespace
 
 std::string decimalText(std::uint64_t number, const std::string& locale) {
-    static LastFormat& last = *new LastFormat;  // never taken down: threads may use it while the process ends
+    static LastFormat& last = *new LastFormat;  // never destroyed: threads may use it while the process ends
     std::lock_guard lock(last.mutex);
     if (!last.format || last.locale != locale) {
         last.format = formatFor(locale);

@@ -28,7 +28,7 @@ namespace {
 constexpr double secondsOfDay = 86400.0;
 constexpr std::string_view dictionaryRepresentationKey = "DictionaryRepresentation";
 
-// A number of days; what is none, or beyond all numbers, counts as 0.
+// A value, read as a number of days; 0 when the result is not finite.
 Duration daysFrom(const Value& value) {
     double seconds = platform::numberFromValue(value) * secondsOfDay;
     return Duration(std::isfinite(seconds) ? seconds : 0);
@@ -60,7 +60,7 @@ struct Objects {
     const Value& benefitsCard;
 };
 
-// One row of the mapping: where a field stands in the dictionary. The rule by which it is read follows from its type.
+// One row of the mapping from the dictionary to the fields. The type of the field decides how its value is read.
 using Fields = VRXWarranty::Fields;
 
 struct Row {
@@ -82,6 +82,7 @@ constexpr Row asSent(Object object, std::string_view key, Value Fields::*field) 
     return {object, key, field};
 }
 
+// The keys are the server's and are spelled so on purpose: "Qx" beside "qx", and one key that fills two fields.
 // clang-format off
 constexpr auto rows = std::to_array<Row>({
     flag(Object::Root, "covered", &Fields::covered),
@@ -226,7 +227,7 @@ Value VRXWarranty::textForDaysEligible(const Value& singular, const Value& plura
         reportFormat();
         return nullptr;
     }
-    // A format carries one placeholder; whatever else it holds, a further one included, is shown as it stands.
+    // Only the first placeholder is filled. The rest of the format, a further placeholder included, is shown as it is.
     return platform::filled(*format, {Platform::current().locale().decimalText(count)});
 }
 

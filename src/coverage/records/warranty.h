@@ -1,6 +1,7 @@
 // A device's coverage record: the server's answer for one serial number, and the typed fields read from it once, at
-// construction. Shared by reference, and the agent does not change it after construction; derived texts and day counts
-// are computed on each read, from the clock. Any thread may read and write it, a field at a time.
+// construction. Shared by reference, and the agent does not change it after construction. Derived texts and day counts
+// are computed on each read, from the clock. Any thread may read or replace a field.
+// A leading "_" is spelled so on purpose; "Names" in docs/architecture.md says why.
 #pragma once
 
 #include <cstdint>
@@ -24,9 +25,9 @@ class VRXWarranty final : public platform::Archivable {
 public:
     static constexpr std::string_view archiveClassName = "VRXWarranty";
 
-    // The record of a coverage dictionary; null when there is no dictionary. Whatever the dictionary holds makes a
-    // record: a date or an object of an unexpected type reads as an absent one. The serial number is not kept: a record
-    // is the same whether built from an answer, a cache file or an archive, and only the first would know it.
+    // The record of a coverage dictionary; null when the value is not a dictionary. Every dictionary makes a record: a
+    // date or an object of an unexpected type reads as null. The serial number is not kept, because a record that is
+    // built from a cache file or an archive could not know it.
     static std::shared_ptr<VRXWarranty> warrantyWithDictionary(const Value& dictionary);
     static std::shared_ptr<VRXWarranty> warrantyWithDictionary(const Value& dictionary,
                                                                const std::optional<std::string>& serialNumber);
@@ -38,13 +39,15 @@ public:
     Value dictionaryRepresentation() const { return get(&Fields::dictionaryRepresentation); }
     void setDictionaryRepresentation(Value value) { set(&Fields::dictionaryRepresentation, std::move(value)); }
 
-    // Texts, lists and objects stand as the server sent them, of whatever type they are; null when it sent none.
+    // Texts, lists and objects are as the server sent them, whatever their type; null when it sent none.
+
     // The coverage.
     bool covered() const { return get(&Fields::covered); }
     void setCovered(bool value) { set(&Fields::covered, value); }
     std::optional<Date> coverageEndDate() const { return get(&Fields::coverageEndDate); }
     void setCoverageEndDate(std::optional<Date> value) { set(&Fields::coverageEndDate, std::move(value)); }
-    // Never filled by the agent; nor are localizedCoverageDetailsLabel, its Value, and the two keys of a benefit below.
+    // The agent never fills this field, nor localizedCoverageDetailsLabel, localizedCoverageDetailsValue,
+    // localizedBenefitLabelKey and localizedBenefitValueKey below.
     std::optional<Date> coverageValidityDate() const { return get(&Fields::coverageValidityDate); }
     void setCoverageValidityDate(std::optional<Date> value) { set(&Fields::coverageValidityDate, std::move(value)); }
     Value localizedCoveredDeviceDateLabelFormat() const { return get(&Fields::localizedCoveredDeviceDateLabelFormat); }
@@ -208,18 +211,18 @@ public:
 
     // Whole days until the offer ends, rounded up: 1 in its last 24 hours, 0 once it has ended or when it has no end.
     std::uint32_t daysEligible() const;
-    // The same of an offer that ends at a date, seen from now. A day that does not last longer than 0 lasts 86400 s.
+    // The same for an offer that ends at a date, counted from now. A day of 0 seconds or less counts as 86400.
     static std::uint32_t daysEligible(const std::optional<Date>& until, Duration day, Date now);
-    // The texts that count those days: the singular as the server sent it for one day or none, else the plural format
-    // with the number in the user's locale; null when the format is no string.
+    // The texts that name those days: the server's singular text for at most one day, else its plural format, filled
+    // with the number in the user's locale. Null when the format is not a string.
     Value qxLocalizedOfferDesc() const;
     Value qxLocalizedOfferDetailsEligibility() const;
 
-    // The date of a server's number of seconds or, above ten thousand million, milliseconds since 1970. Nothing for
-    // what is no number, negative or not finite.
+    // The date that lies so many seconds after 1970 or, above ten thousand million, so many milliseconds. Null when the
+    // value is not a number, is negative or is not finite.
     static std::optional<Date> _dateWithEpochNumber(const Value& number);
 
-    // Equal dictionaries; an object of another class is equal only to itself.
+    // Whether the dictionaries are equal. An object of another class is never equal.
     bool isEqual(const platform::Archivable* other) const;
     std::string description() const { return dictionaryRepresentation().description(); }
 
@@ -228,19 +231,22 @@ public:
     void encodeWithCoder(platform::KeyedEncoder& coder) const override;
     static std::shared_ptr<VRXWarranty> initWithCoder(platform::KeyedDecoder& coder);
 
-    // The cache of records on disk, a file for each serial number; without a serial number, the one file of the older
-    // single-device layout. No operation tells of a failure: what cannot be written leaves the earlier file, what
-    // cannot be read is no record.
+    // The cache of records on disk: a file for each serial number or, without a serial number, the one file of the
+    // older single-device layout. No operation reports a failure: a failed write keeps the earlier file, and a file
+    // that cannot be read reads as null.
+    // These need facilities that only the agent has, so they are defined in the agent's own layer
+    // (coverage/warranty_cache.cpp): a client program that calls one of them does not link.
     static std::string _legacyWarrantyPath();
     static std::string _warrantyPathForSerialNumberFormat();  // with a "%@" for the serial number's hash
     void cacheWarranty(const std::optional<std::string>& serialNumber) const;
     void cache() const { cacheWarranty(std::nullopt); }
     static std::shared_ptr<VRXWarranty> cachedWarrantyForSerialNumber(const std::optional<std::string>& serialNumber);
-    // Moves the file and metadata of the older layout to the serial number and gives the record; null, with nothing
-    // touched, when there is no such record or no serial number to move it to.
+    // Moves the file and metadata of the older layout to the serial number and returns the record. Returns null and
+    // changes nothing when there is no such record or no serial number to move it to.
     static std::shared_ptr<VRXWarranty> migrateLegacyCachedWarrantyIfNeededForSerialNumber(
         const std::optional<std::string>& serialNumber);
 
+    // The fields by the names of their properties; public for the table in warranty.cpp.
     struct Fields {
         bool covered = false;
         std::optional<Date> coverageEndDate;

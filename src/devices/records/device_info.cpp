@@ -19,7 +19,7 @@ std::shared_ptr<VRXDeviceInfo> VRXDeviceInfo::deviceInfoWithDevice(std::shared_p
 
 bool VRXDeviceInfo::isEqual(const platform::Archivable* other) const {
     const auto* info = dynamic_cast<const VRXDeviceInfo*>(other);
-    if (!info) return false;  // this object is a VRXDeviceInfo, so the other is not this very one
+    if (!info) return false;  // of another class
     auto otherDevice = info->device();
     auto otherWarranty = info->warranty();
     return otherDevice && otherDevice == device() && otherWarranty && otherWarranty->isEqual(warranty().get());

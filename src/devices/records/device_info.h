@@ -1,5 +1,5 @@
-// A device with its coverage record, either of which may be absent: what crosses the IPC boundary and reaches
-// activities and follow-ups. Shared by reference; each property is read and replaced whole, from any thread.
+// A device with its coverage record, either of which may be null: what crosses the IPC boundary and reaches activities
+// and follow-ups. Shared by reference; each property is read and replaced whole, from any thread.
 #pragma once
 
 #include <memory>
@@ -21,13 +21,12 @@ public:
 
     std::shared_ptr<VRXDevice> device() const { return device_.get(); }
     void setDevice(std::shared_ptr<VRXDevice> device) { device_.set(std::move(device)); }
-    // Null, which is usual, when no record was cached or downloaded.
+    // Null when no record was cached or downloaded, which is usual.
     std::shared_ptr<VRXWarranty> warranty() const { return warranty_.get(); }
     void setWarranty(std::shared_ptr<VRXWarranty> warranty) { warranty_.set(std::move(warranty)); }
 
-    // The same device object and equal records. Infos that lack a device or a record are not equal, not even to
-    // themselves: there is nothing by which to tell. An object of another class is equal only if it is this very
-    // object.
+    // Whether both infos hold the same device object and equal records. An info that lacks its device or its record
+    // equals none, not even itself. An object of another class is never equal.
     bool isEqual(const platform::Archivable* other) const;
     std::string description() const;
 

@@ -182,7 +182,7 @@ MaybeError statusError(int status) {
 }  // namespace
 
 Error credentialError(CredentialFailure failure, std::string text) {
-    return Error{"credential", static_cast<int>(failure), std::move(text)};
+    return Error{platform::error_domain::credential, static_cast<int>(failure), std::move(text)};
 }
 
 // Closes its own copy of the pipe's writing end, so that the output ends when the helper and its children do.

@@ -61,7 +61,7 @@ FileCalls& FileCalls::system() {
 }
 
 Error systemError(const std::string& what, const std::string& path, int number) {
-    return Error{"system", number, "cannot " + what + " " + path + ": " + std::strerror(number)};
+    return Error{platform::error_domain::system, number, "cannot " + what + " " + path + ": " + std::strerror(number)};
 }
 
 namespace {

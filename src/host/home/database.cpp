@@ -292,7 +292,7 @@ std::shared_ptr<Database::Opening> Database::opening(MaybeError& error) {
         lastFailure_.clear();
         return opening_;
     } catch (const DatabaseError& failure) {
-        error = Error{"database", failure.code, "cannot open " + path_ + ": " + failure.what()};
+        error = Error{platform::error_domain::database, failure.code, "cannot open " + path_ + ": " + failure.what()};
         if (std::exchange(lastFailure_, error->text) != error->text) log(Level::Error, "%@", error->text);
         return nullptr;
     }
@@ -386,7 +386,7 @@ Error Database::failed(const std::shared_ptr<Opening>& opening, const DatabaseEr
         std::lock_guard lock(mutex_);
         if (opening_ == opening) opening_.reset();
     }
-    return Error{"database", error.code, path_ + ": " + error.what()};
+    return Error{platform::error_domain::database, error.code, path_ + ": " + error.what()};
 }
 
 // A statement left unfinished would block COMMIT and ROLLBACK, so all are ended first.
@@ -418,7 +418,8 @@ MaybeError Database::write(const std::function<void(Connection&)>& body) {
     std::lock_guard lock(writing_);
     MaybeError error;
     std::shared_ptr<Opening> current = opening(error);
-    if (current && !current->writer) error = Error{"database", SQLITE_READONLY, path_ + ": is only looked at"};
+    if (current && !current->writer)
+        error = Error{platform::error_domain::database, SQLITE_READONLY, path_ + ": is only looked at"};
     return error ? error : transaction(*current->writer, current, "BEGIN IMMEDIATE", body);
 }
 

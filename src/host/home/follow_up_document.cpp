@@ -132,7 +132,7 @@ Result<FollowUpItem> followUpFromDocument(const Value& document) {
     try {
         return itemFrom(document);
     } catch (const Mistake& mistake) {
-        return Error{"follow-up", 0, mistake.what()};
+        return Error{platform::error_domain::followUp, 0, mistake.what()};
     }
 }
 

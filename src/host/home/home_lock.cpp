@@ -63,7 +63,8 @@ MaybeError HomeLock::take(const std::string& home) {
     if (fcntl(file.number(), F_OFD_SETLK, &lock) != 0) {
         const int number = errno;
         if (number != EWOULDBLOCK) return systemError("lock", path, number);
-        return Error{"system", number, "another agent" + ownerIn(file.number()) + " uses the home " + home};
+        return Error{platform::error_domain::system, number,
+                     "another agent" + ownerIn(file.number()) + " uses the home " + home};
     }
     // For people. The lock does not depend on it.
     const std::string owner = std::to_string(getpid()) + "\n";

@@ -53,7 +53,7 @@ std::chrono::steady_clock::time_point deadlineAfter(Duration timeout, Duration l
 }  // namespace
 
 Error httpError(int code, std::string text) {
-    return Error{"http", code, std::move(text)};
+    return Error{platform::error_domain::http, code, std::move(text)};
 }
 
 HttpResponse httpFailure(Error error) {

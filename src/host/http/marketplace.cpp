@@ -56,12 +56,13 @@ private:
 // The list under a key of an answer. An answer without it is an error.
 Result<platform::Array> listOf(const HttpResponse& response, const char* key) {
     if (response.error) return *response.error;
-    if (response.status != 200) return Error{"store", response.status, "status " + std::to_string(response.status)};
+    if (response.status != 200)
+        return Error{platform::error_domain::store, response.status, "status " + std::to_string(response.status)};
     const platform::Data body = response.body.value_or(platform::Data());
     Result<Value> root = Platform::current().json().parse({reinterpret_cast<const char*>(body.data()), body.size()});
     if (!root) return root.error();
     const platform::Array* list = (*root)[key].asArray();
-    if (!list) return Error{"store", 0, std::string("the answer holds no list of ") + key};
+    if (!list) return Error{platform::error_domain::store, 0, std::string("the answer holds no list of ") + key};
     return *list;
 }
 
@@ -98,7 +99,7 @@ public:
         const auto* bag = dynamic_cast<const Bag*>(bag_.get());
         if (!bag || !bag->lookupURL) {
             auto fail = [completion = std::move(completion)]() mutable {
-                completion(Error{"store", 0, "no store is configured"});
+                completion(Error{platform::error_domain::store, 0, "no store is configured"});
             };
             return Platform::current().queues().workers(platform::Priority::UserInitiated).post(std::move(fail));
         }

@@ -40,7 +40,7 @@ Result<BundleFile> readBundleFile(const std::string& folder) {
             file.entitlements = *valueOf(*entitlements).asDictionary();
         return file;
     } catch (const toml::parse_error& error) {
-        return Error{"bundle", EINVAL,
+        return Error{platform::error_domain::bundle, EINVAL,
                      path + ":" + std::to_string(error.source().begin.line) + ": " + std::string(error.description())};
     }
 }

@@ -350,7 +350,7 @@ private:
 std::optional<OpenToOthers> ProfileContent::findOpenToOthers() const {
     if (path.empty()) return std::nullopt;
     std::optional<OpenToOthers> open = host::findOpenToOthers(path, Links::Followed);
-    if (!open && wasOpenToOthers) open = {path, Error{"profile", EPERM, path + " could be changed by others"}};
+    if (!open && wasOpenToOthers) open = {path, Error{platform::error_domain::profile, EPERM, path + " could be changed by others"}};
     return open;
 }
 
@@ -367,9 +367,10 @@ Result<ProfileReading> parseProfile(std::string_view document, const std::string
         table.reportUnknown();
         return reading;
     } catch (const toml::parse_error& error) {
-        return Error{"profile", 0, place(error.source().begin.line) + std::string(error.description())};
+        return Error{platform::error_domain::profile, 0,
+                     place(error.source().begin.line) + std::string(error.description())};
     } catch (const ProfileError& error) {
-        return Error{"profile", 0, place(error.line) + error.text};
+        return Error{platform::error_domain::profile, 0, place(error.line) + error.text};
     }
 }
 

@@ -1,4 +1,4 @@
-#include "vrx/scheduling/activity_run.h"
+#include "vrx/scheduling/deferrable_run.h"
 
 #include "vrx/platform/platform.h"
 #include "vrx/platform/queue.h"
@@ -8,13 +8,13 @@ namespace vrx {
 
 namespace {
 
-// So long that no process sees a watch fire: a run ends by its work. Cutting runs off sooner is not wanted, as each
-// begins its downloads anew.
+// So long that no process lives to see a watch fire: a run ends by its work. Deferring it sooner would cost more than
+// it saves, because the next run starts its downloads from the beginning.
 constexpr platform::Duration deferralWatchInterval{2'000'000'000.0};
 
 }  // namespace
 
-std::shared_ptr<platform::RepeatingTimer> makeDeferralWatch(const std::shared_ptr<VRXScheduler>& scheduler,
+std::shared_ptr<platform::RepeatingTimer> makeDeferralTimer(const std::shared_ptr<VRXScheduler>& scheduler,
                                                             std::function<void()> defer) {
     return platform::RepeatingTimer::schedule(platform::Platform::current().queues().mainQueue(), deferralWatchInterval,
                                               [asked = std::weak_ptr(scheduler), defer = std::move(defer)] {
