@@ -21,7 +21,8 @@ bool isOwnedByOthers(const struct stat& status) {
 }
 
 OpenToOthers openToOthers(const std::string& path) {
-    return {path, Error{platform::error_domain::bundle, EPERM, path + " can be changed by others than root and the agent's user"}};
+    return {path, Error{platform::error_domain::bundle, EPERM,
+                        path + " can be changed by others than root and the agent's user"}};
 }
 
 OpenToOthers unknown(const std::string& path, int number) {

@@ -350,7 +350,8 @@ private:
 std::optional<OpenToOthers> ProfileContent::findOpenToOthers() const {
     if (path.empty()) return std::nullopt;
     std::optional<OpenToOthers> open = host::findOpenToOthers(path, Links::Followed);
-    if (!open && wasOpenToOthers) open = {path, Error{platform::error_domain::profile, EPERM, path + " could be changed by others"}};
+    if (!open && wasOpenToOthers)
+        open = {path, Error{platform::error_domain::profile, EPERM, path + " could be changed by others"}};
     return open;
 }
 
