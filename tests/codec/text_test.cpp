@@ -1,36 +1,12 @@
-// Digests and numbers as texts.
+// Numbers as texts.
 #include <gtest/gtest.h>
 
 #include <cstdlib>
-#include <thread>
 
 #include "vrx/codec/core/number_format.h"
-#include "vrx/codec/digest.h"
 
 namespace vrx::codec {
 namespace {
-
-std::string hexadecimal(const std::array<std::uint8_t, 32>& digest) {
-    std::string text;
-    for (std::uint8_t byte : digest) {
-        char digits[3];
-        std::snprintf(digits, sizeof digits, "%02x", byte);
-        text += digits;
-    }
-    return text;
-}
-
-TEST(Digest, GivesThePublishedDigestsOnAnyThread) {
-    const std::pair<std::string, const char*> messages[] = {
-        {"", "e3b0c44298fc1c149afbf4c8996fb92427ae41e4649b934ca495991b7852b855"},
-        {"abc", "ba7816bf8f01cfea414140de5dae2223b00361a396177a9cb410ff61f20015ad"},
-        {std::string(1'000'000, 'a'), "cdc76e5c9914fb9281a1c7e284d73e67f1809a48a497200e046d39ccc7112cd0"},
-    };
-    std::vector<std::thread> threads;
-    for (const auto& message : messages)
-        threads.emplace_back([&message] { EXPECT_EQ(hexadecimal(sha256(message.first)), message.second); });
-    for (std::thread& thread : threads) thread.join();
-}
 
 TEST(DecimalText, GroupsAsTheLocaleDoes) {
     struct {

@@ -1,18 +1,15 @@
 // What a request to the coverage server carries, and what becomes of it without account or token.
 #include "vrx/coverage/account_headers.h"
 
-#include <gtest/gtest.h>
-
-#include "vrx/sim/host.h"
+#include "support/simulated_host.h"
 
 namespace vrx {
 namespace {
 
 using platform::HttpRequest;
 
-struct AccountHeadersTest : testing::Test {
+struct AccountHeadersTest : public OnSimulatedHost {
     AccountHeadersTest() { host.accounts.tokens[service] = "OLD"; }
-    sim::Host host;
     const std::string service = "com.orvane.ks.supportapp.auth";
 };
 
@@ -82,7 +79,7 @@ TEST_F(AccountHeadersTest, OfferRequestsNeedNoAccount) {
 }
 
 TEST_F(AccountHeadersTest, TheBodyAsksForOneDeviceHereAndNow) {
-    host.clock.set(platform::dateFromEpoch(1735689600.9999));
+    host.clock.set(dateFromEpoch(1735689600.9999));
     host.clock.setTimeZoneOffset(-std::chrono::minutes(9 * 60 + 30));
     HttpRequest request;
     vrx_setCoverageRequestBodyWithSerialNumber(request, "S\"1");

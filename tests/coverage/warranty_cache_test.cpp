@@ -1,20 +1,14 @@
 // The cache of records on disk, and the move from the older single-device layout.
-#include <gtest/gtest.h>
-
 #include <cerrno>
 
+#include "support/simulated_host.h"
 #include "vrx/coverage/cache_metadata.h"
 #include "vrx/coverage/records/warranty.h"
-#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {
 
-using platform::dateFromEpoch;
-using platform::Dictionary;
-using platform::Value;
-
-class WarrantyCacheTest : public testing::Test {
+class WarrantyCacheTest : public OnSimulatedHost {
 protected:
     std::string pathOf(const std::string& serialNumber) const {
         return host.files.homeDirectory() + "/Library/Application Support/com.orvane.Vireo/" +
@@ -23,7 +17,6 @@ protected:
     static std::shared_ptr<VRXWarranty> record(Dictionary dictionary) {
         return VRXWarranty::warrantyWithDictionary(std::move(dictionary));
     }
-    sim::Host host;
 };
 
 TEST_F(WarrantyCacheTest, KeepsOneFileForEachSerialNumber) {
@@ -53,7 +46,7 @@ TEST_F(WarrantyCacheTest, WhatCannotBeWrittenLeavesTheEarlierFile) {
 }
 
 TEST_F(WarrantyCacheTest, AFileCutAnywhereIsNoRecord) {
-    record({{"covered", true}, {"texts", platform::Array{"a", "b"}}})->cacheWarranty("A");
+    record({{"covered", true}, {"texts", Array{"a", "b"}}})->cacheWarranty("A");
     std::string whole = *host.files.content(pathOf("A"));
     for (std::size_t length = 0; length < whole.size(); ++length) {
         host.files.put(pathOf("A"), whole.substr(0, length));

@@ -1,20 +1,15 @@
 // The inventory of this device and its watches.
 #include "vrx/devices/devices_manager.h"
 
-#include <gtest/gtest.h>
-
+#include "support/simulated_host.h"
 #include "vrx/devices/records/device.h"
-#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {
 
-using platform::dateFromEpoch;
-using platform::Dictionary;
-using platform::Duration;
 using platform::PairedWatch;
 
-class DevicesManagerTest : public testing::Test {
+class DevicesManagerTest : public OnSimulatedHost {
 protected:
     DevicesManagerTest() {
         host.device.strings["SerialNumber"] = "REAL";
@@ -27,7 +22,6 @@ protected:
         for (const auto& [number, device] : devices) numbers.push_back(number);
         return numbers;
     }
-    sim::Host host;
     std::shared_ptr<VRXDevicesManager> manager = VRXDevicesManager::sharedManager();
 };
 

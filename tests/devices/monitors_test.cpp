@@ -1,15 +1,10 @@
 // What a change of paired devices or of the language starts, on a whole agent.
-#include <gmock/gmock.h>
-
 #include "scheduling/agent_world.h"
 #include "vrx/devices/locale_monitor.h"
 #include "vrx/followup/follow_up.h"
 
 namespace vrx {
 namespace {
-
-using platform::Duration;
-using testing::ElementsAre;
 
 class MonitorsTest : public testing::Test {
 protected:

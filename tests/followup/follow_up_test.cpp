@@ -1,34 +1,27 @@
 // Follow-ups as they are decided, filled, posted, refreshed, dismissed and migrated, on the simulated service.
 #include "vrx/followup/follow_up.h"
 
-#include <gmock/gmock.h>
+#include <regex>
 
+#include "support/simulated_host.h"
 #include "vrx/devices/records/device_info.h"
 #include "vrx/followup/follow_up_rules.h"
 #include "vrx/followup/serial_number_hashes.h"
 #include "vrx/platform/sha256_hash.h"
-#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {
 
-using platform::Array;
-using platform::Date;
-using platform::Dictionary;
-using platform::Duration;
 using platform::FollowUpItem;
 using platform::Level;
 using platform::sha256Hash;
-using platform::Value;
-using testing::ElementsAre;
-using testing::IsEmpty;
 using Request = sim::FollowUpControllers::Request;
 
 constexpr double day = 86400;
 const Date now = sim::Clock::start;
 const std::string client = "com.orvane.Vireo";
 
-class FollowUpTest : public testing::Test {
+class FollowUpTest : public OnSimulatedHost {
 protected:
     // An offer that was to be shown long ago.
     static Dictionary offer(double daysLeft = 10, double badgeDays = 14) {
@@ -58,14 +51,12 @@ protected:
         for (const std::string& request : host.followUps.asked()) text += (text.empty() ? "" : ", ") + request;
         text += " ->";
         for (const FollowUpItem& item : pending()) text += " " + item.uniqueIdentifier;
-        for (std::string serialNumber : {"A", "B", "C", "D", "E"})
-            for (std::string identifier = itemOf(serialNumber).uniqueIdentifier; text.find(identifier) != text.npos;)
-                text.replace(text.find(identifier), identifier.size(), serialNumber);
+        for (const char* serialNumber : {"A", "B", "C", "D", "E"})
+            text = std::regex_replace(text, std::regex(itemOf(serialNumber).uniqueIdentifier), serialNumber);
         host.followUps.forgetAsked();
         return text;
     }
 
-    sim::Host host;
     const std::shared_ptr<VRXDeviceInfo> a = info("A", offer()), b = info("B", offer());
 };
 

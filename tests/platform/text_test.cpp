@@ -3,6 +3,8 @@
 
 #include <gmock/gmock.h>
 
+#include <thread>
+
 #include "vrx/platform/sha256_hash.h"
 #include "vrx/platform/value.h"
 #include "vrx/sim/host.h"
@@ -42,11 +44,16 @@ TEST(Filled, ReplacesPlaceholdersInTurnAndOnlyThose) {
     EXPECT_EQ(filled("", {}), "");
 }
 
-TEST(Sha256Hash, IsOfTheTextUpToItsFirstNul) {
+TEST(Sha256Hash, IsThePublishedOneOfTheTextUpToItsFirstNulOnAnyThread) {
     sim::Host host;
-    EXPECT_EQ(sha256Hash(""), "e3b0c44298fc1c149afbf4c8996fb92427ae41e4649b934ca495991b7852b855");
-    EXPECT_EQ(sha256Hash(std::string_view("abc\0def", 7)),
-              "ba7816bf8f01cfea414140de5dae2223b00361a396177a9cb410ff61f20015ad");
+    const std::pair<std::string, const char*> texts[] = {
+        {"", "e3b0c44298fc1c149afbf4c8996fb92427ae41e4649b934ca495991b7852b855"},
+        {{"abc\0def", 7}, "ba7816bf8f01cfea414140de5dae2223b00361a396177a9cb410ff61f20015ad"},
+        {std::string(1'000'000, 'a'), "cdc76e5c9914fb9281a1c7e284d73e67f1809a48a497200e046d39ccc7112cd0"},
+    };
+    std::vector<std::jthread> threads;
+    for (const auto& [text, hash] : texts)
+        threads.emplace_back([&text = text, &hash = hash] { EXPECT_EQ(sha256Hash(text), hash); });
 }
 
 TEST(Log, FillsEachPlaceholderAndRedactsWhatIsPrivate) {
@@ -59,6 +66,7 @@ TEST(Log, FillsEachPlaceholderAndRedactsWhatIsPrivate) {
     EXPECT_EQ(entry.message(), "-[Class operation:]: (null) <private> (1/-2) -3 4 -0.12 s ...");
     EXPECT_EQ(entry.message(true), "-[Class operation:]: (null) S%@1 (1/-2) -3 4 -0.12 s key");
     EXPECT_TRUE(std::string_view(entry.file).ends_with("text_test.cpp"));
+    EXPECT_FALSE(host.log.contains("%s")) << "asked for by whole formats";
 }
 
 TEST(Log, PutsNoLineTogetherThatNobodyReads) {

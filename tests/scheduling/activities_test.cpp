@@ -1,6 +1,4 @@
 // The activities one by one: what a run decides, and how it ends.
-#include <gmock/gmock.h>
-
 #include "scheduling/agent_world.h"
 #include "vrx/devices/records/device.h"
 #include "vrx/followup/follow_up.h"
@@ -13,26 +11,35 @@ namespace vrx {
 namespace {
 
 using platform::BackgroundActivityResult;
-using platform::Duration;
-using testing::ElementsAre;
-using testing::IsEmpty;
 using enum BackgroundActivityResult;
 
 TEST(Outreach, SchedulesThePostForTheEarliestDueDate) {
     struct Case {
         const char* name;
-        std::map<std::string, AgentWorld::Record> records;  // of PHONE, and of watches
-        std::optional<double> expected;
+        std::map<std::string, AgentWorld::Record> records{};  // of PHONE, and of watches
+        std::optional<double> expected{};
     };
     const Case cases[] = {
-        {"no record", {}, {}},
-        {"the earliest of three", {{"PHONE", {300, 10}}, {"V", {300, 3}}, {"W", {300, 20}}}, 3},
-        {"the record's day wins over an earlier one", {{"PHONE", {60, 50, 30}}}, 50},
-        {"before the end", {{"PHONE", {60, {}, 30}}}, 30},
-        {"a date in the past", {{"PHONE", {60, 1}}}, 1},
-        {"records without a date", {{"PHONE", {}}, {"V", {300, 10}}, {"W", {}}}, 10},
-        {"an excluded carrier", {{"PHONE", {300, 10, 0, "310410"}}, {"W", {300, 20, 0, "31041"}}}, 20},
-        {"all on excluded carriers", {{"PHONE", {300, 10, 0, "310410"}}}, {}},
+        {.name = "no record"},
+        {.name = "the earliest of three",
+         .records = {{"PHONE", {.until = 300, .shownFrom = 10}},
+                     {"V", {.until = 300, .shownFrom = 3}},
+                     {"W", {.until = 300, .shownFrom = 20}}},
+         .expected = 3},
+        {.name = "the record's day wins over an earlier one",
+         .records = {{"PHONE", {.until = 60, .shownFrom = 50, .shownBeforeEnd = 30}}},
+         .expected = 50},
+        {.name = "before the end", .records = {{"PHONE", {.until = 60, .shownBeforeEnd = 30}}}, .expected = 30},
+        {.name = "a date in the past", .records = {{"PHONE", {.until = 60, .shownFrom = 1}}}, .expected = 1},
+        {.name = "records without a date",
+         .records = {{"PHONE", {}}, {"V", {.until = 300, .shownFrom = 10}}, {"W", {}}},
+         .expected = 10},
+        {.name = "an excluded carrier",
+         .records = {{"PHONE", {.until = 300, .shownFrom = 10, .excludedCarrier = "310410"}},
+                     {"W", {.until = 300, .shownFrom = 20, .excludedCarrier = "31041"}}},
+         .expected = 20},
+        {.name = "all on excluded carriers",
+         .records = {{"PHONE", {.until = 300, .shownFrom = 10, .excludedCarrier = "310410"}}}},
     };
     for (const Case& c : cases) {
         AgentWorld world;
@@ -84,7 +91,7 @@ public:
     std::shared_ptr<platform::Event> isReady = platform::Platform::current().queues().makeEvent();
 };
 
-class ActivityTest : public testing::Test {
+class ActivityTest : public OnSimulatedHost {
 protected:
     template <class Activity>
     std::shared_ptr<Activity> run(std::shared_ptr<VRXAgentProtocol> agent) {
@@ -99,7 +106,6 @@ protected:
         return activity;
     }
 
-    sim::Host host;
     std::shared_ptr<VRXScheduler> scheduler;
     std::vector<BackgroundActivityResult> results;
 };

@@ -2,11 +2,9 @@
 // beginning.
 #pragma once
 
-#include <gmock/gmock.h>
-
+#include "support/simulated_host.h"
 #include "vrx/platform/vendor.h"
 #include "vrx/service/start_up.h"
-#include "vrx/sim/host.h"
 
 namespace vrx {
 
@@ -26,26 +24,26 @@ public:
     void install() {
         host.process.launch([] { return std::make_shared<StartUp>(); });
     }
-    static platform::Duration days(double count) { return platform::Duration(count * 86400); }
-    static platform::Date day(double count) { return sim::Clock::start + days(count); }
+    static Duration days(double count) { return Duration(count * 86400); }
+    static Date day(double count) { return sim::Clock::start + days(count); }
     double today() const { return (host.clock.now() - sim::Clock::start) / days(1); }
     void runToDay(double count) { host.runUntil(day(count)); }
 
     // What the coverage server answers for a device from now on, in the user's language.
     void setRecord(const std::string& serialNumber, const Record& record) {
         records[serialNumber] = record;
-        platform::Dictionary toggles{{"qxOfferDisplay", true},
-                                     {"qxOfferDurationDaysBeforeEndDate", record.shownBeforeEnd},
-                                     {"qxOfferToggle", platform::Array{record.excludedCarrier}}};
-        platform::Dictionary answer{{"featureToggleParameters", toggles},
-                                    {"qxLocalizedOfferLabel", host.locale.identifier},
-                                    {"qxLocalizedOfferPluralDescFormat", "%@"},
-                                    {"qxLocalizedOfferSingularDesc", "1"}};
+        Dictionary toggles{{"qxOfferDisplay", true},
+                           {"qxOfferDurationDaysBeforeEndDate", record.shownBeforeEnd},
+                           {"qxOfferToggle", Array{record.excludedCarrier}}};
+        Dictionary answer{{"featureToggleParameters", toggles},
+                          {"qxLocalizedOfferLabel", host.locale.identifier},
+                          {"qxLocalizedOfferPluralDescFormat", "%@"},
+                          {"qxLocalizedOfferSingularDesc", "1"}};
         for (const auto& [key, value] : {std::pair("qxOfferEligibleUntil", record.until),
                                          std::pair("qxOfferFollowupDisplayDate", record.shownFrom)})
             if (value) answer[key] = static_cast<std::int64_t>(platform::epochSeconds(day(*value)));
-        auto data = host.propertyList.serialize(answer, platform::PropertyListFormat::Binary).value();
-        host.files.put("/data/W." + serialNumber + ".plist", std::string(data.begin(), data.end()));
+        host.files.put("/data/W." + serialNumber + ".plist",
+                       propertyList(answer, platform::PropertyListFormat::Binary));
     }
     void setLanguage(const std::string& language) {
         host.locale.identifier = language;

@@ -1,29 +1,21 @@
 // The rules for the next post and the next refresh. All times are days from now.
-#include <gtest/gtest.h>
-
+#include "support/simulated_host.h"
 #include "vrx/devices/records/device_info.h"
 #include "vrx/platform/sha256_hash.h"
 #include "vrx/scheduling/post_date.h"
 #include "vrx/scheduling/refresh_date.h"
-#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {
 
-using platform::Date;
-using platform::Duration;
-
 constexpr Date now = sim::Clock::start;
-constexpr std::optional<double> absent;
 
 Duration days(double count) {
     return Duration(count * 86400);
 }
 
 struct Device {
-    std::optional<double> activated;
-    std::optional<double> shownFrom;
-    std::optional<double> until;
+    std::optional<double> activated{}, shownFrom{}, until{};
     bool asksForOffer = true;
     std::string serialNumber = "A";
 };
@@ -32,7 +24,7 @@ DeviceInfoList infos(const std::vector<Device>& devices) {
     auto date = [](std::optional<double> day) { return day ? std::optional(now + days(*day)) : std::nullopt; };
     DeviceInfoList list;
     for (const Device& device : devices) {
-        auto warranty = VRXWarranty::warrantyWithDictionary(platform::Dictionary{});
+        auto warranty = VRXWarranty::warrantyWithDictionary(Dictionary{});
         warranty->setQxOfferDisplay(device.asksForOffer);
         warranty->setQxOfferEligibleUntil(date(device.until));
         warranty->setQxOfferFollowupDisplayDate(date(device.shownFrom));
@@ -47,8 +39,8 @@ DeviceInfoList infos(const std::vector<Device>& devices) {
 
 struct Case {
     const char* name;
-    std::vector<Device> devices;
-    std::optional<double> expected;
+    std::vector<Device> devices{};
+    std::optional<double> expected{};
 };
 
 void expectDate(const Case& c, const std::optional<Date>& date) {
@@ -57,71 +49,87 @@ void expectDate(const Case& c, const std::optional<Date>& date) {
     EXPECT_NEAR((*date - now) / days(1), *c.expected, 1e-9) << c.name;
 }
 
+// What most cases are made of.
+const Device dueIn1{.activated = -1, .until = 300}, dueIn10{.activated = 0, .shownFrom = 10, .until = 300};
+const Device shown{.activated = -3, .until = 10.5}, onItsLastDay{.activated = -3, .until = 0.25};
+const Device ended{.activated = -9, .until = -3}, endedEarlier{.activated = -9, .until = -5};
+
 TEST(PostDate, FollowsTheRule) {
     sim::Host host;
     const PostDateSettings settings{{platform::sha256Hash("POSTED")}, days(2)};
+    const Device posted{.activated = -9, .until = -3, .serialNumber = "POSTED"}, endsIn5{.activated = -9, .until = 5};
+    const Device withoutEnd{.activated = -1, .shownFrom = 3}, dueIn5{.activated = 3, .shownFrom = 2, .until = 300};
+    const Device dueIn7{.activated = 0, .shownFrom = 7, .until = 300},
+        dueIn20{.activated = 0, .shownFrom = 20, .until = 300};
     const Case cases[] = {
-        {"no device", {}, {}},
-        {"the delay after the activation", {{-1, {}, 300}}, 1},
-        {"the record's day is later", {{0, 10, 300}}, 10},
-        {"the record's day is earlier", {{3, 2, 300}}, 5},
-        {"both have passed", {{-9, -3, 300}}, absent},
-        {"does not ask", {{-1, {}, 300, false}}, absent},
-        {"ended", {{-9, {}, -3}}, -3},
-        {"the first ended one stops the scan", {{-9, {}, -3}, {-9, {}, -5}, {-1, {}, 300}}, -3},
-        {"an ended one after a date", {{-1, {}, 300}, {-9, {}, -5}}, -5},
-        {"posted before", {{-9, {}, -3, true, "POSTED"}, {-1, {}, 300}}, 1},
-        {"the earlier of two", {{0, 10, 300}, {0, 7, 300}, {0, 8, 300}}, 7},
-        {"an end before the date", {{0, 10, 5}}, 5},
-        {"an end before another's date", {{0, 10, 300}, {-9, {}, 5}}, 5},
-        {"without a date, an end to come is none", {{-9, {}, 5}, {0, 10, 300}}, 10},
-        {"no activation, the record's day to come", {{{}, 4, 300}}, 4},
-        {"no activation, the record's day passed", {{{}, -4, 300}}, absent},
-        {"no end", {{-1, 3, {}}}, absent},
-        {"an unknown end counts as now", {{0, 10, 300}, {-1, 3, {}}}, absent},
-        {"and what follows it sets the date", {{0, 10, 300}, {-1, 3, {}}, {0, 20, 300}}, 20},
+        {.name = "no device"},
+        {.name = "the delay after the activation", .devices = {dueIn1}, .expected = 1},
+        {.name = "the record's day is later", .devices = {dueIn10}, .expected = 10},
+        {.name = "the record's day is earlier", .devices = {dueIn5}, .expected = 5},
+        {.name = "both have passed", .devices = {{.activated = -9, .shownFrom = -3, .until = 300}}},
+        {.name = "does not ask", .devices = {{.activated = -1, .until = 300, .asksForOffer = false}}},
+        {.name = "ended", .devices = {ended}, .expected = -3},
+        {.name = "the first ended one stops the scan", .devices = {ended, endedEarlier, dueIn1}, .expected = -3},
+        {.name = "an ended one after a date", .devices = {dueIn1, endedEarlier}, .expected = -5},
+        {.name = "posted before", .devices = {posted, dueIn1}, .expected = 1},
+        {.name = "the earliest of three", .devices = {dueIn10, dueIn7, dueIn20}, .expected = 7},
+        {.name = "an end before the date", .devices = {{.activated = 0, .shownFrom = 10, .until = 5}}, .expected = 5},
+        {.name = "an end before another's date", .devices = {dueIn10, endsIn5}, .expected = 5},
+        {.name = "without a date, an end to come is none", .devices = {endsIn5, dueIn10}, .expected = 10},
+        {.name = "no activation, the record's day to come", .devices = {{.shownFrom = 4, .until = 300}}, .expected = 4},
+        {.name = "no activation, the record's day passed", .devices = {{.shownFrom = -4, .until = 300}}},
+        {.name = "no end", .devices = {withoutEnd}},
+        {.name = "an unknown end counts as now", .devices = {dueIn10, withoutEnd}},
+        {.name = "and what follows it sets the date", .devices = {dueIn10, withoutEnd, dueIn20}, .expected = 20},
     };
     for (const Case& c : cases) expectDate(c, nextPostDate(infos(c.devices), settings, now));
 }
 
 TEST(RefreshDate, FollowsTheRule) {
     sim::Host host;
+    const Device notYet{.activated = 1, .until = 20}, notYetByRecord{.activated = -9, .shownFrom = 4, .until = 20};
+    const Device changesIn75{.activated = -3, .until = 10.75}, changesIn25{.activated = -3, .until = 7.25};
+    const Device withoutEnd{.activated = -3}, withoutActivation{.shownFrom = -4, .until = 10.5},
+        shownSoon{.activated = -1.9, .until = 30};
     const Case cases[] = {
-        {"no device", {}, absent},
-        {"shown, the day count changes", {{-3, {}, 10.5}}, 0.5},
-        {"shown, a whole number of days", {{-3, {}, 10}}, 1},
-        {"not shown yet", {{1, {}, 20}}, 3},
-        {"not shown yet, by the record's day", {{-9, 4, 20}}, 4},
-        {"does not ask", {{-3, {}, 10.5, false}}, absent},
-        {"last day", {{-3, {}, 0.25}}, absent},
-        {"another's last day after a date", {{-3, {}, 10.5}, {-3, {}, 0.25}}, 0.25},
-        {"another's last day before there is a date", {{-3, {}, 0.25}, {-3, {}, 10.5}}, 0.5},
-        {"the earlier of two", {{-3, {}, 10.5}, {-3, {}, 7.25}, {-3, {}, 5.75}}, 0.25},
-        {"first shown before another's day count changes", {{-1.9, {}, 30}, {-3, {}, 10.5}}, 0.1},
-        {"ended", {{-9, {}, -3}}, -3},
-        {"ended, after a date", {{-3, {}, 10.5}, {-9, {}, -3}, {-9, {}, -5}}, -3},
-        {"no end", {{-3, {}, {}}}, absent},
-        {"no end takes no date away", {{-3, {}, 10.5}, {-3, {}, {}}}, 0.5},
-        {"no activation, the record's day to come", {{{}, 4, 20}}, 4},
-        {"no activation, the record's day passed", {{{}, -4, 10.5}}, absent},
-        {"no activation, after a date", {{-3, {}, 10.75}, {{}, -4, 10.5}}, 0.5},
+        {.name = "no device"},
+        {.name = "shown, the day count changes", .devices = {shown}, .expected = 0.5},
+        {.name = "shown, a whole number of days", .devices = {{.activated = -3, .until = 10}}, .expected = 1},
+        {.name = "not shown yet", .devices = {notYet}, .expected = 3},
+        {.name = "not shown yet, by the record's day", .devices = {notYetByRecord}, .expected = 4},
+        {.name = "does not ask", .devices = {{.activated = -3, .until = 10.5, .asksForOffer = false}}},
+        {.name = "last day", .devices = {onItsLastDay}},
+        {.name = "another's last day after a date", .devices = {shown, onItsLastDay}, .expected = 0.25},
+        {.name = "another's last day before there is a date", .devices = {onItsLastDay, shown}, .expected = 0.5},
+        {.name = "the earliest of three", .devices = {shown, changesIn25, changesIn75}, .expected = 0.25},
+        {.name = "first shown before another's day count changes", .devices = {shownSoon, shown}, .expected = 0.1},
+        {.name = "ended", .devices = {ended}, .expected = -3},
+        {.name = "ended, after a date", .devices = {shown, ended, endedEarlier}, .expected = -3},
+        {.name = "no end", .devices = {withoutEnd}},
+        {.name = "no end takes no date away", .devices = {shown, withoutEnd}, .expected = 0.5},
+        {.name = "no activation, the record's day to come", .devices = {{.shownFrom = 4, .until = 20}}, .expected = 4},
+        {.name = "no activation, the record's day passed", .devices = {withoutActivation}},
+        {.name = "no activation, after a date", .devices = {changesIn75, withoutActivation}, .expected = 0.5},
     };
     for (const Case& c : cases) expectDate(c, nextRefreshDate(infos(c.devices), true, {days(1), days(2)}, now));
 }
 
 TEST(RefreshDate, BeginsADayFromNowUnlessTheCallIsInitial) {
     sim::Host host;
+    const Device notYet{.activated = 1, .until = 10.5}, changesInHalfAnHour{.activated = -3, .until = 10.5 / 24};
     const Case cases[] = {
-        {"no device", {}, 1},
-        {"shown", {{-3, {}, 10.5}}, 0.5},
-        {"not shown yet, the count changes first", {{1, {}, 10.5}}, 0.5},
-        {"ended", {{-9, {}, -3}}, -3},
+        {.name = "no device", .expected = 1},
+        {.name = "shown", .devices = {shown}, .expected = 0.5},
+        {.name = "not shown yet, the count changes first", .devices = {notYet}, .expected = 0.5},
+        {.name = "ended", .devices = {ended}, .expected = -3},
     };
     for (const Case& c : cases) expectDate(c, nextRefreshDate(infos(c.devices), false, {days(1), days(2)}, now));
 
     // In days of their set length.
-    expectDate({"hours", {}, 0.5 / 24}, nextRefreshDate(infos({{-3, {}, 10.5 / 24}}), true, {days(1.0 / 24), {}}, now));
-    expectDate({"no length", {}, absent}, nextRefreshDate(infos({{-3, {}, 10.5}}), true, {Duration(0), {}}, now));
+    const RefreshDateSettings hours{.oneDay = days(1.0 / 24)}, noLength{.oneDay = Duration(0)};
+    expectDate({.name = "hours", .expected = 0.5 / 24},
+               nextRefreshDate(infos({changesInHalfAnHour}), true, hours, now));
+    expectDate({.name = "no length"}, nextRefreshDate(infos({shown}), true, noLength, now));
 }
 
 }  // namespace

@@ -1,18 +1,13 @@
 // The scheduler: what it registers with the system, and what a firing does.
 #include "vrx/scheduling/scheduler.h"
 
-#include <gmock/gmock.h>
-
-#include "vrx/sim/host.h"
+#include "support/simulated_host.h"
 
 namespace vrx {
 namespace {
 
 using platform::ActivityCriteria;
 using platform::BackgroundActivityResult;
-using platform::Date;
-using platform::Duration;
-using testing::ElementsAre;
 using enum BackgroundActivityResult;
 
 class FakeActivity final : public VRXSchedulerActivityDelegate {
@@ -27,7 +22,7 @@ public:
     BackgroundActivityResult result = Finished;
 };
 
-class SchedulerTest : public testing::Test {
+class SchedulerTest : public OnSimulatedHost {
 protected:
     static constexpr const char* key = "activity.TargetDate";
 
@@ -41,7 +36,6 @@ protected:
         });
     }
 
-    sim::Host host;
     std::shared_ptr<FakeActivity> activity = std::make_shared<FakeActivity>();
     std::shared_ptr<VRXScheduler> scheduler = VRXScheduler::newSchedulerWithActivityDelegate(activity);
     std::vector<BackgroundActivityResult> results;

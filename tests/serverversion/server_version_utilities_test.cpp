@@ -1,16 +1,11 @@
 // Which protocol versions client and server share, wherever the server's come from.
 #include "vrx/serverversion/server_version_utilities.h"
 
-#include <gtest/gtest.h>
-
-#include "vrx/sim/host.h"
+#include "support/simulated_host.h"
 
 namespace vrx {
 namespace {
 
-using platform::Array;
-using platform::Dictionary;
-using platform::Value;
 using Utilities = VRXServerVersionUtilities;
 
 constexpr const char* documentURL = "https://cdn.example/versions.plist";
@@ -20,38 +15,22 @@ Value versions(Value low, Value high) {
     return Dictionary{{"LowServerVersion", low}, {"HighServerVersion", high}};
 }
 
-class ServerVersionTest : public testing::Test {
+class ServerVersionTest : public OnSimulatedHost {
 protected:
     ServerVersionTest() {
         host.defaults.registerDefaults(
             {{"LowServerVersion", 2}, {"HighServerVersion", 3}, {"ServerVersionURL", documentURL}});
     }
-    std::string document(const Value& root) const {
-        auto data = host.propertyList.serialize(root, platform::PropertyListFormat::Xml).value();
-        return std::string(data.begin(), data.end());
-    }
-    void serve(const Value& root) { host.http.answer(documentURL, sim::HttpAnswer::ok(document(root))); }
+    void serve(const Value& root) { host.http.answer(documentURL, sim::HttpAnswer::ok(propertyList(root))); }
     bool supported() {
-        return answerOf([](auto completion) { Utilities::serverVersionSupported(std::move(completion)); });
+        return replyOf<bool>([](auto completion) { Utilities::serverVersionSupported(std::move(completion)); });
     }
     bool high(VRXServerLookupPolicy policy) {
-        return answerOf([policy](auto completion) {
+        return replyOf<bool>([policy](auto completion) {
             Utilities::isHighServerVersionFeaturesetEnabled(policy, std::move(completion));
         });
     }
-    template <class Ask>
-    bool answerOf(Ask ask) {
-        std::optional<bool> result;
-        ask([&result](bool answer) {
-            EXPECT_FALSE(result) << "answered twice";
-            result = answer;
-        });
-        host.runFor(platform::Duration(120));
-        EXPECT_TRUE(result) << "not answered";
-        return result.value_or(false);
-    }
     std::size_t requests() const { return host.http.sent().size(); }
-    sim::Host host;
 };
 
 TEST_F(ServerVersionTest, SharesTheTwoNamedVersionsOnly) {
@@ -91,7 +70,7 @@ TEST_F(ServerVersionTest, ARefreshFallsBackToCacheThenClientAndStoresWhatItUsed)
     EXPECT_EQ(host.defaults.get(cacheKey), versions(7, 8));
     host.http.answer(documentURL, sim::HttpAnswer::ok("not a property list"));
     EXPECT_FALSE(supported());
-    host.http.answer(documentURL, sim::HttpAnswer::status(404, document(versions(2, 3))));
+    host.http.answer(documentURL, sim::HttpAnswer::status(404, propertyList(versions(2, 3))));
     EXPECT_TRUE(supported()) << "the status is not examined";
 }
 
@@ -119,7 +98,8 @@ TEST_F(ServerVersionTest, ALocalLookupNeverFetches) {
 TEST_F(ServerVersionTest, AnOverrideWinsUnderEveryPolicy) {
     serve(versions(2, 3));
     host.defaults.set("ServerVersionOverride", versions(2, 2));
-    for (VRXServerLookupPolicy policy : {0, 1, 2}) {
+    for (VRXServerLookupPolicy policy :
+         {VRXServerLookupPolicyDefault, VRXServerLookupPolicyLocal, VRXServerLookupPolicyRefresh}) {
         host.defaults.remove(cacheKey);
         EXPECT_FALSE(high(policy));
         EXPECT_EQ(host.defaults.get(cacheKey), versions(2, 2));
@@ -131,7 +111,7 @@ TEST_F(ServerVersionTest, AnOverrideWinsUnderEveryPolicy) {
 }
 
 TEST_F(ServerVersionTest, ADocumentThatIsNoDictionaryIsFetchedOnceMorePastCaches) {
-    host.http.answerOnce(documentURL, sim::HttpAnswer::ok(document(Array{1})));
+    host.http.answerOnce(documentURL, sim::HttpAnswer::ok(propertyList(Array{1})));
     serve(versions(3, 4));
     EXPECT_TRUE(supported());
     ASSERT_EQ(requests(), 2u);

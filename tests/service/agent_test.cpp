@@ -1,20 +1,14 @@
 // The requests of clients, on an agent with its default providers, and the check of who may make them.
 #include "vrx/service/agent.h"
 
-#include <gtest/gtest.h>
-
+#include "support/simulated_host.h"
 #include "vrx/coverage/records/warranty.h"
 #include "vrx/devices/records/device_info.h"
 #include "vrx/service/register_defaults.h"
 #include "vrx/service/start_up.h"
-#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {
-
-using platform::dateFromEpoch;
-using platform::Dictionary;
-using platform::Value;
 
 // Writes down what was asked of the follow-ups.
 class RecordingFollowUps final : public VRXFollowUpManaging {
@@ -40,7 +34,7 @@ private:
     std::vector<std::string>& asked_;
 };
 
-class AgentTest : public testing::Test {
+class AgentTest : public OnSimulatedHost {
 protected:
     AgentTest() {
         vrx_registerDefaults(host.defaults);
@@ -48,30 +42,25 @@ protected:
         host.flags.enabled = {{"Vireo", "Meridian_3_0"}};
         host.watches.all = {{"Watch", {}, "WATCH", dateFromEpoch(5), true, false}};
         host.defaults.set("WarrantyURL", "file:///data/Warranty.plist");
-        auto data =
-            host.propertyList.serialize(Dictionary{{"covered", true}}, platform::PropertyListFormat::Xml).value();
-        host.files.put("/data/Warranty.plist", std::string(data.begin(), data.end()));
+        host.files.put("/data/Warranty.plist", propertyList(Dictionary{{"covered", true}}));
     }
     std::shared_ptr<VRXAgent> makeAgent() {
         AgentCollaborators collaborators;
         collaborators.makeFollowUp = [this] { return std::make_shared<RecordingFollowUps>(followUps); };
         return VRXAgent::initWithCallingProcessBundleID("com.example.client", collaborators);
     }
-    // Runs everything that is due and gives what was replied, which must be one reply.
-    template <class T, class Ask>
-    T replyOf(Ask ask) {
-        std::optional<T> result;
-        ask(platform::OnceCallback<T>([&result](T answer) { result = std::move(answer); }));
-        host.runFor(platform::Duration(120));
-        EXPECT_TRUE(result) << "no reply";
-        return result ? *result : T();
-    }
     std::shared_ptr<VRXDeviceInfo> info(const std::string& serialNumber, VRXWarrantyLookupPolicy policy) {
         return replyOf<std::shared_ptr<VRXDeviceInfo>>(
             [&](auto reply) { agent->getDeviceInfoForSerialNumber(serialNumber, policy, std::move(reply)); });
     }
+    DeviceInfoList allInfos(VRXWarrantyLookupPolicy policy, bool updateFollowUps) {
+        return replyOf<DeviceInfoList>(
+            [&](auto reply) { agent->getAllDeviceInfosUsingPolicy(policy, updateFollowUps, std::move(reply)); });
+    }
+    DeviceList pairedDevices() {
+        return replyOf<DeviceList>([this](auto reply) { agent->pairedDevices(std::move(reply)); });
+    }
 
-    sim::Host host;
     std::vector<std::string> followUps;
     std::shared_ptr<VRXAgent> agent = makeAgent();
 };
@@ -92,41 +81,38 @@ TEST_F(AgentTest, GivesThisDeviceWithItsRecord) {
 }
 
 TEST_F(AgentTest, GivesAnyDeviceBySerialNumber) {
-    EXPECT_EQ(info("WATCH", 2)->device()->name(), "Watch");
-    auto unknown = info("STRANGER", 0);
+    EXPECT_EQ(info("WATCH", VRXWarrantyLookupPolicyRefresh)->device()->name(), "Watch");
+    auto unknown = info("STRANGER", VRXWarrantyLookupPolicyDefault);
     EXPECT_EQ(unknown->device()->description(), "<unknown> (STRANGER) ((null)) - Other");
     EXPECT_TRUE(unknown->warranty());
 
     host.defaults.set("PairedBluetoothDevicesSerialNumbers", Dictionary{{"A", "NEVER"}, {"B", "WATCH"}});
     host.defaults.set("PairedWatchesSerialNumbers", Dictionary{{"A", "PHONE"}, {"B", 5}});
-    EXPECT_EQ(info("A", 1)->device()->serialNumber(), "PHONE");
-    EXPECT_EQ(info("B", 1)->device()->serialNumber(), "WATCH");
+    EXPECT_EQ(info("A", VRXWarrantyLookupPolicyCachedOnly)->device()->serialNumber(), "PHONE");
+    EXPECT_EQ(info("B", VRXWarrantyLookupPolicyCachedOnly)->device()->serialNumber(), "WATCH");
     EXPECT_EQ(host.log.lastMessage("Override Serial Number: %@ found for SN: %@"),
               "Override Serial Number: WATCH found for SN: B");
 }
 
 TEST_F(AgentTest, GivesAllDevicesOnThePolicyQueue) {
-    auto ask = [this](bool updateFollowUps) {
-        return replyOf<DeviceInfoList>(
-            [&](auto reply) { agent->getAllDeviceInfosUsingPolicy(2, updateFollowUps, std::move(reply)); });
-    };
-    EXPECT_EQ(ask(false).size(), 2u);
+    EXPECT_EQ(allInfos(VRXWarrantyLookupPolicyRefresh, false).size(), 2u);
     EXPECT_TRUE(followUps.empty());
-    auto infos = ask(true);
+    const auto infos = allInfos(VRXWarrantyLookupPolicyRefresh, true);
     EXPECT_EQ(infos.size(), 2u);
     for (const auto& deviceInfo : infos) EXPECT_TRUE(deviceInfo->warranty());
     EXPECT_EQ(followUps, std::vector<std::string>{"refresh 2"});
 
     // Even when nothing has to be downloaded the reply comes later, from the queue.
     bool replied = false;
-    agent->getAllDeviceInfosUsingPolicy(1, false, [&](DeviceInfoList) { replied = true; });
+    agent->getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicyCachedOnly, false,
+                                        [&](DeviceInfoList) { replied = true; });
     EXPECT_FALSE(replied);
     host.run();
     EXPECT_TRUE(replied);
 }
 
 TEST_F(AgentTest, OverlappingAllDevicesRequestsOfOneAgentEndTogether) {
-    host.http.answer("https://cdn.example/slow", sim::HttpAnswer::failure().after(platform::Duration(10)));
+    host.http.answer("https://cdn.example/slow", sim::HttpAnswer::failure().after(Duration(10)));
     host.defaults.set("ServerVersionURL", "https://cdn.example/slow");
     std::vector<std::string> replies;
     auto ask = [&](std::shared_ptr<VRXAgent> asked, VRXWarrantyLookupPolicy policy, const char* name) {
@@ -134,30 +120,31 @@ TEST_F(AgentTest, OverlappingAllDevicesRequestsOfOneAgentEndTogether) {
                                             [&replies, name](DeviceInfoList) { replies.push_back(name); });
     };
     auto other = makeAgent();
-    ask(agent, 2, "refresh");
-    ask(agent, 1, "cached");
-    ask(other, 1, "other agent");
+    ask(agent, VRXWarrantyLookupPolicyRefresh, "refresh");
+    ask(agent, VRXWarrantyLookupPolicyCachedOnly, "cached");
+    ask(other, VRXWarrantyLookupPolicyCachedOnly, "other agent");
     host.run();
     EXPECT_EQ(replies, std::vector<std::string>{"other agent"});
-    host.runFor(platform::Duration(30));
+    host.runFor(Duration(30));
     EXPECT_EQ(replies, (std::vector<std::string>{"other agent", "refresh", "cached"}));
 }
 
 TEST_F(AgentTest, APendingReplyKeepsTheAgentAlive) {
     std::weak_ptr<VRXAgent> watched = agent;
     std::size_t count = 0;
-    agent->getAllDeviceInfosUsingPolicy(2, false, [&](DeviceInfoList infos) { count = infos.size(); });
+    agent->getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicyRefresh, false,
+                                        [&](DeviceInfoList infos) { count = infos.size(); });
     agent.reset();
     EXPECT_FALSE(watched.expired());
-    host.runFor(platform::Duration(120));
+    host.runFor(Duration(120));
     EXPECT_EQ(count, 2u);
     EXPECT_TRUE(watched.expired());
 }
 
 TEST_F(AgentTest, AnswersTheSmallRequests) {
-    EXPECT_EQ(replyOf<DeviceList>([&](auto reply) { agent->pairedDevices(std::move(reply)); }).size(), 1u);
+    EXPECT_EQ(pairedDevices().size(), 1u);
     host.flags.enabled.clear();
-    EXPECT_TRUE(replyOf<DeviceList>([&](auto reply) { agent->pairedDevices(std::move(reply)); }).empty());
+    EXPECT_TRUE(pairedDevices().empty());
     EXPECT_TRUE(replyOf<bool>([&](auto reply) { agent->dismissFollowUpForSerialNumber("WATCH", std::move(reply)); }));
     EXPECT_EQ(followUps, std::vector<std::string>{"dismiss WATCH"});
 

@@ -1,15 +1,10 @@
 // The one-time move from the older single-device layout, at start.
-#include <gtest/gtest.h>
-
+#include "support/simulated_host.h"
 #include "vrx/coverage/records/warranty.h"
 #include "vrx/service/start_up.h"
-#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {
-
-using platform::Dictionary;
-using platform::Value;
 
 TEST(Migration, HappensOnceWhateverCameOfIt) {
     constexpr std::size_t moves = 3, loses = 2, nothing = 0;  // what is asked of the follow-ups

@@ -1,13 +1,12 @@
 // The simulated process: what its end takes, and when it ends by itself.
-#include <gmock/gmock.h>
-
 #include "vrx/sim/host.h"
+
+#include "support/values.h"
 
 namespace vrx::sim {
 namespace {
 
 using namespace std::chrono_literals;
-using testing::ElementsAre;
 
 class SimProcess : public testing::Test {
 protected:
@@ -41,7 +40,7 @@ TEST_F(SimProcess, TakesItsMemoryAlongWhenItEnds) {
     host.process.kill();
     host.runFor(2s);
     EXPECT_THAT(notes, ElementsAre("notified", "unwound", "gone"));
-    EXPECT_EQ(host.defaults.dictionaryRepresentation(), (platform::Dictionary{{"stored", 1}}));
+    EXPECT_EQ(host.defaults.dictionaryRepresentation(), (Dictionary{{"stored", 1}}));
     host.notifications.raise(".n");
     host.process.relaunch();
     host.run();

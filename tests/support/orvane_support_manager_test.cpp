@@ -1,45 +1,27 @@
 // Where an application is found, and what a client is told of it.
 #include "vrx/support/orvane_support_manager.h"
 
-#include <gtest/gtest.h>
-
-#include "vrx/sim/host.h"
+#include "support/simulated_host.h"
 
 namespace vrx {
 namespace {
 
-using platform::Dictionary;
-using platform::Duration;
-using platform::Value;
-
 constexpr const char* app = "com.orvane.support";
 
-class SupportManagerTest : public testing::Test {
+class SupportManagerTest : public OnSimulatedHost {
 protected:
-    // Asks on a connection's thread and gives the one reply.
-    template <class Ask>
-    std::optional<Value> replyOf(Ask ask) {
-        std::optional<Value> reply;
-        connection->post([&] {
-            ask(*std::make_shared<VRXOrvaneSupportManager>(), [&](Value answer) {
-                EXPECT_FALSE(reply) << "a second reply";
-                repliedAfter = host.clock.elapsed();
-                reply = std::move(answer);
-            });
+    // Replied to a connection's thread.
+    Value availability() { return replyTo(&VRXOrvaneSupportManager::appSupportAvailability); }
+    Value store() { return replyTo(&VRXOrvaneSupportManager::checkIsAvailableInStore); }
+    template <class Operation>
+    Value replyTo(Operation operation) {
+        return replyOf<Value>([this, operation](auto reply) {
+            connection->post(
+                [operation, reply] { (*std::make_shared<VRXOrvaneSupportManager>().*operation)(app, reply); });
         });
-        host.runFor(Duration(60));
-        return reply;
-    }
-    std::optional<Value> availability() {
-        return replyOf([](auto& manager, auto reply) { manager.appSupportAvailability(app, std::move(reply)); });
-    }
-    std::optional<Value> store() {
-        return replyOf([](auto& manager, auto reply) { manager.checkIsAvailableInStore(app, std::move(reply)); });
     }
 
-    sim::Host host;
     std::shared_ptr<platform::Queue> connection = host.queues.makeSerialQueue("connection");
-    Duration repliedAfter{};
 };
 
 TEST_F(SupportManagerTest, AnInstalledAppIsAskedForNowhereElse) {
@@ -74,7 +56,7 @@ TEST_F(SupportManagerTest, APurchasedAppIsNotLookedUp) {
 
     host.accounts.primary.reset();
     host.purchaseHistory.purchases = {{app, "Support", "Orvane Inc", ""}};
-    const Value answer = availability().value();
+    const Value answer = availability();
     EXPECT_EQ(answer["AppLinkURL"], Value(""));
     EXPECT_EQ(answer["AppTitleKey"], Value("Support"));
     EXPECT_EQ(host.purchaseHistory.asked.at(1).accountIdentifier, 0);
@@ -99,7 +81,7 @@ TEST_F(SupportManagerTest, AnAppOfTheMarketplaceIsOfferedOnlyWhenItIsTheOnlyOne)
     EXPECT_EQ(availability(), Value(whole));
 
     host.store.answer = std::vector{platform::StoreItem()};
-    const Value bare = store().value();
+    const Value bare = store();
     for (const char* key : {"AppLinkURL", "AppIconURL", "AppTitleKey", "AppVendorName"})
         EXPECT_EQ(bare[key], Value("")) << key;
 
@@ -125,15 +107,14 @@ TEST_F(SupportManagerTest, TheOverrideStandsInForTheMarketplaceOnly) {
     EXPECT_EQ(store(), Value(override));
     EXPECT_TRUE(host.store.asked.empty());
     host.purchaseHistory.purchases = {{.bundleIdentifier = app}};
-    EXPECT_EQ(availability().value()["AppAvailablityText"], Value("DOWNLOAD"));
+    EXPECT_EQ(availability()["AppAvailablityText"], Value("DOWNLOAD"));
 }
 
 TEST_F(SupportManagerTest, PurchasesThatComeLateChangeNothing) {
     host.purchaseHistory.purchases = {{.bundleIdentifier = app}};
     host.purchaseHistory.delay = Duration(5.5);
-    const Duration asked = host.clock.elapsed();
     EXPECT_EQ(availability(), Value(Dictionary{{"AppBundleID", app}, {"AppAvailabilityType", 0}}));
-    EXPECT_NEAR((repliedAfter - asked).count(), 5.1, 0.01);
+    EXPECT_NEAR(timeToReply.count(), 5.1, 0.01);
 }
 
 }  // namespace

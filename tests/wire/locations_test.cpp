@@ -8,6 +8,8 @@
 namespace vrx::wire {
 namespace {
 
+const std::string bareHome = "/home/ada/.local/state/vrxagent";
+
 struct Machine {
     std::map<std::string, std::string> variables{{"HOME", "/home/ada"}};
     std::set<std::string> files;
@@ -24,10 +26,9 @@ struct Machine {
 
 TEST(Locations, GoFromTheCommandLineToTheBareMachine) {
     Machine machine;
-    Locations bare = machine.find();
-    EXPECT_EQ(bare.home.path, "/home/ada/.local/state/vrxagent");
-    EXPECT_EQ(bare.profile.path, "");
-    EXPECT_EQ(bare.socket.path, "/home/ada/.local/state/vrxagent/com.orvane.vrxagent");
+    EXPECT_EQ(machine.find().home.path, bareHome);
+    EXPECT_EQ(machine.find().profile.path, "");
+    EXPECT_EQ(machine.find().socket.path, bareHome + "/com.orvane.vrxagent");
 
     machine.files = {"/etc/vrxagent/device.toml", "/run/vrxagent"};
     EXPECT_EQ(machine.find().profile.path, "/etc/vrxagent/device.toml");
@@ -53,11 +54,10 @@ TEST(Locations, GoFromTheCommandLineToTheBareMachine) {
 
 TEST(Locations, PassOverVariablesThatAreNoPath) {
     Machine machine;
-    machine.variables["XDG_STATE_HOME"] = "";
+    for (const char* name : {"XDG_STATE_HOME", "XDG_RUNTIME_DIR"}) machine.variables[name] = "";
     machine.variables["STATE_DIRECTORY"] = "relative";
-    machine.variables["XDG_RUNTIME_DIR"] = "";
-    EXPECT_EQ(machine.find().home.path, "/home/ada/.local/state/vrxagent");
-    EXPECT_EQ(machine.find().socket.path, "/home/ada/.local/state/vrxagent/com.orvane.vrxagent");
+    EXPECT_EQ(machine.find().home.path, bareHome);
+    EXPECT_EQ(machine.find().socket.path, bareHome + "/com.orvane.vrxagent");
 }
 
 }  // namespace

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <array>
 #include <cmath>
+#include <concepts>
 #include <limits>
 #include <variant>
 
@@ -138,6 +139,38 @@ constexpr auto rows = std::to_array<Row>({
     asSent(Object::Root, "supportAppURL", &Fields::supportAppURL),
 });
 // clang-format on
+
+// No member is filled twice, and no key twice by the same rule.
+constexpr bool areRowsDistinct() {
+    for (std::size_t i = 0; i < rows.size(); ++i)
+        for (std::size_t j = 0; j < i; ++j) {
+            if (rows[i].field == rows[j].field) return false;
+            if (rows[i].field.index() == rows[j].field.index() && rows[i].object == rows[j].object &&
+                rows[i].key == rows[j].key)
+                return false;
+        }
+    return true;
+}
+static_assert(areRowsDistinct(), "two rows fill one member, or read one key by one rule");
+
+// Stands for a field of any type. As many of them as there are fields make a Fields, and no more.
+struct AnyField {
+    template <class T>
+    requires(std::same_as<T, bool> || std::same_as<T, std::optional<Date>> || std::same_as<T, Duration> ||
+             std::same_as<T, Value>)
+    operator T() const;
+};
+template <class... Given>
+constexpr std::size_t numberOfFields() {
+    if constexpr (requires { Fields{Given()..., AnyField()}; })
+        return numberOfFields<Given..., AnyField>();
+    else
+        return sizeof...(Given);
+}
+// coverageValidityDate, localizedCoverageDetailsLabel, localizedCoverageDetailsValue, localizedBenefitLabelKey,
+// localizedBenefitValueKey and serialNumber are never filled; dictionaryRepresentation is the whole.
+constexpr std::size_t fieldsWithoutRow = 7;
+static_assert(rows.size() + fieldsWithoutRow == numberOfFields(), "a field has no row, or a row too many");
 
 void read(const Value& value, bool& field) {
     field = platform::flagFromValue(value);

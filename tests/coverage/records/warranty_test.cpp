@@ -1,26 +1,16 @@
 // The coverage record: how its fields are read, its derived values, equality, and the archive it crosses the IPC in.
 #include "vrx/coverage/records/warranty.h"
 
-#include <gtest/gtest.h>
-
 #include <cmath>
 #include <limits>
 
+#include "support/simulated_host.h"
 #include "vrx/codec/core/keyed_archive.h"
-#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {
 
-using platform::Array;
-using platform::Data;
-using platform::Date;
-using platform::dateFromEpoch;
-using platform::Dictionary;
-using platform::Duration;
-using platform::Value;
-
-class WarrantyTest : public testing::Test {
+class WarrantyTest : public OnSimulatedHost {
 protected:
     std::shared_ptr<VRXWarranty> record(Dictionary dictionary) {
         return VRXWarranty::warrantyWithDictionary(std::move(dictionary));
@@ -32,103 +22,153 @@ protected:
         more.try_emplace("qxLocalizedOfferPluralDescFormat", "%@ days left");
         return record(std::move(more));
     }
-    sim::Host host;
 };
 
-TEST_F(WarrantyTest, ReadsFieldsFromTheirPlaces) {
-    auto warranty =
-        record({{"covered", true},
-                {"coverageEndDate", 1700000000},
-                {"footer2LinkURL", "https://support.example/"},
-                {"qxOfferBadgeBeforeEndDate", 1.5},
-                {"isQxSubscription", "Yes"},
-                {"unknown", 7},
-                {"featureToggleParameters", Dictionary{{"qxOfferDisplay", 1},
-                                                       {"qxOfferDurationDaysBeforeEndDate", "30 days"},
-                                                       {"qxOfferToggle", Array{"31026"}}}},
-                {"coverage", Dictionary{{"localizedCoverageTitle", "Details"},
-                                        {"benefitsCard", Dictionary{{"localizedBenefitsCardFooter", "Foot"}}}}}});
-    ASSERT_TRUE(warranty);
-    EXPECT_TRUE(warranty->covered());
-    EXPECT_EQ(warranty->coverageEndDate(), dateFromEpoch(1700000000));
-    EXPECT_EQ(warranty->footer2LinkURL(), Value("https://support.example/"));
-    EXPECT_EQ(warranty->qxOfferBadgeDurationBeforeEndDate(), Duration(129600));
-    EXPECT_EQ(warranty->qxOfferBadgeDaysBeforeEndDate(), Value(1.5));
-    EXPECT_TRUE(warranty->isCoveragePlanSubscriptionType());
-    EXPECT_TRUE(warranty->qxOfferDisplay());
-    EXPECT_EQ(warranty->qxOfferDurationBeforeEndDate(), Duration(2592000));
-    EXPECT_EQ(warranty->qxOfferToggle(), Value(Array{"31026"}));
-    EXPECT_EQ(warranty->localizedCoverageDetailsTitle(), Value("Details"));
-    EXPECT_EQ(warranty->localizedBenefitsCardFooter(), Value("Foot"));
-    EXPECT_EQ(warranty->dictionaryRepresentation()["unknown"], Value(7));
+// Where the fields of one rule stand in the dictionary.
+template <class T>
+using Places = std::vector<std::pair<std::string_view, T (VRXWarranty::*)() const>>;
+
+const Places<bool> flags{
+    {"covered", &VRXWarranty::covered},
+    {"qxOfferEligible", &VRXWarranty::qxOfferEligible},
+    {"featureToggleParameters.qxOfferDisplay", &VRXWarranty::qxOfferDisplay},
+    {"featureToggleParameters.qxOfferSettingsAppBadge", &VRXWarranty::qxOfferSettingsAppBadge},
+    {"featureToggleParameters.qxOfferSettingsRowBadge", &VRXWarranty::qxOfferSettingsRowBadge},
+    {"qxLogoToggle", &VRXWarranty::coverageHasQXLogo},
+    {"isQxSubscription", &VRXWarranty::isCoveragePlanSubscriptionType},
+    {"isQxServicesPartner", &VRXWarranty::isQXServicesPartner},
+    {"displayRepairAndSupport", &VRXWarranty::displayRepairAndSupport},
+};
+const Places<std::optional<Date>> epochs{
+    {"coverageEndDate", &VRXWarranty::coverageEndDate},
+    {"qxOfferEligibleUntil", &VRXWarranty::qxOfferEligibleUntil},
+    {"qxOfferFollowupDisplayDate", &VRXWarranty::qxOfferFollowupDisplayDate},
+    {"qxOfferDisplayDate", &VRXWarranty::qxOfferDisplayDate},
+};
+const Places<Duration> days{
+    {"featureToggleParameters.qxOfferDurationDaysBeforeEndDate", &VRXWarranty::qxOfferDurationBeforeEndDate},
+    {"qxOfferBadgeBeforeEndDate", &VRXWarranty::qxOfferBadgeDurationBeforeEndDate},
+};
+const Places<Value> asSent{
+    {"localizedCoveredDeviceDateLabelFormat", &VRXWarranty::localizedCoveredDeviceDateLabelFormat},
+    {"coverageLocalizedLabel", &VRXWarranty::coverageLocalizedLabel},
+    {"coverageLocalizedDesc", &VRXWarranty::coverageLocalizedDesc},
+    {"coverageLocalizedDescLong", &VRXWarranty::coverageLocalizedDescLong},
+    {"coverageLocalizedExpirationLabel", &VRXWarranty::coverageLocalizedExpirationLabel},
+    {"footer1FormatString", &VRXWarranty::footer1FormatString},
+    {"footer1LinkLabel", &VRXWarranty::footer1LinkLabel},
+    {"footer1LinkURL", &VRXWarranty::footer1LinkURL},
+    {"footer2FormatString", &VRXWarranty::footer2FormatString},
+    {"footer2LinkLabel", &VRXWarranty::footer2LinkLabel},
+    {"footer2LinkURL", &VRXWarranty::footer2LinkURL},
+    {"qxOfferIdentifier", &VRXWarranty::qxOfferIdentifier},
+    {"qxLocalizedOfferLabel", &VRXWarranty::qxLocalizedOfferLabel},
+    {"qxLocalizedOfferPluralDescFormat", &VRXWarranty::qxLocalizedOfferPluralDescFormat},
+    {"qxLocalizedOfferSingularDesc", &VRXWarranty::qxLocalizedOfferSingularDesc},
+    {"qxLocalizedOfferCTA", &VRXWarranty::qxLocalizedOfferCTA},
+    {"qxLocalizedOfferDetails", &VRXWarranty::qxLocalizedOfferDetails},
+    {"qxLocalizedOfferDetailsPluralEligibilityFormat", &VRXWarranty::qxLocalizedOfferDetailsPluralEligibilityFormat},
+    {"qxLocalizedOfferDetailsSingularEligibility", &VRXWarranty::qxLocalizedOfferDetailsSingularEligibility},
+    {"featureToggleParameters.qxOfferToggle", &VRXWarranty::qxOfferToggle},
+    {"qxOfferBadgeBeforeEndDate", &VRXWarranty::qxOfferBadgeDaysBeforeEndDate},
+    {"qxServicesPartner", &VRXWarranty::localizedCoverageSubTitleForServicesPartnerString},
+    {"localizedSupportAppLabel", &VRXWarranty::localizedSupportAppLabel},
+    {"localizedManagePlanLabel", &VRXWarranty::localizedManagePlanLabel},
+    {"kelURL", &VRXWarranty::kelURL},
+    {"supportAppURL", &VRXWarranty::supportAppURL},
+    {"coverage", &VRXWarranty::coverageDetailsDictionary},
+    {"coverage.localizedCoverageTitle", &VRXWarranty::localizedCoverageDetailsTitle},
+    {"coverage.coverageDetails", &VRXWarranty::coverageDetailsArray},
+    {"coverage.localizedCoverageFooterFormatString", &VRXWarranty::localizedCoverageFooterFormatString},
+    {"coverage.localizedCoverageFooterLinkLabel", &VRXWarranty::localizedCoverageFooterLinkLabel},
+    {"coverage.benefitsCard", &VRXWarranty::coverageBenefitsDictionary},
+    {"coverage.benefitsCard.localizedBenefitsCardTitle", &VRXWarranty::localizedBenefitsCardTitle},
+    {"coverage.benefitsCard.localizedBenefitsCardSubTitle", &VRXWarranty::localizedBenefitsCardSubTitle},
+    {"coverage.benefitsCard.benefitDetails", &VRXWarranty::benefitDetailsArray},
+    {"coverage.benefitsCard.localizedBenefitsCardFooter", &VRXWarranty::localizedBenefitsCardFooter},
+};
+const Places<Value> neverFilled{
+    {"localizedCoverageDetailsLabel", &VRXWarranty::localizedCoverageDetailsLabel},
+    {"localizedCoverageDetailsValue", &VRXWarranty::localizedCoverageDetailsValue},
+    {"localizedBenefitLabelKey", &VRXWarranty::localizedBenefitLabelKey},
+    {"localizedBenefitValueKey", &VRXWarranty::localizedBenefitValueKey},
+    {"serialNumber", &VRXWarranty::serialNumber},
+};
+
+// A dictionary that holds nothing but a value at a path of keys.
+Dictionary holding(std::string_view path, const Value& value) {
+    const std::size_t dot = path.rfind('.');
+    const Dictionary object{{std::string(path.substr(dot + 1)), value}};
+    return dot == path.npos ? object : holding(path.substr(0, dot), object);
 }
 
-TEST_F(WarrantyTest, WrongTypesReadAsAbsent) {
+template <class T>
+T fieldOf(const Dictionary& dictionary, T (VRXWarranty::*field)() const) {
+    return (*VRXWarranty::initWithDictionary(dictionary).*field)();
+}
+
+// Every field of a rule reads each of the values alike.
+template <class T>
+void expectReading(const Places<T>& places, const std::type_identity_t<T>& expected, const std::vector<Value>& values) {
+    for (const auto& [path, field] : places)
+        for (const Value& value : values)
+            EXPECT_EQ(fieldOf(holding(path, value), field), expected) << path << ": " << value.description();
+}
+
+// A field that is absent has its default, and so has one whose object is none.
+template <class T>
+void expectDefault(const Places<T>& places) {
+    for (const auto& [path, field] : places) {
+        EXPECT_EQ(fieldOf({{"unknown", 7}}, field), T()) << path;
+        for (std::size_t dot = path.find('.'); dot != path.npos; dot = path.find('.', dot + 1))
+            for (const Value& object : {Value("text"), Value(Array{1}), Value()})
+                EXPECT_EQ(fieldOf(holding(path.substr(0, dot), object), field), T()) << path << object.description();
+    }
+}
+
+const double infinity = std::numeric_limits<double>::infinity();
+
+TEST_F(WarrantyTest, ReadsFlagsFromTheirPlaces) {
+    expectReading(flags, true, {true, -0.5, "yes", " \t-007", "+T", std::nan("")});
+    expectReading(flags, false, {false, 0, "000", "", "   ", "no", "+-1", nullptr, Array{}});
+    expectDefault(flags);
+}
+
+TEST_F(WarrantyTest, ReadsDatesFromTheirPlaces) {
+    expectReading(epochs, dateFromEpoch(0), {0});
+    expectReading(epochs, dateFromEpoch(1700000000), {1700000000, 1700000000.9, 1700000000123});
+    expectReading(epochs, dateFromEpoch(10000000000), {10000000000});
+    expectReading(epochs, dateFromEpoch(10000000), {10000000001});
+    expectReading(epochs, dateFromEpoch(9223372036854775.0), {std::numeric_limits<std::int64_t>::max()});
+    expectReading(epochs, dateFromEpoch(18446744073709551.0), {1e308});
+    expectReading(epochs, {}, {-1, -0.5, "1700000000", true, nullptr, std::nan(""), infinity, Dictionary{}});
+    expectDefault(epochs);
+}
+
+TEST_F(WarrantyTest, ReadsNumbersOfDaysFromTheirPlaces) {
+    constexpr Duration day(86400);
+    expectReading(days, day, {1, true});
+    expectReading(days, 1.5 * day, {1.5, "1.5days"});
+    expectReading(days, -day, {"-1"});
+    expectReading(days, {}, {"x", 1e308, infinity, std::nan(""), nullptr, Dictionary{}});
+    expectDefault(days);
+}
+
+TEST_F(WarrantyTest, KeepsTheRestAsItWasSent) {
+    for (const Value& value : {Value("text"), Value(1.5), Value(false), Value(Array{1}), Value(Dictionary{{"k", 1}})})
+        expectReading(asSent, value, {value});
+    expectDefault(asSent);
+    expectReading(neverFilled, {}, {"text"});
+    EXPECT_FALSE(record({{"coverageValidityDate", 1}})->coverageValidityDate());
+    EXPECT_EQ(record({{"unknown", 7}})->dictionaryRepresentation(), Value(Dictionary{{"unknown", 7}}));
+}
+
+TEST_F(WarrantyTest, IsOfADictionaryHoweverEmpty) {
     EXPECT_FALSE(VRXWarranty::warrantyWithDictionary(nullptr));
     EXPECT_FALSE(VRXWarranty::warrantyWithDictionary(Array{1}));
-    auto warranty = record({{"covered", Array{}},
-                            {"coverageEndDate", "1700000000"},
-                            {"qxOfferBadgeBeforeEndDate", Dictionary{}},
-                            {"featureToggleParameters", nullptr},
-                            {"coverage", "text"}});
-    ASSERT_TRUE(warranty);
-    EXPECT_FALSE(warranty->covered());
-    EXPECT_FALSE(warranty->coverageEndDate());
-    EXPECT_EQ(warranty->qxOfferBadgeDurationBeforeEndDate(), Duration(0));
-    EXPECT_FALSE(warranty->qxOfferDisplay());
-    EXPECT_EQ(warranty->coverageDetailsDictionary(), Value("text"));
-    EXPECT_TRUE(warranty->benefitDetailsArray().isNull());
-
-    auto empty = record({});
-    ASSERT_TRUE(empty);
-    EXPECT_EQ(empty->daysEligible(), 0u);
-    EXPECT_TRUE(empty->qxLocalizedOfferDesc().isNull());
-}
-
-TEST_F(WarrantyTest, ReadsFlagsAndDays) {
-    const std::pair<Value, bool> flags[] = {{true, true},     {false, false},      {0, false},     {-0.5, true},
-                                            {"yes", true},    {" \t-007", true},   {"000", false}, {"", false},
-                                            {"   ", false},   {"+T", true},        {"no", false},  {"+-1", false},
-                                            {nullptr, false}, {std::nan(""), true}};
-    for (const auto& [value, expected] : flags)
-        EXPECT_EQ(record({{"covered", value}})->covered(), expected) << value.description();
-    const std::pair<Value, double> days[] = {{2, 172800},
-                                             {"1.5days", 129600},
-                                             {"x", 0},
-                                             {true, 86400},
-                                             {"-1", -86400.0},
-                                             {1e308, 0},
-                                             {std::numeric_limits<double>::infinity(), 0},
-                                             {std::nan(""), 0},
-                                             {nullptr, 0}};
-    for (const auto& [value, expected] : days)
-        EXPECT_EQ(record({{"qxOfferBadgeBeforeEndDate", value}})->qxOfferBadgeDurationBeforeEndDate(),
-                  Duration(expected))
-            << value.description();
-}
-
-TEST_F(WarrantyTest, ReadsEpochNumbers) {
-    const std::pair<Value, std::optional<double>> epochs[] = {
-        {1700000000, 1700000000},
-        {1700000000123, 1700000000},
-        {10000000000, 10000000000},
-        {10000000001, 10000000},
-        {1700000000.9, 1700000000},
-        {0, 0},
-        {-1, std::nullopt},
-        {-0.5, std::nullopt},
-        {"1700000000", std::nullopt},
-        {true, std::nullopt},
-        {nullptr, std::nullopt},
-        {std::nan(""), std::nullopt},
-        {std::numeric_limits<double>::infinity(), std::nullopt},
-        {std::numeric_limits<std::int64_t>::max(), 9223372036854775.0},
-        {1e308, 18446744073709551.0}};
-    for (const auto& [value, expected] : epochs) {
-        auto date = VRXWarranty::_dateWithEpochNumber(value);
-        ASSERT_EQ(date.has_value(), expected.has_value()) << value.description();
-        EXPECT_EQ(date.value_or(dateFromEpoch(0)), dateFromEpoch(expected.value_or(0))) << value.description();
-    }
+    ASSERT_TRUE(record({}));
+    EXPECT_EQ(record({})->daysEligible(), 0u);
+    EXPECT_TRUE(record({})->qxLocalizedOfferDesc().isNull());
 }
 
 TEST_F(WarrantyTest, CountsDaysUpwards) {
@@ -169,15 +209,13 @@ TEST_F(WarrantyTest, IsEqualByItsDictionaryAndSurvivesTheArchive) {
     EXPECT_FALSE(warranty->isEqual(record({{"covered", true}}).get()));
     EXPECT_FALSE(warranty->isEqual(nullptr));
 
-    auto restored = codec::unarchive<VRXWarranty>(codec::archive(*warranty));
-    ASSERT_TRUE(restored) << restored.error().text;
-    EXPECT_TRUE(warranty->isEqual(restored->get()));
-
+    auto restored = [](const VRXWarranty& from) {
+        return valueOf(codec::unarchive<VRXWarranty>(codec::archive(from)));
+    };
+    EXPECT_TRUE(warranty->isEqual(restored(*warranty).get()));
     // Nulls and data have no place in the archive; the rest of the record still arrives.
-    auto holed = codec::unarchive<VRXWarranty>(
-        codec::archive(*record({{"covered", true}, {"kelURL", nullptr}, {"list", Array{nullptr, 1, Data{1}}}})));
-    ASSERT_TRUE(holed);
-    EXPECT_EQ((*holed)->dictionaryRepresentation(), Value(Dictionary{{"covered", true}, {"list", Array{1}}}));
+    auto holed = record({{"covered", true}, {"kelURL", nullptr}, {"list", Array{nullptr, 1, Data{1}}}});
+    EXPECT_EQ(restored(*holed)->dictionaryRepresentation(), Value(Dictionary{{"covered", true}, {"list", Array{1}}}));
 }
 
 }  // namespace
