@@ -1,8 +1,8 @@
 // The input is an answer's headers, a line each. Whatever they are, the cache stays within its bounds, keeps nothing
 // that no-store forbids, and asks about what it keeps by headers that can be sent.
 #include <cmath>
-#include <cstdlib>
 
+#include "require.h"
 #include "vrx/host/base/text.h"
 #include "vrx/host/http/http_cache.h"
 #include "vrx/host/http/http_cache_rules.h"
@@ -15,10 +15,6 @@ struct StillClock final : platform::Clock {
     platform::Date now() const override { return platform::dateFromEpoch(784'111'777); }
     std::chrono::seconds timeZoneOffset() const override { return {}; }
 } still;
-
-void expect(bool isTrue) {
-    if (!isTrue) std::abort();
-}
 
 }  // namespace
 
@@ -33,15 +29,15 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t siz
     static host::HttpCache cache(still, 4096);
     const std::string url = "https://host/" + std::to_string(size);
     cache.store(url, still.now(), answer);
-    expect(cache.bytes() <= 4096);
+    require(cache.bytes() <= 4096);
     const auto stored = cache.find(url);
     const platform::Duration age = host::ageOnArrival(answer.headers, still.now(), still.now());
     const platform::Duration lifetime = host::freshnessLifetime(answer.headers, still.now());
-    expect(age.count() >= 0 && lifetime.count() >= 0 && std::isfinite(age.count() + lifetime.count()));
+    require(age.count() >= 0 && lifetime.count() >= 0 && std::isfinite(age.count() + lifetime.count()));
     if (!stored) return 0;
-    expect(host::parseCacheControl(answer.headers["Cache-Control"]).isStorable);
-    expect(cache.freshAnswer(*stored).has_value() == (age < lifetime));
-    for (const auto& [name, value] : host::revalidationHeaders(stored->answer.headers)) expect(host::isOneLine(value));
-    expect(cache.revalidated(*stored, still.now(), answer.headers).status == 200);
+    require(host::parseCacheControl(answer.headers["Cache-Control"]).isStorable);
+    require(cache.freshAnswer(*stored).has_value() == (age < lifetime));
+    for (const auto& [name, value] : host::revalidationHeaders(stored->answer.headers)) require(host::isOneLine(value));
+    require(cache.revalidated(*stored, still.now(), answer.headers).status == 200);
     return 0;
 }

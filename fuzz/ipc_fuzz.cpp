@@ -5,12 +5,12 @@
 #include <systemd/sd-bus.h>
 
 #include <atomic>
-#include <cstdlib>
-#include <cstring>
 #include <string>
 
+#include "client/fake_agent.h"
+#include "client/raw_client.h"
+#include "require.h"
 #include "vrx/codec/core/keyed_archive.h"
-#include "vrx/devices/records/device_info.h"
 #include "vrx/host/ipc/client_session.h"
 #include "vrx/host/log/system_log.h"
 #include "vrx/host/loop/main_loop.h"
@@ -21,10 +21,6 @@
 using namespace vrx;
 
 namespace {
-
-void require(bool holds) {
-    if (!holds) std::abort();
-}
 
 // Two authenticated ends of a bus in one thread. Bytes that are written past the one end arrive at the other.
 class BusPair {
@@ -46,28 +42,10 @@ public:
         sd_bus_close_unref(server_);
     }
 
-    platform::Result<platform::Value> readBody(std::string body) {
+    platform::Result<platform::Value> readBody(const std::string& body) {
         // A signal whose signature is that of replies.
-        std::string message("l\x04\x01\x01\0\0\0\0\x01\0\0\0\0\0\0\0", 16);
-        auto addField = [&](char code, char type, const std::string& value) {
-            message.resize((message.size() + 7) / 8 * 8);
-            message += {code, '\x01', type, '\0'};
-            if (type == 'g')
-                message += static_cast<char>(value.size());
-            else
-                message += {static_cast<char>(value.size()), '\0', '\0', '\0'};
-            message += value + '\0';
-        };
-        addField(1, 'o', "/a");
-        addField(2, 's', "a.b");
-        addField(3, 's', "c");
-        addField(8, 'g', "a{sv}");
-        auto fieldBytes = static_cast<std::uint32_t>(message.size() - 16);
-        auto bodyBytes = static_cast<std::uint32_t>(body.size());
-        std::memcpy(message.data() + 4, &bodyBytes, 4);
-        std::memcpy(message.data() + 12, &fieldBytes, 4);
-        message.resize((message.size() + 7) / 8 * 8);
-        message += body;
+        const std::string message = test::RawClient::message(
+            '\x04', 1, {{1, 'o', "/a"}, {2, 's', "a.b"}, {3, 's', "c"}, {8, 'g', "a{sv}"}}, body);
         require(write(raw_, message.data(), message.size()) == static_cast<ssize_t>(message.size()));
         result_.reset();
         int r = 1;
@@ -107,28 +85,19 @@ void fuzzReply(const std::string& body) {
     sd_bus_message_unref(again);
 }
 
-class Agent final : public VRXAgentProtocol {
-    void scheduleOutreachWithReply(Reply<bool> reply) override { reply(true); }
-    void checkIsAvailableInStore(std::string id, Reply<platform::Value> reply) override {
-        reply(platform::Dictionary{{id, 1}});
+// Echoes what it is asked for, and answers at once.
+struct Agent final : test::FakeAgent {
+    Agent() {
+        onStore = [](std::string id, Reply<platform::Value> reply) { reply(platform::Dictionary{{id, 1}}); };
+        onDeviceInfo = [](std::string serialNumber, Reply<std::shared_ptr<VRXDeviceInfo>> reply) {
+            auto device = VRXDevice::deviceWithName(serialNumber, serialNumber, std::nullopt, VRXDeviceTypeOther);
+            reply(VRXDeviceInfo::deviceInfoWithDevice(device, nullptr));
+        };
     }
     void appSupportAvailability(std::string id, Reply<platform::Value> reply) override { reply(id); }
-    void readWebURLOverride(Reply<std::optional<std::string>> reply) override { reply("u"); }
-    void defaultDevice(Reply<std::shared_ptr<VRXDevice>> reply) override { reply(nullptr); }
-    void pairedDevices(Reply<DeviceList> reply) override { reply({}); }
-    void getDefaultDeviceInfoUsingPolicy(VRXWarrantyLookupPolicy,
-                                         Reply<std::shared_ptr<VRXDeviceInfo>> reply) override {
-        reply(nullptr);
-    }
-    void getDeviceInfoForSerialNumber(std::string serialNumber, VRXWarrantyLookupPolicy,
-                                      Reply<std::shared_ptr<VRXDeviceInfo>> reply) override {
-        auto device = VRXDevice::deviceWithName(serialNumber, serialNumber, std::nullopt, VRXDeviceTypeOther);
-        reply(VRXDeviceInfo::deviceInfoWithDevice(device, nullptr));
-    }
     void getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicy, bool, Reply<DeviceInfoList> reply) override {
         reply({});
     }
-    void dismissFollowUpForSerialNumber(std::string, Reply<bool> reply) override { reply(true); }
 };
 
 void fuzzRequests(const std::string& bytes) {
@@ -146,9 +115,7 @@ void fuzzRequests(const std::string& bytes) {
     host::ProcessLifecycle lifecycle(mainLoop);
     host::ClientSession session(std::move(agentEnd), *peer, std::make_shared<Agent>(),
                                 std::make_shared<host::ReplyBox>(), limits, lifecycle);
-    std::string hex;
-    for (char digit : std::to_string(getuid())) hex += std::string("3") + digit;
-    const std::string sent = std::string(1, '\0') + "AUTH EXTERNAL " + hex + "\r\nBEGIN\r\n" + bytes;
+    const std::string sent = test::RawClient::authentication() + bytes;
     [[maybe_unused]] ssize_t size = write(ends[1], sent.data(), sent.size());
     shutdown(ends[1], SHUT_WR);
     session.serve(std::atomic<bool>(false));

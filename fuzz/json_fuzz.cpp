@@ -1,6 +1,5 @@
 // Whatever parses is written and read back equal, in every layout.
-#include <cstdlib>
-
+#include "require.h"
 #include "vrx/codec/json.h"
 
 using namespace vrx;
@@ -9,11 +8,11 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t siz
     const auto value = codec::parseJson({reinterpret_cast<const char*>(bytes), size});
     if (!value) return 0;
     const auto written = codec::serializeJson(*value);
-    if (!written) std::abort();
+    require(written.has_value());
     for (const std::string& text : {*written, codec::printedJson(*value, codec::JsonLayout::OneLine),
                                     codec::printedJson(*value, codec::JsonLayout::Indented)}) {
         const auto again = codec::parseJson(text);
-        if (!again || *again != *value) std::abort();
+        require(again && *again == *value);
     }
     return 0;
 }

@@ -1,6 +1,5 @@
 // A document, taken once for what a record holds and once for the archive that a peer sends.
-#include <cstdlib>
-
+#include "require.h"
 #include "vrx/codec/core/keyed_archive.h"
 #include "vrx/codec/json.h"
 #include "vrx/codec/property_list.h"
@@ -33,10 +32,6 @@ struct Node final : platform::Archivable {
     std::int64_t number = 0;
     std::shared_ptr<Node> next;
 };
-
-void require(bool holds) {
-    if (!holds) std::abort();
-}
 
 // Texts tell apart what does not equal itself.
 bool same(const Value& a, const Value& b) {

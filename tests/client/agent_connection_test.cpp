@@ -6,7 +6,8 @@
 #include <atomic>
 #include <barrier>
 
-#include "client/fake_agent.h"
+#include "client/fake_service.h"
+#include "client/raw_client.h"
 
 namespace vrx::test {
 namespace {
@@ -16,22 +17,11 @@ using client::Failure;
 using testing::ElementsAre;
 using testing::HasSubstr;
 
-// What only the encoding's exceptions carry.
-const Value awkwardRecord = platform::Dictionary{
-    {"covered", true},
-    {"", "empty key"},
-    {"$class", "VRXDevice"},
-    {"$$", platform::Dictionary{{"$date", 5}}},
-    {std::string("k\0y", 3), std::string("v\0lue", 5)},
-    {"\xef\xbf\xbe", "\xef\xb7\x90"},
-    {"list", platform::Array{1, 2.5, false, "x", platform::Array{}, platform::Dictionary{}}},
-    {"large", std::int64_t{1} << 62},
-};
-
 using AgentConnectionTest = WithFakeAgent;
 
 TEST_F(AgentConnectionTest, AsksEveryOperationAndWaits) {
-    agent->record = awkwardRecord;
+    agent->record = platform::Dictionary{
+        {"covered", true}, {"", "empty key"}, {"$class", "VRXDevice"}, {"$$", platform::Dictionary{{"$date", 5}}}};
     AgentConnection connection(options());
 
     EXPECT_TRUE(*connection.scheduleOutreachWithReply());
@@ -46,7 +36,7 @@ TEST_F(AgentConnectionTest, AsksEveryOperationAndWaits) {
     EXPECT_EQ((*connection.getDefaultDeviceInfoUsingPolicy(VRXWarrantyLookupPolicyRefresh))->device()->serialNumber(),
               "SN1");
     auto info = *connection.getDeviceInfoForSerialNumber("SN7", 77);
-    EXPECT_EQ(info->warranty()->dictionaryRepresentation(), awkwardRecord);
+    EXPECT_EQ(info->warranty()->dictionaryRepresentation(), agent->record);
     EXPECT_TRUE(info->warranty()->covered());
     EXPECT_EQ(connection.getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicyCachedOnly, true)->size(), 2u);
     EXPECT_TRUE(*connection.dismissFollowUpForSerialNumber("SN1"));
@@ -96,6 +86,17 @@ TEST_F(AgentConnectionTest, TellsWhyThereIsNoAnswer) {
     awaitHeld();
     answerHeld();  // late, and for nobody
     EXPECT_TRUE(*connection.defaultDevice());
+
+    // Nor does a call come through where nobody is accepted and the queue is full.
+    host::TemporaryFolder folder;
+    host::ListeningSocket full;
+    ASSERT_FALSE(full.open(folder / "socket"));
+    ASSERT_EQ(listen(full.number(), 0), 0);
+    const RawClient first(folder / "socket");
+    AgentConnection late({.socketPath = folder / "socket", .timeLimit = platform::Duration(0.05)});
+    const Failure failure = late.scheduleOutreachWithReply().failure();
+    EXPECT_EQ(failure.kind, Failure::Kind::TimedOut);
+    EXPECT_THAT(failure.text, HasSubstr("timed out"));
 
     std::string failed;
     {

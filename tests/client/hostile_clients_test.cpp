@@ -1,9 +1,7 @@
 // Clients that err or mean harm: each is dealt with alone, and the agent goes on serving others.
-#include <fcntl.h>
 #include <gtest/gtest.h>
-#include <sys/wait.h>
 
-#include "client/fake_agent.h"
+#include "client/fake_service.h"
 #include "client/raw_client.h"
 
 namespace vrx::test {
@@ -32,29 +30,20 @@ TEST_F(HostileClients, AuthenticateAndCallInOneWrite) {
 }
 
 TEST_F(HostileClients, WriteGarbage) {
-    std::string huge = RawClient::call("defaultDevice", 1);
-    huge[7] = 5;  // 80 MiB of body are to come
-    const std::string half = RawClient::call("defaultDevice", 1).substr(0, 40);
-    for (const std::string& bytes : {std::string("GET / HTTP/1.1\r\n\r\n"), std::string(100'000, '\0'),
-                                     RawClient::authentication() + std::string(64, '\xff'),
-                                     std::string(1, '\0') + "AUTH EXTERNAL 39393939\r\nBEGIN\r\n"}) {
+    const std::string authentication = RawClient::authentication(), call = RawClient::call("defaultDevice", 1);
+    for (const std::string& bytes :
+         {std::string("GET / HTTP/1.1\r\n\r\n"), std::string(100'000, '\0'), authentication + std::string(64, '\xff'),
+          std::string(1, '\0') + "AUTH EXTERNAL 39393939\r\nBEGIN\r\n", authentication + call.substr(0, 40)}) {
         RawClient client = rawClient(bytes);
         shutdown(client.file(), SHUT_WR);
         EXPECT_TRUE(client.isClosedByAgent());
     }
-    {
-        RawClient client = rawClient(RawClient::authentication() + half);
-        shutdown(client.file(), SHUT_WR);
-        EXPECT_TRUE(client.isClosedByAgent());
-    }
-    {
-        RawClient client = rawClient(RawClient::authentication());
-        ASSERT_TRUE(client.readUntil("OK "));
-        client.write(RawClient::call("defaultDevice", 1));
-        ASSERT_TRUE(client.readUntil("Phone"));
-        client.write(huge);
-        EXPECT_TRUE(client.isClosedByAgent()) << "a message is too long, by its header";
-    }
+    std::string huge = call;
+    huge[7] = 5;  // 80 MiB of body are to come
+    RawClient client = rawClient(authentication + call);
+    ASSERT_TRUE(client.readUntil("Phone"));
+    client.write(huge);
+    EXPECT_TRUE(client.isClosedByAgent()) << "a message is too long, by its header";
     expectGoesOn();
     EXPECT_EQ(agent->requests().size(), 2u);
 }
@@ -107,7 +96,7 @@ TEST_F(HostileClients, ComeTwoHundredAtOnce) {
     // A place is free once the agent has seen a client go: asked until it has.
     clients.clear();
     client::AgentConnection connection(options());
-    while (!connection.defaultDevice()) std::this_thread::yield();
+    eventually([&] { return bool(connection.defaultDevice()); }, "a free place");
 }
 
 // The programs of others must not use what this one was entitled to.
@@ -115,12 +104,9 @@ TEST_F(HostileClients, HandTheirConnectionToAnotherProcess) {
     const std::string call = RawClient::call("readWebURLOverride", 2);
     RawClient client = rawClient(RawClient::authentication() + RawClient::call("defaultDevice", 1));
     ASSERT_TRUE(client.readUntil("Phone"));
-    if (const pid_t child = fork(); child == 0) {
-        [[maybe_unused]] ssize_t size = write(client.file(), call.data(), call.size());
-        _exit(0);
-    }
+    const pid_t child = host::inChild([&] { client.write(call); });
     EXPECT_TRUE(client.isClosedByAgent());
-    wait(nullptr);
+    EXPECT_EQ(host::endOf(child), 0);
     EXPECT_EQ(agent->requests().size(), 1u);
 }
 
@@ -128,35 +114,20 @@ TEST_F(HostileClients, RunAnotherProgram) {
     const std::string path = service->socketPath();
     const std::string first = RawClient::authentication() + RawClient::call("defaultDevice", 1);
     const std::string callFile = path + ".call";
-    {
-        const int file = open(callFile.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0600);
-        const std::string second = RawClient::call("readWebURLOverride", 2);
-        ASSERT_EQ(write(file, second.data(), second.size()), static_cast<ssize_t>(second.size()));
-        close(file);
-    }
-    if (const pid_t child = fork(); child == 0) {
-        sockaddr_un address{};
-        address.sun_family = AF_UNIX;
-        std::memcpy(address.sun_path, path.c_str(), path.size());
-        const int file = socket(AF_UNIX, SOCK_STREAM, 0);
-        char buffer[4096];
-        if (connect(file, reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0 &&
-            write(file, first.data(), first.size()) > 0)
-            for (std::size_t size = 0; !memmem(buffer, size, "Phone", 5);)
-                size += static_cast<std::size_t>(read(file, buffer + size, sizeof buffer - size));
-        dup2(file, 0);
+    host::writeFile(callFile, RawClient::call("readWebURLOverride", 2));
+    const pid_t child = host::inChild([&] {
+        RawClient client(path);
+        if (!client.write(first) || !client.readUntil("Phone")) _exit(1);
+        dup2(client.file(), 0);
         dup2(open("/dev/null", O_WRONLY), 1);
         // It writes the call itself, in the process that connected, and then reads to the end.
         execl("/usr/bin/perl", "perl", "-e",
               "open(C,'<',$ARGV[0]);local $/;$c=<C>;open(S,'+<&=0');syswrite(S,$c);while(sysread(S,$b,4096)){}",
               callFile.c_str(), nullptr);
-        _exit(1);
-    }
-    int status = 0;
-    wait(&status);
-    EXPECT_EQ(status, 0);
+        _exit(2);
+    });
+    EXPECT_EQ(host::endOf(child), 0);
     EXPECT_EQ(agent->requests().size(), 1u);
-    unlink(callFile.c_str());
 }
 
 }  // namespace

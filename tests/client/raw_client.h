@@ -1,38 +1,34 @@
 // A client that writes D-Bus's bytes itself, well or badly.
 #pragma once
 
-#include <poll.h>
-#include <sys/socket.h>
-#include <sys/un.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <cstdint>
-#include <cstring>
 #include <string>
+#include <vector>
+
+#include "support/sockets.h"
+#include "vrx/host/base/descriptor.h"
 
 namespace vrx::test {
 
 class RawClient {
 public:
     explicit RawClient(const std::string& path) : file_(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0)) {
-        sockaddr_un address{};
-        address.sun_family = AF_UNIX;
-        std::memcpy(address.sun_path, path.c_str(), path.size());
-        isConnected_ = connect(file_, reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0;
+        const timeval minute{60, 0};  // what does not come by then, never comes
+        setsockopt(file(), SOL_SOCKET, SO_RCVTIMEO, &minute, sizeof minute);
+        isConnected_ = connectTo(file(), addressOf(path));
     }
-    RawClient(RawClient&& other) noexcept : file_(std::exchange(other.file_, -1)), isConnected_(other.isConnected_) {}
-    ~RawClient() { close(); }
-    void close() {
-        if (file_ >= 0) ::close(std::exchange(file_, -1));
-    }
+    void close() { file_ = host::Descriptor(); }
 
-    int file() const { return file_; }
+    int file() const { return file_.number(); }
     bool isConnected() const { return isConnected_; }
 
     // False when the agent has closed.
     bool write(const std::string& bytes) {
         for (std::size_t sent = 0; sent < bytes.size();) {
-            ssize_t size = send(file_, bytes.data() + sent, bytes.size() - sent, MSG_NOSIGNAL);
+            ssize_t size = send(file(), bytes.data() + sent, bytes.size() - sent, MSG_NOSIGNAL);
             if (size <= 0) return false;
             sent += static_cast<std::size_t>(size);
         }
@@ -43,13 +39,14 @@ public:
     bool readUntil(const std::string& text) {
         while (received_.find(text) == std::string::npos) {
             char buffer[4096];
-            ssize_t size = read(file_, buffer, sizeof buffer);
+            ssize_t size = read(file(), buffer, sizeof buffer);
+            isLate_ = size < 0 && errno == EAGAIN;
             if (size <= 0) return false;
             received_.append(buffer, static_cast<std::size_t>(size));
         }
         return true;
     }
-    bool isClosedByAgent() { return !readUntil("\x01never\x02"); }
+    bool isClosedByAgent() { return !readUntil("\x01never\x02") && !isLate_; }
     const std::string& received() const { return received_; }
 
     static std::string authentication() {
@@ -59,43 +56,55 @@ public:
         return std::string(1, '\0') + "AUTH EXTERNAL " + hex + "\r\nBEGIN\r\n";
     }
 
+    struct Field {
+        char code;
+        char type;
+        std::string value;
+    };
+    // A message of the bus: its type is that of calls, signals and so on.
+    static std::string message(char type, std::uint32_t serial, const std::vector<Field>& fields,
+                               const std::string& body) {
+        std::string header;
+        for (const Field& field : fields) {
+            pad(header);
+            header += {field.code, '\x01', field.type, '\0'};
+            if (field.type == 'g')
+                header += std::string(1, static_cast<char>(field.value.size())) + field.value + '\0';
+            else
+                addString(header, field.value);
+        }
+        std::string message{'l', type, '\0', '\x01'};
+        for (std::size_t number : {body.size(), std::size_t{serial}, header.size()}) addNumber(message, number);
+        message += header;
+        pad(message);
+        return message + body;
+    }
     // A call of an operation with no arguments, or with one string.
     static std::string call(const std::string& member, std::uint32_t serial, const std::string* argument = nullptr) {
-        std::string fields;
-        addField(fields, 1, "o", "/com/orvane/vrxagent");
-        addField(fields, 2, "s", "com.orvane.VRXAgentProtocol");
-        addField(fields, 3, "s", member);
-        if (argument) addField(fields, 8, "g", "s");
+        std::vector<Field> fields{
+            {1, 'o', "/com/orvane/vrxagent"}, {2, 's', "com.orvane.VRXAgentProtocol"}, {3, 's', member}};
         std::string body;
-        if (argument) addString(body, *argument);
-        std::string message("l\x01\x00\x01", 4);
-        addNumber(message, static_cast<std::uint32_t>(body.size()));
-        addNumber(message, serial);
-        addNumber(message, static_cast<std::uint32_t>(fields.size()));
-        message += fields;
-        message.resize((message.size() + 7) / 8 * 8);
-        return message + body;
+        if (argument) {
+            fields.push_back({8, 'g', "s"});
+            addString(body, *argument);
+        }
+        return message('\x01', serial, fields, body);
     }
 
 private:
-    static void addNumber(std::string& bytes, std::uint32_t number) {
-        bytes.append(reinterpret_cast<const char*>(&number), sizeof number);
+    static void pad(std::string& bytes) { bytes.resize((bytes.size() + 7) / 8 * 8); }
+    static void addNumber(std::string& bytes, std::size_t number) {
+        const auto word = static_cast<std::uint32_t>(number);
+        bytes.append(reinterpret_cast<const char*>(&word), sizeof word);
     }
     static void addString(std::string& bytes, const std::string& text) {
-        addNumber(bytes, static_cast<std::uint32_t>(text.size()));
+        addNumber(bytes, text.size());
         bytes += text + '\0';
     }
-    static void addField(std::string& fields, char code, const std::string& type, const std::string& value) {
-        fields.resize((fields.size() + 7) / 8 * 8);
-        fields += std::string(1, code) + '\x01' + type + '\0';
-        if (type == "g")
-            fields += std::string(1, static_cast<char>(value.size())) + value + '\0';
-        else
-            addString(fields, value);
-    }
 
-    int file_;
+    host::Descriptor file_;
     bool isConnected_ = false;
+    bool isLate_ = false;
     std::string received_;
 };
 

@@ -1,12 +1,8 @@
 // What every host's account store does, simulated or real. The real one renews by a helper that is a line of shell.
 #include "vrx/platform/account_store.h"
 
-#include <gtest/gtest.h>
-
-#include "host/support.h"
+#include "contract/hosts.h"
 #include "vrx/host/account/account_store.h"
-#include "vrx/host/loop/queues.h"
-#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {
@@ -47,14 +43,10 @@ TEST(AccountStoreContract, Simulated) {
 }
 
 TEST(AccountStoreContract, Real) {
-    host::LogRecorder log;
-    host::TemporaryFolder folder;
-    host::MainLoop loop;
-    host::Queues queues{loop, 2};
-    host::DeviceProfile profile{folder / "device.toml"};
-    host::AccountStore store{profile, folder.path()};
-    expectContract(store, queues, [&](const std::optional<std::string>& token) {
-        host::writeFile(profile.path(),
+    RealHost real;
+    host::AccountStore store{real.profile, real.folder.path()};
+    expectContract(store, real.queues(), [&](const std::optional<std::string>& token) {
+        host::writeFile(real.profile.path(),
                         "[account]\nidentifier = 'user@cloud'\nalt_dsid = 'ALT-1'\n"
                         "credential_helper = ['/bin/sh', '-c', 'echo token=" +
                             token.value_or("") + "']");

@@ -5,9 +5,9 @@
 
 #include <chrono>
 
+#include "contract/hosts.h"
 #include "host/activities/real_activities.h"
 #include "vrx/platform/activity_timing.h"
-#include "vrx/sim/host.h"
 
 namespace vrx {
 namespace {
@@ -76,14 +76,8 @@ protected:
     Subject subject;
 };
 
-struct Names {
-    template <class Subject>
-    static std::string GetName(int) {
-        return std::is_same_v<Subject, SimulatedActivities> ? "Simulated" : "Real";
-    }
-};
 using Subjects = testing::Types<SimulatedActivities, RealActivities>;
-TYPED_TEST_SUITE(BackgroundActivitiesContract, Subjects, Names);
+TYPED_TEST_SUITE(BackgroundActivitiesContract, Subjects, HostNames);
 
 TYPED_TEST(BackgroundActivitiesContract, FireOnceASecondAfterTheDelay) {
     this->monitor();

@@ -3,12 +3,9 @@
 
 #include <gmock/gmock.h>
 
-#include <cmath>
 #include <limits>
 
-#include "host/support.h"
-#include "vrx/host/home/defaults_store.h"
-#include "vrx/sim/host.h"
+#include "contract/hosts.h"
 
 namespace vrx {
 namespace {
@@ -19,44 +16,9 @@ using platform::Date;
 using platform::Dictionary;
 using platform::Value;
 
-class SimulatedStore {
-public:
-    platform::DefaultsStore& store() { return host_.defaults; }
-    // What the next process finds.
-    void restart() { host_.defaults.forgetRegistered(); }
-    std::size_t loggedLines() const { return host_.log.messages(platform::Level::Default).size(); }
-
-private:
-    sim::Host host_;
-};
-
-class RealStore {
-public:
-    platform::DefaultsStore& store() { return *store_; }
-    void restart() { store_.emplace(database_.emplace(folder_ / "host.db")); }
-    std::size_t loggedLines() const { return log_.lines().size(); }
-
-private:
-    host::LogRecorder log_;
-    host::TemporaryFolder folder_;
-    std::optional<host::Database> database_{folder_ / "host.db"};
-    std::optional<host::DefaultsStore> store_{*database_};
-};
-
-template <class Subject>
-class DefaultsStoreContract : public testing::Test {
-protected:
-    Subject subject;
-};
-
-struct Names {
-    template <class Subject>
-    static std::string GetName(int) {
-        return std::is_same_v<Subject, SimulatedStore> ? "Simulated" : "Real";
-    }
-};
-using Subjects = testing::Types<SimulatedStore, RealStore>;
-TYPED_TEST_SUITE(DefaultsStoreContract, Subjects, Names);
+template <class Host>
+using DefaultsStoreContract = ContractTest<Host>;
+TYPED_TEST_SUITE(DefaultsStoreContract, Hosts, HostNames);
 
 TYPED_TEST(DefaultsStoreContract, KeepsEveryKindOfValueAcrossProcesses) {
     const Dictionary values{
@@ -73,19 +35,19 @@ TYPED_TEST(DefaultsStoreContract, KeepsEveryKindOfValueAcrossProcesses) {
         {"dictionary", Dictionary{{"list", Array{1, "two", 3.5}}, {"", Dictionary{}}}},
         {"", "the empty key"},
     };
-    for (const auto& [key, value] : values) this->subject.store().set(key, value);
-    this->subject.restart();
+    for (const auto& [key, value] : values) this->host.defaults().set(key, value);
+    this->host.restart();
     for (const auto& [key, value] : values) {
-        Value read = this->subject.store().get(key);
+        Value read = this->host.defaults().get(key);
         EXPECT_EQ(read, value) << key;
         EXPECT_EQ(read.type(), value.type()) << key;
     }
-    EXPECT_EQ(this->subject.store().dictionaryRepresentation(), values);
-    EXPECT_EQ(this->subject.loggedLines(), 0u);
+    EXPECT_EQ(this->host.defaults().dictionaryRepresentation(), values);
+    EXPECT_EQ(this->host.loggedLines(), 0u);
 }
 
 TYPED_TEST(DefaultsStoreContract, PutsStoredValuesBeforeRegisteredOnes) {
-    platform::DefaultsStore& store = this->subject.store();
+    platform::DefaultsStore& store = this->host.defaults();
     store.registerDefaults({{"a", 1}, {"b", 1}});
     store.registerDefaults({{"b", 2}, {"c", 2}});
     store.set("a", "stored");
@@ -100,12 +62,12 @@ TYPED_TEST(DefaultsStoreContract, PutsStoredValuesBeforeRegisteredOnes) {
     EXPECT_EQ(store.get("c"), Value(2)) << "there was none to remove";
 
     store.set("b", false);
-    this->subject.restart();
-    EXPECT_EQ(this->subject.store().dictionaryRepresentation(), (Dictionary{{"b", false}}));
+    this->host.restart();
+    EXPECT_EQ(this->host.defaults().dictionaryRepresentation(), (Dictionary{{"b", false}}));
 }
 
 TYPED_TEST(DefaultsStoreContract, UpdatesWhatIsThere) {
-    platform::DefaultsStore& store = this->subject.store();
+    platform::DefaultsStore& store = this->host.defaults();
     store.registerDefaults({{"list", Array{0}}});
     auto append = [&](const char* key, int number) {
         store.update(key, [number](const Value& value) {
@@ -124,28 +86,25 @@ TYPED_TEST(DefaultsStoreContract, UpdatesWhatIsThere) {
 }
 
 TYPED_TEST(DefaultsStoreContract, LogsAWriteThatFailsAndKeepsTheEarlierValue) {
-    platform::DefaultsStore& store = this->subject.store();
+    platform::DefaultsStore& store = this->host.defaults();
     store.set("key", "earlier");
     store.set("key", Dictionary{{"null", nullptr}});
-    EXPECT_EQ(this->subject.loggedLines(), 1u);
+    EXPECT_EQ(this->host.loggedLines(), 1u);
     store.update("key", [](const Value&) { return Value(Array{Value()}); });
-    EXPECT_EQ(this->subject.loggedLines(), 2u);
+    EXPECT_EQ(this->host.loggedLines(), 2u);
     EXPECT_EQ(store.get("key"), Value("earlier"));
 }
 
 TYPED_TEST(DefaultsStoreContract, ReadsByType) {
-    platform::DefaultsStore& store = this->subject.store();
-    store.set("number", 86400.9);
-    store.set("text", "12 days");
-    store.set("true", true);
-    store.set("date", platform::dateFromEpoch(5));
-    store.set("dictionary", Dictionary{{"a", 1}});
-
-    EXPECT_EQ(store.integer("number"), 86400);
-    EXPECT_EQ(store.integer("text"), 12);
-    EXPECT_EQ(store.integer("true"), 1);
-    EXPECT_EQ(store.integer("date"), 0);
-    EXPECT_EQ(store.integer("absent"), 0);
+    platform::DefaultsStore& store = this->host.defaults();
+    for (const auto& [key, value] : Dictionary{{"number", 86400.9},
+                                               {"text", "12 days"},
+                                               {"true", true},
+                                               {"date", platform::dateFromEpoch(5)},
+                                               {"dictionary", Dictionary{{"a", 1}}}})
+        store.set(key, value);
+    for (auto [key, number] : {std::pair("number", 86400), {"text", 12}, {"true", 1}, {"date", 0}, {"absent", 0}})
+        EXPECT_EQ(store.integer(key), number) << key;
     EXPECT_EQ(store.number("number"), 86400.9);
     EXPECT_EQ(store.string("text"), "12 days");
     EXPECT_EQ(store.string("number"), std::nullopt);

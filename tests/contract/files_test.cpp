@@ -1,43 +1,22 @@
 // What the files of every host do, simulated or real.
 #include "vrx/platform/files.h"
 
-#include <gtest/gtest.h>
-
-#include "host/support.h"
-#include "vrx/host/base/files.h"
+#include "contract/hosts.h"
 #include "vrx/platform/limits.h"
-#include "vrx/sim/files.h"
 
 namespace vrx {
 namespace {
 
 using platform::Data;
 
-struct SimulatedFiles {
-    sim::Files files;
-};
-struct RealFiles {
-    host::TemporaryFolder folder;
-    host::Files files{folder.path()};
-};
-
-template <class Subject>
-class FilesContract : public testing::Test {
+template <class Host>
+class FilesContract : public ContractTest<Host> {
 protected:
     std::string home(const std::string& name) const { return files.homeDirectory() + "/" + name; }
 
-    Subject subject;
-    platform::Files& files = subject.files;
+    platform::Files& files = this->host.files();
 };
-
-struct Names {
-    template <class Subject>
-    static std::string GetName(int) {
-        return std::is_same_v<Subject, SimulatedFiles> ? "Simulated" : "Real";
-    }
-};
-using Subjects = testing::Types<SimulatedFiles, RealFiles>;
-TYPED_TEST_SUITE(FilesContract, Subjects, Names);
+TYPED_TEST_SUITE(FilesContract, Hosts, HostNames);
 
 TYPED_TEST(FilesContract, ReplaceAndReadWholeFiles) {
     EXPECT_TRUE(this->files.homeDirectory().starts_with('/'));
@@ -62,9 +41,8 @@ TYPED_TEST(FilesContract, ReadNoFileOverTheLimit) {
 TYPED_TEST(FilesContract, MakeDirectoriesAndAcceptThoseThatExist) {
     const std::string path = this->home("a/b/file");
     EXPECT_TRUE(this->files.replace(path, {})) << "the directory must exist";
-    EXPECT_EQ(this->files.createDirectories(this->home("a/b")), std::nullopt);
-    EXPECT_EQ(this->files.createDirectories(this->home("a/b")), std::nullopt);
-    EXPECT_EQ(this->files.createDirectories(this->home("a")), std::nullopt);
+    for (const char* name : {"a/b", "a/b", "a"})
+        EXPECT_EQ(this->files.createDirectories(this->home(name)), std::nullopt);
     EXPECT_EQ(this->files.replace(path, {}), std::nullopt);
     EXPECT_TRUE(this->files.read(path));
 

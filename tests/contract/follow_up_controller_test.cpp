@@ -3,9 +3,7 @@
 
 #include <gmock/gmock.h>
 
-#include "host/support.h"
-#include "vrx/host/home/follow_up_controller.h"
-#include "vrx/sim/host.h"
+#include "contract/hosts.h"
 
 namespace vrx {
 namespace {
@@ -16,49 +14,19 @@ using platform::Dictionary;
 using platform::FollowUpItem;
 using testing::ElementsAre;
 
-class SimulatedService {
-public:
-    platform::FollowUpControllers& controllers() { return host_.followUps; }
-    // What the next process finds.
-    void restart() {}
-
-private:
-    sim::Host host_;
-};
-
-class RealService {
-public:
-    platform::FollowUpControllers& controllers() { return *service_; }
-    void restart() { service_.emplace(database_.emplace(folder_ / "host.db")); }
-
-private:
-    host::LogRecorder log_;
-    host::TemporaryFolder folder_;
-    std::optional<host::Database> database_{folder_ / "host.db"};
-    std::optional<host::FollowUpControllers> service_{*database_};
-};
-
-template <class Subject>
-class FollowUpControllerContract : public testing::Test {
+template <class Host>
+class FollowUpControllerContract : public ContractTest<Host> {
 protected:
     // A controller for each request, as the agent has it.
-    auto controller(const std::string& client = "client") { return subject.controllers().makeController(client); }
+    auto controller(const std::string& client = "client") { return this->host.followUps().makeController(client); }
     bool post(const FollowUpItem& item) { return !controller()->postFollowUpItem(item); }
     bool clear(const std::vector<std::string>& some) { return !controller()->clearPendingFollowUpItems(some); }
     std::vector<FollowUpItem> pending() { return controller()->pendingFollowUpItems().value(); }
 
-    Subject subject;
     const FollowUpItem a{.uniqueIdentifier = "a"}, b{.uniqueIdentifier = "b"}, c{.uniqueIdentifier = "c"};
 };
 
-struct Names {
-    template <class Subject>
-    static std::string GetName(int) {
-        return std::is_same_v<Subject, SimulatedService> ? "Simulated" : "Real";
-    }
-};
-using Subjects = testing::Types<SimulatedService, RealService>;
-TYPED_TEST_SUITE(FollowUpControllerContract, Subjects, Names);
+TYPED_TEST_SUITE(FollowUpControllerContract, Hosts, HostNames);
 
 TYPED_TEST(FollowUpControllerContract, KeepsItemsWholeAcrossProcesses) {
     FollowUpItem full{"full", "group", "target", "extension", 2 | 1 | 16 | (1ULL << 40), "Ünï 🙂", ""};
@@ -69,7 +37,7 @@ TYPED_TEST(FollowUpControllerContract, KeepsItemsWholeAcrossProcesses) {
     far.expirationDate = dateFromEpoch(253402300799.999);  // the end of the year 9999
     early.expirationDate = dateFromEpoch(-62135596800);    // the begin of the year 1
     for (const FollowUpItem& item : {full, this->a, far, early}) EXPECT_TRUE(this->post(item));
-    this->subject.restart();
+    this->host.restart();
     EXPECT_THAT(this->pending(), ElementsAre(full, this->a, far, early));
     EXPECT_TRUE(this->controller("other client")->pendingFollowUpItems().value().empty());
 }
@@ -87,7 +55,7 @@ TYPED_TEST(FollowUpControllerContract, ReplacesInPlaceAndClearsWhatIsThere) {
     EXPECT_THAT(this->pending(), ElementsAre(this->a, other, this->c));
     EXPECT_TRUE(this->clear({"c", "unknown", "a", "a"}));
     EXPECT_TRUE(this->post(this->a));
-    this->subject.restart();
+    this->host.restart();
     EXPECT_THAT(this->pending(), ElementsAre(other, this->a));
 }
 

@@ -4,12 +4,12 @@
 
 #include <gmock/gmock.h>
 
+#include <algorithm>
 #include <chrono>
+#include <limits>
 #include <mutex>
 
-#include "host/support.h"
-#include "vrx/host/loop/queues.h"
-#include "vrx/sim/host.h"
+#include "contract/hosts.h"
 
 namespace vrx {
 namespace {
@@ -20,37 +20,8 @@ using platform::Event;
 using platform::Priority;
 using testing::ElementsAre;
 
-class SimulatedQueues {
-public:
-    platform::Queues& queues() { return host_.queues; }
-    Duration time() const { return host_.clock.elapsed(); }
-    // Lets all queues run until the event is set.
-    void runUntil(const std::shared_ptr<Event>& event) { event->wait(); }
-
-private:
-    sim::Host host_;
-};
-
-class RealQueues {
-public:
-    platform::Queues& queues() { return queues_; }
-    Duration time() const { return std::chrono::steady_clock::now().time_since_epoch(); }
-    void runUntil(const std::shared_ptr<Event>& event) {
-        queues_.workers(Priority::UserInitiated).post([this, event] {
-            event->wait();
-            loop_.stop();
-        });
-        loop_.run();
-    }
-
-private:
-    host::LogRecorder log_;
-    host::MainLoop loop_;
-    host::Queues queues_{loop_, 2};
-};
-
-template <class Subject>
-class QueuesContract : public testing::Test {
+template <class Host>
+class QueuesContract : public ContractTest<Host> {
 protected:
     void note(const char* text) {
         std::lock_guard lock(mutex);
@@ -59,26 +30,17 @@ protected:
 
     std::mutex mutex;
     std::vector<std::string> notes;
-    Subject subject;
-    platform::Queues& queues = subject.queues();
+    platform::Queues& queues = this->host.queues();
+    const std::shared_ptr<platform::Queue> serial = queues.makeSerialQueue("serial");
     platform::Queue& worker = queues.workers(Priority::Background);
     std::shared_ptr<Event> done = queues.makeEvent();
 };
 
-struct Names {
-    template <class Subject>
-    static std::string GetName(int) {
-        return std::is_same_v<Subject, SimulatedQueues> ? "Simulated" : "Real";
-    }
-};
-using Subjects = testing::Types<SimulatedQueues, RealQueues>;
-TYPED_TEST_SUITE(QueuesContract, Subjects, Names);
+TYPED_TEST_SUITE(QueuesContract, Hosts, HostNames);
 
 TYPED_TEST(QueuesContract, RunASerialQueuesTasksInTheirOrderAndOneAtATime) {
-    for (platform::Queue* queue : {&this->queues.mainQueue(), this->queues.makeSerialQueue("serial").get()}) {
-        auto serial = this->queues.makeSerialQueue("serial");
+    for (platform::Queue* queue : {&this->queues.mainQueue(), this->serial.get()}) {
         auto finished = this->queues.makeEvent();
-        if (queue != &this->queues.mainQueue()) queue = serial.get();
         this->notes.clear();
         queue->post([&, queue] {
             queue->post([&] { this->note("posted by the first"); });
@@ -88,15 +50,14 @@ TYPED_TEST(QueuesContract, RunASerialQueuesTasksInTheirOrderAndOneAtATime) {
             });
             this->note("first");
         });
-        this->subject.runUntil(finished);
+        this->host.runUntil(finished);
         EXPECT_THAT(this->notes, ElementsAre("first", "posted by the first", "after no time"));
     }
 }
 
 TYPED_TEST(QueuesContract, KeepASerialQueueBusyWhileItsTaskWaits) {
-    auto serial = this->queues.makeSerialQueue("serial");
     auto event = this->queues.makeEvent();
-    serial->post([&, event] {
+    this->serial->post([&, event] {
         this->note("begins");
         this->worker.post([&, event] {
             this->note("other work");
@@ -105,11 +66,11 @@ TYPED_TEST(QueuesContract, KeepASerialQueueBusyWhileItsTaskWaits) {
         event->wait();
         this->note("ends");
     });
-    serial->post([&] {
+    this->serial->post([&] {
         this->note("next");
         this->done->set();
     });
-    this->subject.runUntil(this->done);
+    this->host.runUntil(this->done);
     EXPECT_THAT(this->notes, ElementsAre("begins", "other work", "ends", "next"));
 }
 
@@ -124,33 +85,44 @@ TYPED_TEST(QueuesContract, RunWorkersSideBySideHoweverManyWait) {
             events[index + 1]->wait();
             events[index]->set();
         });
-    this->worker.post([&] { events.back()->set(); });
-    this->subject.runUntil(events.front());
+    this->worker.post([&] {
+        auto inner = this->queues.makeEvent();
+        this->serial->post([inner] { inner->set(); });
+        inner->wait();
+        events.back()->set();
+    });
+    this->host.runUntil(events.front());
 }
 
 TYPED_TEST(QueuesContract, RunDelayedTasksInTheirOrderAndNeverEarly) {
-    auto serial = this->queues.makeSerialQueue("serial");
-    const Duration begin = this->subject.time();
-    Duration took{};
-    serial->postAfter(20ms, [&] {
-        took = this->subject.time() - begin;
-        this->note("late");
-        this->done->set();
-    });
-    serial->postAfter(10ms, [&] { this->note("early"); });
-    serial->postAfter(Duration(std::numeric_limits<double>::infinity()), [&] { this->note("never"); });
-    this->subject.runUntil(this->done);
-    EXPECT_THAT(this->notes, ElementsAre("early", "late"));
-    EXPECT_GE(took, 20ms);
+    for (platform::Queue* queue : {&this->queues.mainQueue(), this->serial.get()}) {
+        auto finished = this->queues.makeEvent();
+        this->notes.clear();
+        const Duration begin = this->host.time();
+        Duration took{};
+        queue->postAfter(20ms, [&, finished] {
+            took = this->host.time() - begin;
+            this->note("late");
+            finished->set();
+        });
+        queue->postAfter(10ms, [&] { this->note("early"); });
+        for (double never : {1e300, std::numeric_limits<double>::infinity()})
+            queue->postAfter(Duration(never), [&] { this->note("never"); });
+        this->host.runUntil(finished);
+        EXPECT_THAT(this->notes, ElementsAre("early", "late"));
+        EXPECT_GE(took, 20ms);
+    }
+    this->worker.postAfter(1ms, [&] { this->done->set(); });
+    this->host.runUntil(this->done);
 }
 
 TYPED_TEST(QueuesContract, KeepAnEventSetAndLimitAWait) {
     this->worker.post([&] {
         auto event = this->queues.makeEvent();
         EXPECT_FALSE(event->waitFor(-1s));
-        const Duration begin = this->subject.time();
+        const Duration begin = this->host.time();
         EXPECT_FALSE(event->waitFor(10ms));
-        EXPECT_GE(this->subject.time() - begin, 10ms);
+        EXPECT_GE(this->host.time() - begin, 10ms);
         event->set();
         event->set();
         EXPECT_TRUE(event->waitFor(0s));
@@ -161,22 +133,27 @@ TYPED_TEST(QueuesContract, KeepAnEventSetAndLimitAWait) {
         EXPECT_TRUE(later->waitFor(1h));
         this->done->set();
     });
-    this->subject.runUntil(this->done);
+    this->host.runUntil(this->done);
 }
 
-TYPED_TEST(QueuesContract, LetPostedWorkOutliveItsQueueAndFreeItWhenRun) {
+TYPED_TEST(QueuesContract, LetPostedWorkOutliveItsQueueInOrderAndFreeItWhenRun) {
+    static constexpr int count = 2000;
     auto held = std::make_shared<int>();
     std::weak_ptr<int> watch = held;
     auto freed = this->queues.makeEvent();
-    bool hasRun = false;
-    this->queues.makeSerialQueue("forgotten")
-        ->post([&hasRun, held = std::shared_ptr<int>(held.get(), [held, freed](int*) mutable {
-                             held.reset();
-                             freed->set();
-                         })] { hasRun = true; });
+    std::vector<int> order;
+    {
+        auto forgotten = this->queues.makeSerialQueue("forgotten");
+        for (int i = 0; i < count; ++i) forgotten->post([&order, i] { order.push_back(i); });
+        forgotten->post([&order, held = std::shared_ptr<int>(held.get(), [held, freed](int*) mutable {
+                                     held.reset();
+                                     freed->set();
+                                 })] { order.push_back(count); });
+    }
     held.reset();
-    this->subject.runUntil(freed);
-    EXPECT_TRUE(hasRun);
+    this->host.runUntil(freed);
+    EXPECT_EQ(order.size(), count + 1u);
+    EXPECT_TRUE(std::ranges::is_sorted(order));
     EXPECT_TRUE(watch.expired());
 }
 

@@ -2,24 +2,22 @@
 // case, and on standard error the cause of a failure and what to try next.
 #include <gtest/gtest.h>
 
-#include <fcntl.h>
 #include <sys/file.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <csignal>
-#include <filesystem>
 #include <sstream>
 
 #include "end_to_end/programs.h"
+#include "host/http/loopback_server.h"
 #include "vrx/host/home/database.h"
 #include "vrx/host/home/home_lock.h"
+#include "vrx/host/ipc/listening_socket.h"
 
 namespace vrx::end_to_end {
 namespace {
 
 using platform::Value;
-using std::filesystem::perms;
 
 struct Verb {
     const char* words;
@@ -64,17 +62,11 @@ struct Case {
     std::string member{};
 };
 
-class CommandLine : public testing::Test {
+class CommandLine : public AtPlace {
 protected:
     CommandLine() {
         place_.write("item.json", R"({"uniqueIdentifier": "b"})");
         place_.write("pending.json", R"({"uniqueIdentifier": "a"})");
-    }
-
-    void start() {
-        place_.start();
-        ASSERT_TRUE(place_.isReady()) << place_.agent().errors();
-        place_.useCoverageFiles();
     }
 
     Arguments command(Arguments program, const std::string& words) const {
@@ -129,7 +121,6 @@ protected:
         return place_.runAll({command(program, words + " --json")}).front().document;
     }
 
-    Place place_;
     const Arguments vrxctl_{place_ / "app/vrxctl", "--socket", place_ / "socket"};
     const Arguments vrxhost_{place_ / "app/vrxhost", "--home", place_ / "home"};
 };
@@ -146,10 +137,23 @@ TEST_F(CommandLine, Answers) {
     for (const auto& cases : {fire, asking, looking}) expect(cases);
 
     // What the table leaves open.
+    EXPECT_EQ(value(vrxctl_, "device")["device"]["name"], Value("Maya's Phone"));
+    EXPECT_EQ(value(vrxctl_, "info X --policy cached")["device"]["name"], Value("<unknown>"));
+    EXPECT_EQ(value(vrxctl_, "support com.example")["availability"],
+              Value(platform::Dictionary{{"AppBundleID", "com.example"}}));
+    EXPECT_EQ(value(vrxctl_, "paired")["devices"].asArray()->size(), 2u);
+    EXPECT_EQ(value(vrxctl_, "all")["devices"].asArray()->size(), 3u);
+    EXPECT_EQ(value(vrxhost_, "defaults read FollowupDismissedSerialNumberHashes")["value"].asArray()->size(), 2u);
     const Value info = value(vrxctl_, "info VRXWATCH0001 --policy cached --timeout 60");
     EXPECT_EQ(info["coverage"]["coverageLocalizedLabel"], Value("QX Coverage for Watch"));
     EXPECT_EQ(info["derived"]["coverageEndDate"], Value("2031-03-14T00:00:00Z"));
-    EXPECT_EQ(value(vrxhost_, "cache VRXWATCH0001")["coverage"], info["coverage"]);
+    const Value cached = value(vrxhost_, "cache VRXWATCH0001");
+    EXPECT_EQ(cached["coverage"], info["coverage"]);
+    // One that is damaged is taken for absent, until the next download.
+    std::filesystem::resize_file(*cached["path"].asString(), 100);
+    EXPECT_EQ(value(vrxhost_, "cache VRXWATCH0001")["error"]["kind"], Value("damaged"));
+    for (const auto& [policy, code] : {std::pair("cached", 1), {"default", 0}, {"cached", 0}})
+        expect({{command(vrxctl_, std::string("info VRXWATCH0001 --policy ") + policy), code}});
     EXPECT_EQ(value(vrxhost_, "defaults read OneDayInterval")["registered"], Value(true));
     for (const auto& [form, stored, type] :
          {std::tuple(R"({"a":[1,2.5]})", Value(platform::Dictionary{{"a", platform::Array{1, 2.5}}}), "dictionary"),
@@ -187,23 +191,24 @@ TEST_F(CommandLine, TellsThatItIsRefused) {
     Texts named{"com.orvane.private.vrxagent", "bundle.toml", "vrxhost doctor", other[0]};
     expectAll(other, vrxctlVerbs, 4, named);
     // A bundle that anyone could have written entitles to nothing.
-    permissions(std::filesystem::path(place_ / "app/bundle.toml"), perms::others_write,
-                std::filesystem::perm_options::add);
+    place_.setMode("app/bundle.toml", 0646);
     named.back() = vrxctl_[0];
     expectAll(vrxctl_, {{"device", ""}}, 4, named);
 
     // Another user's home.
-    permissions(std::filesystem::path(place_ / ""), perms(0755));
-    permissions(std::filesystem::path(place_ / "home"), perms::none);
+    place_.setMode("", 0755);
+    place_.setMode("home", 0);
     other = vrxhost_;
     if (getuid() == 0)
         other.insert(other.begin(), {"/usr/bin/setpriv", "--reuid", "65534", "--regid", "65534", "--clear-groups"});
     expectAll(other, vrxhostVerbs, 3, {place_ / "home", "as the agent's user"});
-    permissions(std::filesystem::path(place_ / "home"), perms::owner_all);
+    place_.setMode("home", 0700);
 }
 
 TEST_F(CommandLine, TellsThatNobodyAnswersInTime) {
-    const SilentServer agent(place_ / "socket"), servers;
+    host::ListeningSocket agent;
+    ASSERT_FALSE(agent.open(place_ / "socket"));
+    const host::LoopbackServer silent([](const auto&) { return ""; });
     Arguments hasty = vrxctl_;
     hasty.insert(hasty.end(), {"--timeout", "0.2"});
     expectAll(hasty, vrxctlVerbs, 5, {"0.2 s", "--timeout"});
@@ -224,23 +229,22 @@ TEST_F(CommandLine, TellsThatNobodyAnswersInTime) {
     ASSERT_FALSE(database.open());
     expect({{command(vrxhost_, "followups post pending.json"), 0}});
     for (const char* key : {"ServerVersionURL", "WarrantyURL"})
-        EXPECT_EQ(value(vrxhost_, std::string("defaults write ") + key + " --string " + servers.url())["ok"],
+        EXPECT_EQ(value(vrxhost_, std::string("defaults write ") + key + " --string " + silent.url())["ok"],
                   Value(true));
     expect({{command(vrxhost_, "fire outreach --timeout 0.2"), 5, {"0.2 s", "--timeout"}}});
     // Then one that holds the database besides: also from one that watches it, which is to end when it is told to.
-    int lines[2];
-    ASSERT_EQ(pipe2(lines, O_CLOEXEC), 0);
-    Process watch(place_ / "", vrxhost_[0], {"--home", place_ / "home", "followups", "--watch"}, {},
-                  {.output = lines[1]});
+    host::Pipe lines;
+    Process watch(place_.path(), vrxhost_[0], {"--home", place_ / "home", "followups", "--watch"}, {},
+                  {.output = lines.writer.number()});
     char first = 0;
-    EXPECT_EQ(read(lines[0], &first, 1), 1);
+    EXPECT_EQ(read(lines.reader.number(), &first, 1), 1);
     EXPECT_FALSE(database.write([&](host::Connection&) {
         place_.write("home/change", "");  // which it takes for one of the database
         std::vector<Case> cases;
         for (const Verb& verb : vrxhostVerbs) {
             const std::string words = verb.words;
             Texts named{place_ / "home/host.db", "locked", "fuser"};
-            if (words.starts_with("doctor")) named = {servers.url(), "in time", "defaults read ServerVersionURL"};
+            if (words.starts_with("doctor")) named = {silent.url(), "in time", "defaults read ServerVersionURL"};
             if (verb.hung != 5) named.clear();
             if (!words.ends_with("--watch")) cases.push_back({command(vrxhost_, words), verb.hung, named});
         }
@@ -248,13 +252,11 @@ TEST_F(CommandLine, TellsThatNobodyAnswersInTime) {
         watch.signal(SIGTERM);
         EXPECT_EQ(watch.wait(), 0) << watch.errors();
     }));
-    for (int end : lines) close(end);
 }
 
 TEST_F(CommandLine, TellsWhatElseIsInTheWay) {
     place_.write("file", "");
     std::filesystem::create_directories(place_ / "folder/host.db");
-    std::filesystem::create_directory(place_ / "damaged");
     place_.write("damaged/host.db", std::string(8192, 'x'));
     std::vector<Case> cases;
     for (const char* words : {"why X", "activities", "followups", "cache X", "defaults list"})
@@ -264,7 +266,6 @@ TEST_F(CommandLine, TellsWhatElseIsInTheWay) {
                              isFile ? 3 : 1,
                              {place_ / home + "/host.db", isFile ? "--home" : "vrxhost doctor"}});
         }
-    std::filesystem::create_directory(place_ / "held");
     place_.write("held/host.db", "");
     const host::Descriptor held(open((place_ / "held").c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
     ASSERT_EQ(flock(held.number(), LOCK_EX), 0);

@@ -1,13 +1,8 @@
 #include "end_to_end/coverage_server.h"
 
-#include <arpa/inet.h>
-#include <fcntl.h>
-#include <sys/socket.h>
-#include <unistd.h>
-
-#include <array>
 #include <cstdio>
 
+#include "support/sockets.h"
 #include "vrx/codec/json.h"
 
 namespace vrx::end_to_end {
@@ -15,38 +10,31 @@ namespace vrx::end_to_end {
 using platform::Value;
 
 CoverageServer::CoverageServer(const std::string& folder, const Arguments& arguments) {
-    std::array<int, 2> ends{};
-    EXPECT_EQ(pipe2(ends.data(), O_CLOEXEC), 0);
+    host::Pipe pipe;
     process_.emplace(folder, VRX_PROGRAMS "/vrx-coverage-server", arguments, Arguments{},
-                     Process::Handed{.output = ends[1], .listeningSocket = -1});
-    close(ends[1]);
-    std::FILE* output = fdopen(ends[0], "r");
-    std::array<char, 200> line{}, address{};
-    while (url_.empty() && std::fgets(line.data(), line.size(), output)) {
-        if (std::sscanf(line.data(), "listening on %199s", address.data()) == 1) url_ = address.data();
-        std::sscanf(line.data(), "control on http://127.0.0.1:%d", &controlPort_);
+                     Handed{.output = pipe.writer.number(), .listeningSocket = -1});
+    pipe.writer = host::Descriptor();
+    const std::string_view address = "listening on ";
+    std::ifstream lines("/dev/fd/" + std::to_string(pipe.reader.number()));
+    for (std::string line; url_.empty() && std::getline(lines, line);) {
+        if (line.starts_with(address)) url_ = line.substr(address.size());
+        std::sscanf(line.c_str(), "control on http://127.0.0.1:%d", &controlPort_);
     }
-    std::fclose(output);
     EXPECT_FALSE(url_.empty()) << process_->errors();
 }
 
 Value CoverageServer::ask(const std::string& method, const std::string& path, const std::string& body) const {
-    const int connection = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
-    sockaddr_in address{};
-    address.sin_family = AF_INET;
-    address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-    address.sin_port = htons(static_cast<std::uint16_t>(controlPort_));
-    EXPECT_EQ(connect(connection, reinterpret_cast<sockaddr*>(&address), sizeof address), 0);
+    const host::Descriptor connection(socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
+    EXPECT_TRUE(connectTo(connection.number(), loopbackAddress(controlPort_)));
     const std::string request =
         method + " " + path +
         " HTTP/1.1\r\nHost: localhost\r\nConnection: close\r\nContent-Length: " + std::to_string(body.size()) +
         "\r\n\r\n" + body;
-    EXPECT_EQ(send(connection, request.data(), request.size(), MSG_NOSIGNAL), std::ssize(request));
+    EXPECT_EQ(send(connection.number(), request.data(), request.size(), MSG_NOSIGNAL), std::ssize(request));
     std::string answer;
     std::array<char, 4096> piece;
-    for (ssize_t count; (count = recv(connection, piece.data(), piece.size(), 0)) > 0;)
+    for (ssize_t count; (count = recv(connection.number(), piece.data(), piece.size(), 0)) > 0;)
         answer.append(piece.data(), static_cast<std::size_t>(count));
-    close(connection);
     EXPECT_TRUE(answer.starts_with("HTTP/1.1 20")) << path << ": " << answer;
     return codec::parseJson(answer.substr(answer.find("\r\n\r\n") + 4)).value();
 }

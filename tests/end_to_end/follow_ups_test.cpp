@@ -1,12 +1,10 @@
 // Follow-ups as the settings app would show them, beside a running agent that keeps them true.
 #include <gtest/gtest.h>
-#include <sys/stat.h>
 
 #include <chrono>
-#include <filesystem>
-#include <fstream>
 
 #include "end_to_end/programs.h"
+#include "support/eventually.h"
 #include "vrx/codec/json.h"
 
 namespace vrx::end_to_end {
@@ -19,18 +17,14 @@ using platform::Value;
 const std::string legacyIdentifier = "com.orvane.Vireo";
 
 std::string record(const std::string& label, bool isOffered = true) {
-    return "<plist version='1.0'><dict><key>qxLocalizedOfferLabel</key><string>" + label +
-           "</string><key>qxOfferEligibleUntil</key><integer>9999999999</integer><key>featureToggleParameters</key>"
-           "<dict><key>qxOfferDisplay</key><" +
-           (isOffered ? "true" : "false") + "/></dict></dict></plist>";
+    return host::propertyList({{"qxLocalizedOfferLabel", label},
+                               {"qxOfferEligibleUntil", 9'999'999'999},
+                               {"featureToggleParameters", Dictionary{{"qxOfferDisplay", isOffered}}}});
 }
 
-class FollowUps : public testing::Test {
+class FollowUps : public AtPlace {
 protected:
-    void SetUp() override {
-        place_.start();
-        ASSERT_TRUE(place_.isReady()) << place_.agent().errors();
-    }
+    void SetUp() override { place_.start(); }
     Place::Outcome post(const Value& item) const {
         place_.write("item.json", codec::printedJson(item, codec::JsonLayout::OneLine));
         return place_.vrxhost({"followups", "post", place_ / "item.json", "--json"});
@@ -40,8 +34,6 @@ protected:
             place_.vrxhost({"followups", "--json", "--device", place_ / "device.toml"}).document["followUps"];
         return list.asArray() ? *list.asArray() : Array{Value()};
     }
-
-    Place place_;
 };
 
 TEST_F(FollowUps, AreShownAsTheSettingsAppWould) {
@@ -104,10 +96,11 @@ TEST_F(FollowUps, AreShownAsTheSettingsAppWould) {
 }
 
 TEST_F(FollowUps, AreWatchedWithoutMissingAChange) {
-    ASSERT_EQ(mkfifo((place_ / "lines").c_str(), 0600), 0);
-    const std::string command = VRX_PROGRAMS "/vrxhost followups --watch --json --home '" + place_ / "home";
-    Process watch(place_ / "", "/bin/sh", {"-c", "exec " + command + "' >'" + place_ / "lines" + "'"});
-    std::ifstream lines(place_ / "lines");
+    host::Pipe pipe;
+    Process watch(place_.path(), place_ / "app/vrxhost", {"--home", place_ / "home", "followups", "--watch", "--json"},
+                  {}, {.output = pipe.writer.number()});
+    pipe.writer = host::Descriptor();
+    std::ifstream lines("/dev/fd/" + std::to_string(pipe.reader.number()));
     const auto next = [&] {
         std::string line;
         std::getline(lines, line);
@@ -124,8 +117,7 @@ TEST_F(FollowUps, AreWatchedWithoutMissingAChange) {
     // Nothing need be written for an item to expire.
     const std::chrono::duration<double> now = std::chrono::system_clock::now().time_since_epoch();
     ASSERT_EQ(post(Dictionary{{"uniqueIdentifier", "a"}, {"expirationDate", now.count() + 0.3}}).code, 0);
-    while (nextItem()["derived"]["expired"] == Value(false)) {
-    }
+    eventually([&] { return nextItem()["derived"]["expired"] == Value(true); }, "the item's expiry");
     std::filesystem::remove(place_ / "home/host.db");
     EXPECT_EQ(next()["error"]["kind"], Value("not-reachable"));
     EXPECT_EQ(watch.wait(), 3);
@@ -137,7 +129,6 @@ TEST_F(FollowUps, OfTheOlderLayoutAreMovedOnceAndThenFollowTheRecord) {
         ASSERT_EQ(post(Dictionary{{"uniqueIdentifier", legacyIdentifier}}).code, 0);
         ASSERT_EQ(place_.stop(), 0);
         ASSERT_EQ(place_.vrxhost({"defaults", "delete", "VRXMigrationVersion"}).code, 0);
-        std::filesystem::create_directories(std::filesystem::path(place_ / cacheFile).parent_path());
         place_.write(cacheFile, cached);
         place_.start();
     };

@@ -34,65 +34,59 @@ constexpr std::string_view metadataKeys[] = {cachedWarrantyLastUpdatedDateKey, c
                                              cachedWarrantyVersionKey};
 constexpr const char* signedIn = "identifier = 'maya@orvane.example'\nalt_dsid = '000001-02'\n";
 
-class Network : public testing::Test {
+class Network : public AtPlace {
 protected:
     // A profile of a phone and two watches that entitles this program; the lines are its account's. The time zone is
     // its own: the thread sanitizer does not see that the C library guards the machine's.
     void useAccount(const std::string& lines) const {
-        place.write("device.toml",
-                    "[device]\nserial_number = 'VRXPHONE0001'\nproduct_type = 'Phone12,3'\nproduct_version = '18.1'\n"
-                    "[locale]\ntime_zone = 'Asia/Kathmandu'\n"
-                    "[features.Vireo]\nMeridian_3_0 = true\n"
-                    "[[watches]]\nserial_number = 'VRXWATCH0001'\n[[watches]]\nserial_number = 'VRXWATCH0002'\n"
-                    "[[bundles]]\nexecutables = ['" +
-                        std::filesystem::read_symlink("/proc/self/exe").string() +
-                        "']\nidentifier = 'com.orvane.tests'\n"
-                        "[bundles.entitlements]\n'com.orvane.private.vrxagent' = true\n" +
-                        (lines.empty() ? "" : "[account]\ncredential_helper = ['" + place / "helper" + "']\n" + lines));
+        place_.write(
+            "device.toml",
+            "[device]\nserial_number = 'VRXPHONE0001'\nproduct_type = 'Phone12,3'\nproduct_version = '18.1'\n"
+            "[locale]\ntime_zone = 'Asia/Kathmandu'\n"
+            "[features.Vireo]\nMeridian_3_0 = true\n"
+            "[[watches]]\nserial_number = 'VRXWATCH0001'\n[[watches]]\nserial_number = 'VRXWATCH0002'\n"
+            "[[bundles]]\nexecutables = ['" +
+                std::filesystem::read_symlink("/proc/self/exe").string() +
+                "']\nidentifier = 'com.orvane.tests'\n"
+                "[bundles.entitlements]\n'com.orvane.private.vrxagent' = true\n" +
+                (lines.empty() ? "" : "[account]\ncredential_helper = ['" + place_ / "helper" + "']\n" + lines));
     }
     // The credential helper, a script.
     void useHelper(const std::string& script) const {
-        place.write("helper", "#!/bin/sh\n" + script + "\n");
-        std::filesystem::permissions(place / "helper", std::filesystem::perms::owner_all);
+        place_.write("helper", "#!/bin/sh\n" + script + "\n");
+        place_.setMode("helper", 0700);
     }
     void serveRecord(int round) const {
-        place.write("records/default.json", R"({"covered": true, "round": )" + std::to_string(round) + "}");
+        place_.write("records/default.json", R"({"covered": true, "round": )" + std::to_string(round) + "}");
     }
     // In KiB, since the last reset.
     static long peakMemory() {
-        std::ifstream status("/proc/self/status");
-        long peak = 0;
-        for (std::string word; word != "VmHWM:" && status >> word;) {
-        }
-        status >> peak;
-        return peak;
+        const std::string status = fileText("/proc/self/status"), name = "VmHWM:";
+        return std::stol(status.substr(status.find(name) + name.size()));
     }
     static void resetPeakMemory() { std::ofstream("/proc/self/clear_refs") << 5; }
     static void setDefault(std::string_view key, Value value) {
         Platform::current().defaultsStore().set(std::string(key), std::move(value));
     }
 
-    // What is cached for this device: the file and the metadata.
-    using Cached = std::pair<std::string, std::array<Value, std::size(metadataKeys)>>;
-    Cached cached() const {
-        Cached cached{fileText(place / "home/Library/Application Support/com.orvane.Vireo/" +
-                               platform::sha256Hash(serialNumber) + "_Warranty.plist"),
-                      {}};
-        for (std::size_t i = 0; i < std::size(metadataKeys); ++i)
-            cached.second[i] = Platform::current().defaultsStore().get(cacheMetadataKey(serialNumber, metadataKeys[i]));
+    // What is cached for this device: the file, and then the metadata in the order of their keys.
+    std::vector<Value> cached() const {
+        std::vector<Value> cached{fileText(place_ / "home/Library/Application Support/com.orvane.Vireo/" +
+                                           platform::sha256Hash(serialNumber) + "_Warranty.plist")};
+        for (std::string_view key : metadataKeys)
+            cached.push_back(Platform::current().defaultsStore().get(cacheMetadataKey(serialNumber, key)));
         return cached;
     }
 
-    Place place;
     std::optional<CoverageServer> server;
     std::optional<client::AgentConnection> clients;
 
     // An agent that has refreshed its record once.
     void SetUp() override {
         setenv("no_proxy", "*", 1);  // nothing leaves this machine
-        std::filesystem::create_directory(place / "records");
         serveRecord(1);
-        server.emplace(place / "", Arguments{"--quiet", "--records", place / "records", "--cache-control", "no-store"});
+        server.emplace(place_.path(),
+                       Arguments{"--quiet", "--records", place_ / "records", "--cache-control", "no-store"});
         useHelper("exec '" VRX_SOURCE "/examples/credential-helper' " + server->url());
         useAccount(signedIn);
         std::promise<void> isReady;
@@ -100,7 +94,7 @@ protected:
         isReady.get_future().wait();
         setDefault("WarrantyURL", server->url() + "/api/v2/coverage/summary");
         setDefault("ServerVersionURL", server->url() + "/library/ORVANE/asset/vrxV2.plist");
-        clients.emplace(client::ConnectionOptions{.socketPath = place / "socket"});
+        clients.emplace(client::ConnectionOptions{.socketPath = place_ / "socket"});
         ASSERT_TRUE((*clients->getDefaultDeviceInfoUsingPolicy(VRXWarrantyLookupPolicyRefresh))->warranty());
         EXPECT_EQ(server->requests(3), "s200 t200 c1:200");
         server->ask("DELETE", "/requests");
@@ -117,12 +111,12 @@ protected:
 private:
     // As the agent's main thread.
     void runAgent(std::promise<void>& isReady) {
-        host::Host host({.home = place / "home", .profile = place / "device.toml"}, platform::Level::Error,
+        host::Host host({.home = place_ / "home", .profile = place_ / "device.toml"}, platform::Level::Error,
                         {.http = {.longestTimeout = timeLimit}, .credentialHelper = timeLimit});
         EXPECT_FALSE(host.open(host::HomeUse::Agent));
         host::BundleLookup bundles([&] { return host.profile().content(); });
         host::ServiceListenerFactory factory(host.mainLoop().event(), bundles, host.lifecycle());
-        EXPECT_FALSE(factory.open(place / "socket"));
+        EXPECT_FALSE(factory.open(place_ / "socket"));
         host.setBundleLookup(&bundles);
         host.setServiceListenerFactory(&factory);
         const StartUp startUp;
@@ -218,7 +212,7 @@ class NetworkFaults : public Network, public testing::WithParamInterface<Fault> 
 TEST_P(NetworkFaults, EndAsTheyShould) {
     const Fault& fault = GetParam();
     std::optional<CoverageServer> tls;
-    if (fault.change.warrantyURL == untrusted) tls.emplace(place / "", Arguments{"--tls"});
+    if (fault.change.warrantyURL == untrusted) tls.emplace(place_.path(), Arguments{"--tls"});
     if (fault.change.warrantyURL) setDefault("WarrantyURL", tls ? tls->url() : fault.change.warrantyURL);
     if (fault.change.serverVersionURL) setDefault("ServerVersionURL", fault.change.serverVersionURL);
     if (fault.change.document) server->ask("PATCH", "/document", fault.change.document);
@@ -227,7 +221,7 @@ TEST_P(NetworkFaults, EndAsTheyShould) {
     server->ask("POST", "/faults", fault.faults);
     if (fault.outcome == RecordUnfiled)
         for (std::string_view key : metadataKeys) setDefault(cacheMetadataKey(serialNumber, key), nullptr);
-    const Cached before = cached();
+    const std::vector<Value> before = cached();
     resetPeakMemory();
     const long memoryBefore = peakMemory();
 
@@ -246,14 +240,14 @@ TEST_P(NetworkFaults, EndAsTheyShould) {
         EXPECT_EQ(tls->ask("GET", "/counters")["handshakeFailures"], Value(1));
     }
     ASSERT_EQ(record != nullptr, fault.outcome != NoRecord);
-    const Cached after = cached();
+    const std::vector<Value> after = cached();
     if (fault.outcome == NoRecord) {
         EXPECT_EQ(after, before);
         return;
     }
-    EXPECT_EQ(after.first == before.first, fault.outcome == RecordUnfiled);
-    for (std::size_t i = 0; i < std::size(metadataKeys); ++i) EXPECT_FALSE(after.second[i].isNull()) << metadataKeys[i];
-    EXPECT_NE(after.second[0], before.second[0]);
+    EXPECT_EQ(after[0] == before[0], fault.outcome == RecordUnfiled);
+    for (const Value& value : after) EXPECT_FALSE(value.isNull());
+    EXPECT_NE(after[1], before[1]);
     if (fault.outcome == RecordUnfiled) return;
     EXPECT_EQ(record->dictionaryRepresentation()["round"], Value(2));
     const auto lookup = clients->getDefaultDeviceInfoUsingPolicy(VRXWarrantyLookupPolicyCachedOnly);

@@ -1,21 +1,12 @@
 #include "end_to_end/programs.h"
 
-#include <arpa/inet.h>
-#include <fcntl.h>
 #include <poll.h>
 #include <spawn.h>
-#include <sys/socket.h>
 #include <sys/stat.h>
-#include <sys/syscall.h>
-#include <sys/wait.h>
-#include <unistd.h>
 
-#include <array>
-#include <atomic>
 #include <csignal>
-#include <filesystem>
-#include <fstream>
 
+#include "support/sockets.h"
 #include "vrx/codec/json.h"
 
 extern char** environ;
@@ -32,40 +23,6 @@ std::vector<char*> pointers(const Arguments& texts) {
 }
 
 }  // namespace
-
-std::string fileText(const std::string& path) {
-    std::ifstream file(path, std::ios::binary);
-    return {std::istreambuf_iterator<char>(file), {}};
-}
-
-sockaddr_un addressOf(const std::string& path) {
-    sockaddr_un address{};
-    address.sun_family = AF_UNIX;
-    path.copy(address.sun_path, sizeof address.sun_path - 1);
-    return address;
-}
-
-SilentServer::SilentServer(const std::string& path)
-    : file_(socket(path.empty() ? AF_INET : AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0)) {
-    const sockaddr_un there = addressOf(path);
-    sockaddr_in loopback{};
-    loopback.sin_family = AF_INET;
-    loopback.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-    socklen_t size = path.empty() ? sizeof loopback : sizeof there;
-    EXPECT_EQ(
-        bind(file_,
-             path.empty() ? reinterpret_cast<const sockaddr*>(&loopback) : reinterpret_cast<const sockaddr*>(&there),
-             size),
-        0);
-    EXPECT_EQ(listen(file_, 64), 0);
-    if (!path.empty()) return;
-    EXPECT_EQ(getsockname(file_, reinterpret_cast<sockaddr*>(&loopback), &size), 0);
-    url_ = "http://127.0.0.1:" + std::to_string(ntohs(loopback.sin_port)) + "/";
-}
-
-SilentServer::~SilentServer() {
-    close(file_);
-}
 
 Process::Process(const std::string& folder, const std::string& program, const Arguments& arguments,
                  const Arguments& environment, const Handed& handed) {
@@ -93,7 +50,7 @@ Process::Process(const std::string& folder, const std::string& program, const Ar
               0)
         << program;
     posix_spawn_file_actions_destroy(&actions);
-    pidFile_ = static_cast<int>(syscall(SYS_pidfd_open, pid_, 0));
+    pidFile_ = host::openProcess(pid_);
 }
 
 Process::~Process() {
@@ -101,12 +58,6 @@ Process::~Process() {
         signal(SIGKILL);
         wait();
     }
-    close(pidFile_);
-}
-
-bool Process::isRunning() const {
-    pollfd ended{pidFile_, POLLIN, 0};
-    return poll(&ended, 1, 0) == 0;
 }
 
 void Process::signal(int number) const {
@@ -114,67 +65,41 @@ void Process::signal(int number) const {
 }
 
 int Process::wait() {
-    if (result_) return *result_;
-    int status = 0;
-    waitpid(pid_, &status, 0);
-    result_ = WIFEXITED(status) ? WEXITSTATUS(status) : -WTERMSIG(status);
+    if (!result_) result_ = host::endOf(pid_);
     return *result_;
-}
-
-std::string Process::output() const {
-    return fileText(files_ + ".out");
-}
-
-std::string Process::errors() const {
-    return fileText(files_ + ".err");
 }
 
 NoticeSocket::NoticeSocket(const std::string& path)
     : path_(path), file_(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0)) {
     const sockaddr_un address = addressOf(path);
     unlink(path.c_str());
-    EXPECT_EQ(bind(file_, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
-}
-
-NoticeSocket::~NoticeSocket() {
-    close(file_);
+    EXPECT_EQ(bind(file_.number(), reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
 }
 
 std::string NoticeSocket::next(const Process& process) const {
-    std::array<pollfd, 2> files{{{file_, POLLIN, 0}, {process.endedFile(), POLLIN, 0}}};
-    poll(files.data(), files.size(), -1);
+    std::array<pollfd, 2> files{{{file_.number(), POLLIN, 0}, {process.endedFile(), POLLIN, 0}}};
+    poll(files.data(), files.size(), 60'000);
     std::array<char, 4096> text;
-    const ssize_t size = recv(file_, text.data(), text.size(), MSG_DONTWAIT);
+    const ssize_t size = recv(file_.number(), text.data(), text.size(), MSG_DONTWAIT);
     return {text.data(), size > 0 ? static_cast<std::size_t>(size) : 0};
 }
 
 Place::Place() {
     umask(022);  // a bundle that others can write is none
-    std::string pattern = std::filesystem::canonical(std::filesystem::temp_directory_path()) / "vrx-XXXXXX";
-    folder_ = mkdtemp(pattern.data());
     std::filesystem::create_directory(*this / "app");
     for (const char* name : {"vrxctl", "vrxhost", "bundle.toml"})
         std::filesystem::copy(std::string(VRX_PROGRAMS "/") + name, *this / "app");
-    std::filesystem::copy(VRX_SOURCE "/examples/device.toml", folder_);
+    std::filesystem::copy(VRX_SOURCE "/examples/device.toml", path());
     std::filesystem::copy(VRX_SOURCE "/examples/coverage", *this / "coverage");
-}
-
-Place::~Place() {
-    agent_.reset();
-    std::filesystem::remove_all(folder_);
-}
-
-void Place::write(const std::string& name, const std::string& text) const {
-    std::ofstream(*this / name, std::ios::binary) << text;
 }
 
 void Place::start() {
     const NoticeSocket notices(*this / "notices");
     agent_ = std::make_unique<Process>(
-        folder_, VRX_PROGRAMS "/vrxagent",
+        path(), VRX_PROGRAMS "/vrxagent",
         Arguments{"--home", *this / "home", "--device", *this / "device.toml", "--socket", *this / "socket"},
         Arguments{notices.variable()});
-    isReady_ = notices.next(*agent_) == "READY=1";
+    ASSERT_EQ(notices.next(*agent_), "READY=1") << agent_->errors();
 }
 
 int Place::stop() {
@@ -189,20 +114,16 @@ void Place::useCoverageFiles() {
 }
 
 Place::Outcome Place::vrxctl(const Arguments& arguments, const std::string& socket) const {
-    Arguments all{"--socket", *this / socket};
-    all.insert(all.end(), arguments.begin(), arguments.end());
-    return run(*this / "app/vrxctl", all);
+    return run(*this / "app/vrxctl", {"--socket", *this / socket}, arguments);
 }
 
-Place::Outcome Place::vrxhost(const Arguments& arguments, const std::string& home) const {
-    Arguments all{"--home", *this / home};
-    all.insert(all.end(), arguments.begin(), arguments.end());
-    return run(*this / "app/vrxhost", all);
+Place::Outcome Place::vrxhost(const Arguments& arguments) const {
+    return run(*this / "app/vrxhost", {"--home", *this / "home"}, arguments);
 }
 
-Place::Outcome Place::run(const std::string& program, const Arguments& arguments) const {
+Place::Outcome Place::run(const std::string& program, const Arguments& arguments, const Arguments& more) const {
     Arguments words{program};
-    words.insert(words.end(), arguments.begin(), arguments.end());
+    for (const Arguments* some : {&arguments, &more}) words.insert(words.end(), some->begin(), some->end());
     return runAll({words}).front();
 }
 
@@ -210,7 +131,7 @@ std::vector<Place::Outcome> Place::runAll(const std::vector<Arguments>& commands
     std::vector<std::unique_ptr<Process>> processes;
     for (const Arguments& words : commands)
         processes.push_back(
-            std::make_unique<Process>(folder_, words.front(), Arguments(words.begin() + 1, words.end())));
+            std::make_unique<Process>(path(), words.front(), Arguments(words.begin() + 1, words.end())));
     std::vector<Outcome> outcomes;
     for (const auto& process : processes) {
         const int code = process->wait();

@@ -3,37 +3,37 @@
 
 #include <poll.h>
 #include <sys/inotify.h>
-#include <sys/socket.h>
 #include <sys/stat.h>
-#include <unistd.h>
 
-#include <array>
 #include <csignal>
-#include <filesystem>
 
+#include "client/raw_client.h"
 #include "end_to_end/programs.h"
+#include "support/eventually.h"
+#include "vrx/host/ipc/listening_socket.h"
 
 namespace vrx::end_to_end {
 namespace {
 
-class ServiceManager : public testing::Test {
+class ServiceManager : public AtPlace {
 protected:
     std::unique_ptr<Process> startAgent(int listeningSocket = -1, const std::string& variable = "NONE=") const {
-        return std::make_unique<Process>(
-            place_ / "", VRX_PROGRAMS "/vrxagent", Arguments{"--home", place_ / "home", "--socket", place_ / "socket"},
-            Arguments{notices_.variable(), variable}, Process::Handed{.listeningSocket = listeningSocket});
+        return std::make_unique<Process>(place_.path(), VRX_PROGRAMS "/vrxagent",
+                                         Arguments{"--home", place_ / "home", "--socket", place_ / "socket"},
+                                         Arguments{notices_.variable(), variable},
+                                         Handed{.listeningSocket = listeningSocket});
     }
 
-    Place place_;
     const NoticeSocket notices_{place_ / "notices"};
 };
 
 // Clients connect to a socket that is the service manager's; who answers them there may change.
 TEST_F(ServiceManager, HandsItsSocketToOneAgentAfterTheOther) {
-    const SilentServer listening(place_ / "socket");
+    host::ListeningSocket listening;
+    ASSERT_FALSE(listening.open(place_ / "socket"));
     for (int round = 1; round <= 2; ++round) {
-        Process early(place_ / "", place_ / "app/vrxctl", {"--socket", place_ / "socket", "device"});
-        const std::unique_ptr<Process> agent = startAgent(listening.file());
+        Process early(place_.path(), place_ / "app/vrxctl", {"--socket", place_ / "socket", "device"});
+        const std::unique_ptr<Process> agent = startAgent(listening.number());
         EXPECT_EQ(notices_.next(*agent), "READY=1") << agent->errors();
         EXPECT_EQ(early.wait(), 0) << early.errors();
         EXPECT_EQ(place_.vrxctl({"device"}).code, 0);
@@ -45,22 +45,17 @@ TEST_F(ServiceManager, HandsItsSocketToOneAgentAfterTheOther) {
 
 // The notice is held up in a full queue: the socket must be there by then.
 TEST_F(ServiceManager, HearsThatTheAgentIsReadyWhenClientsCanConnect) {
-    const sockaddr_un notices = addressOf(place_ / "notices");
-    const int filler = socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0);
+    const host::Descriptor filler(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
+    ASSERT_TRUE(connectTo(filler.number(), addressOf(place_ / "notices")));
     std::size_t fillings = 0;
-    while (sendto(filler, "x", 1, 0, reinterpret_cast<const sockaddr*>(&notices), sizeof notices) == 1) ++fillings;
-    close(filler);
-    const int folder = inotify_init1(IN_CLOEXEC);
-    inotify_add_watch(folder, (place_ / "").c_str(), IN_MOVED_TO);
+    while (send(filler.number(), "x", 1, 0) == 1) ++fillings;
+    const host::Descriptor folder(inotify_init1(IN_CLOEXEC));
+    inotify_add_watch(folder.number(), place_.path().c_str(), IN_MOVED_TO);
 
     const std::unique_ptr<Process> agent = startAgent();
-    std::array<pollfd, 2> files{{{folder, POLLIN, 0}, {agent->endedFile(), POLLIN, 0}}};
+    std::array<pollfd, 2> files{{{folder.number(), POLLIN, 0}, {agent->endedFile(), POLLIN, 0}}};
     poll(files.data(), files.size(), 10'000);  // it comes in no time, or never
-    close(folder);
-    const sockaddr_un address = addressOf(place_ / "socket");
-    const int client = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
-    EXPECT_EQ(connect(client, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0) << agent->errors();
-    close(client);
+    EXPECT_TRUE(test::RawClient(place_ / "socket").isConnected()) << agent->errors();
     while (fillings-- > 0) EXPECT_EQ(notices_.next(*agent), "x");
     EXPECT_EQ(notices_.next(*agent), "READY=1");
 }
@@ -68,7 +63,7 @@ TEST_F(ServiceManager, HearsThatTheAgentIsReadyWhenClientsCanConnect) {
 // An agent whose main loop goes on says so at least that often.
 TEST_F(ServiceManager, IsToldAgainAndAgainThatTheAgentIsAlive) {
     const std::unique_ptr<Process> agent = startAgent(-1, "WATCHDOG_USEC=400000");
-    while (notices_.next(*agent) != "READY=1") ASSERT_TRUE(agent->isRunning()) << agent->errors();
+    ASSERT_TRUE(eventually([&] { return notices_.next(*agent) == "READY=1"; }, "the agent")) << agent->errors();
     for (int count = 0; count < 2; ++count) EXPECT_EQ(notices_.next(*agent), "WATCHDOG=1");
 }
 
@@ -77,17 +72,17 @@ TEST_F(ServiceManager, IsToldAgainAndAgainThatTheAgentIsAlive) {
 TEST_F(ServiceManager, GivesTheCapabilityThatTellsOtherUsersPrograms) {
     if (getuid() != 0) GTEST_SKIP() << "takes two users: run it as root";
     constexpr const char* otherUser = "65534";
-    std::filesystem::permissions(place_ / "", std::filesystem::perms(0755));
+    place_.setMode("", 0755);
     std::filesystem::copy(VRX_PROGRAMS "/vrxagent", place_ / "app");
     std::filesystem::create_directory(place_ / "home");
     ASSERT_EQ(chown((place_ / "home").c_str(), 65534, 65534), 0);
-    ASSERT_EQ(chmod((place_ / "notices").c_str(), 0666), 0);
+    place_.setMode("notices", 0666);
     for (const bool isCapable : {false, true}) {
         Arguments words{"--reuid", otherUser, "--regid", otherUser, "--clear-groups"};
         if (isCapable) words.insert(words.end(), {"--inh-caps", "+sys_ptrace", "--ambient-caps", "+sys_ptrace"});
         words.insert(words.end(),
                      {place_ / "app/vrxagent", "--home", place_ / "home", "--socket", place_ / "home/socket"});
-        const Process agent(place_ / "", "/usr/bin/setpriv", words, {notices_.variable()});
+        const Process agent(place_.path(), "/usr/bin/setpriv", words, {notices_.variable()});
         ASSERT_EQ(notices_.next(agent), "READY=1") << agent.errors();
         const Place::Outcome outcome = place_.vrxctl({"device"}, "home/socket");
         EXPECT_EQ(outcome.code, isCapable ? 0 : 4) << outcome.errors;

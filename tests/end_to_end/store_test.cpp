@@ -3,7 +3,6 @@
 
 #include <algorithm>
 #include <cstdlib>
-#include <filesystem>
 #include <regex>
 
 #include "end_to_end/coverage_server.h"
@@ -42,36 +41,34 @@ constexpr const char* installed =
 constexpr const char* notFound = R"({"AppAvailabilityType": 0})";
 constexpr const char* nothing = nullptr;  // not even whether it is offered
 
-class StoreOfAgent : public testing::Test {
+class StoreOfAgent : public AtPlace {
 protected:
     void SetUp() override {
         setenv("no_proxy", "*", 1);
-        place.write("store.json", storeFile);
-        server.emplace(place / "", Arguments{"--quiet", "--store", place / "store.json"});
-        std::filesystem::create_directories(place / "apps/tool");
-        place.write("apps/tool/bundle.toml", "identifier = 'com.tool'\nname = 'Werkzeug'\nvendor = 'Ltd.'\n");
+        place_.write("store.json", storeFile);
+        server.emplace(place_.path(), Arguments{"--quiet", "--store", place_ / "store.json"});
+        place_.write("apps/tool/bundle.toml", "identifier = 'com.tool'\nname = 'Werkzeug'\nvendor = 'Ltd.'\n");
         useStore(server->url());
-        place.start();
-        ASSERT_TRUE(place.isReady());
+        place_.start();
     }
     void useStore(const std::string& url) const {
-        place.write("device.toml",
-                    "[account]\nidentifier = 'maya@orvane.example'\nstore_account_identifier = 4711\n"
-                    "[locale]\nlanguage = 'de_AT'\n[store]\nlookup_url = '" +
-                        url + "/store/lookup'\npurchase_history_url = '" + url +
-                        "/store/purchases'\n[applications]\nfolders = ['" + place / "apps" +
-                        "']\ncompanion = '" VRX_SOURCE "/companion'\n");
+        place_.write("device.toml",
+                     "[account]\nidentifier = 'maya@orvane.example'\nstore_account_identifier = 4711\n"
+                     "[locale]\nlanguage = 'de_AT'\n[store]\nlookup_url = '" +
+                         url + "/store/lookup'\npurchase_history_url = '" + url +
+                         "/store/purchases'\n[applications]\nfolders = ['" + place_ / "apps" +
+                         "']\ncompanion = '" VRX_SOURCE "/companion'\n");
     }
     // Asks with and without --json. The requests are those of one asking, none of which a cache may answer.
     void expect(const std::string& verb, const std::string& bundle, const char* answer, std::string requests,
                 const std::string& faults = "") const {
         SCOPED_TRACE(verb + " " + bundle + " " + faults);
         server->ask("POST", "/faults", faults);
-        const Place::Outcome json = place.vrxctl({verb, bundle, "--json"});
+        const Place::Outcome json = place_.vrxctl({verb, bundle, "--json"});
         const auto count = requests.empty() ? 0 : 1 + std::ranges::count(requests, ' ');
         if (count > 0) requests = std::regex_replace(requests + "!", std::regex(" "), "! ");
         EXPECT_EQ(server->requests(count), requests);
-        const Place::Outcome text = place.vrxctl({verb, bundle});
+        const Place::Outcome text = place_.vrxctl({verb, bundle});
         server->ask("DELETE", "/faults");
         server->ask("DELETE", "/requests");
 
@@ -90,7 +87,6 @@ protected:
             << text.output;
     }
 
-    Place place;
     std::optional<CoverageServer> server;
 };
 
@@ -114,14 +110,14 @@ TEST_F(StoreOfAgent, IsAskedForWhatIsNotInstalled) {
     expect("store", "com.offered", offeredWithoutData, "c200", "catalogue:nulls");
     expect("support", "com.offered", offered, "p302 moved-p200 c302 moved-c200", "any:redirect");
 
-    place.write("store.json", "{\"items\": [");
+    place_.write("store.json", "{\"items\": [");
     expect("store", "com.offered", nothing, "c500");
-    ASSERT_EQ(place.vrxhost({"defaults", "write", "AppSupportAvailability", "true"}).code, 0);
+    ASSERT_EQ(place_.vrxhost({"defaults", "write", "AppSupportAvailability", "true"}).code, 0);
     expect("support", "com.none",
            R"({"AppTitleKey": "Orvane Support", "AppVendorName": "Orvane", "AppAvailablityText": "OVERRIDE",
                "AppAvailabilityType": 1})",
            "p500");
-    ASSERT_EQ(place.vrxhost({"defaults", "delete", "AppSupportAvailability"}).code, 0);
+    ASSERT_EQ(place_.vrxhost({"defaults", "delete", "AppSupportAvailability"}).code, 0);
     useStore("http://127.0.0.1:1");
     expect("support", "com.offered", nothing, "");
 }
@@ -129,10 +125,10 @@ TEST_F(StoreOfAgent, IsAskedForWhatIsNotInstalled) {
 // Takes the 5 seconds for which the agent waits.
 TEST_F(StoreOfAgent, SlowPurchasesHoldTheirOwnConnectionOnly) {
     server->ask("POST", "/faults", "purchases:hold");
-    const std::string socket = place / "socket";
-    Process slow(place / "", place / "app/vrxctl", {"--socket", socket, "support", "com.bought", "--json"});
+    const std::string socket = place_ / "socket";
+    Process slow(place_.path(), place_ / "app/vrxctl", {"--socket", socket, "support", "com.bought", "--json"});
     server->ask("GET", "/requests?atLeast=1&begun=1");
-    EXPECT_EQ(place.vrxctl({"device"}).code, 0);
+    EXPECT_EQ(place_.vrxctl({"device"}).code, 0);
     EXPECT_EQ(server->ask("GET", "/requests").asArray()->size(), 1u) << "the other connection had to wait";
     EXPECT_EQ(slow.wait(), 0) << slow.errors();
     const Value answer = codec::parseJson(slow.output()).value()["availability"];

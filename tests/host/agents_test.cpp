@@ -4,12 +4,10 @@
 #include <atomic>
 #include <future>
 #include <latch>
-#include <thread>
 
 #include "host/support.h"
 #include "vrx/coverage/records/warranty.h"
 #include "vrx/devices/records/device_info.h"
-#include "vrx/followup/follow_up.h"
 #include "vrx/host/host.h"
 #include "vrx/scheduling/outreach_activity.h"
 #include "vrx/scheduling/scheduler.h"
@@ -28,16 +26,15 @@ protected:
                   "= true\n[locale]\ntime_zone = 'UTC'\n"
                   "[[watches]]\nname = 'One'\nserial_number = 'W1'\npaired = true\n"
                   "[[watches]]\nname = 'Two'\nserial_number = 'W2'\npaired = true\n");
-        writeRecord("Warranty.plist", "<key>covered</key><true/>");
-        writeRecord("versions.plist",
-                    "<key>LowServerVersion</key><integer>2</integer><key>HighServerVersion</key><integer>3</integer>");
+        writeRecord("Warranty", {{"covered", true}});
+        writeRecord("versions", {{"LowServerVersion", 2}, {"HighServerVersion", 3}});
         ASSERT_FALSE(host_.open(HomeUse::Agent));
         vrx_registerDefaults(defaults());
         defaults().set("WarrantyURL", "file://" + folder_ / "Warranty.plist");
         defaults().set("ServerVersionURL", "file://" + folder_ / "versions.plist");
     }
-    void writeRecord(const std::string& name, const std::string& entries) const {
-        writeFile(folder_ / name, "<plist version='1.0'><dict>" + entries + "</dict></plist>");
+    void writeRecord(const std::string& name, const platform::Dictionary& entries) const {
+        writeFile(folder_ / (name + ".plist"), propertyList(entries));
     }
     static platform::DefaultsStore& defaults() { return platform::Platform::current().defaultsStore(); }
 
@@ -64,13 +61,10 @@ TEST_F(Agents, AnswerOverlappingAllDevicesRequests) {
 }
 
 TEST_F(Agents, FindTheEarliestOfDatesThatComeAtOnce) {
-    const std::pair<const char*, const char*> dates[] = {
-        {"PHONE", "3000000000"}, {"W1", "2900000000"}, {"W2", "2950000000"}};
-    for (const auto& [serialNumber, date] : dates)
-        writeRecord(std::string("Warranty.") + serialNumber + ".plist",
-                    std::string("<key>featureToggleParameters</key><dict><key>qxOfferDisplay</key><true/></dict>"
-                                "<key>qxOfferFollowupDisplayDate</key><integer>") +
-                        date + "</integer>");
+    const platform::Dictionary offer{{"qxOfferDisplay", true}};
+    for (auto [serialNumber, date] : {std::pair("PHONE", 3000000000), {"W1", 2900000000}, {"W2", 2950000000}})
+        writeRecord(std::string("Warranty.") + serialNumber,
+                    {{"featureToggleParameters", offer}, {"qxOfferFollowupDisplayDate", date}});
     constexpr const char* targetDate = "com.orvane.vrxagent.followuppost.TargetDate";
     for (int round = 0; round < 20; ++round) {
         defaults().remove(targetDate);
@@ -81,27 +75,6 @@ TEST_F(Agents, FindTheEarliestOfDatesThatComeAtOnce) {
         ASSERT_EQ(result.get_future().get(), platform::BackgroundActivityResult::Finished);
         ASSERT_EQ(defaults().date(targetDate), platform::dateFromEpoch(2900000000));
     }
-}
-
-TEST_F(Agents, RememberPostsAndDismissalsThatComeAtOnce) {
-    constexpr std::size_t devices = 10;
-    auto serialNumber = [](std::size_t device) { return "DEVICE" + std::to_string(device); };
-    const auto offer = VRXWarranty::warrantyWithDictionary(
-        platform::Dictionary{{"featureToggleParameters", platform::Dictionary{{"qxOfferDisplay", true}}}});
-    auto forAll = [&](auto act) {
-        return std::thread([act] {
-            for (std::size_t device = 0; device < devices; ++device) act(device);
-        });
-    };
-    auto post = [&](std::size_t device) {
-        VRXFollowUp().postFollowUpWithDeviceInfo(VRXDeviceInfo::deviceInfoWithDevice(
-            VRXDevice::deviceWithName("Device", serialNumber(device), std::nullopt, VRXDeviceTypeWatch), offer));
-    };
-    auto dismiss = [&](std::size_t device) { VRXFollowUp().dismissFollowUpForSerialNumber(serialNumber(device)); };
-    std::thread threads[] = {forAll(post), forAll(post), forAll(dismiss), forAll(dismiss)};
-    for (std::thread& thread : threads) thread.join();
-    EXPECT_EQ(defaults().get("FollowupPostedSerialNumberHashes").asArray()->size(), devices);
-    EXPECT_EQ(defaults().get("FollowupDismissedSerialNumberHashes").asArray()->size(), 2 * devices);
 }
 
 }  // namespace

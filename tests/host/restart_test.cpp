@@ -1,16 +1,10 @@
 #include "vrx/host/restart.h"
 
-#include <fcntl.h>
-#include <gmock/gmock.h>
 #include <poll.h>
-#include <sched.h>
-#include <sys/socket.h>
-#include <sys/wait.h>
-
-#include <filesystem>
 
 #include "client/raw_client.h"
 #include "host/support.h"
+#include "support/eventually.h"
 #include "vrx/host/home/home_lock.h"
 
 namespace vrx::host {
@@ -26,7 +20,7 @@ void runFirstProgram(const std::string& folder) {
     setenv(folderVariable, folder.c_str(), 1);
     if (lock.take(folder) || listener.open(folder + "/socket")) _exit(1);
     writeFile(folder + "/first", "");
-    while (!std::filesystem::exists(folder + "/connected")) sched_yield();
+    if (!eventually([&] { return std::filesystem::exists(folder + "/connected"); }, "a client")) _exit(1);
     std::string name = "host_tests", filter = "--gtest_filter=*DISABLED_SecondProgram";
     std::string disabled = "--gtest_also_run_disabled_tests";
     char* arguments[] = {name.data(), filter.data(), disabled.data(), nullptr};
@@ -52,9 +46,8 @@ TEST(Restart, DISABLED_SecondProgram) {
 TEST(Restart, KeepsClientsWaitingAndTheHomeLocked) {
     LogRecorder log;
     TemporaryFolder folder;
-    const pid_t child = fork();
-    if (child == 0) runFirstProgram(folder.path());
-    while (!std::filesystem::exists(folder / "first")) std::this_thread::yield();
+    const pid_t child = inChild([&] { runFirstProgram(folder.path()); });
+    ASSERT_TRUE(eventually([&] { return std::filesystem::exists(folder / "first"); }, "the first program"));
     test::RawClient client(folder / "socket");
     ASSERT_TRUE(client.isConnected());
     writeFile(folder / "connected", "");
@@ -64,9 +57,7 @@ TEST(Restart, KeepsClientsWaitingAndTheHomeLocked) {
         ASSERT_TRUE(HomeLock::isInUse(folder.path()) && HomeLock().take(folder.path()));
     EXPECT_TRUE(client.readUntil(std::to_string(child))) << "the same process";
     client.close();
-    int status = 0;
-    waitpid(child, &status, 0);
-    EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0);
+    EXPECT_EQ(endOf(child), 0);
     EXPECT_FALSE(HomeLock::isInUse(folder.path()));
     EXPECT_FALSE(std::filesystem::exists(folder / "socket")) << "it goes with the process that bound it";
 }

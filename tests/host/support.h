@@ -1,9 +1,13 @@
-// What the host's tests share: a folder that goes away, a clock that the test sets, and a platform that writes down
-// what is logged.
+// What the host's tests share: a folder that goes away, child processes and pipes, a clock that the test sets, and a
+// platform that writes down what is logged.
 #pragma once
 
+#include <fcntl.h>
 #include <gtest/gtest.h>
+#include <sys/wait.h>
+#include <unistd.h>
 
+#include <array>
 #include <atomic>
 #include <cstdlib>
 #include <filesystem>
@@ -13,6 +17,8 @@
 #include <vector>
 
 #include "vrx/codec/codec.h"
+#include "vrx/codec/property_list.h"
+#include "vrx/host/base/descriptor.h"
 #include "vrx/platform/clock.h"
 #include "vrx/platform/log.h"
 #include "vrx/platform/platform.h"
@@ -22,7 +28,7 @@ namespace vrx::host {
 class TemporaryFolder {
 public:
     TemporaryFolder() {
-        std::string pattern = (std::filesystem::temp_directory_path() / "vrx-XXXXXX").string();
+        std::string pattern = std::filesystem::canonical(std::filesystem::temp_directory_path()) / "vrx-XXXXXX";
         path_ = mkdtemp(pattern.data());
     }
     ~TemporaryFolder() { std::filesystem::remove_all(path_); }
@@ -42,7 +48,13 @@ private:
     std::string path_;
 };
 
-inline void writeFile(const std::string& path, std::string_view text) {
+inline platform::Data bytes(std::string_view text) {
+    return {text.begin(), text.end()};
+}
+
+// Makes the folders above it too.
+inline void writeFile(const std::filesystem::path& path, std::string_view text) {
+    std::filesystem::create_directories(path.parent_path());
     std::ofstream(path, std::ios::binary) << text;
 }
 
@@ -50,6 +62,61 @@ inline std::string fileText(const std::string& path) {
     std::ifstream file(path, std::ios::binary);
     return {std::istreambuf_iterator<char>(file), {}};
 }
+
+// What a folder's files hold, and when each was written; without the index that a database's readers share.
+inline platform::Dictionary contentsOf(const std::string& folder) {
+    platform::Dictionary contents;
+    for (const auto& entry : std::filesystem::recursive_directory_iterator(folder))
+        if (entry.is_regular_file() && !entry.path().string().ends_with("-shm"))
+            contents[entry.path()] =
+                platform::Array{fileText(entry.path()), entry.last_write_time().time_since_epoch().count()};
+    return contents;
+}
+
+// A property list in XML.
+inline std::string propertyList(const platform::Dictionary& entries) {
+    const auto written = codec::serializePropertyList(entries, platform::PropertyListFormat::Xml);
+    return {written->begin(), written->end()};
+}
+
+inline unsigned modeOf(const std::string& path) {
+    return static_cast<unsigned>(std::filesystem::status(path).permissions());
+}
+
+// A child process that does the work and ends without any clean-up. It must be made before this process has threads.
+template <class Work>
+pid_t inChild(Work work) {
+    const pid_t child = fork();
+    if (child != 0) return child;
+    work();
+    _exit(0);
+}
+
+// Its exit code, or the negative signal that ended it, once it has ended.
+inline int endOf(pid_t child) {
+    int status = 0;
+    waitpid(child, &status, 0);
+    return WIFEXITED(status) ? WEXITSTATUS(status) : -WTERMSIG(status);
+}
+
+struct Pipe {
+    Pipe() {
+        std::array<int, 2> ends{};
+        if (pipe2(ends.data(), O_CLOEXEC) != 0) std::abort();
+        reader = Descriptor(ends[0]);
+        writer = Descriptor(ends[1]);
+    }
+    // Everything that comes until nobody can write any longer; this process cannot from now on.
+    std::string rest() {
+        writer = Descriptor();
+        std::string text;
+        std::array<char, 4096> piece;
+        for (ssize_t size; (size = read(reader.number(), piece.data(), piece.size())) > 0;)
+            text.append(piece.data(), static_cast<std::size_t>(size));
+        return text;
+    }
+    Descriptor reader, writer;
+};
 
 class SettableClock final : public platform::Clock {
 public:

@@ -53,9 +53,7 @@ TEST_F(AccountStoreTest, AsksTheHelperAndKeepsItsTokenToItself) {
     EXPECT_EQ(store.credentialToken({"eve", "A1"}, "S"), std::nullopt);
 
     const std::string file = std::filesystem::directory_iterator(folder / "credentials")->path();
-    struct stat status;
-    ASSERT_EQ(stat(file.c_str(), &status), 0);
-    EXPECT_EQ(status.st_mode & 0777, 0600u);
+    EXPECT_EQ(modeOf(file), 0600u);
     EXPECT_THAT(log.lines(), IsEmpty());
     chmod(file.c_str(), 0640);
     EXPECT_EQ(token(), "(none)");
@@ -67,29 +65,41 @@ TEST_F(AccountStoreTest, AsksTheHelperAndKeepsItsTokenToItself) {
     EXPECT_THAT(log.lines(), ElementsAre(HasSubstr("must belong to the agent's user"), HasSubstr("holds no token")));
 }
 
-TEST_F(AccountStoreTest, FailsWithAReasonAndKeepsTheTokenWhateverTheHelperDoes) {
+struct BadHelper {
+    const char *name, *script, *reason;
+};
+std::ostream& operator<<(std::ostream& stream, const BadHelper& helper) {
+    return stream << helper.script;
+}
+const BadHelper badHelpers[] = {
+    {"Fails", "echo token=new; exit 3", "failed with status 3"},
+    {"IsKilled", "echo token=new; kill -TERM $$; exit 0", "ended by signal 15"},
+    {"IsSilent", "true", "printed no token"},
+    {"GivesAnEmptyToken", "echo token=", "printed no token"},
+    {"GivesItAfterTheEnd", "echo; echo token=new", "printed no token"},
+    {"Babbles", "printf '\\377\\000new\\n'; echo token=new", "not key=value"},
+    {"GivesALineEndToo", "printf 'token=new\\r\\n'", "visible characters"},
+    {"GivesANul", "printf 'token=n\\000ew\\n'", "visible characters"},
+    {"GivesALongToken", "head -c 9000 /dev/zero | tr '\\0' x | sed s/^/token=/", "too long"},
+    {"NeverStops", "yes token=new", "printed too much"},
+    {"IsInTheWay", "rm -r $1/credentials; : >$1/credentials; echo token=new", "cannot create"},
+};
+class BadHelpers : public AccountStoreTest, public WithParamInterface<BadHelper> {};
+
+TEST_P(BadHelpers, FailWithAReasonAndChangeNoToken) {
     setHelper("echo token=old");
     ASSERT_EQ(renew().code, RenewalResult::renewed);
-    const std::pair<const char*, const char*> cases[] = {
-        {"echo token=new; exit 3", "failed with status 3"},
-        {"echo token=new; kill -TERM $$; exit 0", "ended by signal 15"},
-        {"true", "printed no token"},
-        {"echo token=", "printed no token"},
-        {"echo; echo token=new", "printed no token"},
-        {"printf '\\377\\000new\\n'; echo token=new", "not key=value"},
-        {"printf 'token=new\\r\\n'", "visible characters"},
-        {"printf 'token=n\\000ew\\n'", "visible characters"},
-        {"head -c 9000 /dev/zero | tr '\\0' x | sed s/^/token=/", "too long"},
-        {"yes token=new", "printed too much"},
-        {"rm -r $1/credentials; : >$1/credentials; echo token=new", "cannot create"},
-    };
-    for (const auto& [script, reason] : cases) {
-        EXPECT_EQ(token(), "old") << script;
-        setHelper(script);
-        const RenewalResult result = renew();
-        EXPECT_NE(result.code, RenewalResult::renewed) << script;
-        EXPECT_THAT(result.error.value().text, AllOf(HasSubstr(reason), Not(HasSubstr("new")))) << script;
-    }
+    setHelper(GetParam().script);
+    const RenewalResult result = renew();
+    EXPECT_NE(result.code, RenewalResult::renewed);
+    EXPECT_THAT(result.error.value().text, AllOf(HasSubstr(GetParam().reason), Not(HasSubstr("new"))));
+    EXPECT_EQ(token(), std::string_view(GetParam().name) == "IsInTheWay" ? "(none)" : "old");
+}
+
+INSTANTIATE_TEST_SUITE_P(Each, BadHelpers, ValuesIn(badHelpers),
+                         [](const auto& helper) { return std::string(helper.param.name); });
+
+TEST_F(AccountStoreTest, RunsOnlyAHelperThatATrustedProfileNames) {
     setHelper("echo token=new");
     chmod(profile.path().c_str(), 0666);
     EXPECT_EQ(renew().code, static_cast<int>(CredentialFailure::NotTrusted));

@@ -2,7 +2,6 @@
 #include "vrx/host/activities/background_activities.h"
 
 #include <gmock/gmock.h>
-#include <sys/wait.h>
 
 #include <chrono>
 #include <csignal>
@@ -169,17 +168,15 @@ private:
 };
 
 TEST(StoredActivitiesRoad, LosesNothingWhenKilledAtAnyMoment) {
-    int steps = 0, status = -1;
-    for (; status != 0; ++steps) {
+    int steps = 0;
+    for (bool wasKilled = true; wasKilled; ++steps) {
         TemporaryFolder folder;
-        const pid_t child = fork();
-        if (child == 0) {
-            Road road(folder);
-            for (int i = 0; i < steps; ++i)
-                if (!road.subject.step(24h)) _exit(0);
-            kill(getpid(), SIGKILL);
-        }
-        waitpid(child, &status, 0);
+        wasKilled = endOf(inChild([&] {
+                        Road road(folder);
+                        for (int i = 0; i < steps; ++i)
+                            if (!road.subject.step(24h)) _exit(0);
+                        kill(getpid(), SIGKILL);
+                    })) != 0;
         Road road(folder);
         road.subject.pass(24h);
         EXPECT_THAT(folder.names(), IsSupersetOf({"com.orvane.vrxagent.upgrade", "first", "second", "again"}))

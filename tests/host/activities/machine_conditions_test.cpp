@@ -6,12 +6,11 @@
 #include <sched.h>
 #include <sys/ioctl.h>
 #include <sys/socket.h>
-#include <sys/wait.h>
 
-#include <filesystem>
 #include <map>
 
 #include "host/support.h"
+#include "support/eventually.h"
 #include "vrx/host/activities/power_supply.h"
 #include "vrx/host/loop/main_loop.h"
 
@@ -21,9 +20,8 @@ namespace {
 TEST(PowerSupply, IsLowWhereEveryBatteryIsAndNothingElseFeedsTheMachine) {
     TemporaryFolder root;
     auto isLowWith = [&](const std::string& supply, std::map<const char*, const char*> attributes) {
-        const std::string folder = root / ("sys/class/power_supply/" + supply);
-        std::filesystem::create_directories(folder);
-        for (const auto& [name, value] : attributes) writeFile(folder + "/" + name, std::string(value) + "\n");
+        for (const auto& [name, value] : attributes)
+            writeFile(root / ("sys/class/power_supply/" + supply + "/" + name), std::string(value) + "\n");
         return isOnLowBattery(root.path());
     };
     EXPECT_FALSE(isOnLowBattery(root.path()));
@@ -67,20 +65,18 @@ int followRoutes() {
     if (conditions.isNetworkAvailable()) return 1;
     conditions.wakeAt(std::nullopt, true);
     loop.post([] { addDefaultRoute(); });
-    while (!conditions.isNetworkAvailable()) loop.run();
+    loop.postAfter(std::chrono::minutes(1), [&] { loop.stop(); });
+    const auto hasRoute = [&] { return conditions.isNetworkAvailable() || (loop.run(), false); };
+    if (!eventually(hasRoute, "the route")) return 4;
     if (wakeUps == 0) return 2;
     writeFile(profile.path(), "[network]\navailable = false\n");
     return conditions.isNetworkAvailable() ? 3 : 0;
 }
 
 TEST(MachineConditions, FollowTheDefaultRoutesAndTheProfile) {
-    const pid_t child = fork();
-    if (child == 0) _exit(followRoutes());
-    int status = 0;
-    waitpid(child, &status, 0);
-    ASSERT_TRUE(WIFEXITED(status));
-    if (WEXITSTATUS(status) == 77) GTEST_SKIP() << "no network of its own here";
-    EXPECT_EQ(WEXITSTATUS(status), 0);
+    const int code = endOf(inChild([] { _exit(followRoutes()); }));
+    if (code == 77) GTEST_SKIP() << "no network of its own here";
+    EXPECT_EQ(code, 0);
 }
 
 }  // namespace

@@ -1,6 +1,5 @@
 #include "vrx/host/base/files.h"
 
-#include <dirent.h>
 #include <gmock/gmock.h>
 #include <sys/stat.h>
 
@@ -8,8 +7,6 @@
 #include <thread>
 
 #include "host/support.h"
-#include "vrx/host/home/home_lock.h"
-#include "vrx/platform/limits.h"
 
 namespace vrx::host {
 namespace {
@@ -18,14 +15,8 @@ using platform::Data;
 using platform::MaybeError;
 using ::testing::ElementsAre;
 
-Data bytes(std::string_view text) {
-    return {text.begin(), text.end()};
-}
-
-std::size_t openFiles() {
-    std::size_t count = 0;
-    for ([[maybe_unused]] const auto& entry : std::filesystem::directory_iterator("/proc/self/fd")) ++count;
-    return count;
+std::ptrdiff_t openFiles() {
+    return std::distance(std::filesystem::directory_iterator("/proc/self/fd"), {});
 }
 
 // Fails the k-th call and, when it is to be for good, every one after it; clean-up calls pass, so that what is checked
@@ -64,7 +55,7 @@ TEST(ReplaceFile, LeavesTheOldContentWhateverCallFails) {
             TemporaryFolder folder;
             const std::string path = folder / "file";
             ASSERT_FALSE(replaceFile(path, bytes("old content")));
-            const std::size_t open = openFiles();
+            const std::ptrdiff_t open = openFiles();
             FailingCalls calls(k, forGood);
             const MaybeError error = replaceFile(path, bytes("new content"), calls);
             EXPECT_EQ(openFiles(), open);
@@ -94,11 +85,10 @@ TEST(ReplaceFile, WritersAtOnceEachLeaveAWholeFile) {
     const std::string path = folder / "file";
     ASSERT_FALSE(replaceFile(path, bytes(std::string(20000, 'a'))));
     std::vector<std::thread> writers;
-    for (char c : {'a', 'b', 'c'}) {
+    for (char c : {'a', 'b', 'c'})
         writers.emplace_back([&path, c] {
             for (int i = 0; i < 30; ++i) EXPECT_FALSE(replaceFile(path, bytes(std::string(20000, c))));
         });
-    }
     for (int i = 0; i < 100; ++i) {
         auto content = readFile(path);
         ASSERT_TRUE(content) << content.error().text;
@@ -106,55 +96,18 @@ TEST(ReplaceFile, WritersAtOnceEachLeaveAWholeFile) {
     }
     for (std::thread& writer : writers) writer.join();
     EXPECT_THAT(folder.names(), ElementsAre("file"));
-    struct stat status;
-    ASSERT_EQ(stat(path.c_str(), &status), 0);
-    EXPECT_EQ(status.st_mode & 0777, 0600u);
 }
 
-TEST(ReadFile, RefusesWhatIsNoRegularFileOrTooLargeAndReadsWhatHasNoSize) {
-    TemporaryFolder folder;
-    ASSERT_EQ(mkfifo((folder / "fifo").c_str(), 0600), 0);
-    EXPECT_FALSE(readFile(folder / "fifo"));
-    EXPECT_FALSE(readFile(folder.path()));
-    EXPECT_FALSE(readFile(folder / "absent"));
-    writeFile(folder / "large", "");
-    std::filesystem::resize_file(folder / "large", platform::limits::fileBytes);
-    EXPECT_TRUE(readFile(folder / "large"));
-    std::filesystem::resize_file(folder / "large", platform::limits::fileBytes + 1);
-    EXPECT_FALSE(readFile(folder / "large"));
-    auto status = readFile("/proc/self/status");
-    ASSERT_TRUE(status);
-    EXPECT_GT(status->bytes.size(), 100u);
-}
-
-TEST(CreateDirectories, MakesPrivateFoldersAndAcceptsThoseThatExist) {
+TEST(Files, AreForTheirUserAloneAndReadOnlyWhereTheyAreRegular) {
     TemporaryFolder folder;
     Files files(folder / "home");
-    EXPECT_TRUE(files.replace(folder / "home/a/file", bytes("x")));
-    EXPECT_FALSE(files.createDirectories(folder / "home/a/b"));
-    EXPECT_FALSE(files.createDirectories(folder / "home/a"));
-    struct stat status;
-    ASSERT_EQ(stat((folder / "home/a").c_str(), &status), 0);
-    EXPECT_EQ(status.st_mode & 0777, 0700u);
-    EXPECT_FALSE(files.replace(folder / "home/a/file", bytes("x")));
-    EXPECT_TRUE(files.createDirectories(folder / "home/a/file"));
-    EXPECT_TRUE(files.createDirectories(folder / "home/a/file/b"));
-    EXPECT_FALSE(files.remove(folder / "home/a/file"));
-    EXPECT_TRUE(files.remove(folder / "home/a/file"));
-}
-
-TEST(HomeLock, KeepsASecondAgentOutAndNamesTheFirst) {
-    TemporaryFolder folder;
-    HomeLock second;
-    {
-        HomeLock first;
-        ASSERT_FALSE(first.take(folder / "home"));
-        const MaybeError refusal = second.take(folder / "home");
-        ASSERT_TRUE(refusal);
-        EXPECT_EQ(refusal->code, EWOULDBLOCK);
-        EXPECT_THAT(refusal->text, ::testing::HasSubstr("process " + std::to_string(getpid())));
-    }
-    EXPECT_FALSE(second.take(folder / "home"));
+    ASSERT_FALSE(files.createDirectories(folder / "home/a"));
+    ASSERT_FALSE(files.replace(folder / "home/a/file", bytes("x")));
+    EXPECT_EQ(modeOf(folder / "home/a"), 0700u);
+    EXPECT_EQ(modeOf(folder / "home/a/file"), 0600u);
+    ASSERT_EQ(mkfifo((folder / "fifo").c_str(), 0600), 0);
+    EXPECT_FALSE(readFile(folder / "fifo"));
+    EXPECT_GT(readFile("/proc/self/status")->bytes.size(), 100u) << "it has no size";
 }
 
 }  // namespace

@@ -1,10 +1,9 @@
 // Follow-ups on the real host: a service that fails, processes that work at once, and processes that are killed at
 // work.
 #include <gmock/gmock.h>
-#include <sys/wait.h>
-#include <unistd.h>
 
 #include <csignal>
+#include <thread>
 
 #include "host/support.h"
 #include "vrx/coverage/records/warranty.h"
@@ -66,19 +65,12 @@ protected:
         host.emplace(HostLocations{folder / "home", folder / "device.toml"}, platform::Level::Error);
         ASSERT_FALSE(host->open(HomeUse::Tool));
     }
-    // Does the work in a process with a host of its own, which must be made before this one has threads.
-    pid_t inChild(const std::function<void()>& work) {
-        const pid_t child = fork();
-        if (child != 0) return child;
-        openHost();
-        work();
-        _exit(0);
-    }
-    // 0, or the signal that ended it.
-    static int end(pid_t child) {
-        int status = -1;
-        waitpid(child, &status, 0);
-        return status;
+    // Does the work in a process with a host of its own.
+    pid_t inChildWithHost(const std::function<void()>& work) {
+        return inChild([&] {
+            openHost();
+            work();
+        });
     }
     std::vector<std::string> pending() {
         std::vector<std::string> identifiers;
@@ -143,7 +135,7 @@ TEST_F(FollowUps, AreNotHiddenByOneThatCannotBeRead) {
     EXPECT_THAT(pending(), ElementsAre("a", "c", "b"));
 }
 
-TEST_F(FollowUps, OfProcessesAtOnceAreAllThereAndSoAreTheirHashes) {
+TEST_F(FollowUps, OfProcessesAndThreadsAtOnceAreAllThereAndSoAreTheirHashes) {
     constexpr int each = 20;
     const auto work = [](const std::string& name) {
         for (int i = 0; i < each; ++i) {
@@ -152,12 +144,14 @@ TEST_F(FollowUps, OfProcessesAtOnceAreAllThereAndSoAreTheirHashes) {
             VRXFollowUp().dismissFollowUpForSerialNumber(name + std::to_string(i));
         }
     };
-    const pid_t child = inChild([&] { work("child"); });
+    const pid_t child = inChildWithHost([&] { work("child"); });
     openHost();
+    std::thread other(work, "other");
     work("parent");
-    EXPECT_EQ(end(child), 0);
+    other.join();
+    EXPECT_EQ(endOf(child), 0);
     for (auto [key, count] :
-         {std::pair(postedSerialNumberHashesKey, 3 * each), {dismissedSerialNumberHashesKey, 2 * each}}) {
+         {std::pair(postedSerialNumberHashesKey, 4 * each), {dismissedSerialNumberHashesKey, 3 * each}}) {
         EXPECT_THAT(*stored(key).asArray(), SizeIs(count));
         EXPECT_THAT(serialNumberHashes(key), SizeIs(count));
     }
@@ -168,7 +162,7 @@ TEST_F(FollowUps, AreThereOnceWhenTheProcessWasKilledBehindThePost) {
     const auto post = [](const std::shared_ptr<VRXFollowUpProvider>& by) {
         VRXFollowUp(by).postFollowUpWithDeviceInfo(offered("PHONE"));
     };
-    EXPECT_EQ(end(inChild([&] { post(std::make_shared<KilledProvider>()); })), SIGKILL);
+    EXPECT_EQ(endOf(inChildWithHost([&] { post(std::make_shared<KilledProvider>()); })), -SIGKILL);
     openHost();
     EXPECT_THAT(pending(), SizeIs(1));
     EXPECT_TRUE(stored(postedSerialNumberHashesKey).isNull());
@@ -184,12 +178,12 @@ TEST_F(FollowUps, AreBothThereWhenTheProcessWasKilledWithinTheMigration) {
         collaborators.makeFollowUp = [=] { return std::make_shared<VRXFollowUp>(by); };
         VRXAgent::initWithCallingProcessBundleID("id", collaborators)->performMigrationIfNeeded();
     };
-    const pid_t child = inChild([&] {
+    const pid_t child = inChildWithHost([&] {
         provider->postFollowUpItem({.uniqueIdentifier = followUpClientIdentifier()}, nullptr);
         offered("")->warranty()->cache();
         migrate(std::make_shared<KilledProvider>());
     });
-    EXPECT_EQ(end(child), SIGKILL);
+    EXPECT_EQ(endOf(child), -SIGKILL);
     openHost();
     EXPECT_TRUE(stored("VRXMigrationVersion").isNull());
     migrate(provider);

@@ -1,10 +1,7 @@
 // A small HTTP server on loopback, for tests of what sends requests.
 #pragma once
 
-#include <arpa/inet.h>
 #include <poll.h>
-#include <sys/socket.h>
-#include <unistd.h>
 
 #include <array>
 #include <atomic>
@@ -15,6 +12,9 @@
 #include <utility>
 #include <vector>
 
+#include "host/support.h"
+#include "support/sockets.h"
+
 namespace vrx::host {
 
 // Answers each request of each connection on loopback with whatever the test's function makes of it; an empty answer
@@ -24,19 +24,17 @@ public:
     using Answer = std::function<std::string(const std::string& request)>;
 
     explicit LoopbackServer(Answer answer) : answer_(std::move(answer)) {
-        sockaddr_in address{};
-        address.sin_family = AF_INET;
-        address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+        sockaddr_in address = loopbackAddress();
         socklen_t size = sizeof address;
-        if (bind(listener_, reinterpret_cast<sockaddr*>(&address), size) != 0 || listen(listener_, 16) != 0) abort();
-        getsockname(listener_, reinterpret_cast<sockaddr*>(&address), &size);
+        const int listener = listener_.number();
+        if (bind(listener, reinterpret_cast<sockaddr*>(&address), size) != 0 || listen(listener, 16) != 0) abort();
+        getsockname(listener, reinterpret_cast<sockaddr*>(&address), &size);
         port_ = ntohs(address.sin_port);
         thread_ = std::thread([this] { run(); });
     }
     ~LoopbackServer() {
-        if (::write(stop_[1], "x", 1) != 1) abort();
+        stop_.writer = Descriptor();
         thread_.join();
-        for (int file : {listener_, stop_[0], stop_[1]}) ::close(file);
     }
 
     std::string url(const std::string& path = "/") const { return "http://127.0.0.1:" + std::to_string(port_) + path; }
@@ -44,27 +42,28 @@ public:
 
 private:
     struct Connection {
-        int file;
+        Descriptor file;
         std::string received;
     };
 
     void run() {
         std::vector<Connection> open;
         while (true) {
-            std::vector<pollfd> files{{stop_[0], POLLIN, 0}, {listener_, POLLIN, 0}};
-            for (const Connection& connection : open) files.push_back({connection.file, POLLIN, 0});
+            std::vector<pollfd> files{{stop_.reader.number(), POLLIN, 0}, {listener_.number(), POLLIN, 0}};
+            for (const Connection& connection : open) files.push_back({connection.file.number(), POLLIN, 0});
             poll(files.data(), files.size(), -1);
-            if (files[0].revents) break;
+            if (files[0].revents) return;
             for (std::size_t i = open.size(); i-- > 0;)
-                if (files[i + 2].revents && !serve(open[i])) ::close(open[i].file), open.erase(open.begin() + long(i));
-            if (files[1].revents) open.push_back({accept(listener_, nullptr, nullptr), ""}), ++connections_;
+                if (files[i + 2].revents && !serve(open[i])) open.erase(open.begin() + long(i));
+            if (!files[1].revents) continue;
+            open.push_back({Descriptor(accept(listener_.number(), nullptr, nullptr)), ""});
+            ++connections_;
         }
-        for (Connection& connection : open) ::close(connection.file);
     }
 
     bool serve(Connection& connection) {
         std::array<char, 65536> bytes;
-        const ssize_t count = recv(connection.file, bytes.data(), bytes.size(), 0);
+        const ssize_t count = recv(connection.file.number(), bytes.data(), bytes.size(), 0);
         if (count <= 0) return false;
         connection.received.append(bytes.data(), static_cast<std::size_t>(count));
         const std::size_t end = connection.received.find("\r\n\r\n");
@@ -73,14 +72,13 @@ private:
         const std::size_t body = length < end ? std::stoul(connection.received.substr(length + 16)) : 0;
         if (connection.received.size() < end + 4 + body) return true;
         const std::string answer = answer_(std::exchange(connection.received, ""));
-        const ssize_t sent = send(connection.file, answer.data(), answer.size(), MSG_NOSIGNAL);
+        const ssize_t sent = send(connection.file.number(), answer.data(), answer.size(), MSG_NOSIGNAL);
         return sent == static_cast<ssize_t>(answer.size()) && !answer.starts_with("HTTP/1.0");
     }
 
     const Answer answer_;
-    int listener_ = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
-    int stop_[2] = {-1, -1};
-    [[maybe_unused]] int piped_ = pipe(stop_);
+    const Descriptor listener_{socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0)};
+    Pipe stop_;
     int port_ = 0;
     std::atomic<int> connections_ = 0;
     std::thread thread_;

@@ -78,8 +78,6 @@ TEST_F(StoreTest, WithoutAUsableAnswerNothingIsOfferedOrPurchased) {
 
 TEST_F(StoreTest, AnInstalledAppIsOneWhoseBundleIsBelieved) {
     start("", "200 OK", "[applications]\nfolders = ['" + folder.path() + "/none', '" + folder.path() + "/apps']\n");
-    std::filesystem::create_directories(folder / "apps/good");
-    std::filesystem::create_directories(folder / "apps/open");
     writeFile(folder / "apps/good/bundle.toml", "identifier = 'com.good'\nname = 'Good'\nvendor = 'Ltd.'\n");
     writeFile(folder / "apps/open/bundle.toml", "identifier = 'com.open'\n");
     std::filesystem::permissions(folder / "apps/open/bundle.toml", std::filesystem::perms::all);

@@ -1,10 +1,9 @@
 #include "vrx/host/log/system_log.h"
 
 #include <gmock/gmock.h>
-#include <sys/wait.h>
-#include <unistd.h>
 
 #include <csignal>
+#include <numeric>
 
 #include "host/support.h"
 
@@ -15,15 +14,9 @@ using platform::Level;
 using platform::LogEntry;
 
 std::string written(const LogEntry& entry, Level lowest) {
-    int ends[2];
-    EXPECT_EQ(pipe(ends), 0);
-    SystemLog(lowest, ends[1]).write(entry);
-    ::close(ends[1]);
-    std::string text(4096, 0);
-    const ssize_t size = ::read(ends[0], text.data(), text.size());
-    ::close(ends[0]);
-    text.resize(size > 0 ? static_cast<std::size_t>(size) : 0);
-    return text;
+    Pipe pipe;
+    SystemLog(lowest, pipe.writer.number()).write(entry);
+    return pipe.rest();
 }
 
 TEST(SystemLog, WritesOneLineAnEntryWhateverItsArgumentsHold) {
@@ -47,31 +40,19 @@ TEST(SystemLog, LeavesOutWhatIsBelowItsLevel) {
 }
 
 TEST(LogWriter, WritesEverythingInOrderWhateverEndsTheProcess) {
+    std::vector<std::string> lines;
+    for (int i = 0; i < 3000; ++i) lines.push_back(std::to_string(i) + std::string(200, '.') + "\n");
     for (const bool isCrash : {false, true}) {
-        int ends[2];
-        ASSERT_EQ(pipe(ends), 0);
-        const pid_t child = fork();
-        if (child == 0) {
-            ::close(ends[0]);
-            {
-                LogWriter writer(ends[1], LogWriter::Form::Lines);
-                for (int i = 0; i < 3000; ++i) writer.add(std::to_string(i) + std::string(200, '.') + "\n");
-                if (isCrash) raise(SIGABRT);
-            }
-            _exit(0);
-        }
-        ::close(ends[1]);
-        std::string text;
-        char bytes[4096];
-        while (const ssize_t size = ::read(ends[0], bytes, sizeof bytes))
-            if (size > 0) text.append(bytes, static_cast<std::size_t>(size));
-        ::close(ends[0]);
-        int status = 0;
-        waitpid(child, &status, 0);
-        EXPECT_EQ(WIFSIGNALED(status), isCrash);
-        std::string expected;
-        for (int i = 0; i < 3000; ++i) expected += std::to_string(i) + std::string(200, '.') + "\n";
-        EXPECT_EQ(text, expected) << (isCrash ? "crash" : "exit");
+        Pipe pipe;
+        const pid_t child = inChild([&] {
+            pipe.reader = Descriptor();
+            LogWriter writer(pipe.writer.number(), LogWriter::Form::Lines);
+            for (const std::string& line : lines) writer.add(line);
+            if (isCrash) raise(SIGABRT);
+        });
+        EXPECT_EQ(pipe.rest(), std::accumulate(lines.begin(), lines.end(), std::string()))
+            << (isCrash ? "crash" : "exit");
+        EXPECT_EQ(endOf(child), isCrash ? -SIGABRT : 0);
     }
 }
 

@@ -2,11 +2,9 @@
 
 #include <gmock/gmock.h>
 
-#include <filesystem>
 #include <thread>
 
 #include "host/support.h"
-#include "vrx/codec/codec.h"
 #include "vrx/host/home/stored_facts.h"
 #include "vrx/host/loop/main_loop.h"
 #include "vrx/platform/vendor.h"
@@ -29,8 +27,6 @@ std::string language(const std::string& identifier) {
 class ProfileNotifierTest : public ::testing::Test {
 protected:
     ProfileNotifierTest() {
-        std::filesystem::create_directories(folder / "place");
-        std::filesystem::create_directories(folder / "machine/etc");
         writeFile(folder / "machine/etc/locale.conf", "LANG=nl_NL.UTF-8\n");
         listen(platform::languageChangedNotification, "language");
         listen(platform::devicePairedNotification, "paired");
@@ -54,15 +50,13 @@ protected:
     // What is raised until that one has been.
     std::vector<std::string> raisedUntil(const std::string& last) {
         expectedLast = last;
+        loop.postAfter(1min, [this] { loop.stop(); });  // it comes soon, or never
         loop.run();
         return std::exchange(raised, {});
     }
 
     TemporaryFolder folder;
     LogRecorder log;
-    codec::Digest digest;
-    platform::Platform platform{{.digest = &digest, .systemLog = &log}};
-    platform::ScopedPlatform current{platform};
     MainLoop loop;
     Database database{folder / "host.db"};
     NotificationCenter center;
