@@ -43,7 +43,7 @@ Certificate makeCertificate(EVP_PKEY* key, const CertificateSettings& settings) 
     X509* made = certificate.get();
     X509_set_version(made, X509_VERSION_3);
     ASN1_INTEGER_set(X509_get_serialNumber(made), getpid());
-    // Begins in the past, since clocks differ, and ends before now when it is to have expired.
+    // It begins in the past, because clocks differ. One that has expired begins a day before it ends.
     const long day = 86400;
     X509_gmtime_adj(X509_getm_notBefore(made), -day * (settings.days < 0 ? 1 - settings.days : 1));
     X509_gmtime_adj(X509_getm_notAfter(made), day * settings.days);

@@ -1,4 +1,4 @@
-// TLS with a certificate of the server's own: made at start, signed by itself, its key never leaving the process.
+// TLS with a certificate that the server makes at start and signs itself. Its key never leaves the process.
 #pragma once
 
 #include <openssl/ssl.h>
@@ -9,18 +9,19 @@
 namespace vrx::coverage_server {
 
 struct CertificateSettings {
-    std::string file;  // where the certificate is written; a new file in the folder for temporary files when empty
-    std::string name;  // another name than that of this machine (localhost, 127.0.0.1)
-    int days = 30;     // of validity; negative for one that has expired
+    std::string file;  // where the certificate is written; when empty, a new temporary file
+    std::string name;  // the host name; when empty, localhost and 127.0.0.1
+    int days = 30;     // of validity; negative for a certificate that has expired
 };
 
-// The certificate's file is removed at the end. Throws std::runtime_error when one cannot be made or written.
+// The constructor throws std::runtime_error when the certificate cannot be made or written. The destructor removes its
+// file.
 class TlsContext {
 public:
     explicit TlsContext(const CertificateSettings& settings);
     ~TlsContext();
     SSL_CTX* get() const { return context_.get(); }
-    // The PEM file by which a client can be told to trust the server.
+    // A PEM file; a client that is given it trusts the server.
     const std::string& certificateFile() const { return file_; }
 
 private:

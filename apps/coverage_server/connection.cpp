@@ -1,15 +1,12 @@
 #include "coverage_server/connection.h"
 
-#include <arpa/inet.h>
 #include <netinet/in.h>
 #include <netinet/tcp.h>
-#include <openssl/ssl.h>
 #include <poll.h>
 #include <sys/socket.h>
 #include <unistd.h>
 
 #include <algorithm>
-#include <array>
 #include <cerrno>
 #include <climits>
 
@@ -21,7 +18,8 @@ using SteadyClock = std::chrono::steady_clock;
 
 constexpr std::size_t requestBytesAtMost = 2 * 1024 * 1024;
 constexpr Milliseconds requestTimeAtMost = std::chrono::seconds(30);
-constexpr timeval stalledAtMost{.tv_sec = 60, .tv_usec = 0};  // of a client that takes nothing of what is sent
+constexpr ssize_t nothingYet = -2;                            // a part of a TLS record has come
+constexpr timeval stalledAtMost{.tv_sec = 60, .tv_usec = 0};  // by a client that takes nothing of what is sent
 
 int pollTime(Milliseconds time) {
     return static_cast<int>(std::clamp<Milliseconds::rep>(time.count(), 0, INT_MAX));
@@ -29,15 +27,6 @@ int pollTime(Milliseconds time) {
 
 Milliseconds until(SteadyClock::time_point end) {
     return std::chrono::ceil<Milliseconds>(end - SteadyClock::now());
-}
-
-void addressOf(int socket, decltype(getpeername) name, std::string& ip, int& port) {
-    sockaddr_in address{};
-    socklen_t size = sizeof address;
-    std::array<char, INET_ADDRSTRLEN> text{};
-    if (name(socket, reinterpret_cast<sockaddr*>(&address), &size) != 0) return;
-    ip = inet_ntop(AF_INET, &address.sin_addr, text.data(), text.size());
-    port = ntohs(address.sin_port);
 }
 
 }  // namespace
@@ -66,15 +55,45 @@ void Connection::shutDown() {
 }
 
 bool Connection::awaitRequest(Milliseconds idle) {
+    exchange = {};
     isTakenOver_ = false;
+    status_ = 0;
     requestBytes_ = 0;
     if (isToEnd_ || (consumed_ == received_.size() && !fill(idle))) return false;
     requestBytes_ = received_.size() - consumed_;
-    exchange = {};
     exchange.begun = SteadyClock::now();
     deadline_ = exchange.begun + requestTimeAtMost;
     ++requests_;
     return true;
+}
+
+bool Connection::readLine(std::string& text) {
+    while (true) {
+        const std::string_view bytes = unread();
+        if (bytes.empty()) return false;
+        const std::size_t end = bytes.find('\n');
+        const std::size_t count = end == bytes.npos ? bytes.size() : end + 1;
+        text += bytes.substr(0, count);
+        consumed_ += count;
+        if (end != bytes.npos) return true;
+    }
+}
+
+bool Connection::read(std::string& text, std::size_t count) {
+    while (count > 0) {
+        const std::string_view bytes = unread().substr(0, count);
+        if (bytes.empty()) return false;
+        text += bytes;
+        consumed_ += bytes.size();
+        count -= bytes.size();
+    }
+    return true;
+}
+
+// The request's next bytes; none when there are no more.
+std::string_view Connection::unread() {
+    if (consumed_ == received_.size() && (requestBytes_ > requestBytesAtMost || !fill(until(deadline_)))) return {};
+    return std::string_view(received_).substr(consumed_);
 }
 
 // Receives into the buffer, which is empty; false when nothing came.
@@ -83,50 +102,37 @@ bool Connection::fill(Milliseconds longest) {
     const SteadyClock::time_point end = SteadyClock::now() + longest;
     received_.resize(pieceBytes);
     consumed_ = 0;
+    ssize_t count = nothingYet;
+    while (count == nothingYet) count = awaitBytes(end) ? receive() : 0;
+    received_.resize(static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
+    requestBytes_ += received_.size();
+    return count > 0;
+}
+
+bool Connection::awaitBytes(SteadyClock::time_point end) {
+    if (tls_ && SSL_has_pending(tls_.get())) return true;
     while (true) {
         pollfd file{.fd = socket_, .events = POLLIN, .revents = 0};
-        const bool hasBytes = tls_ && SSL_has_pending(tls_.get());
-        const int ready = hasBytes ? 1 : poll(&file, 1, pollTime(until(end)));
-        if (ready < 0 && errno == EINTR) continue;
-        if (ready <= 0) break;
-        ssize_t count;
-        if (tls_) {
-            count = SSL_read(tls_.get(), received_.data(), static_cast<int>(pieceBytes));
-            if (count <= 0 && SSL_get_error(tls_.get(), static_cast<int>(count)) == SSL_ERROR_WANT_READ) continue;
-        } else {
-            count = recv(socket_, received_.data(), pieceBytes, 0);
-        }
-        if (count <= 0) break;
-        received_.resize(static_cast<std::size_t>(count));
-        requestBytes_ += received_.size();
-        return true;
+        const int ready = poll(&file, 1, pollTime(until(end)));
+        if (ready >= 0 || errno != EINTR) return ready > 0;
     }
-    received_.clear();
-    return false;
 }
 
-ssize_t Connection::read(char* bytes, std::size_t size) {
-    if (consumed_ == received_.size()) {
-        if (requestBytes_ > requestBytesAtMost || until(deadline_) <= Milliseconds(0)) return -1;
-        if (!fill(until(deadline_))) return -1;
-    }
-    const std::size_t count = std::min(size, received_.size() - consumed_);
-    std::copy_n(received_.data() + consumed_, count, bytes);
-    consumed_ += count;
-    return static_cast<ssize_t>(count);
+ssize_t Connection::receive() {
+    if (!tls_) return recv(socket_, received_.data(), received_.size(), 0);
+    const int count = SSL_read(tls_.get(), received_.data(), static_cast<int>(received_.size()));
+    return count <= 0 && SSL_get_error(tls_.get(), count) == SSL_ERROR_WANT_READ ? nothingYet : count;
 }
 
-ssize_t Connection::write(const char* bytes, std::size_t size) {
-    if (isTakenOver_) return static_cast<ssize_t>(size);
-    return send({bytes, size}) ? static_cast<ssize_t>(size) : -1;
+void Connection::answer(int status, std::string_view bytes) {
+    if (isTakenOver_) return;
+    status_ = status;
+    send(bytes);
 }
 
 bool Connection::send(std::string_view bytes) {
     while (!bytes.empty()) {
-        const ssize_t count =
-            tls_ ? SSL_write(tls_.get(), bytes.data(), static_cast<int>(std::min<std::size_t>(bytes.size(), INT_MAX)))
-                 : ::send(socket_, bytes.data(), bytes.size(), MSG_NOSIGNAL);
-        if (count < 0 && !tls_ && errno == EINTR) continue;
+        const ssize_t count = sendSome(bytes);
         if (count <= 0) {
             isToEnd_ = true;
             return false;
@@ -135,6 +141,15 @@ bool Connection::send(std::string_view bytes) {
         bytes.remove_prefix(static_cast<std::size_t>(count));
     }
     return true;
+}
+
+ssize_t Connection::sendSome(std::string_view bytes) {
+    if (tls_)
+        return SSL_write(tls_.get(), bytes.data(), static_cast<int>(std::min<std::size_t>(bytes.size(), INT_MAX)));
+    while (true) {
+        const ssize_t count = ::send(socket_, bytes.data(), bytes.size(), MSG_NOSIGNAL);
+        if (count >= 0 || errno != EINTR) return count;
+    }
 }
 
 void Connection::takeOver(int status) {
@@ -167,14 +182,6 @@ void Connection::endAbruptly(bool withReset) {
     if (!withReset) return;
     const linger atOnce{.l_onoff = 1, .l_linger = 0};
     setsockopt(socket_, SOL_SOCKET, SO_LINGER, &atOnce, sizeof atOnce);
-}
-
-void Connection::get_remote_ip_and_port(std::string& ip, int& port) const {
-    addressOf(socket_, getpeername, ip, port);
-}
-
-void Connection::get_local_ip_and_port(std::string& ip, int& port) const {
-    addressOf(socket_, getsockname, ip, port);
 }
 
 }  // namespace vrx::coverage_server

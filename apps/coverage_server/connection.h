@@ -1,13 +1,14 @@
-// One accepted TCP connection, plain or TLS, as the byte stream that the HTTP library reads requests from and writes
-// answers to. A fault takes the answer over: it sends its own bytes, and what the library writes is swallowed.
+// A client's connection, plain or TLS: its requests are read from it, and answers are sent on it. A fault takes an
+// answer over: it sends its own bytes, and the genuine answer is dropped.
 //
-// Belongs to the thread that serves it; only shutDown() may be called from another one. Bounds what a client can make
-// it hold: the bytes of a request, the time a request may take to arrive, the time an answer may wait to be taken.
+// One thread at a time may use it; shutDown() alone may be called by any other. There are limits
+// to the size of a request, to the time in which it must arrive, and to the time for which a client may take nothing of
+// what is sent.
 #pragma once
 
-#include <httplib.h>
+#include <openssl/ssl.h>
+#include <sys/types.h>
 
-#include <atomic>
 #include <chrono>
 #include <cstdint>
 #include <memory>
@@ -18,12 +19,14 @@ namespace vrx::coverage_server {
 
 using Milliseconds = std::chrono::milliseconds;
 
-class Connection final : public httplib::Stream {
+class Connection final {
 public:
-    // What the service notes of the request under way, begun anew with each.
+    // What is known of the request under way; begun anew with each.
     struct Exchange {
-        bool isServed = false;      // false for what was too malformed
+        bool isServed = false;      // false for a malformed request
+        bool isLast = true;         // the connection ends after it
         std::uint64_t request = 0;  // its number in the log
+        std::string asked;          // its method and target
         std::string fault;
         std::string reason;
         std::chrono::steady_clock::time_point begun;
@@ -32,7 +35,7 @@ public:
 
     // Owns the socket. Without a TLS context the connection is plain.
     Connection(std::uint64_t id, int socket, SSL_CTX* tls);
-    ~Connection() override;
+    ~Connection();
     Connection(const Connection&) = delete;
     Connection& operator=(const Connection&) = delete;
 
@@ -40,39 +43,38 @@ public:
     std::uint64_t requests() const { return requests_; }
     std::uint64_t bytesSent() const { return bytesSent_; }
 
-    // False when TLS could not be agreed on.
+    // False when there is no agreement on TLS.
     bool handshake();
-    // Waits for the first bytes of another request; false when none come in time or the connection has ended.
+    // Waits for the first bytes of the next request; false when none come in time or the connection has ended.
     bool awaitRequest(Milliseconds idle);
-    // Wakes whatever the connection waits for and makes it fail from now on.
+    // Append to the text what comes next, waiting for it: everything up to the end of a line, or so many bytes. False
+    // when the request ends before that: the client has left, or a bound is exceeded.
+    bool readLine(std::string& text);
+    bool read(std::string& text, std::size_t count);
+    // Sends the genuine answer, unless a fault has taken it over.
+    void answer(int status, std::string_view bytes);
+    // Fails whatever the connection waits for, now and later.
     void shutDown();
 
     // For faults.
-    // What is written from now on to the end of this answer is swallowed. The status is the one on the wire, 0 for
-    // none.
+    // The fault answers, with this status on the wire, 0 for none.
     void takeOver(int status);
-    bool isTakenOver() const { return isTakenOver_; }
+    // The status of the answer, 0 for none.
     int status() const { return status_; }
-    // Sends past the take-over; false when the client has gone.
+    // False when the client has gone.
     bool send(std::string_view bytes);
-    // False when the client has gone, or the server is ending, before the time is over.
+    // False when the client leaves, or the server ends, before the time is over.
     bool pause(Milliseconds time);
     void holdUntilClientLeaves();
-    // No other request is served, and the client sees the end at once, a reset instead of an orderly end if so asked.
+    // Serves no other request. The client sees the connection's end at once, as a reset if asked for.
     void endAbruptly(bool withReset);
-    bool isToEnd() const { return isToEnd_; }
-
-    // httplib::Stream
-    bool is_readable() const override { return true; }
-    bool is_writable() const override { return true; }
-    ssize_t read(char* bytes, std::size_t size) override;
-    ssize_t write(const char* bytes, std::size_t size) override;
-    void get_remote_ip_and_port(std::string& ip, int& port) const override;
-    void get_local_ip_and_port(std::string& ip, int& port) const override;
-    socket_t socket() const override { return socket_; }
 
 private:
+    std::string_view unread();
     bool fill(Milliseconds longest);
+    bool awaitBytes(std::chrono::steady_clock::time_point end);
+    ssize_t receive();
+    ssize_t sendSome(std::string_view bytes);
 
     struct TlsFreed {
         void operator()(SSL* tls) const { SSL_free(tls); }

@@ -45,7 +45,7 @@ void ControlService::faults(const httplib::Request& request, httplib::Response& 
     const std::string id = request.path.substr(std::min(request.path.size(), std::string_view("/faults/").size()));
     if (request.method == "POST" && id.empty()) {
         std::istringstream lines(request.body);
-        std::vector<Fault> parsed;  // all of them, before any is added
+        std::vector<Fault> parsed;  // all, before any is added
         for (std::string line; std::getline(lines, line);) parsed.push_back(parseFault(line));
         for (Fault& fault : parsed) list.add(std::move(fault));
         return answer(response, list.json(), 201);

@@ -1,5 +1,4 @@
-// The control port: faults, settings and tokens can be changed, and what the server has seen can be read, while it
-// runs.
+// The control port: changes faults, settings and tokens while the server runs, and shows what it has seen.
 #pragma once
 
 #include <string_view>

@@ -11,7 +11,7 @@ namespace vrx::coverage_server {
 
 namespace {
 
-// Whether the serial number names a file of the folder and nothing else.
+// Whether the serial number can only name a file in the folder.
 bool isFileName(const std::string& serialNumber) {
     constexpr std::string_view others = "-_.";
     return serialNumber.size() <= 128 && !serialNumber.starts_with('.') &&

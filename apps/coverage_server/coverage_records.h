@@ -1,6 +1,6 @@
-// The coverage records: a folder of JSON files named after serial numbers, read afresh for each request. In a file, a
-// string such as "@now", "@now+30d" or "@now-12h:ms" stands for that time as an epoch number, so that examples do not
-// age. Any thread may read.
+// The coverage records: a folder of JSON files named after serial numbers, read for each request. In a file, a string
+// such as "@now", "@now+30d" or "@now-12h:ms" becomes that time as an epoch number, so that examples do not age. Any
+// thread may read.
 #pragma once
 
 #include <filesystem>
@@ -11,10 +11,10 @@ namespace vrx::coverage_server {
 
 class CoverageRecords {
 public:
-    // Without a folder every serial number has one small record.
+    // Without a folder, every serial number has the same small record.
     explicit CoverageRecords(std::filesystem::path folder) : folder_(std::move(folder)) {}
-    // SERIAL.json, else default.json; empty when there is neither. Throws std::runtime_error for a file that is not
-    // JSON.
+    // From SERIAL.json, else from default.json; empty when there is neither. Throws std::runtime_error when the file is
+    // not JSON.
     std::string record(const std::string& serialNumber) const;
 
 private:

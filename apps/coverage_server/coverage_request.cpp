@@ -12,7 +12,7 @@ namespace {
 
 using Reasons = std::vector<std::string>;
 
-// The header's value; a reason and nothing unless it is there once and not empty.
+// The header's value, if it is there exactly once and not empty; else adds a reason and returns an empty text.
 std::string soleHeader(const httplib::Request& request, const std::string& name, Reasons& reasons) {
     const std::size_t count = request.get_header_value_count(name);
     std::string value = count == 1 ? request.get_header_value(name) : "";
@@ -37,7 +37,7 @@ void judgeRequired(const httplib::Request& request, const std::string& name, Rea
     if (!isThere) reasons.push_back("no header begins with " + prefix);
 }
 
-// "<identifier/version/type>", none of them empty.
+// "<identifier/version/type>", with three parts that are not empty.
 bool isUserAgent(std::string_view text) {
     if (text.size() < 7 || !text.starts_with('<') || !text.ends_with('>')) return false;
     text = text.substr(1, text.size() - 2);
@@ -61,7 +61,7 @@ void judgeBody(const std::string& body, Verdict& verdict) {
     expect(
         "requestTimestamp",
         [](const Json& value) {
-            constexpr std::uint64_t year2001 = 1'000'000'000'000;  // what is before it was counted in seconds
+            constexpr std::uint64_t year2001 = 1'000'000'000'000;  // a smaller number counts seconds
             return value.is_number_unsigned() && value.get<std::uint64_t>() >= year2001;
         },
         "an unsigned integer, in milliseconds since 1970");

@@ -1,4 +1,4 @@
-// Judges a signed coverage request: a pure function of the request and of what is asked of it.
+// Judges a signed coverage request: a pure function of the request, the valid tokens and the required headers.
 #pragma once
 
 #include <httplib.h>
@@ -13,14 +13,14 @@ namespace vrx::coverage_server {
 
 inline constexpr std::string_view tokenHeader = "X-Orvane-KS-Token";
 
-// The account session's headers. A name that ends in * stands for at least one header that begins so.
+// The account session's headers. NAME* demands at least one header that begins with NAME.
 inline const std::vector<std::string> defaultRequiredHeaders = {"X-Orvane-Client-Info", "X-Orvane-Device-Id",
                                                                 "X-Orvane-Account-*"};
 
 struct Verdict {
-    int status = 200;                  // else 400, or 401 when the token is missing or not valid
+    int status = 200;                  // 401 when the token is missing or not valid, 400 for any other reason
     std::vector<std::string> reasons;  // all of them
-    std::string serialNumber;          // of a request that is right
+    std::string serialNumber;          // only when the status is 200
 };
 
 Verdict judge(const httplib::Request& request, const Tokens& tokens, const std::vector<std::string>& requiredHeaders);

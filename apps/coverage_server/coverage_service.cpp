@@ -44,7 +44,7 @@ void refuse(httplib::Response& response, int status, std::string& reason, std::s
     response.set_content(dumped({{"reason", reason}}), jsonType);
 }
 
-// What a client sends must not steer a terminal.
+// Control characters that a client sends must not reach a terminal.
 std::string printable(std::string text) {
     constexpr std::size_t longest = 300;
     if (text.size() > longest) text.resize(longest);
@@ -103,6 +103,7 @@ void CoverageService::serve(const httplib::Request& request, httplib::Response& 
     seen.body = request.body;
     seen.bodyBytes = request.body.size();
     Connection::Exchange& exchange = connection.exchange;
+    exchange.asked = request.method + " " + request.target;
     exchange.request = log_.begin(std::move(seen));
 
     if (!target.endpoint) return refuse(response, 404, exchange.reason, "no such path");
@@ -122,7 +123,7 @@ void CoverageService::answer(Endpoint endpoint, const httplib::Request& request,
             return refuse(response, 405, reason, "the method is not GET");
         if (endpoint == Endpoint::ServerVersion) return serverVersion_.answer(request, response);
         answerStore(endpoint, request, response, reason);
-    } catch (const std::runtime_error& error) {  // what is to be served cannot be
+    } catch (const std::runtime_error& error) {  // a file cannot be read
         refuse(response, 500, reason, error.what());
     }
 }
@@ -137,7 +138,7 @@ void CoverageService::answerCoverage(const httplib::Request& request, httplib::R
     response.set_content(record, jsonType);
 }
 
-// Takes and gives lines of key=value, as a credential helper does: it can be one command of curl.
+// Reads and writes lines of key=value, as a credential helper does, so that curl alone can be the helper.
 void CoverageService::answerToken(const httplib::Request& request, httplib::Response& response, std::string& reason) {
     if (request.method != "POST") return refuse(response, 405, reason, "the method is not POST");
     auto entries = keyValueLines(request.body);
@@ -164,18 +165,17 @@ bool CoverageService::wait(const FaultPlan& plan, Connection& connection) const 
     return isThere;
 }
 
-void CoverageService::answered(const httplib::Request& request, const httplib::Response& response,
-                               const Connection& connection) {
+void CoverageService::answered(const Connection& connection) {
     const Connection::Exchange& exchange = connection.exchange;
-    const int status = connection.isTakenOver() ? connection.status() : response.status;
+    const int status = connection.status();
     const auto taken = std::chrono::steady_clock::now() - exchange.begun;
     std::string line = "#" + std::to_string(connection.id()) + "." + std::to_string(connection.requests()) + " ";
-    line += exchange.isServed ? request.method + " " + printable(request.target) : "malformed request";
+    line += exchange.isServed ? printable(exchange.asked) : "malformed request";
     line += " " + (status ? std::to_string(status) : "unanswered");
     line += " " + std::to_string(std::chrono::duration_cast<Milliseconds>(taken).count()) + "ms";
     if (!exchange.fault.empty()) line += " fault=" + printable(exchange.fault);
     if (!exchange.reason.empty()) line += " (" + printable(exchange.reason) + ")";
-    print(line);  // before whoever waits for the request to be answered goes on
+    print(line);  // before finish() wakes those who wait for the answer
 
     if (!exchange.isServed) return log_.countMalformed(status);
     const SeenRequest seen = log_.finish(exchange.request, status, exchange.fault, exchange.reason);

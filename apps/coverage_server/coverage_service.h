@@ -1,5 +1,5 @@
-// The served port: coverage, server-version document, token renewal, the store's catalogue and purchases, each with the
-// faults that are asked for.
+// The served port: coverage, the server-version document, token renewal, the store's catalogue and purchases, each with
+// the faults that were ordered.
 #pragma once
 
 #include <chrono>
@@ -10,7 +10,7 @@
 #include "coverage_server/coverage_records.h"
 #include "coverage_server/coverage_request.h"
 #include "coverage_server/faults.h"
-#include "coverage_server/http_server.h"
+#include "coverage_server/http_service.h"
 #include "coverage_server/request_log.h"
 #include "coverage_server/server_version_document.h"
 #include "coverage_server/store_file.h"
@@ -23,7 +23,7 @@ inline constexpr std::string_view serverVersionPath = "/library/ORVANE/asset/vrx
 inline constexpr std::string_view tokenPath = "/token/renew";
 inline constexpr std::string_view cataloguePath = "/store/lookup";
 inline constexpr std::string_view purchasesPath = "/store/purchases";
-// Under this prefix everything is served once more, without faults: where redirects can lead to.
+// Everything is served under this prefix too, without faults, so that redirects have somewhere to lead.
 inline constexpr std::string_view movedPrefix = "/moved";
 
 struct CoverageServiceSettings {
@@ -32,8 +32,8 @@ struct CoverageServiceSettings {
     std::vector<std::string> tokens;
     std::vector<std::string> requiredHeaders = defaultRequiredHeaders;
     ServerVersionSettings serverVersion;
-    bool isQuiet = false;         // no line on stderr for each request
-    bool printsRequests = false;  // each as JSON on stdout, tokens hidden
+    bool isQuiet = false;         // prints no line on stderr for each request
+    bool printsRequests = false;  // as JSON on stdout, with tokens hidden
 };
 
 class CoverageService final : public HttpService {
@@ -43,8 +43,7 @@ public:
     bool admit(Connection& connection) override;
     void handshakeFailed(const Connection& connection) override;
     void serve(const httplib::Request& request, httplib::Response& response, Connection& connection) override;
-    void answered(const httplib::Request& request, const httplib::Response& response,
-                  const Connection& connection) override;
+    void answered(const Connection& connection) override;
     void ended(const Connection& connection) override;
     void refused() override;
 
@@ -59,7 +58,7 @@ private:
     void answerToken(const httplib::Request& request, httplib::Response& response, std::string& reason);
     void answerStore(Endpoint endpoint, const httplib::Request& request, httplib::Response& response,
                      std::string& reason) const;
-    // False when the client has gone, or the server is ending, before the plan's waiting is over.
+    // Waits as the plan says. False when the client leaves, or the server ends, before that is over.
     bool wait(const FaultPlan& plan, Connection& connection) const;
     void print(const std::string& line) const;
 

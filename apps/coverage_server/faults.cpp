@@ -29,7 +29,7 @@ std::uint64_t wholeNumber(std::string_view text, const char* what) {
     return number;
 }
 
-// A number, and the unit behind it as a factor.
+// The number at the beginning of the text, times the factor of the unit behind it.
 double measured(std::string_view text, std::initializer_list<std::pair<std::string_view, double>> units,
                 const char* what) {
     double number = 0;
@@ -154,7 +154,7 @@ Fault parseFault(std::string_view spec) {
     const std::size_t colon = spec.find(':');
     if (colon == spec.npos) refuse("a fault is ENDPOINT:KIND[=VALUE][,count=N][,skip=N][,code=N]");
     std::string_view kind = spec.substr(colon + 1);
-    // Options are taken from the end, so that a value may hold commas.
+    // The options are split off from the end, because the value may contain commas.
     std::vector<std::pair<std::string_view, std::uint64_t>> options;
     while (true) {
         const std::size_t comma = kind.rfind(',');

@@ -1,5 +1,5 @@
-// What can go wrong on request: the kinds of faults, how they are written, and the list from which each request takes
-// its own.
+// The faults that the server can be told to make: their kinds, how they are written, and the list of those ordered,
+// from which each request takes its own.
 #pragma once
 
 #include <chrono>
@@ -48,9 +48,9 @@ struct FaultKindInfo {
     FaultKind kind;
     std::string_view name;
     FaultValue value;
-    std::string_view defaultValue;  // none: the value has to be given
-    bool bendsAnswer;               // the genuine answer is made first, and its effects take place
-    bool suitsConnection;           // can happen before there is a request
+    std::string_view defaultValue;  // "none": a value must be given
+    bool bendsAnswer;               // the genuine answer is made first, with its effects
+    bool suitsConnection;           // can happen before a request
     std::string_view help;
 };
 const std::vector<FaultKindInfo>& faultKinds();
@@ -60,24 +60,24 @@ struct Fault {
     Endpoint endpoint = Endpoint::Any;
     const FaultKindInfo* kind = nullptr;
     std::string value;
-    std::uint64_t number = 0;            // of a value that is a status or a size
-    std::chrono::milliseconds time{0};   // of a value that is a duration
-    std::uint64_t skip = 0;              // requests that pass before it begins
-    std::optional<std::uint64_t> count;  // requests that it happens to; without one, all
-    int code = 302;                      // of a redirect
+    std::uint64_t number = 0;            // the value, if it is a status or a size
+    std::chrono::milliseconds time{0};   // the value, if it is a duration
+    std::uint64_t skip = 0;              // requests that pass unharmed before it begins
+    std::optional<std::uint64_t> count;  // requests that it still happens to; null for all
+    int code = 302;                      // the status of a redirect
 
     std::string spec() const;
 };
 
-// "ENDPOINT:KIND[=VALUE][,count=N][,skip=N][,code=N]". Throws std::invalid_argument, whose text says what is wrong.
+// Reads "ENDPOINT:KIND[=VALUE][,count=N][,skip=N][,code=N]". Throws std::invalid_argument, which says what is wrong.
 Fault parseFault(std::string_view spec);
 
-// What happens to one request, or to one connection: waiting, then at most one thing more.
+// What happens to one request or connection: it waits, and then has at most one other fault.
 struct FaultPlan {
     std::chrono::milliseconds delay{0};
-    std::vector<std::uint64_t> holds;  // the ids of faults whose removal it waits for
+    std::vector<std::uint64_t> holds;  // ids of the faults until whose removal it waits
     std::optional<Fault> fault;
-    std::string description;  // empty when nothing happens
+    std::string description;  // for the log; empty when nothing happens
 };
 
 // Any thread may use it.
@@ -86,12 +86,12 @@ public:
     std::uint64_t add(Fault fault);
     bool remove(std::uint64_t id);
     void clear();
-    // In the order in which they were added: every delay and hold that applies, and the first other fault that does. A
-    // fault counts a request as passed, or as its own, only when no earlier one of these others has taken it.
+    // Takes every delay and hold that applies, in the order in which they were added, up to and with the first other
+    // fault that applies. The faults after that one do not see the request: their skip and count stay.
     FaultPlan take(Endpoint endpoint);
-    // Whether a fault that the plan waits for is still there.
+    // Whether a fault until whose removal the plan waits is still there.
     bool holds(const FaultPlan& plan) const;
-    Json json() const;  // an id and a description each
+    Json json() const;  // a list of ids and descriptions
 
 private:
     mutable std::mutex mutex_;

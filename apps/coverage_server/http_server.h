@@ -1,52 +1,40 @@
-// An HTTP server on loopback whose service is handed the connection along with the request, so that it can also
-// misbehave below HTTP. The library reads the requests and writes the answers; listening and the connections are our
-// own, since the library's server lets nobody near a connection, answers from a small pool that a few unanswered
-// requests would exhaust, and waits for its clients when it is to end. One port therefore serves good and bad answers
-// alike, plain or TLS.
+// An HTTP server on loopback whose service is handed the client's connection along with each request, so that it can
+// also misbehave below HTTP, within TLS too. It is a relay: it accepts the clients' connections, ends TLS, reads one
+// request after the other and passes the answers of the HTTP library, which it keeps behind itself (BackEnd).
 #pragma once
 
-#include <httplib.h>
-
-#include <atomic>
-#include <condition_variable>
+#include <chrono>
 #include <cstdint>
 #include <mutex>
 #include <set>
 #include <string>
 #include <thread>
 
-#include "coverage_server/connection.h"
+#include "coverage_server/back_end.h"
+#include "coverage_server/http_service.h"
+#include "coverage_server/threads.h"
 
 namespace vrx::coverage_server {
 
-// What a server does with its connections and requests. Called on the connections' threads, several at a time.
-class HttpService {
+class HttpServer final {
 public:
-    virtual ~HttpService() = default;
-    // A new connection, nothing of it read yet; false to close it.
-    virtual bool admit(Connection&) { return true; }
-    virtual void handshakeFailed(const Connection&) {}
-    virtual void serve(const httplib::Request& request, httplib::Response& response, Connection& connection) = 0;
-    // The answer has been written. The request may be one that was too malformed to be served.
-    virtual void answered(const httplib::Request&, const httplib::Response&, const Connection&) {}
-    virtual void ended(const Connection&) {}
-    // There are too many connections; one more has been closed.
-    virtual void refused() {}
-};
-
-class HttpServer final : private httplib::Server {
-public:
-    // Service and TLS context must outlive the server. Throws std::system_error when the port cannot be had; port 0
-    // takes any. With a keep-alive of 0 every connection serves one request.
+    // The service and the TLS context must outlive the server. Throws std::system_error when it cannot listen on the
+    // port; port 0 takes any. With a keep-alive of 0 every connection serves one request.
     HttpServer(HttpService& service, int port, SSL_CTX* tls, std::chrono::seconds keepAlive);
     // Ends all connections.
-    ~HttpServer() override;
+    ~HttpServer();
+    HttpServer(const HttpServer&) = delete;
+    HttpServer& operator=(const HttpServer&) = delete;
 
     int port() const { return port_; }
 
 private:
+    void listen(int port);
     void accept();
+    bool isEnding();
     void serveConnection(int socket, std::uint64_t id);
+    void serveRequests(Connection& connection);
+    std::string answerTo(const ClientRequest& request, Connection& connection);
 
     HttpService& service_;
     SSL_CTX* const tls_;
@@ -55,11 +43,11 @@ private:
     int port_ = 0;
 
     std::mutex mutex_;
-    std::condition_variable isEmpty_;
     bool isEnding_ = false;
-    std::size_t threads_ = 0;
     std::set<Connection*> connections_;
 
+    BackEnd backEnd_;
+    Threads threads_;  // one for each connection
     std::thread acceptor_;
 };
 

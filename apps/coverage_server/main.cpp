@@ -74,7 +74,7 @@ std::string footer() {
     return text;
 }
 
-// The exit code when there is nothing more to do.
+// The exit code, if the program is to end at once.
 std::optional<int> parse(int argc, char** argv, Options& options) {
     CLI::App app("A coverage server, CDN and store for development and tests. Listens on 127.0.0.1 only.",
                  "vrx-coverage-server");
@@ -178,7 +178,7 @@ void announce(const std::string& url, const std::string& control, const std::str
 }
 
 void run(const Options& options) {
-    // Every thread leaves these signals to this one.
+    // Threads inherit the mask, so that only sigwait() below takes these signals.
     sigset_t signals;
     sigemptyset(&signals);
     for (int signal : {SIGTERM, SIGINT, SIGUSR1}) sigaddset(&signals, signal);
@@ -191,7 +191,7 @@ void run(const Options& options) {
     ControlService controlled(coverage);
     HttpServer server(coverage, options.port, tls ? tls->get() : nullptr, std::chrono::seconds(options.keepAlive));
     HttpServer control(controlled, options.controlPort, nullptr, std::chrono::seconds(60));
-    // Writing to a client that has gone is an error of that connection and nothing more.
+    // Writing to a client that has left is an error of its connection, not the end of the process.
     std::signal(SIGPIPE, SIG_IGN);
 
     const std::string host = "127.0.0.1:";

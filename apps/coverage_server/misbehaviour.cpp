@@ -33,7 +33,7 @@ const char* mediaType(Endpoint endpoint) {
     return endpoint == Endpoint::ServerVersion ? "application/x-plist" : "application/json";
 }
 
-// A valid document of the endpoint whose middle can be as long as one likes.
+// A valid document of the endpoint, which may have any number of letters between its begin and end.
 struct Padded {
     std::string begin;
     std::string end;
@@ -99,8 +99,8 @@ std::string littleEndian(std::uint32_t number) {
     return bytes;
 }
 
-// What follows a full flush refers to nothing before it: the piece is compressed once and repeated, which costs
-// next to no time for any size.
+// What follows a full flush refers to nothing before it. The piece is therefore compressed only once and then repeated,
+// which takes little time for any size.
 void sendBomb(std::uint64_t size, Endpoint endpoint, Connection& connection) {
     const Padded document = paddedDocument(endpoint);
     const std::string piece(pieceBytes, 'x');
@@ -172,7 +172,7 @@ void answer(httplib::Response& response, const std::string& body, const char* ty
     response.set_content(body, type);
 }
 
-// Another document in place of the genuine one, to be cached as that would be; an answer without one stays as it is.
+// Replaces the document of the genuine answer, which keeps its caching; an answer without a document stays as it is.
 void bend(httplib::Response& response, const std::string& body) {
     if (response.status != 200) return;
     const std::string type = response.get_header_value("Content-Type");
@@ -194,7 +194,7 @@ std::string withNulls(Endpoint endpoint, const std::string& body, const std::str
     if (json.is_discarded()) return body;
     if (endpoint == Endpoint::Coverage)
         setNulls(json, name);
-    else  // the store's answer: one list
+    else  // the store's answer has one member, a list
         for (Json& list : json)
             for (Json& entry : list) setNulls(entry, name);
     return dumped(json);
@@ -253,7 +253,7 @@ void misbehave(const Fault& fault, Endpoint endpoint, const httplib::Request& re
         case FaultKind::Bomb: return sendBomb(fault.number, endpoint, connection);
         case FaultKind::Deep: return answer(response, nested(endpoint, fault.number), mediaType(endpoint));
         case FaultKind::Redirect:
-            // The prefix under which everything is served once more, without faults.
+            // The prefix is put before the path that was asked for.
             return response.set_redirect(fault.value == "/moved" ? fault.value + request.target : fault.value,
                                          fault.code);
         case FaultKind::Drip: return sendDripping(response, fault.time, connection);

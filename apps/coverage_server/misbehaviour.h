@@ -1,4 +1,4 @@
-// Carries a fault out on a connection: takes the answer over and sends what the fault wants on the wire.
+// Carries out a fault on a connection: takes the answer over and sends other bytes.
 #pragma once
 
 #include <httplib.h>
@@ -8,11 +8,11 @@
 
 namespace vrx::coverage_server {
 
-// Before there is a request; false when the connection is to be closed.
+// Before the first request; false when the connection is to be closed.
 bool misbehave(const FaultPlan& plan, Connection& connection);
 
-// Instead of the response, which holds the genuine answer if the fault bends that. A fault that HTTP can express only
-// changes the response, for the library to send.
+// In place of an answer. The response holds the genuine answer if the fault bends it. A fault that is valid HTTP only
+// changes the response, which is then sent as usual; the others send on the connection.
 void misbehave(const Fault& fault, Endpoint endpoint, const httplib::Request& request, httplib::Response& response,
                Connection& connection);
 

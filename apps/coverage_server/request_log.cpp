@@ -23,7 +23,7 @@ std::string isoTime(std::chrono::system_clock::time_point time) {
     return text.data() + ("." + std::to_string(1000 + milliseconds).substr(1)) + "Z";
 }
 
-// What the library adds to the headers of its own accord.
+// The library adds these to a request's headers.
 bool isOfLibrary(const std::string& name) {
     return name == "REMOTE_ADDR" || name == "REMOTE_PORT" || name == "LOCAL_ADDR" || name == "LOCAL_PORT";
 }

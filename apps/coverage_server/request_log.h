@@ -1,4 +1,4 @@
-// What the server has seen: the requests, in the order in which they began, and counters. Any thread may use it.
+// What the server has seen: the requests, in the order in which they arrived, and counters. Any thread may use it.
 #pragma once
 
 #include <httplib.h>
@@ -19,29 +19,29 @@ struct SeenRequest {
     std::uint64_t id = 0;
     std::chrono::system_clock::time_point time;
     std::uint64_t connection = 0;
-    std::uint64_t requestOfConnection = 0;  // 1 for its first
-    std::string endpoint;                   // empty for a path that is none
+    std::uint64_t requestOfConnection = 0;  // 1 for the first
+    std::string endpoint;                   // empty for any other path
     std::string method;
     std::string path;
-    httplib::Headers headers;  // the token's value replaced by its origin
-    std::string body;          // its beginning, when it is very long
+    httplib::Headers headers;  // with the token's origin in place of the token
+    std::string body;          // cut when it is very long
     std::size_t bodyBytes = 0;
     bool isAnswered = false;
-    int status = 0;  // 0 while there is none, or when none was sent
+    int status = 0;  // 0 until there is an answer, and when none was sent
     std::string fault;
     std::string reason;
 
     Json json() const;
-    std::size_t bytes() const;  // that keeping it takes, about
+    std::size_t bytes() const;  // of memory, about
 };
 
 class RequestLog {
 public:
-    // Notes the request as begun and gives it its id.
+    // Notes a request that has arrived, and returns its id.
     std::uint64_t begin(SeenRequest request);
-    // Notes what became of it, and returns it; one that is no longer kept has the id 0.
+    // Notes how the request was answered, and returns it; when it is no longer kept, a request with the id 0.
     SeenRequest finish(std::uint64_t id, int status, const std::string& fault, const std::string& reason);
-    // One that was too malformed to be served.
+    // Of a request that was too malformed to be served.
     void countMalformed(int status);
     void countConnection();
     void countEnded(std::uint64_t bytesSent);
@@ -52,12 +52,13 @@ public:
         Json requests;
         bool isEnough;
     };
-    // The requests kept; waits, for at most that long, until enough of them have been answered, or have begun.
+    // The requests that are kept, once at least so many have been answered (or else have arrived); waits for at most
+    // the given time.
     Seen requests(std::size_t atLeast, bool answered, std::chrono::milliseconds longest) const;
     void clearRequests();
     Json counters() const;
     void clearCounters();
-    // Wakes whoever waits.
+    // Ends all waiting, now and later.
     void end();
 
 private:

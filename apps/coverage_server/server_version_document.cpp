@@ -75,7 +75,7 @@ std::string marked(unsigned kind, std::size_t size) {
     return bigEndian(kind << 4 | 15, 1) + bigEndian(0x10, 1) + bigEndian(size, 1);
 }
 
-// Objects one after the other, the root last, then where each begins, then the trailer.
+// The objects, of which the last is the root, then the offset of each, then the trailer.
 std::string binaryFile(const std::vector<std::string>& objects) {
     std::string text(binaryMagic), offsets;
     for (const std::string& object : objects) {

@@ -1,10 +1,9 @@
-// What the store has: a JSON file, read afresh for each question, with the entries of both of its answers:
+// The store's content: a JSON file, read for each question, with the entries of both kinds of answer:
 //
 //     {"items": [{"bundleIdentifier": …, "displayName": …, …}, …], "purchases": [{"bundleIdentifier": …, …}, …]}
 //
-// An entry is sent as it stands when it has an identifier that was asked for: its bundleIdentifier, or an item its
-// itemIdentifier. A purchase with a number as its account is that account's; one without is everybody's.
-// Any thread may read.
+// An entry is sent unchanged when the question names its bundleIdentifier, or an item's itemIdentifier. A purchase with
+// an account belongs to the account of that number, one without to every account. Any thread may read.
 #pragma once
 
 #include <filesystem>
@@ -16,10 +15,11 @@ namespace vrx::coverage_server {
 
 class StoreFile {
 public:
-    // Without a file the store offers one support app, and nobody has bought anything.
+    // Without a file, the store offers one support app, and nobody has bought anything.
     explicit StoreFile(std::filesystem::path file) : file_(std::move(file)) {}
 
-    // The answers. Both throw std::runtime_error when the file cannot be read as described; a list may be missing.
+    // The answers. Both throw std::runtime_error when the file cannot be read or is not as above. A missing list counts
+    // as empty.
     Json items(const StoreQuestion& question) const;
     Json purchases(const StoreQuestion& question) const;
 

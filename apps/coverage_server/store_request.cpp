@@ -9,7 +9,7 @@ namespace {
 
 using Reasons = std::vector<std::string>;
 
-// The parameter's values; a reason for each that is empty.
+// The parameter's values. Adds a reason for each empty one.
 std::vector<std::string> valuesOf(const httplib::Request& request, const std::string& name, Reasons& reasons) {
     std::vector<std::string> values;
     const auto [begin, end] = request.params.equal_range(name);
@@ -20,7 +20,7 @@ std::vector<std::string> valuesOf(const httplib::Request& request, const std::st
     return values;
 }
 
-// The parameter's value; a reason and nothing unless it is there once and not empty.
+// The parameter's value, if it is there exactly once and not empty; else adds a reason.
 std::string soleValue(const httplib::Request& request, const std::string& name, Reasons& reasons) {
     const std::vector<std::string> values = valuesOf(request, name, reasons);
     if (values.empty()) reasons.push_back("parameter " + name + " is missing");

@@ -1,5 +1,5 @@
-// Judges a question to the store, and reads it: pure functions of the request. Other parameters than these may be part
-// of the address that the agent's profile names.
+// Reads and judges a question to the store: pure functions of the request. Unknown parameters are allowed, because the
+// store's address in the agent's profile may have some.
 #pragma once
 
 #include <httplib.h>
@@ -13,8 +13,8 @@ namespace vrx::coverage_server {
 struct StoreQuestion {
     std::vector<std::string> bundles;  // at least one
     std::vector<std::string> items;    // of the catalogue
-    std::int64_t account = 0;          // whose purchases
-    std::vector<std::string> reasons;  // why it is not answered, all of them
+    std::int64_t account = 0;          // of the purchases
+    std::vector<std::string> reasons;  // all the reasons why it is not answered
 };
 
 StoreQuestion catalogueQuestion(const httplib::Request& request);

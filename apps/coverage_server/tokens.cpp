@@ -8,7 +8,7 @@ namespace vrx::coverage_server {
 std::optional<std::string> Tokens::originOf(const std::string& token) const {
     std::lock_guard lock(mutex_);
     if (initial_.contains(token)) return "given";
-    // The token's own text says which renewal it is from.
+    // Such a token begins with its origin.
     if (std::ranges::none_of(renewed_, [&](const auto& entry) { return entry.second == token; })) return std::nullopt;
     return token.substr(0, token.rfind('-'));
 }

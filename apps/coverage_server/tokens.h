@@ -1,4 +1,4 @@
-// The account tokens that the coverage endpoint takes, and their renewal. Any thread may use it.
+// The account tokens that the coverage endpoint accepts, and their renewal. Any thread may use it.
 #pragma once
 
 #include <map>
@@ -15,11 +15,11 @@ class Tokens {
 public:
     explicit Tokens(const std::vector<std::string>& initial) : initial_(initial.begin(), initial.end()) {}
 
-    // Where a valid token is from, for people and tests, who are not shown the token itself: "given", or "renewed-N" of
-    // the N-th renewal. Nothing for one that is not valid.
+    // Stands for a token where the token itself is not shown: "given", or "renewed-N" after the N-th renewal. Nothing
+    // when the token is not valid.
     std::optional<std::string> originOf(const std::string& token) const;
-    // A new token for the account and service. The one that they had before is no longer valid, nor are those that
-    // belong to no account: the ones given at start or added.
+    // Returns a new token for the account and service. Their old token is no longer valid, nor are the tokens that
+    // belong to no account: those given at start or added.
     std::string renew(const std::string& account, const std::string& service);
     void add(const std::string& token);
     void clear();
