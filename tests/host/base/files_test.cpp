@@ -48,37 +48,37 @@ private:
     int calls_ = 0;
 };
 
-TEST(ReplaceFile, LeavesTheOldContentWhateverCallFails) {
-    for (bool forGood : {false, true}) {
-        for (int k = 1;; ++k) {
-            SCOPED_TRACE("call " + std::to_string(k) + (forGood ? " and all after it" : ""));
-            TemporaryFolder folder;
-            const std::string path = folder / "file";
-            ASSERT_FALSE(replaceFile(path, bytes("old content")));
-            const std::ptrdiff_t open = openFiles();
-            FailingCalls calls(k, forGood);
-            const MaybeError error = replaceFile(path, bytes("new content"), calls);
-            EXPECT_EQ(openFiles(), open);
-            if (calls.calls() < k) {  // nothing failed: the last round
-                ASSERT_FALSE(error);
-                EXPECT_EQ(fileText(path), "new content");
-                ASSERT_GT(k, 8);
-                break;
-            }
-            ASSERT_TRUE(error);
-            EXPECT_EQ(error->code, ENOSPC);
-            if (fileText(path) == "new content") {  // the folder alone was not synced
-                EXPECT_THAT(error->text, ::testing::StartsWith("cannot sync " + folder.path() + ":"));
-            } else {
-                EXPECT_EQ(fileText(path), "old content");
-            }
-            // What could not be removed is taken over by the next writer.
-            ASSERT_FALSE(replaceFile(path, bytes("x")));
-            EXPECT_EQ(fileText(path), "x");
-            EXPECT_THAT(folder.names(), ElementsAre("file"));
+class ReplaceFileWithFailures : public ::testing::TestWithParam<bool> {};
+
+TEST_P(ReplaceFileWithFailures, LeavesTheOldContent) {
+    for (int k = 1;; ++k) {
+        SCOPED_TRACE("call " + std::to_string(k));
+        TemporaryFolder folder;
+        const std::string path = folder / "file";
+        ASSERT_FALSE(replaceFile(path, bytes("old content")));
+        const std::ptrdiff_t open = openFiles();
+        FailingCalls calls(k, GetParam());
+        const MaybeError error = replaceFile(path, bytes("new content"), calls);
+        EXPECT_EQ(openFiles(), open);
+        if (calls.calls() < k) {  // nothing failed: the last round
+            ASSERT_FALSE(error);
+            EXPECT_EQ(fileText(path), "new content");
+            ASSERT_GT(k, 8);
+            return;
         }
+        ASSERT_TRUE(error);
+        EXPECT_EQ(error->code, ENOSPC);
+        const bool isReplaced = error->text.starts_with("cannot sync " + folder.path() + ":");
+        EXPECT_EQ(fileText(path), isReplaced ? "new content" : "old content") << error->text;
+        // What could not be removed is taken over by the next writer.
+        ASSERT_FALSE(replaceFile(path, bytes("x")));
+        EXPECT_EQ(fileText(path), "x");
+        EXPECT_THAT(folder.names(), ElementsAre("file"));
     }
 }
+
+INSTANTIATE_TEST_SUITE_P(Of, ReplaceFileWithFailures, ::testing::Bool(),
+                         [](const auto& forGood) { return forGood.param ? "ACallAndAllAfterIt" : "OneCall"; });
 
 TEST(ReplaceFile, WritersAtOnceEachLeaveAWholeFile) {
     TemporaryFolder folder;

@@ -39,22 +39,24 @@ TEST(SystemLog, LeavesOutWhatIsBelowItsLevel) {
     EXPECT_EQ(written(entry, Level::Error), "");
 }
 
-TEST(LogWriter, WritesEverythingInOrderWhateverEndsTheProcess) {
+class LogWriterAtEnd : public ::testing::TestWithParam<int> {};
+
+TEST_P(LogWriterAtEnd, HasWrittenEverythingInOrder) {
     std::vector<std::string> lines;
     for (int i = 0; i < 3000; ++i) lines.push_back(std::to_string(i) + std::string(200, '.') + "\n");
-    for (const bool isCrash : {false, true}) {
-        Pipe pipe;
-        const pid_t child = inChild([&] {
-            pipe.reader = Descriptor();
-            LogWriter writer(pipe.writer.number(), LogWriter::Form::Lines);
-            for (const std::string& line : lines) writer.add(line);
-            if (isCrash) raise(SIGABRT);
-        });
-        EXPECT_EQ(pipe.rest(), std::accumulate(lines.begin(), lines.end(), std::string()))
-            << (isCrash ? "crash" : "exit");
-        EXPECT_EQ(endOf(child), isCrash ? -SIGABRT : 0);
-    }
+    Pipe pipe;
+    const pid_t child = inChild([&] {
+        pipe.reader = Descriptor();
+        LogWriter writer(pipe.writer.number(), LogWriter::Form::Lines);
+        for (const std::string& line : lines) writer.add(line);
+        if (GetParam() != 0) raise(GetParam());
+    });
+    EXPECT_EQ(pipe.rest(), std::accumulate(lines.begin(), lines.end(), std::string()));
+    EXPECT_EQ(endOf(child), -GetParam());
 }
+
+INSTANTIATE_TEST_SUITE_P(Of, LogWriterAtEnd, ::testing::Values(0, SIGABRT),
+                         [](const auto& signal) { return signal.param == 0 ? "TheProcess" : "ACrash"; });
 
 }  // namespace
 }  // namespace vrx::host
