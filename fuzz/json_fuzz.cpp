@@ -8,7 +8,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t siz
     const auto value = codec::parseJson({reinterpret_cast<const char*>(bytes), size});
     if (!value) return 0;
     const auto written = codec::serializeJson(*value);
-    require(written.has_value());
+    require(static_cast<bool>(written));
     for (const std::string& text : {*written, codec::printedJson(*value, codec::JsonLayout::OneLine),
                                     codec::printedJson(*value, codec::JsonLayout::Indented)}) {
         const auto again = codec::parseJson(text);
