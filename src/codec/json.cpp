@@ -228,6 +228,9 @@ Result<Value> parseJson(std::string_view document) {
     // The library takes a NUL for the end of the document and would ignore what follows.
     if (const std::size_t nul = document.find('\0'); nul != document.npos) return invalidAt(nul, "NUL");
 
+    // Releases of the library complain of an empty document in different ways.
+    if (document.empty()) return invalidAt(0, "unexpected end of input");
+
     const char* begin = document.data();
     const char* readTo = begin;
     JsonReader reader;
