@@ -237,8 +237,27 @@ void Connection::endStatements() {
         if (sqlite3_stmt_busy(used)) sqlite3_reset(used);
 }
 
-std::int64_t Connection::commitMark() {
-    return integer("PRAGMA data_version");
+// Both the shared-memory method and the header's place and size, 48 bytes at the beginning, are part of SQLite's
+// published interfaces and formats; SQLite itself compares the header to tell whether its cache is current.
+void Connection::findIndexHeader() {
+    constexpr int regionBytes = 32768;
+    integer("PRAGMA user_version");  // a read is what makes it map the index
+    sqlite3_file* file = nullptr;
+    void volatile* region = nullptr;
+    check(sqlite3_file_control(connection_, "main", SQLITE_FCNTL_FILE_POINTER, &file), connection_);
+    if (file->pMethods->iVersion >= 2) file->pMethods->xShmMap(file, 0, regionBytes, 0, &region);
+    indexHeader_ = static_cast<const std::uint32_t*>(const_cast<void*>(region));
+}
+
+Connection::CommitMark Connection::commitMark() {
+    CommitMark mark{};
+    if (!indexHeader_) {  // a file system without shared memory
+        mark[0] = static_cast<std::uint32_t>(integer("PRAGMA data_version"));
+        return mark;
+    }
+    // Another process may be writing it: a mixture of old and new equals neither.
+    for (std::size_t i = 0; i < mark.size(); ++i) mark[i] = __atomic_load_n(indexHeader_ + i, __ATOMIC_ACQUIRE);
+    return mark;
 }
 
 // The connections of one opening. Reading has its own, so that it does not wait while a write waits.
@@ -256,6 +275,7 @@ struct Database::Opening {
     // Called once the database is known to be sound: opens it for reading, and lets closing tidy it up.
     void passed() {
         reader.emplace(path, busyLimit);
+        reader->findIndexHeader();
         for (auto* connection : {&writer, &reader}) (*connection)->keepLogAtClose(false);
         file = FileIdentity::of(path);
         wal = FileIdentity::of(path + "-wal");

@@ -8,6 +8,7 @@
 #include <sqlite3.h>
 #include <sys/stat.h>
 
+#include <array>
 #include <chrono>
 #include <cstdint>
 #include <functional>
@@ -74,19 +75,23 @@ public:
     // The statement of a string literal, prepared at its first use and with nothing bound. It must not be in use.
     Statement& statement(const char* sql);
     std::int64_t integer(const char* sql);
-    // While two marks are equal, no other connection of any process has committed in between.
-    std::int64_t commitMark();
+    // Two equal marks: nothing was committed in between, by any connection of any process. The mark is the header of
+    // the database's shared index, which every commit replaces, and costs no system call.
+    using CommitMark = std::array<std::uint32_t, 12>;
+    CommitMark commitMark();
 
 private:
     friend class Database;
 
     // Whether closing leaves all files as they are. True at first, so that a damaged database is set aside untouched.
     void keepLogAtClose(bool keep);
+    void findIndexHeader();
     void checkSoundness();
     // Resets unfinished statements, which would keep the transaction open.
     void endStatements();
 
     sqlite3* connection_ = nullptr;
+    const std::uint32_t* indexHeader_ = nullptr;  // mapped by SQLite while the connection is open
     std::unordered_map<const char*, std::unique_ptr<Statement>> statements_;
 };
 
@@ -116,7 +121,7 @@ public:
     // Identifies a state of the database. A copy made in that state is current while the stamp is the same.
     struct Stamp {
         std::uint64_t opening = 0;  // 0 when there is none
-        std::int64_t mark = 0;
+        Connection::CommitMark mark{};
         bool operator==(const Stamp&) const = default;
     };
     // Like read(), but without a transaction, for at most one statement. The body gets the present stamp.
