@@ -51,7 +51,7 @@ private:
         std::string pattern = "/tmp/vrx-bench-XXXXXX";
         return std::string(mkdtemp(pattern.data()));
     }();
-    host::Host host_{{.home = home_, .profile = ""}, platform::Level::Error};
+    host::Host host_{{.home = home_, .profile = {}}, platform::Level::Error};
 };
 
 void buildRecord(benchmark::State& state) {

@@ -5,6 +5,18 @@ add_compile_options(-Wall -Wextra -Wpedantic -Wconversion -Wsign-conversion -Wno
 add_compile_options("$<$<NOT:$<CONFIG:Debug>>:-ffunction-sections;-fdata-sections>")
 add_link_options($<$<NOT:$<CONFIG:Debug>>:-Wl,--gc-sections>)
 
+# What is shipped is hardened as Debian hardens its packages, and against stack clashes and bent control flow besides.
+if(NOT VRX_SANITIZE)
+    set(hardening -U_FORTIFY_SOURCE -D_FORTIFY_SOURCE=2 -fPIE -fstack-protector-strong -fstack-clash-protection)
+    if(CMAKE_SYSTEM_PROCESSOR MATCHES "^(x86_64|AMD64|i.86)$")
+        list(APPEND hardening -fcf-protection)
+    elseif(CMAKE_SYSTEM_PROCESSOR MATCHES "^(aarch64|arm64)$")
+        list(APPEND hardening -mbranch-protection=standard)
+    endif()
+    add_compile_options("$<$<NOT:$<CONFIG:Debug>>:${hardening}>")
+    add_link_options("$<$<NOT:$<CONFIG:Debug>>:-pie;LINKER:-z,relro,-z,now>")
+endif()
+
 find_program(VRX_CCACHE ccache)
 if(VRX_CCACHE)
     set(CMAKE_CXX_COMPILER_LAUNCHER ${VRX_CCACHE})

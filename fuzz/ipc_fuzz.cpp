@@ -1,10 +1,13 @@
 // What comes over the agent's socket, from either side. The first byte chooses: a reply's body, read by a client, which
-// must not crash and must come out the same when what was understood is sent again; or the bytes that an authenticated
-// client writes, which the agent's session must survive.
+// must not crash and must come out the same when what was understood is sent again; the bytes that an authenticated
+// client writes, which the agent's session must survive; or the body of a well-formed request, whose operation the
+// second byte chooses, and of which the agent must not understand anything but what a client would write.
 #include <sys/socket.h>
 #include <systemd/sd-bus.h>
 
 #include <atomic>
+#include <bit>
+#include <functional>
 #include <string>
 
 #include "client/fake_agent.h"
@@ -42,15 +45,13 @@ public:
         sd_bus_close_unref(server_);
     }
 
-    platform::Result<platform::Value> readBody(const std::string& body) {
-        // A signal whose signature is that of replies.
+    // Hands over a signal with that body, unless the bus finds it bad.
+    void readBody(const char* signature, const std::string& body, std::function<void(sd_bus_message*)> reader) {
         const std::string message = test::RawClient::message(
-            '\x04', 1, {{1, 'o', "/a"}, {2, 's', "a.b"}, {3, 's', "c"}, {8, 'g', "a{sv}"}}, body);
+            '\x04', 1, {{1, 'o', "/a"}, {2, 's', "a.b"}, {3, 's', "c"}, {8, 'g', signature}}, body);
         require(write(raw_, message.data(), message.size()) == static_cast<ssize_t>(message.size()));
-        result_.reset();
-        int r = 1;
-        while (r > 0 && !result_) r = sd_bus_process(client_, nullptr);
-        return result_ ? *result_ : platform::Error{"bus", r, "no message"};
+        reader_ = std::move(reader);
+        for (int r = 1; r > 0 && reader_;) r = sd_bus_process(client_, nullptr);
     }
 
     bool isOpen() const { return sd_bus_is_open(client_) > 0; }
@@ -58,26 +59,33 @@ public:
 
 private:
     static int onMessage(sd_bus_message* message, void* self, sd_bus_error*) {
-        static_cast<BusPair*>(self)->result_ = wire::readReply(message);
+        std::exchange(static_cast<BusPair*>(self)->reader_, nullptr)(message);
         return 1;
     }
 
     sd_bus* server_ = nullptr;
     sd_bus* client_ = nullptr;
     int raw_;
-    std::optional<platform::Result<platform::Value>> result_;
+    std::function<void(sd_bus_message*)> reader_;
 };
 
-void fuzzReply(const std::string& body) {
+// The bus closes a connection when it finds a message bad.
+BusPair& openPair() {
     static std::unique_ptr<BusPair> pair;
     if (!pair || !pair->isOpen()) pair = std::make_unique<BusPair>();
-    auto reply = pair->readBody(body);
+    return *pair;
+}
+
+void fuzzReply(const std::string& body) {
+    BusPair& pair = openPair();
+    platform::Result<platform::Value> reply = platform::Error{"bus", 0, "no message"};
+    pair.readBody(wire::replySignature, body, [&](sd_bus_message* message) { reply = wire::readReply(message); });
     if (!reply) return;
     codec::unarchive<VRXDeviceInfo>(*reply);
     codec::unarchiveList<VRXDevice>(*reply);
 
     sd_bus_message* again = nullptr;
-    require(sd_bus_message_new_signal(pair->bus(), &again, "/a", "a.b", "c") >= 0);
+    require(sd_bus_message_new_signal(pair.bus(), &again, "/a", "a.b", "c") >= 0);
     require(wire::appendReply(again, *reply) >= 0 && sd_bus_message_seal(again, 1, 0) >= 0);
     auto second = wire::readReply(again);
     // What is not a number equals nothing; texts do.
@@ -113,12 +121,42 @@ void fuzzRequests(const std::string& bytes) {
     host::ServiceLimits limits;
     static host::MainLoop mainLoop;
     host::ProcessLifecycle lifecycle(mainLoop);
+    host::RequestLine line(limits);
     host::ClientSession session(std::move(agentEnd), *peer, std::make_shared<Agent>(),
-                                std::make_shared<host::ReplyBox>(), limits, lifecycle);
+                                std::make_shared<host::ReplyBox>(), limits, line, lifecycle);
     const std::string sent = test::RawClient::authentication() + bytes;
     [[maybe_unused]] ssize_t size = write(ends[1], sent.data(), sent.size());
     shutdown(ends[1], SHUT_WR);
-    session.serve(std::atomic<bool>(false));
+    host::SessionState state;
+    session.serve(state);
+}
+
+// As a client writes them.
+std::string bodyOf(const wire::Operation& operation, const host::RequestArguments& arguments) {
+    std::string body;
+    auto add = [&body](std::uint64_t number, std::size_t size) {
+        body.resize((body.size() + size - 1) / size * size);
+        body.append(reinterpret_cast<const char*>(&number), size);
+    };
+    for (const char type : std::string_view(operation.signature)) {
+        if (type == 's') {
+            add(arguments.text.size(), 4);
+            body += arguments.text + '\0';
+        } else if (type == 't') {
+            add(arguments.policy, 8);
+        } else {
+            add(arguments.flag, 4);
+        }
+    }
+    return body;
+}
+
+void fuzzArguments(const wire::Operation& operation, const std::string& body) {
+    openPair().readBody(operation.signature, body, [&](sd_bus_message* message) {
+        const auto arguments = host::readArguments(message, body, std::endian::little, operation);
+        require(!arguments || bodyOf(operation, *arguments) == body);
+    });
+    fuzzRequests(test::RawClient::call(operation.member, 1, operation.signature, body));
 }
 
 }  // namespace
@@ -126,9 +164,11 @@ void fuzzRequests(const std::string& bytes) {
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
     if (size == 0 || size > 60'000) return 0;
     const std::string bytes(reinterpret_cast<const char*>(data) + 1, size - 1);
-    if (data[0] % 2 == 0)
-        fuzzReply(bytes);
-    else
-        fuzzRequests(bytes);
+    switch (data[0] % 3) {
+        case 0: fuzzReply(bytes); break;
+        case 1: fuzzRequests(bytes); break;
+        default:
+            if (size > 1) fuzzArguments(wire::operations[data[1] % wire::operations.size()], bytes.substr(1));
+    }
     return 0;
 }

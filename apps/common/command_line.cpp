@@ -197,6 +197,8 @@ int CommandLine::report(const Outcome& outcome) const {
     const bool isWritten = outcome.isShown || show(outcome);
     const int error = errno;
     const int code = static_cast<int>(outcome.code);
+    for (const std::string& warning : outcome.warnings)
+        std::fprintf(stderr, "%s: %s\n", program_.c_str(), printable(warning).c_str());
     if (!outcome.problem.empty())
         std::fprintf(stderr, "%s: %s\n", program_.c_str(), printable(outcome.problem).c_str());
     if (!outcome.advice.empty()) std::fprintf(stderr, "%s\n", printable(outcome.advice).c_str());

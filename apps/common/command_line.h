@@ -24,8 +24,9 @@ enum class ExitCode { Done = 0, NoAnswer = 1, Usage = 2, NotReachable = 3, Refus
 // The result of a verb.
 struct Outcome {
     ExitCode code = ExitCode::Done;
-    platform::Dictionary document{};  // for programs
-    std::string text{};               // for people, with a line break at its end; may be empty
+    platform::Dictionary document{};      // for programs
+    std::string text{};                   // for people, with a line break at its end; may be empty
+    std::vector<std::string> warnings{};  // for people, on standard error
     // Why the code is not Done, and what to try next.
     std::string problem{};
     std::string advice{};

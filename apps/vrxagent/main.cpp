@@ -40,11 +40,18 @@ struct HandOver {
     vrx::host::Descriptor homeLock;
 };
 
+std::string joined(const std::vector<std::string>& layers) {
+    std::string text;
+    for (const std::string& layer : layers) text += (text.empty() ? "" : " ") + layer;
+    return text;
+}
+
 // Runs the agent. Fills in the hand-over when the agent has to be executed again.
 int serve(const vrx::wire::Locations& places, Level logLevel, std::optional<HandOver>& handOver) {
     // A capability from the service manager is for the agent alone, not for programs that it starts.
     prctl(PR_CAP_AMBIENT, PR_CAP_AMBIENT_CLEAR_ALL, 0, 0, 0);
-    Host host({.home = vrx::apps::absolutePath(places.home.path), .profile = places.profile.path}, logLevel);
+    Host host({.home = vrx::apps::absolutePath(places.home.path), .profile = places.profile, .systemBus = ""},
+              logLevel);
     if (MaybeError error = host.open(HomeUse::Agent)) return cannotStart(error->text);
     BundleLookup bundles([&] { return host.profile().content(); });
     ServiceListenerFactory factory(host.mainLoop().event(), bundles, host.lifecycle());
@@ -54,7 +61,8 @@ int serve(const vrx::wire::Locations& places, Level logLevel, std::optional<Hand
 
     const vrx::StartUp startUp;
     host.start(VRX_VERSION);
-    log(Level::Default, "ready: home %@, profile %@, socket %@", host.home(), places.profile.path, places.socket.path);
+    log(Level::Default, "ready: home %@, profile %@, socket %@", host.home(), joined(places.profile),
+        places.socket.path);
     sd_notify(0, "READY=1");
     host.mainLoop().run();
     const bool isToBeExecuted =

@@ -14,8 +14,6 @@
 
 namespace vrx::apps {
 
-using platform::Date;
-
 namespace {
 
 template <class Activity>

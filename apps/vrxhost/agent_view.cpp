@@ -77,6 +77,7 @@ AgentView::AgentView(const std::string& home, const std::optional<std::string>& 
       clock_(profile_),
       telephony_(profile_) {
     vrx_registerDefaults(defaults_);
+    defaults_.registerDefaults(*profile_.defaults());
     facilities_ = {.accountStore = &accounts_,
                    .clock = &clock_,
                    .defaultsStore = &defaults_,
@@ -96,8 +97,12 @@ AgentView::AgentView(const std::string& home, const std::optional<std::string>& 
 
 MaybeError AgentView::open() {
     MaybeError error = database_.open();
-    if (!error) defaults_.useStore();
-    return error;
+    if (error) return error;
+    database_.read([this](host::Connection& connection) {
+        profile_.tell(host::keptFacts(connection, profile_.machine().identifier()));
+    });
+    defaults_.useStore();
+    return std::nullopt;
 }
 
 void AgentView::use(platform::Queues* queues, platform::HttpSessions* sessions) {

@@ -40,7 +40,7 @@ CacheFile readCacheFile(Home& home, const std::string& path) {
 }
 
 // Compares the record's language and version with the present ones, as the agent does before it uses the record.
-Outcome showCache(Home& home, const std::string& serialNumber, const std::string& profile) {
+Outcome showCache(Home& home, const std::string& serialNumber, const std::vector<std::string>& profile) {
     const std::string path =
         platform::filled(VRXWarranty::_warrantyPathForSerialNumberFormat(), {platform::sha256Hash(serialNumber)});
     auto metadata = [&](std::string_view key) { return home.defaults().get(cacheMetadataKey(serialNumber, key)); };

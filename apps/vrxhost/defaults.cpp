@@ -2,6 +2,7 @@
 #include "vrx/codec/iso_date.h"
 #include "vrx/codec/json.h"
 #include "vrx/codec/property_list.h"
+#include "vrx/platform/known_settings.h"
 #include "vrxhost/home.h"
 #include "vrxhost/verbs.h"
 
@@ -28,19 +29,28 @@ const char* typeName(const Value& value) {
     return "";
 }
 
-Dictionary settingDocument(const std::string& key, const Value& value, bool isRegistered) {
-    return {{"key", key}, {"value", value}, {"type", typeName(value)}, {"registered", isRegistered}};
+// Where the value in force comes from: "written", a place in the profile, or the agent's own table.
+std::string sourceOf(const Home& home, const std::string& key) {
+    if (!home.stored().get(key).isNull()) return "written";
+    const auto content = home.profile().content();
+    const auto place = content->defaultSources.find(key);
+    return place == content->defaultSources.end() ? "the agent's own" : place->second;
 }
 
-constexpr const char* registeredMark = "registered";
+Dictionary settingDocument(const Home& home, const std::string& key, const Value& value) {
+    return {{"key", key},
+            {"value", value},
+            {"type", typeName(value)},
+            {"registered", home.stored().get(key).isNull()},
+            {"source", sourceOf(home, key)}};
+}
 
 Outcome listDefaults(Home& home) {
     platform::Array documents;
     std::vector<std::vector<std::string>> rows{{"KEY", "TYPE", "FROM", "VALUE"}};
     for (const auto& [key, value] : home.defaults().dictionaryRepresentation()) {
-        const bool isRegistered = home.stored().get(key).isNull();
-        documents.emplace_back(settingDocument(key, value, isRegistered));
-        rows.push_back({key, typeName(value), isRegistered ? registeredMark : "stored", printableValue(value)});
+        documents.emplace_back(settingDocument(home, key, value));
+        rows.push_back({key, typeName(value), sourceOf(home, key), printableValue(value)});
     }
     return {.document = {{"defaults", documents}}, .text = table(rows)};
 }
@@ -49,15 +59,28 @@ Outcome readDefault(Home& home, const std::string& key) {
     const Value value = home.defaults().get(key);
     if (value.isNull())
         return failed(ExitCode::NoAnswer, "nothing is stored or registered under " + key, "See vrxhost defaults list.");
-    const bool isRegistered = home.stored().get(key).isNull();
-    return {.document = settingDocument(key, value, isRegistered),
-            .text = printableValue(value) + (isRegistered ? std::string("  (") + registeredMark + ")\n" : "\n")};
+    return {.document = settingDocument(home, key, value),
+            .text = printableValue(value) + "  (" + printable(sourceOf(home, key)) + ")\n"};
 }
 
 Outcome storeDefault(Home& home, const std::string& key, const Value& value) {
     if (const platform::MaybeError error = home.defaults().write(key, value))
         return databaseFailure(*error, "not-written");
     return {.document = {{"key", key}, {"value", value}}};
+}
+
+// What the agent makes nothing of is stored all the same: another release may read it.
+Outcome writeDefault(Home& home, const std::string& key, const Value& value) {
+    Outcome outcome = storeDefault(home, key, value);
+    const platform::KnownSetting* setting = platform::findSetting(key);
+    if (!setting)
+        outcome.warnings = {"no part of the agent reads " + key};
+    else if (!platform::isReadAs(value, setting->type))
+        outcome.warnings = {"the agent ignores a value of this type, " + std::string(typeName(value)) + ": " + key +
+                            " is " + std::string(platform::describe(setting->type))};
+    if (outcome.code != ExitCode::Done) outcome.warnings.clear();
+    if (!outcome.warnings.empty()) outcome.document["warning"] = outcome.warnings.front();
+    return outcome;
 }
 
 Outcome deleteDefault(Home& home, const std::string& key) {
@@ -115,7 +138,7 @@ void addValue(CLI::App* verb, Setting& setting) {
 void addDefaultsVerbs(CommandLine& line, const wire::LocationOverrides& places) {
     auto setting = std::make_shared<Setting>();
     CLI::App* group = line.addGroup("defaults", "The agent's settings");
-    line.add("list", "Lists all settings, stored and registered", inHome(places, Access::ReadOnly, listDefaults),
+    line.add("list", "Lists all settings, and where each comes from", inHome(places, Access::ReadOnly, listDefaults),
              group);
     addKey(line.add("read", "Shows a setting",
                     inHome(places, Access::ReadOnly, [setting](Home& home) { return readDefault(home, setting->key); }),
@@ -124,7 +147,7 @@ void addDefaultsVerbs(CommandLine& line, const wire::LocationOverrides& places) 
     CLI::App* write =
         line.add("write", "Stores a setting",
                  inHome(places, Access::ReadWrite,
-                        [setting](Home& home) { return storeDefault(home, setting->key, setting->value); }),
+                        [setting](Home& home) { return writeDefault(home, setting->key, setting->value); }),
                  group);
     addKey(write, *setting);
     addValue(write, *setting);

@@ -10,10 +10,11 @@
 #include <filesystem>
 #include <fstream>
 
-#include "vrx/host/activities/network_routes.h"
+#include "vrx/host/activities/machine_conditions.h"
 #include "vrx/host/base/descriptor.h"
 #include "vrx/host/home/home_lock.h"
 #include "vrx/host/ipc/bundle_lookup.h"
+#include "vrx/host/profile/installed_apps.h"
 #include "vrx/platform/defaults_store.h"
 #include "vrx/platform/settings_keys.h"
 #include "vrx/platform/text.h"
@@ -21,6 +22,7 @@
 #include "vrxhost/agent_activities.h"
 #include "vrxhost/agent_view.h"
 #include "vrxhost/home.h"
+#include "vrxhost/profile_facts.h"
 #include "vrxhost/reachability.h"
 #include "vrxhost/verbs.h"
 
@@ -55,6 +57,16 @@ struct Check {
     ExitCode code = ExitCode::NoAnswer;  // when it is the first problem
 };
 
+// Who says whether there is a network.
+std::string networkJudge(const host::MachineServices& services) {
+    constexpr const char* names[] = {"", "none", "portal", "limited", "full"};
+    const host::Connectivity connectivity = services.connectivity();
+    if (connectivity == host::Connectivity::Unknown) return "by the machine's routes";
+    const bool isChecked = services.isConnectivityChecked().value_or(true);
+    return std::string("by NetworkManager (") + names[static_cast<std::size_t>(connectivity)] +
+           (isChecked ? ")" : ", which does not check it)");
+}
+
 Check good(std::string finding) {
     return {"", Health::Good, std::move(finding)};
 }
@@ -74,14 +86,13 @@ Check skipped(std::string finding) {
 class Examination {
 public:
     Examination(AgentView& view, wire::Locations places, platform::Duration limit)
-        : view_(view), places_(std::move(places)), limit_(limit) {
-        if (view_.profile().path() != places_.profile.path) places_.profile = {view_.profile().path(), "the agent"};
-    }
+        : view_(view), places_(std::move(places)), limit_(limit) {}
 
     std::vector<Check> run() {
         add("home", home());
         add("database", database());
         add("profile", profile());
+        add("device", device());
         add("agent", agent());
         add("socket", socket());
         add("entitlement", entitlement());
@@ -92,6 +103,7 @@ public:
         add("server version", serverVersion(servers));
         add("coverage server", coverageServer(servers));
         add("activities", activities());
+        add("applications", applications());
         return std::move(checks_);
     }
 
@@ -104,6 +116,7 @@ private:
     Check home() const;
     Check database();
     Check profile() const;
+    Check device() const;
     Check agent();
     Check socket() const;
     Check entitlement() const;
@@ -113,9 +126,10 @@ private:
     Check serverVersion(const Reachability& servers) const;
     Check coverageServer(const Reachability& servers) const;
     Check activities();
+    Check applications() const;
 
     AgentView& view_;
-    wire::Locations places_;
+    const wire::Locations places_;
     const platform::Duration limit_;
     std::vector<Check> checks_;
     bool isDatabaseReadable_ = false;
@@ -136,6 +150,8 @@ Check Examination::home() const {
         return problem(chosen(places_.home) + ": this user may not use it",
                        "Run vrxhost as the agent's user, number " + std::to_string(status.st_uid) + ".",
                        ExitCode::NotReachable);
+    if (const auto open = host::findOpenToOthers(view_.home(), status))
+        return problem(open->error.text, "chmod 700 " + view_.home() + ", and chown it to the agent's user.");
     if (status.st_mode & 0077) return note(chosen(places_.home) + ": others may look in", "chmod 700 " + view_.home());
     return good(chosen(places_.home));
 }
@@ -156,25 +172,32 @@ Check Examination::database() {
                    "of a newer release it leaves alone: use that release.");
 }
 
-// Mistakes in the whole profile come before those in single keys.
+// Mistakes, which keep a whole file from being taken over, come before those in single keys.
 Check Examination::profile() const {
-    const std::string& path = places_.profile.path;
-    if (path.empty()) return good("none: the machine's own facts hold");
-    const Result<host::FileContent> file = host::readFile(path);
-    if (!file && file.error().code == ENOENT)
-        return note("there is none at " + chosen(places_.profile) + ": the machine's own facts hold");
-    if (!file) return problem(file.error().text, "Let the agent's user read it.");
-    const Result<host::ProfileReading> reading =
-        host::parseProfile({reinterpret_cast<const char*>(file->bytes.data()), file->bytes.size()}, path);
-    if (!reading)
-        return problem(reading.error().text, "Correct the line; until then the agent goes by what it read before.");
-    if (!reading->warnings.empty())
-        return note(reading->warnings.front(), "Correct or remove what means nothing to the agent.");
-    if (const auto open = view_.profile().content()->findOpenToOthers())
-        return note(chosen(places_.profile) + ": others can write " + (open->path == path ? "it" : open->path) +
-                        ", so what it says of bundles, authorities and helpers does not count",
-                    "chown it to root or the agent's user, and chmod go-w " + open->path);
-    return good(chosen(places_.profile));
+    using Kind = host::ProfileLayers::Problem::Kind;
+    const std::vector<host::ProfileLayers::Problem> problems = view_.profile().problems();
+    for (const auto& [kind, advice] :
+         {std::pair(Kind::Mistake, "Correct the line; until then the agent goes by what it read before."),
+          {Kind::Warning, "Correct or remove what means nothing to the agent."},
+          {Kind::OpenToOthers, "chown it to root or the agent's user, and chmod go-w it."}})
+        for (const host::ProfileLayers::Problem& found : problems)
+            if (found.kind == kind)
+                return kind == Kind::Mistake ? problem(found.text, advice) : note(found.text, advice);
+    if (const auto missing = view_.profile().missingFile())
+        return note(*missing + " is not there: the machine's own facts hold",
+                    "Make the file, or name another one to the agent with --device.");
+    std::string files;
+    for (const std::string& file : view_.profile().files()) files += (files.empty() ? "" : ", ") + file;
+    return good(files.empty() ? "none: the machine's own facts hold" : files);
+}
+
+// Where the facts come from by which servers and people know the device; not the facts.
+Check Examination::device() const {
+    const auto source = [&](const char* key) { return factInForce(key, view_.profile()).source; };
+    const std::string rest = "name: " + source("device.name") + "; model: " + source("device.product_type");
+    if (!view_.profile().string("SerialNumber"))
+        return note("no serial number; " + rest, "Name one in the profile: [device] serial_number = \"…\".");
+    return good("serial number: " + source("device.serial_number") + "; " + rest);
 }
 
 Check Examination::agent() {
@@ -233,6 +256,14 @@ Check Examination::entitlement() const {
     return good(program + " is entitled");
 }
 
+Check Examination::applications() const {
+    const std::vector<std::string> problems = host::InstalledApps(view_.profile()).problems();
+    if (!problems.empty())
+        return note("not taken for installed: " + problems.front(),
+                    "chown its folder to root or the agent's user, and chmod go-w it; or correct its bundle.toml.");
+    return good("each bundle.toml of the profile's application folders is believed");
+}
+
 Check Examination::account() const {
     const auto& store = Platform::current().accountStore();
     const auto account = store.primaryCloudAccount();
@@ -252,20 +283,23 @@ Check Examination::credentialHelper() const {
     const std::string& program = content->account->credentialHelper.front();
     if (access(program.c_str(), X_OK) != 0)
         return problem(program + " cannot be run: " + std::strerror(errno), "Correct the profile's credential_helper.");
-    if (const auto open = content->findOpenToOthers())
-        return problem(
-            program + " is not run: others can write " + (open->path == content->path ? "the profile" : open->path),
-            "chown it to root or the agent's user, and chmod go-w " + open->path);
+    if (const auto open = content->account->credentialHelperSource.findOpenToOthers())
+        return problem(program + " is not run: others can write " + open->path,
+                       "chown it to root or the agent's user, and chmod go-w " + open->path);
     return good(program);
 }
 
 Check Examination::network() const {
-    const auto overridden = view_.profile().content()->networkAvailable;
-    const bool isAvailable = overridden ? *overridden : host::NetworkRoutes(nullptr, {}).hasDefaultRoute();
-    const std::string by = overridden ? "by the profile" : "by the machine's routes";
-    if (isAvailable) return good("there is one, " + by);
+    const host::EventLoop loop = host::makeEventLoop();
+    host::MachineServices services(loop.get());
+    const auto content = view_.profile().content();
+    const bool isOverridden = content->networkAvailable.has_value();
+    if (!isOverridden && content->usesSystemBus) services.waitForNetwork(std::chrono::seconds(1));
+    const std::string by = isOverridden ? "by the profile" : networkJudge(services);
+    if (host::MachineConditions(loop.get(), view_.profile(), services).isNetworkAvailable())
+        return good("there is one, " + by);
     return note("there is none, " + by + ": activities that need it wait",
-                overridden ? "Set [network] available = true in the profile." : "");
+                isOverridden ? "Set [network] available = true in the profile." : "");
 }
 
 Check Examination::serverVersion(const Reachability& servers) const {

@@ -40,7 +40,7 @@ std::optional<std::string> deviceName(const host::DeviceProfile& profile, const 
 }
 
 // How an item looks at one moment.
-struct Shown {
+struct Appearance {
     std::optional<std::string> serialNumber{};
     std::optional<std::string> deviceName{};
     bool hasBadge = false;
@@ -67,7 +67,7 @@ std::optional<std::string> relativeText(const Value& userInfo, std::int64_t days
     return platform::filled(*format, {locale.decimalText(static_cast<std::uint64_t>(daysLeft))});
 }
 
-void countDays(Shown& shown, const FollowUpItem& item, Date now, Duration day, const platform::Locale& locale) {
+void countDays(Appearance& shown, const FollowUpItem& item, Date now, Duration day, const platform::Locale& locale) {
     if (!item.expirationDate) return;
     shown.isExpired = *item.expirationDate <= now;
     const double days = (*item.expirationDate - now) / day;
@@ -80,8 +80,8 @@ void countDays(Shown& shown, const FollowUpItem& item, Date now, Duration day, c
     if (!shown.isExpired) shown.nextChange = *item.expirationDate - std::max(0.0, roundsUp ? whole - 1 : whole) * day;
 }
 
-Shown shownAt(Date now, const FollowUpItem& item, Duration day, const host::DeviceProfile& profile) {
-    Shown shown;
+Appearance shownAt(Date now, const FollowUpItem& item, Duration day, const host::DeviceProfile& profile) {
+    Appearance shown;
     if (const std::string* serialNumber = serialNumberOfItem(item)) {
         shown.serialNumber = *serialNumber;
         shown.deviceName = deviceName(profile, *serialNumber);
@@ -97,7 +97,7 @@ Value valueOf(const std::optional<T>& value) {
     return value ? Value(*value) : Value();
 }
 
-Value documentOf(const FollowUpItem& item, const Shown& shown) {
+Value documentOf(const FollowUpItem& item, const Appearance& shown) {
     const auto expires = item.expirationDate ? codec::isoTextFromDate(*item.expirationDate) : std::nullopt;
     return Dictionary{{"item", host::followUpDocument(item)},
                       {"derived", Dictionary{{"deviceName", valueOf(shown.deviceName)},
@@ -111,7 +111,7 @@ Value documentOf(const FollowUpItem& item, const Shown& shown) {
                                              {"differsFromFooter", shown.differsFromFooter(item)}}}};
 }
 
-std::string textOf(const FollowUpItem& item, const Shown& shown) {
+std::string textOf(const FollowUpItem& item, const Appearance& shown) {
     std::string text = printable(item.title.value_or("(no title)")) + (shown.isExpired ? "  [expired]" : "") +
                        (shown.isLegacy ? "  [legacy]" : "") + "\n";
     auto line = [&](const std::string& field, const std::optional<std::string>& content, const char* remark = "") {
@@ -148,7 +148,7 @@ Listing list(Home& home, const host::DeviceProfile& profile) {
     Listing listing;
     Array documents;
     for (const FollowUpItem& item : *items) {
-        const Shown shown = shownAt(now, item, day, profile);
+        const Appearance shown = shownAt(now, item, day, profile);
         documents.emplace_back(documentOf(item, shown));
         listing.outcome.text += textOf(item, shown);
         if (shown.nextChange && *shown.nextChange < listing.nextChange.value_or(Date::max()))

@@ -4,6 +4,7 @@
 
 #include <cerrno>
 #include <cstring>
+#include <sstream>
 
 #include "vrx/host/home/stored_facts.h"
 #include "vrx/service/register_defaults.h"
@@ -16,6 +17,13 @@ Home::Home(const std::string& path, Access access)
       database_(access == Access::ReadOnly ? host::Database::readOnly(databasePath(path))
                                            : host::Database(databasePath(path))) {
     vrx_registerDefaults(defaults_);
+}
+
+platform::MaybeError Home::open() {
+    if (platform::MaybeError error = database_.open()) return error;
+    profile_.emplace(agentProfile(database_, std::nullopt));
+    defaults_.setPresets([this] { return profile_->defaults(); });
+    return std::nullopt;
 }
 
 Outcome notReachable(std::string problem) {
@@ -46,10 +54,14 @@ Outcome databaseFailure(const platform::Error& error, const char* kind) {
     return failed(ExitCode::NoAnswer, error.text, "vrxhost doctor tells what is wrong, and what to do.", kind);
 }
 
-std::string agentProfile(host::Database& database, const std::optional<std::string>& named) {
-    if (named) return *named;
-    const std::optional<std::string> told = host::storedFact(database, host::stored_facts::profile);
-    return told ? *told : wire::findLocations().profile.path;
+std::vector<std::string> agentProfile(host::Database& database, const std::optional<std::string>& named) {
+    const std::optional<std::string> told =
+        named ? std::nullopt : host::storedFact(database, host::stored_facts::profile);
+    if (!told) return wire::findLocations({.profile = named}).profile;
+    std::vector<std::string> layers;
+    std::istringstream lines(*told);
+    for (std::string line; std::getline(lines, line);) layers.push_back(line);
+    return layers;
 }
 
 CommandLine::Verb inHome(const wire::LocationOverrides& places, Access access, std::function<Outcome(Home&)> verb) {

@@ -4,6 +4,7 @@
 #include <functional>
 #include <optional>
 #include <string>
+#include <vector>
 
 #include "common/command_line.h"
 #include "vrx/codec/codec.h"
@@ -12,6 +13,7 @@
 #include "vrx/host/home/defaults_store.h"
 #include "vrx/host/home/follow_up_controller.h"
 #include "vrx/host/log/system_log.h"
+#include "vrx/host/profile/device_profile.h"
 #include "vrx/platform/platform.h"
 #include "vrx/wire/locations.h"
 
@@ -27,11 +29,13 @@ public:
 
     static std::string databasePath(const std::string& home) { return home + "/host.db"; }
 
-    platform::MaybeError open() { return database_.open(); }
+    platform::MaybeError open();
     const std::string& path() const { return path_; }
     host::Database& database() { return database_; }
     host::DefaultsStore& defaults() { return defaults_; }
-    // Without the registered values.
+    // The agent's, once the home is open.
+    const host::DeviceProfile& profile() const { return *profile_; }
+    // Without the profile's and the registered values.
     const platform::DefaultsStore& stored() const { return stored_; }
     const platform::Files& files() const { return files_; }
     platform::FollowUpControllers& followUps() { return followUps_; }
@@ -46,6 +50,7 @@ private:
     host::DefaultsStore stored_{database_};
     host::DefaultsStore defaults_{database_};
     host::FollowUpControllers followUps_{database_};
+    std::optional<host::DeviceProfile> profile_;
     platform::Platform platform_{{.defaultsStore = &defaults_,
                                   .digest = &digest_,
                                   .files = &files_,
@@ -63,8 +68,9 @@ bool isHeldByAnother(const platform::Error& error);
 // The failure when a database cannot be used. The kind is for errors other than a database that is held.
 Outcome databaseFailure(const platform::Error& error, const char* kind);
 
-// The path of the device profile: the named one, else the one that the agent noted, else where an agent would look.
-std::string agentProfile(host::Database& database, const std::optional<std::string>& named);
+// The layers of the device profile: the file that is named, else those that the agent noted, else where an agent would
+// look.
+std::vector<std::string> agentProfile(host::Database& database, const std::optional<std::string>& named);
 
 // A verb that runs in the home, which must exist. The places are read when the verb runs.
 CommandLine::Verb inHome(const wire::LocationOverrides& places, Access access, std::function<Outcome(Home&)> verb);

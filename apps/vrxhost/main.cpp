@@ -13,6 +13,7 @@ int main(int argc, char** argv) {
     addActivitiesVerb(line, places);
     addFireVerb(line, places);
     addWhyVerb(line, places);
+    addProfileVerb(line, places);
     addDoctorVerb(line, places);
     return line.run(argc, argv);
 }

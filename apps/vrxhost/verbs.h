@@ -13,6 +13,7 @@ void addFollowUpVerbs(CommandLine& line, const wire::LocationOverrides& places);
 void addActivitiesVerb(CommandLine& line, const wire::LocationOverrides& places);
 void addFireVerb(CommandLine& line, const wire::LocationOverrides& places);
 void addWhyVerb(CommandLine& line, const wire::LocationOverrides& places);
+void addProfileVerb(CommandLine& line, const wire::LocationOverrides& places);
 void addDoctorVerb(CommandLine& line, const wire::LocationOverrides& places);
 
 }  // namespace vrx::apps

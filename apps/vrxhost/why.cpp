@@ -26,7 +26,6 @@
 
 namespace vrx::apps {
 
-using platform::Array;
 using platform::Date;
 using platform::Dictionary;
 using platform::Duration;

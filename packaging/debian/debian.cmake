@@ -44,7 +44,10 @@ string(JOIN ", " CPACK_DEBIAN_AGENT_PACKAGE_DEPENDS
     "libicu${icu_version}"
     "systemd | systemd-standalone-sysusers | systemd-sysusers")  # for the postinst
 set(CPACK_DEBIAN_AGENT_PACKAGE_RECOMMENDS "ca-certificates")
-set(CPACK_DEBIAN_AGENT_PACKAGE_SUGGESTS "libsystemd-dev, vrx-coverage-server")  # to link with the client library; to test
+string(JOIN ", " CPACK_DEBIAN_AGENT_PACKAGE_SUGGESTS
+    "dbus, polkitd, network-manager-config-connectivity-debian"  # to know the machine
+    "libsystemd-dev"       # to link with the client library
+    "vrx-coverage-server")  # to test
 foreach(script postinst prerm postrm)
     list(APPEND CPACK_DEBIAN_AGENT_PACKAGE_CONTROL_EXTRA ${CMAKE_CURRENT_SOURCE_DIR}/debian/${script})
 endforeach()

@@ -24,8 +24,7 @@ namespace {
 //
 // Objects may share others, overlap, and refer in circles. Each use of an object counts as a value, so that circles and
 // sharing end at the limits of depth and count. Texts and data are made once for each place in the document and then
-// shared; a key, which the dictionary copies, counts at each use. All their bytes together are limited, so that neither
-// overlapping contents nor shared keys use more memory than a document may.
+// shared, but their bytes count at each use: whoever copies or prints the value pays for each.
 class BinaryReader {
 public:
     explicit BinaryReader(const platform::Data& document) : document_(document) {}
@@ -168,14 +167,16 @@ private:
 
     Value readBytes(const Object& object) {
         auto [known, isNew] = contents_.try_emplace(object.offset);
+        if (!spend(object, object.count * widthOf(object))) return {};
         if (isNew) known->second = makeBytes(object);
         return known->second;
     }
 
+    static std::size_t widthOf(const Object& object) { return object.kind() == Utf16String ? 2 : 1; }
+
     Value makeBytes(const Object& object) {
-        const std::size_t width = object.kind() == Utf16String ? 2 : 1;
-        // Checked and paid for before any memory is taken.
-        if (!fits(object, object.count, width) || !spend(object, object.count * width)) return {};
+        const std::size_t width = widthOf(object);
+        if (!fits(object, object.count, width)) return {};  // before any memory is taken
         const std::uint8_t* begin = document_.data() + object.content;
         const std::uint8_t* end = begin + object.count * width;
         if (object.kind() == Data) return platform::Data(begin, end);
@@ -225,7 +226,6 @@ private:
             complain(at, "a key that is no string");
             return {};
         }
-        if (!spend(object, object.count)) return {};
         return readBytes(object);
     }
 

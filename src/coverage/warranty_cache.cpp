@@ -70,7 +70,9 @@ void VRXWarranty::cacheWarranty(const std::optional<std::string>& serialNumber) 
     // earlier file stays.
     Result<Data> document =
         platform.propertyList().serialize(dictionaryRepresentation(), platform::PropertyListFormat::Binary);
-    if (document) platform.files().replace(path, *document);
+    const platform::MaybeError error = document ? platform.files().replace(path, *document) : document.error();
+    // Whatever follows takes the record for cached: only this line tells why an older one is replied later.
+    if (error) log(Level::Error, "Cannot write the cached record %@: %@", path, *error);
 }
 
 std::shared_ptr<VRXWarranty> VRXWarranty::cachedWarrantyForSerialNumber(

@@ -1,6 +1,7 @@
 #include "vrx/followup/follow_up.h"
 
 #include <map>
+#include <mutex>
 #include <set>
 #include <utility>
 
@@ -9,6 +10,7 @@
 #include "vrx/followup/follow_up_content.h"
 #include "vrx/followup/follow_up_rules.h"
 #include "vrx/followup/serial_number_hashes.h"
+#include "vrx/followup/turn_lock.h"
 #include "vrx/platform/clock.h"
 #include "vrx/platform/defaults_store.h"
 #include "vrx/platform/log.h"
@@ -144,6 +146,14 @@ std::vector<FollowUpItem> pendingItems(VRXFollowUpProvider& provider) {
     return items;
 }
 
+// One piece of work at a time in this process. Otherwise a refresh could post an item again that was dismissed after it
+// had been listed. Held over deciding and carrying out, and over clearing and remembering; taken again by work within
+// work. It cannot hold back another process.
+[[nodiscard]] std::unique_lock<TurnLock> onePieceOfWork() {
+    static TurnLock lock;
+    return std::unique_lock(lock);
+}
+
 }  // namespace
 
 VRXFollowUp::VRXFollowUp() : VRXFollowUp(std::make_shared<VRXDefaultFolllowUpProvider>()) {}
@@ -157,6 +167,7 @@ bool VRXFollowUp::postFollowUpWithDevicesInfo(const DeviceInfoList& deviceInfos)
 }
 
 bool VRXFollowUp::_postFollowUpWithDevicesInfo(const DeviceInfoList& deviceInfos, bool repostAllowed) {
+    const auto lock = onePieceOfWork();
     const std::set<std::string> dismissed = serialNumberHashes(dismissedSerialNumberHashesKey);
     const Duration outreachDelay(
         Platform::current().defaultsStore().number(platform::settings::postUpgradeOutreachDelay));
@@ -178,6 +189,7 @@ bool VRXFollowUp::_postFollowUpWithDevicesInfo(const DeviceInfoList& deviceInfos
 }
 
 void VRXFollowUp::postFollowUpWithDeviceInfo(const SharedDeviceInfo& deviceInfo) {
+    const auto lock = onePieceOfWork();
     const auto record = deviceInfo->warranty();
     const SharedDevice device = deviceInfo->device();
     const std::optional<std::string> serialNumber = device ? device->serialNumber() : std::nullopt;
@@ -207,6 +219,7 @@ DeviceInfoList VRXFollowUp::refreshFollowupWithDeviceInfo(const SharedDeviceInfo
 
 DeviceInfoList VRXFollowUp::refreshFollowupWithDeviceInfos(const DeviceInfoList& deviceInfos,
                                                            bool clearUntrackedDeviceFollowups, bool allowForcePost) {
+    const auto lock = onePieceOfWork();
     std::vector<FollowUpItem> pending = pendingItems(*followUpProvider_);
     const ItemsBySerialNumber items = itemsBySerialNumber(pending);
     RefreshPlan plan = planRefresh(deviceInfos, items, allowForcePost);
@@ -251,6 +264,7 @@ void VRXFollowUp::_clearFollowUpWithDevices(const DeviceList& devices) {
 }
 
 void VRXFollowUp::dismissFollowUpForSerialNumber(const std::string& serialNumber) {
+    const auto lock = onePieceOfWork();
     MaybeError error;
     const bool success = followUpProvider_->clearPendingFollowUpItemsWithUniqueIdentifiers(
         {uniqueIdentfierForSerialNumber(serialNumber)}, &error);
@@ -263,6 +277,7 @@ std::size_t VRXFollowUp::pendingFollowUpCount() {
 }
 
 void VRXFollowUp::migrateLegacyFollowUpIfNeededWithDeviceInfo(const SharedDeviceInfo& deviceInfo) {
+    const auto lock = onePieceOfWork();
     const std::string legacyIdentifier = uniqueIdentfierForSerialNumber(std::nullopt);
     std::vector<FollowUpItem> pending = pendingItems(*followUpProvider_);
     if (pending.size() != 1 || pending.front().uniqueIdentifier != legacyIdentifier) return;

@@ -1,10 +1,15 @@
 #include "vrx/host/host.h"
 
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <filesystem>
 
+#include "vrx/host/base/trust.h"
+#include "vrx/host/bus/hardware_serial.h"
+#include "vrx/host/home/kept_facts.h"
 #include "vrx/host/home/stored_facts.h"
+#include "vrx/platform/log.h"
 
 namespace vrx::host {
 
@@ -14,6 +19,7 @@ using platform::Platform;
 // The platform gets its facilities once all exist. Until then it can only log.
 Host::Host(const HostLocations& locations, platform::Level lowestLevel, const HostLimits& limits)
     : home_(locations.home),
+      systemBus_(locations.systemBus),
       log_(lowestLevel),
       facilities_{.systemLog = &log_},
       platform_(facilities_),
@@ -23,14 +29,15 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel, const Ho
       database_(home_ + "/host.db"),
       defaults_(database_),
       followUps_(database_),
-      profile_(locations.profile),
+      profile_(locations.profile, locations.machineRoot),
       accounts_(profile_, home_, limits.credentialHelper),
       accountSession_(profile_),
       clock_(profile_),
       http_(queues_.workers(platform::Priority::UserInitiated), clock_, profile_, limits.http),
-      conditions_(mainLoop_.event(), profile_),
+      services_(mainLoop_.event(), systemBus_.value_or("")),
+      conditions_(mainLoop_.event(), profile_, services_),
       activities_({.database = database_,
-                   .mainQueue = mainLoop_,
+                   .mainLoop = mainLoop_,
                    .workers = queues_.workers(platform::Priority::Background),
                    .conditions = conditions_,
                    .lifecycle = lifecycle_}),
@@ -38,6 +45,8 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel, const Ho
       purchases_(profile_),
       apps_(profile_),
       strings_(profile_) {
+    defaults_.setPresets([this] { return profile_.defaults(); });
+    lifecycle_.setMainQueue(queues_.weakMainQueue());
     facilities_.accountSession = &accountSession_;
     facilities_.accountStore = &accounts_;
     facilities_.backgroundActivities = &activities_;
@@ -75,27 +84,72 @@ Host::~Host() {
 
 MaybeError Host::open(HomeUse use) {
     if (MaybeError error = createDirectories(home_)) return error;
-    if (use == HomeUse::Agent)
+    if (use == HomeUse::Agent) {
         if (MaybeError error = lock_.take(home_)) return error;
+        struct stat status;
+        if (stat(home_.c_str(), &status) == 0)
+            if (const auto open = findOpenToOthers(home_, status)) log(platform::Level::Error, "%@", open->error.text);
+    }
     profile_.content();  // reports mistakes now, and keeps the content for when an edit is wrong
-    return database_.open();
+    if (const auto missing = use == HomeUse::Agent ? profile_.missingFile() : std::nullopt)
+        log(platform::Level::Error, "The device profile %@ is not there: the machine's own facts hold", *missing);
+    if (MaybeError error = database_.open()) return error;
+    learnKeptFacts(use);
+    return std::nullopt;
 }
 
-// Watches the database's folder for tools' requests and for another database in its place. While there is no database
-// it waits, because somebody may be replacing it.
+// What services have told before holds until they tell something else. The serial number is waited for where nothing
+// else tells it: the start-up needs it, and a device that changes its number is another one to the server.
+void Host::learnKeptFacts(HomeUse use) {
+    constexpr std::chrono::seconds longestWait(5);
+    const std::string machine = profile_.machine().identifier();
+    ToldFacts facts;
+    database_.read([&](Connection& connection) { facts = keptFacts(connection, machine); });
+    const bool isNumbered = facts.serialNumber || profile_.content()->serialNumber || profile_.machine().serialNumber();
+    if (use == HomeUse::Agent && usesSystemBus() && !isNumbered) {
+        facts.serialNumber = askHardwareSerial(*systemBus_, longestWait);
+        if (facts.serialNumber) database_.write([&](Connection& connection) { keepFacts(connection, machine, facts); });
+    }
+    profile_.tell(std::move(facts));
+}
+
+// Watches the home for tools' requests, for another database in its place, and for another agent's lock. While there is
+// no database it waits, because somebody may be replacing it.
 void Host::start(const std::string& agentVersion) {
     sd_event_set_watchdog(mainLoop_.event(), 1);  // if the service manager asks for it
     constexpr platform::Duration pause = std::chrono::milliseconds(5);
     const std::string path = home_ + "/host.db";
-    databaseWatch_ = std::make_unique<FileWatch>(mainLoop_.event(), std::vector{path}, pause, [this, path] {
-        if (access(path.c_str(), F_OK) == 0) activities_.reconsider();
+    const std::vector<std::string> watched{path, home_ + "/lock"};
+    homeWatch_ = std::make_unique<FileWatch>(mainLoop_.event(), watched, pause, [this, path] {
+        if (lock_.isLost(home_)) {
+            log(platform::Level::Error, "The home %@ was taken away from this agent, which begins anew", home_);
+            activities_.abandon();
+            lifecycle_.exitCleanWhenIdle();
+        } else if (access(path.c_str(), F_OK) == 0) {
+            activities_.reconsider();
+        }
     });
-    database_.write([this](Connection& connection) {
-        setStoredFact(connection, stored_facts::profile,
-                      profile_.path().empty() ? "" : std::filesystem::absolute(profile_.path()).string());
-    });
+    std::string layers;
+    for (const std::string& layer : profile_.layers())
+        layers += (layers.empty() ? "" : "\n") + std::filesystem::absolute(layer).string();
+    database_.write([&](Connection& connection) { setStoredFact(connection, stored_facts::profile, layers); });
     activities_.start(agentVersion);
+    if (usesSystemBus()) followServices();
     profileNotifier_.start(mainLoop_.event(), [this] { activities_.reconsider(); });
+}
+
+// Until the services have answered, nobody is told that the language or the watches are others.
+void Host::followServices() {
+    constexpr std::chrono::seconds longestWait(5);
+    services_.followFacts(*profile_.told(), geteuid(), localeIdentifierFromPosix, [this] { takeFacts(); });
+    services_.start();
+    if (services_.hasBus() && !services_.areFactsSettled()) profileNotifier_.holdFor(longestWait);
+}
+
+void Host::takeFacts() {
+    ToldFacts facts = services_.facts();
+    if (facts != *profile_.told()) profile_.tell(std::move(facts));
+    services_.areFactsSettled() ? profileNotifier_.release() : profileNotifier_.factsChanged();
 }
 
 void Host::setServiceListenerFactory(platform::ServiceListenerFactory* factory) {

@@ -9,7 +9,9 @@
 //     host.mainLoop().run();
 #pragma once
 
+#include <optional>
 #include <string>
+#include <vector>
 
 #include "vrx/codec/codec.h"
 #include "vrx/host/account/account_session.h"
@@ -43,8 +45,11 @@
 namespace vrx::host {
 
 struct HostLocations {
-    std::string home;     // absolute, without a slash at its end
-    std::string profile;  // empty for the machine's own facts
+    std::string home;                  // absolute, without a slash at its end
+    std::vector<std::string> profile;  // its layers, as ProfileLayers takes them; none for the machine's own facts
+    // The system bus's address, empty for the usual one. Nothing where the machine's services are not to be asked.
+    std::optional<std::string> systemBus = {};
+    std::string machineRoot = {};  // tests pass another root than "/" for the machine's files
 };
 
 struct HostLimits {
@@ -84,7 +89,13 @@ public:
     Descriptor releaseHomeLock() { return lock_.release(); }
 
 private:
+    bool usesSystemBus() const { return systemBus_ && profile_.content()->usesSystemBus; }
+    void learnKeptFacts(HomeUse use);
+    void followServices();
+    void takeFacts();
+
     const std::string home_;
+    const std::optional<std::string> systemBus_;
     SystemLog log_;
     // The current platform from here on, so that the members below can log during all of their life.
     platform::Platform::Facilities facilities_;
@@ -111,9 +122,10 @@ private:
     TelephonyNetworkInfo telephony_{profile_};
     NotificationCenter notifications_;
     ProfileNotifier profileNotifier_{profile_, database_, notifications_};
+    MachineServices services_;
     MachineConditions conditions_;
     BackgroundActivities activities_;
-    std::unique_ptr<FileWatch> databaseWatch_;
+    std::unique_ptr<FileWatch> homeWatch_;
     Marketplace marketplace_;
     PurchaseHistory purchases_;
     InstalledApps apps_;

@@ -42,9 +42,15 @@ DueTime carriedOver(const DueTime& due, const Moment& now) {
     return carried;
 }
 
+DueTime takenUp(const DueTime& due, const DueTime& earlier, const Moment& now) {
+    DueTime bound = due;
+    bound.isCarriedOver = earlier.isCarriedOver || earlier.boot != now.boot;
+    return bound;
+}
+
 DueTime dueTime(const ActivityCriteria& criteria, Duration interval, const Moment& now) {
     const Duration wait = Duration(static_cast<double>(std::max<std::int64_t>(criteria.delay, 0))) + firingMargin;
-    return dueAfter(std::max(wait, interval), now);
+    return dueAfter(criteria.delay > 0 ? wait : std::max(wait, interval), now);
 }
 
 Duration retryDelay(int deferrals) {
@@ -65,7 +71,7 @@ FiringDecision decideFiring(const DueTime& due, const ActivityCriteria& criteria
     // The grace period is used only while the system asks for deferral.
     const Duration spent = due.boot == now.boot ? now.sinceBoot - due.sinceBoot : none;
     const Duration grace(static_cast<double>(criteria.gracePeriod));
-    if (shouldDefer && spent < grace) return {.askAgainIn = grace - spent};
+    if (shouldDefer && spent < grace) return {.askAgainIn = grace - spent, .isHeldBack = true};
     return {.isFired = true};
 }
 

@@ -25,7 +25,7 @@ struct DueTime {
     Duration sinceBoot{};
     Date wall{};
     Duration wait{};             // the whole delay; no more than that can be left
-    bool isCarriedOver = false;  // it was registered in an earlier boot
+    bool isCarriedOver = false;  // it was registered in an earlier boot, or in the place of such a one
 
     bool operator==(const DueTime&) const = default;
 };
@@ -39,13 +39,18 @@ DueTime noSoonerThan(const DueTime& due, Duration wait, const Moment& now);
 // set: a device may start with a wrong clock and learn the time later, which can bring the due time nearer.
 DueTime carriedOver(const DueTime& due, const Moment& now);
 
+// The due time of what the boot activity registers anew. What was registered in an earlier boot stays bound to the wall
+// clock, which may be wrong at the boot.
+DueTime takenUp(const DueTime& due, const DueTime& earlier, const Moment& now);
+
 // Delays are truncated to whole seconds. An activity fires this much later, so that it is never early.
 inline constexpr Duration firingMargin{1.0};
-// The least time between a run of an activity and the next run that it registers itself. An activity that keeps asking
-// for no delay costs a run now and then instead of a whole processor.
+// The least time between a run of an activity and the next run that it registers itself with no delay. An activity that
+// keeps asking for none costs a run now and then instead of a whole processor.
 inline constexpr Duration minimumInterval{15.0 * 60};
 
-// When a registration falls due. The interval is minimumInterval if a run of the activity itself registers it, else 0.
+// When a registration falls due. The interval is minimumInterval if a run of the activity itself registers it, else 0;
+// it counts for a registration with no delay only.
 DueTime dueTime(const ActivityCriteria& criteria, Duration interval, const Moment& now);
 
 // The time from a deferred result to the next attempt, by the number of deferred results in a row: a second at first,
@@ -61,6 +66,7 @@ struct FiringDecision {
     bool isFired = false;
     std::optional<Duration> askAgainIn{};  // null when it fires, and while it waits for the network alone
     bool isWaitingForNetwork = false;
+    bool isHeldBack = false;  // by the system's asking for deferral
 };
 FiringDecision decideFiring(const DueTime& due, const ActivityCriteria& criteria, const Moment& now,
                             bool isNetworkAvailable, bool shouldDefer);

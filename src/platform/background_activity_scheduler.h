@@ -46,8 +46,9 @@ struct ActivityRegistration {
     bool repeats = false;
     QualityOfService qualityOfService = QualityOfService::Default;
     std::optional<ActivityCriteria> criteria{};
-    // A run of the activity registers it for its next run. The next run then comes no sooner than minimumInterval
-    // (activity_timing.h) after this one, so that a rule which keeps answering "at once" does not become a busy loop.
+    // A run of the activity registers it for its next run. With no delay the next run comes no sooner than
+    // minimumInterval (activity_timing.h) after this one, so that a rule which keeps answering "at once" does not
+    // become a busy loop.
     bool isByOwnRun = false;
 };
 

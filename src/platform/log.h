@@ -2,15 +2,18 @@
 //     log(Level::Default, "%{private}@ : warranty download attempt (%d/%d)", serialNumber, 0, 2);
 // Placeholders: %@ any describable value, %{private}@ the same, redacted by the sink, %s an operation's full name, %d a
 // flag or a 32-bit integer, %ld a signed and %lu an unsigned 64-bit integer, %.02f seconds. A format that does not fit
-// its arguments does not compile. Any thread may log.
+// its arguments does not compile. An argument's description is brief: what is beyond limits::logArgumentBytes is left
+// out. Any thread may log.
 #pragma once
 
+#include <algorithm>
 #include <optional>
 #include <string>
 #include <string_view>
 #include <type_traits>
 #include <vector>
 
+#include "vrx/platform/limits.h"
 #include "vrx/platform/text.h"
 
 namespace vrx::platform {
@@ -121,6 +124,12 @@ constexpr void checkFormat(std::string_view format) {
 
 std::string roundedSeconds(Duration duration);
 
+// What is put together from brief parts can be too long again. The words about what is left out may stay.
+inline std::string cutToLimit(std::string text) {
+    constexpr std::size_t leftOut = 64;
+    return text.size() - std::min(text.size(), leftOut) > BriefDescriptions::limit() ? describe(text) : text;
+}
+
 template <class T>
 std::string argumentText(const T& value) {
     if constexpr (std::is_integral_v<T>)
@@ -128,13 +137,13 @@ std::string argumentText(const T& value) {
     else if constexpr (std::is_same_v<T, Duration>)
         return roundedSeconds(value);
     else
-        return describe(value);
+        return cutToLimit(describe(value));
 }
 
 template <class T>
 LogArgument argument(Kind kind, const T& value) {
     if (kind == Kind::Private) return {argumentText(value), std::string(redactedMark)};
-    if constexpr (std::is_same_v<T, RedactableText>) return {value.text, value.redacted};
+    if constexpr (std::is_same_v<T, RedactableText>) return {describe(value.text), describe(value.redacted)};
     return {argumentText(value)};
 }
 
@@ -157,6 +166,7 @@ void log(Level level, std::type_identity_t<LogFormat<std::decay_t<Args>...>> for
     if (!sink.isOn(level)) return;
     LogEntry entry{level, format.text, {}, format.file, format.line};
     entry.arguments.reserve(sizeof...(args));
+    const BriefDescriptions brief(limits::logArgumentBytes);
     [[maybe_unused]] std::size_t position = 0;
     [[maybe_unused]] auto add = [&](const auto& value) {
         log_detail::Placeholder placeholder = log_detail::nextPlaceholder(format.text, position);

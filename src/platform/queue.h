@@ -3,6 +3,7 @@
 
 #include <memory>
 #include <string>
+#include <utility>
 
 #include "vrx/platform/date.h"
 #include "vrx/platform/task.h"
@@ -17,6 +18,10 @@ public:
     virtual void post(Task task) = 0;
     // Runs the task no earlier than the delay from now; a delay of 0 or less is post().
     virtual void postAfter(Duration delay, Task task) = 0;
+    // The same for a task that does nothing once the owner is gone: then the queue need not wake up for it.
+    virtual void postAfterWhile(std::weak_ptr<const void> /*owner*/, Duration delay, Task task) {
+        postAfter(delay, std::move(task));
+    }
 };
 
 // A flag that threads can wait for; once set it stays set.

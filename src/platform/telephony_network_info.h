@@ -11,6 +11,7 @@ struct Carrier {
     std::optional<std::string> mobileCountryCode{};
     std::optional<std::string> mobileNetworkCode{};
 
+    bool operator==(const Carrier&) const = default;
     std::string description() const {
         return "carrier " + mobileCountryCode.value_or("(null)") + " " + mobileNetworkCode.value_or("(null)");
     }

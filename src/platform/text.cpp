@@ -7,6 +7,17 @@
 
 namespace vrx::platform {
 
+std::string describe(std::string_view text) {
+    std::size_t end = BriefDescriptions::limit();
+    if (text.size() <= end) return std::string(text);
+    while (end > 0 && (static_cast<unsigned char>(text[end]) & 0xC0) == 0x80) --end;  // not within a character
+    return std::string(text.substr(0, end)) + describeLeftOut(text.size() - end, "bytes");
+}
+
+std::string describeLeftOut(std::size_t count, const char* ofWhat) {
+    return "... (" + std::to_string(count) + " more " + ofWhat + ")";
+}
+
 std::string describe(std::int64_t number) {
     return std::to_string(number);
 }

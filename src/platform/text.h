@@ -11,6 +11,7 @@
 #include <set>
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 #include "vrx/platform/date.h"
@@ -21,14 +22,29 @@ inline std::string describeNothing() {
     return "(null)";
 }
 
-inline std::string describe(std::string_view text) {
-    return std::string(text);
-}
+// While one is alive, the descriptions that are made on its thread stop after about so many bytes, and say how much
+// they leave out.
+class BriefDescriptions {
+public:
+    explicit BriefDescriptions(std::size_t bytes) : previous_(std::exchange(limit_, bytes)) {}
+    ~BriefDescriptions() { limit_ = previous_; }
+    BriefDescriptions(const BriefDescriptions&) = delete;
+    BriefDescriptions& operator=(const BriefDescriptions&) = delete;
+
+    static std::size_t limit() { return limit_; }
+
+private:
+    static inline thread_local std::size_t limit_ = std::string::npos;
+    const std::size_t previous_;
+};
+
+// The text, or its beginning while descriptions are brief.
+std::string describe(std::string_view text);
 inline std::string describe(const char* text) {
-    return text ? std::string(text) : describeNothing();
+    return text ? describe(std::string_view(text)) : describeNothing();
 }
 inline std::string describe(const std::string& text) {
-    return text;
+    return describe(std::string_view(text));
 }
 std::string describe(std::int64_t number);
 std::string describe(double number);
@@ -63,15 +79,23 @@ std::string describe(const std::optional<T>& value) {
     return value ? describe(*value) : describeNothing();
 }
 
+std::string describeLeftOut(std::size_t count, const char* ofWhat);
+
+template <class List, class Describe>
+std::string describeEach(const List& list, const char* separator, Describe describeElement) {
+    std::string text;
+    std::size_t count = 0;
+    for (const auto& element : list) {
+        if (text.size() >= BriefDescriptions::limit()) return text + describeLeftOut(list.size() - count, "elements");
+        if (count++ > 0) text += separator;
+        text += describeElement(element);
+    }
+    return text;
+}
+
 template <class List>
 std::string describeList(const List& list, const char* opening, const char* closing) {
-    std::string text = opening;
-    const char* separator = "";
-    for (const auto& element : list) {
-        text += separator + describe(element);
-        separator = ", ";
-    }
-    return text + closing;
+    return opening + describeEach(list, ", ", [](const auto& element) { return describe(element); }) + closing;
 }
 
 template <class T>
@@ -86,13 +110,10 @@ std::string describe(const std::set<T, Compare>& set) {
 
 template <class K, class T, class Compare>
 std::string describe(const std::map<K, T, Compare>& dictionary) {
-    std::string text = "{";
-    const char* separator = "";
-    for (const auto& [key, value] : dictionary) {
-        text += separator + describe(key) + " = " + describe(value) + ";";
-        separator = " ";
-    }
-    return text + "}";
+    const auto describeEntry = [](const auto& entry) {
+        return describe(entry.first) + " = " + describe(entry.second) + ";";
+    };
+    return "{" + describeEach(dictionary, " ", describeEntry) + "}";
 }
 
 // The format with each "%@" replaced by the next text; a placeholder without a text stays.

@@ -17,12 +17,12 @@ void RepeatingTimer::invalidate() {
     released.swap(fire_);
 }
 
-// A queue cannot take a delayed task back, so a released timer leaves an empty task behind. A long interval is waited
-// for in steps of at most a day, so that such tasks do not pile up.
+// A released timer can leave an empty task behind. A long interval is waited for in steps of at most a day, so that
+// such tasks do not pile up.
 void RepeatingTimer::wait(Duration left) {
     constexpr Duration longestStep{86400.0};
     const Duration step = std::min(left, longestStep);
-    queue_.postAfter(step, [timer = weak_from_this(), left = left - step] {
+    queue_.postAfterWhile(weak_from_this(), step, [timer = weak_from_this(), left = left - step] {
         auto self = timer.lock();
         if (!self) return;
         left > Duration(0) ? self->wait(left) : self->fire();

@@ -103,7 +103,7 @@ std::string Value::description() const {
         case Type::Integer: return describe(std::get<std::int64_t>(content_));
         case Type::Double: return describe(std::get<double>(content_));
         case Type::Date: return describe(std::get<platform::Date>(content_));
-        case Type::String: return *asString();
+        case Type::String: return describe(*asString());
         case Type::Data: return "<" + std::to_string(asData()->size()) + " bytes>";
         case Type::Array: return describe(*asArray());
         case Type::Dictionary: return describe(*asDictionary());

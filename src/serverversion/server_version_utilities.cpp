@@ -54,13 +54,13 @@ void storeServerVersionCache(const Value& dictionary) {
 
 // A version in a version dictionary: a number as it is, a string by the integer that it begins with. Null when it is
 // missing or of another type.
-std::optional<double> versionFrom(const Value& dictionary, std::string_view key) {
+Value versionFrom(const Value& dictionary, std::string_view key) {
     const Value& value = dictionary[key];
-    if (const std::string* text = value.asString()) return static_cast<double>(platform::leadingInteger(*text));
+    if (const std::string* text = value.asString()) return platform::leadingInteger(*text);
     // NaN has no place in an ordered set and counts as missing.
-    if (auto number = value.asNumber(); number && !std::isnan(*number)) return number;
+    if (auto number = value.asNumber(); number && !std::isnan(*number)) return value;
     log(Level::Error, "Server version dictionary missing key '%@'", key);
-    return std::nullopt;
+    return nullptr;
 }
 
 // The versions that the client shares with a server of the given version dictionary.
@@ -74,17 +74,18 @@ std::optional<VersionSet> versionsSharedWith(const Value& server) {
         log(Level::Error, "Incorrect serverDictionary format");
         return std::nullopt;
     }
-    std::optional<double> low = versionFrom(server, settings::lowServerVersion);
-    if (!low) return std::nullopt;
-    std::optional<double> high = versionFrom(server, settings::highServerVersion);
-    if (!high) return std::nullopt;
-    VersionSet serverSet{*low, *high};
+    const Value low = versionFrom(server, settings::lowServerVersion);
+    if (low.isNull()) return std::nullopt;
+    const Value high = versionFrom(server, settings::highServerVersion);
+    if (high.isNull()) return std::nullopt;
+    VersionSet serverSet{low, high};
     log(Level::Default, "Server versions '%@'", serverSet);
-    VersionSet clientSet{static_cast<double>(defaults().integer(settings::lowServerVersion)),
-                         static_cast<double>(defaults().integer(settings::highServerVersion))};
+    VersionSet clientSet{defaults().integer(settings::lowServerVersion),
+                         defaults().integer(settings::highServerVersion)};
     log(Level::Default, "Client versions '%@'", clientSet);
     VersionSet shared;
-    std::ranges::set_intersection(clientSet, serverSet, std::inserter(shared, shared.end()));
+    std::ranges::set_intersection(clientSet, serverSet, std::inserter(shared, shared.end()),
+                                  VRXServerVersionUtilities::NumericOrder());
     log(Level::Default, "clientAndServerSet '%@'", shared);
     return shared;
 }
@@ -103,7 +104,26 @@ Value rootOfDocument(const std::string& url, const HttpResponse& response) {
     return *root;
 }
 
+// Whether the integer is less than the double.
+bool isLess(std::int64_t integer, double number) {
+    constexpr double end = 9223372036854775808.0;  // 2^63
+    if (number >= end || number < -end) return number > 0;
+    const auto whole = static_cast<std::int64_t>(number);
+    return integer < whole || (integer == whole && number > static_cast<double>(whole));
+}
+
 }  // namespace
+
+bool VRXServerVersionUtilities::NumericOrder::operator()(const Value& one, const Value& other) const {
+    const auto oneInteger = one.asInteger();
+    const auto otherInteger = other.asInteger();
+    if (oneInteger && otherInteger) return *oneInteger < *otherInteger;
+    const double oneNumber = one.asNumber().value_or(0);
+    const double otherNumber = other.asNumber().value_or(0);
+    if (oneInteger) return isLess(*oneInteger, otherNumber);
+    if (otherInteger) return one != other && !isLess(*otherInteger, oneNumber);
+    return oneNumber < otherNumber;
+}
 
 void VRXServerVersionUtilities::_dictionaryFromURL(std::string url, bool shouldRetry, Completion<Value> completion) {
     auto& sessions = Platform::current().httpSessions();
@@ -177,8 +197,7 @@ void VRXServerVersionUtilities::serverVersionSupported(Completion<bool> completi
 void VRXServerVersionUtilities::isHighServerVersionFeaturesetEnabled(VRXServerLookupPolicy policy,
                                                                      Completion<bool> completion) {
     auto answer = [completion = std::move(completion)](const std::optional<VersionSet>& shared) mutable {
-        auto high = static_cast<double>(defaults().integer(settings::highServerVersion));
-        const bool isEnabled = shared && shared->contains(high);
+        const bool isEnabled = shared && shared->contains(defaults().integer(settings::highServerVersion));
         log(Level::Default, "High Server version supported - %@", isEnabled ? "YES" : "NO");
         completion(isEnabled);
     };

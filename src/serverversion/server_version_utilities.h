@@ -26,8 +26,12 @@ inline constexpr std::string_view serverVersionCacheKey = "ServerVersionCache";
 
 class VRXServerVersionUtilities {
 public:
+    // Numbers by their exact value: as doubles, large integers would not all be told apart.
+    struct NumericOrder {
+        bool operator()(const platform::Value& one, const platform::Value& other) const;
+    };
     // At most two versions, the low and the high one; the versions between them are not members.
-    using VersionSet = std::set<double>;
+    using VersionSet = std::set<platform::Value, NumericOrder>;
     template <class T>
     using Completion = platform::OnceCallback<T>;
 

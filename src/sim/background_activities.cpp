@@ -30,8 +30,11 @@ void BackgroundActivities::schedule(const platform::ActivityRegistration& regist
     if (!registration.isPreregistered) {
         ActivityCriteria criteria = registration.criteria.value_or(ActivityCriteria());
         Duration interval = registration.isByOwnRun ? platform::minimumInterval : atOnce;
-        attachment.isRegisteredByOwnRun = registration.isByOwnRun;
-        addRow(registration.identifier, criteria, platform::dueTime(criteria, interval, now()));
+        attachment.isRegisteredByOwnRun = registration.isByOwnRun && criteria.delay <= 0;
+        platform::DueTime due = platform::dueTime(criteria, interval, now());
+        const auto earlier = rows_.find(registration.identifier);
+        if (earlier != rows_.end() && isAfterBoot()) due = platform::takenUp(due, earlier->second.due, now());
+        addRow(registration.identifier, criteria, std::move(due));
     }
     considerLater(registration.identifier, atOnce);
 }
@@ -51,7 +54,20 @@ void BackgroundActivities::setShouldDefer(bool shouldDefer) {
     considerAll();
 }
 
+void BackgroundActivities::setNetworkMetered(bool isNetworkMetered) {
+    isNetworkMetered_ = isNetworkMetered;
+    considerAll();
+}
+
+bool BackgroundActivities::shouldDefer(std::string_view identifier) const {
+    const auto running = attachments_.find(identifier);
+    return shouldDefer_ || (isNetworkMetered_ && running != attachments_.end() && running->second.doesRunNeedNetwork);
+}
+
 void BackgroundActivities::processStarted(const std::string& agentVersion) {
+    for (auto& [identifier, row] : rows_)
+        if (std::exchange(row.isInterrupted, false))
+            row.due = platform::dueAfter(platform::retryDelay(++row.deferrals), now());
     const auto due = platform::dueAfter(atOnce, now());
     if (std::exchange(lastVersion_, agentVersion) != agentVersion)
         addRow(platform::vendorIdentifier(platform::upgradeActivityRemainder), {}, due);
@@ -63,6 +79,10 @@ void BackgroundActivities::processStarted(const std::string& agentVersion) {
 void BackgroundActivities::processEnded() {
     platform::ShutdownScope shutdown;
     factory_ = nullptr;
+    for (auto& [identifier, row] : rows_) {
+        const auto attachment = attachments_.find(identifier);
+        row.isInterrupted = attachment != attachments_.end() && attachment->second.runningGeneration == row.generation;
+    }
     attachments_.clear();
 }
 
@@ -98,6 +118,12 @@ void BackgroundActivities::considerLater(const std::string& identifier, Duration
     lane_->postAfter(delay, [this, identifier] { consider(identifier); });
 }
 
+// Whether the boot activity is under way.
+bool BackgroundActivities::isAfterBoot() const {
+    const auto boot = attachments_.find(platform::vendorIdentifier(platform::bootActivityRemainder));
+    return boot != attachments_.end() && boot->second.runningGeneration.has_value();
+}
+
 // Whether an activity has to wait until the boot activity has taken up what was scheduled before the boot.
 bool BackgroundActivities::isHeldForBoot(const std::string& identifier) {
     const std::string boot = platform::vendorIdentifier(platform::bootActivityRemainder);
@@ -109,8 +135,9 @@ void BackgroundActivities::consider(const std::string& identifier) {
     auto row = rows_.find(identifier);
     if (row == rows_.end() || attachments_[identifier].runningGeneration || isHeldForBoot(identifier)) return;
     row->second.due = platform::carriedOver(row->second.due, now());  // the wall clock may have been set
+    const bool doesDefer = shouldDefer_ || (isNetworkMetered_ && row->second.criteria.requiresNetwork);
     auto decision =
-        platform::decideFiring(row->second.due, row->second.criteria, now(), isNetworkAvailable_, shouldDefer_);
+        platform::decideFiring(row->second.due, row->second.criteria, now(), isNetworkAvailable_, doesDefer);
     if (decision.isFired)
         fire(identifier, row->second.generation);
     else if (decision.askAgainIn)
@@ -122,6 +149,7 @@ void BackgroundActivities::fire(const std::string& identifier, int generation) {
     if (!attachment.handler && factory_) attachment.handler = factory_(identifier);
     if (!attachment.handler) return;  // waits until a process attaches a handler
     attachment.runningGeneration = generation;
+    attachment.doesRunNeedNetwork = rows_.at(identifier).criteria.requiresNetwork;
     firings_.push_back({identifier, clock_.now()});
     ActivityHandler handler = attachment.handler;  // another handler may take its place during the run
     handler([this, identifier](BackgroundActivityResult result) { takeResult(identifier, result); });

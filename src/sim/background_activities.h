@@ -27,7 +27,7 @@ public:
     BackgroundActivities(const Clock& clock, Queues& queues) : clock_(clock), queues_(queues) {}
 
     void schedule(const platform::ActivityRegistration& registration, platform::ActivityHandler handler) override;
-    bool shouldDefer(std::string_view /*identifier*/) const override { return shouldDefer_; }
+    bool shouldDefer(std::string_view identifier) const override;
     void setHandlerFactory(std::function<platform::ActivityHandler(const std::string& identifier)> factory) override {
         factory_ = std::move(factory);
     }
@@ -35,11 +35,13 @@ public:
     // The state of the device.
     void setNetworkAvailable(bool isNetworkAvailable);
     void setShouldDefer(bool shouldDefer);
+    // What needs the network then defers.
+    void setNetworkMetered(bool isNetworkMetered);
     void wallClockWasSet() { considerAll(); }
 
     // What happens to the process. Its life begins with the first start.
     void processStarted(const std::string& agentVersion);
-    // Drops the handlers and the runs. A run that was under way begins anew in the next process.
+    // Drops the handlers and the runs. The next process begins a run that was under way anew, as after a deferral.
     void processEnded();
     void booted();
 
@@ -63,17 +65,20 @@ private:
         platform::ActivityCriteria criteria{};
         platform::DueTime due{};
         int generation = 0;
-        int deferrals = 0;  // in a row
+        int deferrals = 0;  // deferred or interrupted runs in a row
+        bool isInterrupted = false;
     };
     // In memory.
     struct Attachment {
         platform::ActivityHandler handler;
         std::optional<int> runningGeneration;  // null without a run under way
-        bool isRegisteredByOwnRun = false;     // by the run that is under way
+        bool doesRunNeedNetwork = false;
+        bool isRegisteredByOwnRun = false;  // by the run that is under way
     };
 
     platform::Moment now() const;
     void addRow(const std::string& identifier, const platform::ActivityCriteria& criteria, platform::DueTime due);
+    bool isAfterBoot() const;
     bool isHeldForBoot(const std::string& identifier);
     void considerAll();
     void considerLater(const std::string& identifier, platform::Duration delay);
@@ -94,6 +99,7 @@ private:
     std::function<platform::ActivityHandler(const std::string& identifier)> factory_;
     bool isNetworkAvailable_ = true;
     bool shouldDefer_ = false;
+    bool isNetworkMetered_ = false;
     std::vector<Firing> firings_;
 };
 

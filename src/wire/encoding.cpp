@@ -311,6 +311,17 @@ int appendReply(sd_bus_message* message, const Value& root) {
     return writer.dictionary([&] { return isLeftOut(root) ? 0 : writer.entry(rootKey, root, replyDepth); });
 }
 
+std::size_t encodedBytes(const Value& value) {
+    constexpr std::size_t overhead = 16;  // of types, lengths and alignment
+    std::size_t bytes = overhead;
+    if (const std::string* text = value.asString()) bytes += text->size();
+    if (const Array* array = value.asArray())
+        for (const Value& element : *array) bytes += encodedBytes(element);
+    if (const Dictionary* dictionary = value.asDictionary())
+        for (const auto& [key, element] : *dictionary) bytes += overhead + key.size() + encodedBytes(element);
+    return bytes;
+}
+
 Result<Value> readReply(sd_bus_message* message) {
     try {
         return Reader(message).reply();

@@ -27,6 +27,9 @@ inline constexpr int replyDepth = platform::limits::documentDepth + 3;
 // nested deeper than replyDepth (-ELOOP) or memory is short; the message is then useless.
 int appendReply(sd_bus_message* message, const platform::Value& root);
 
+// About how many bytes a value takes in a message.
+std::size_t encodedBytes(const platform::Value& value);
+
 // The root of a reply, or null when it is absent. Anything that the encoding does not produce, or that exceeds the
 // limits of a document, is an error.
 platform::Result<platform::Value> readReply(sd_bus_message* message);

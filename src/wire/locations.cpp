@@ -39,13 +39,18 @@ Location findHome(const LocationOverrides& overrides, const Surroundings& surrou
     return {userHome(surroundings) + "/.local/state/" + folderName, "the user's home"};
 }
 
-Location findProfile(const LocationOverrides& overrides, const Surroundings& surroundings) {
-    if (overrides.profile) return {*overrides.profile, "--device"};
-    const std::string file = std::string("/") + folderName + "/device.toml";
-    if (auto config = absoluteVariable(surroundings, "XDG_CONFIG_HOME"))
-        if (surroundings.exists(*config + file)) return {*config + file, "$XDG_CONFIG_HOME"};
-    if (surroundings.exists("/etc" + file)) return {"/etc" + file, "the system's settings"};
-    return {"", "no profile: the machine itself"};
+std::vector<std::string> findProfile(const LocationOverrides& overrides, const Surroundings& surroundings) {
+    if (overrides.profile)
+        return overrides.profile->empty() ? std::vector<std::string>() : std::vector{*overrides.profile};
+    std::vector<std::string> layers{std::string("/usr/lib/") + folderName + "/device.d/"};
+    const auto addFolder = [&](const std::string& parent) {
+        layers.push_back(parent + "/" + folderName + "/device.toml");
+        layers.push_back(parent + "/" + folderName + "/device.d/");
+    };
+    addFolder("/etc");
+    layers.push_back(std::string(systemFolder) + "/device.d/");
+    if (auto config = absoluteVariable(surroundings, "XDG_CONFIG_HOME")) addFolder(*config);
+    return layers;
 }
 
 Location findSocket(const LocationOverrides& overrides, const Surroundings& surroundings, const Location& home) {

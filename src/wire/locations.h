@@ -5,6 +5,7 @@
 #include <functional>
 #include <optional>
 #include <string>
+#include <vector>
 
 namespace vrx::wire {
 
@@ -22,7 +23,9 @@ struct Location {
 
 struct Locations {
     Location home;
-    Location profile;  // the path is empty when there is none: the machine's own facts then hold
+    // The layers of the device profile, the lowest first: files, and folders of *.toml files, whose paths end in "/".
+    // None need exist. The machine's own facts hold where they say nothing.
+    std::vector<std::string> profile;
     Location socket;
 };
 
@@ -35,8 +38,8 @@ struct Surroundings {
 };
 
 //     home     --home, else $STATE_DIRECTORY, else $XDG_STATE_HOME/vrxagent, else ~/.local/state/vrxagent
-//     profile  --device, else the first that exists of $XDG_CONFIG_HOME/vrxagent/device.toml and
-//              /etc/vrxagent/device.toml, else none
+//     profile  --device alone, else /usr/lib/vrxagent/device.d/, /etc/vrxagent/device.toml, /etc/vrxagent/device.d/,
+//              /run/vrxagent/device.d/ and, of a user, $XDG_CONFIG_HOME/vrxagent/device.toml and device.d/ beside it
 //     socket   --socket, else in $XDG_RUNTIME_DIR, else in /run/vrxagent if that exists, else in the home
 //
 // A variable that is empty or not an absolute path counts as not set. Overrides are taken as they are.

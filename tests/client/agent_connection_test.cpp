@@ -1,8 +1,5 @@
 #include "vrx/client/agent_connection.h"
 
-#include <gmock/gmock.h>
-#include <gtest/gtest.h>
-
 #include <atomic>
 #include <barrier>
 
@@ -14,19 +11,16 @@ namespace {
 
 using client::AgentConnection;
 using client::Failure;
-using testing::ElementsAre;
-using testing::HasSubstr;
 
 using AgentConnectionTest = WithFakeAgent;
 
 TEST_F(AgentConnectionTest, AsksEveryOperationAndWaits) {
-    agent->record = platform::Dictionary{
-        {"covered", true}, {"", "empty key"}, {"$class", "VRXDevice"}, {"$$", platform::Dictionary{{"$date", 5}}}};
+    agent->record =
+        Dictionary{{"covered", true}, {"", "empty key"}, {"$class", "VRXDevice"}, {"$$", Dictionary{{"$date", 5}}}};
     AgentConnection connection(options());
 
     EXPECT_TRUE(*connection.scheduleOutreachWithReply());
-    EXPECT_EQ(*connection.checkIsAvailableInStore("com.example"),
-              Value(platform::Dictionary{{"price", 0.5}, {"$id", 7}}));
+    EXPECT_EQ(*connection.checkIsAvailableInStore("com.example"), Value(Dictionary{{"price", 0.5}, {"$id", 7}}));
     EXPECT_TRUE(connection.appSupportAvailability("com.example")->isNull());
     EXPECT_EQ(*connection.readWebURLOverride(), "https://web.example");
     auto device = *connection.defaultDevice();
@@ -76,12 +70,12 @@ TEST_F(AgentConnectionTest, TellsWhyThereIsNoAnswer) {
     AgentConnection connection(options());
     EXPECT_EQ(connection.checkIsAvailableInStore("x").failure().kind, Failure::Kind::BadReply);
     EXPECT_EQ(connection.dismissFollowUpForSerialNumber(std::string("S\0N", 3)).failure().kind, Failure::Kind::Refused);
-    auto tooLong = connection.dismissFollowUpForSerialNumber(std::string(1 << 20, 'x'));
+    auto tooLong = connection.dismissFollowUpForSerialNumber(std::string(1 << 13, 'x'));
     EXPECT_EQ(tooLong.failure().kind, Failure::Kind::Refused);
     EXPECT_EQ(tooLong.failure().refusal, Failure::Refusal::Argument);
     EXPECT_THAT(tooLong.failure().text, HasSubstr("longer than 1024"));
 
-    AgentConnection hasty({.socketPath = service->socketPath(), .timeLimit = platform::Duration(0.05)});
+    AgentConnection hasty({.socketPath = service->socketPath(), .timeLimit = Duration(0.05)});
     EXPECT_EQ(hasty.scheduleOutreachWithReply().failure().kind, Failure::Kind::TimedOut);
     awaitHeld();
     answerHeld();  // late, and for nobody
@@ -93,7 +87,7 @@ TEST_F(AgentConnectionTest, TellsWhyThereIsNoAnswer) {
     ASSERT_FALSE(full.open(folder / "socket"));
     ASSERT_EQ(listen(full.number(), 0), 0);
     const RawClient first(folder / "socket");
-    AgentConnection late({.socketPath = folder / "socket", .timeLimit = platform::Duration(0.05)});
+    AgentConnection late({.socketPath = folder / "socket", .timeLimit = Duration(0.05)});
     const Failure failure = late.scheduleOutreachWithReply().failure();
     EXPECT_EQ(failure.kind, Failure::Kind::TimedOut);
     EXPECT_THAT(failure.text, HasSubstr("timed out"));
@@ -221,7 +215,7 @@ TEST_F(AgentConnectionTest, GivesRecordsTheirDerivedTextsWithoutAPlatform) {
     const double inThreeDays =
         std::chrono::duration<double>(std::chrono::system_clock::now().time_since_epoch()).count() + 2.5 * 86400;
     auto record = VRXWarranty::initWithDictionary(
-        platform::Dictionary{{"qxOfferEligibleUntil", inThreeDays}, {"qxLocalizedOfferPluralDescFormat", "%@ days"}});
+        Dictionary{{"qxOfferEligibleUntil", inThreeDays}, {"qxLocalizedOfferPluralDescFormat", "%@ days"}});
     EXPECT_EQ(record->daysEligible(), 3u);
     EXPECT_EQ(record->qxLocalizedOfferDesc(), Value("3 days"));
     platform::Platform::setCurrent(before);

@@ -2,8 +2,7 @@
 // and entitles callers as the test says.
 #pragma once
 
-#include <gtest/gtest.h>
-
+#include <algorithm>
 #include <atomic>
 #include <mutex>
 #include <optional>
@@ -41,6 +40,9 @@ public:
     ~FakeService() override { stop(); }
 
     std::string socketPath() const { return folder_ / "socket"; }
+    long logged(std::string_view text) const {
+        return std::ranges::count_if(log_.lines(), [=](const auto& line) { return line.find(text) != line.npos; });
+    }
 
     void start(const host::ServiceLimits& limits = {}) {
         Signal isReady;
@@ -56,6 +58,7 @@ public:
             isReady.set();
             loop.run();
             while (lifecycle_->isEnding()) {  // and the next process takes over the socket
+                if (onEnding) onEnding();
                 listener_.reset();
                 lifecycle_.emplace(loop);
                 listen(factory);
@@ -91,6 +94,7 @@ public:
     void exitCleanWhenIdle() {
         loop_->post([this] { lifecycle_->exitCleanWhenIdle(); });
     }
+    std::function<void()> onEnding;  // on the service's thread, which still has its connections
     int ends() const { return ends_; }
     void waitForEnd(int number) const {
         eventually([&] { return ends_ >= number; }, "the agent's end");

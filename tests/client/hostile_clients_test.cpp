@@ -1,5 +1,6 @@
 // Clients that err or mean harm: each is dealt with alone, and the agent goes on serving others.
-#include <gtest/gtest.h>
+#include <poll.h>
+#include <sys/resource.h>
 
 #include "client/fake_service.h"
 #include "client/raw_client.h"
@@ -53,12 +54,60 @@ TEST_F(HostileClients, NeverSpeak) {
     EXPECT_TRUE(rawClient().isClosedByAgent());
 }
 
-TEST_F(HostileClients, SendAStringOfAMebibyte) {
-    const std::string text(1 << 20, 'x');
-    RawClient client = rawClient(RawClient::authentication() + RawClient::call("checkIsAvailableInStore", 1, &text));
+TEST_F(HostileClients, SendLongStrings) {
+    const std::string longer(1025, 'x'), tooLong(16 * 1024, 'x');
+    RawClient client = rawClient(RawClient::authentication() + RawClient::call("checkIsAvailableInStore", 1, &longer));
     EXPECT_TRUE(client.readUntil("InvalidArgs"));
     client.write(RawClient::call("defaultDevice", 2));
     EXPECT_TRUE(client.readUntil("Phone")) << "the connection stays";
+    client = rawClient(RawClient::authentication() + RawClient::call("checkIsAvailableInStore", 1, &tooLong));
+    EXPECT_TRUE(client.isClosedByAgent()) << "although it came together with the authentication";
+    EXPECT_EQ(agent->requests().size(), 1u);
+}
+
+TEST_F(HostileClients, SendABodyThatDoesNotHoldTheArguments) {
+    const std::string text("\4\0\0\0text\0", 9), policy("\1\0\0\0\0\0\0\0", 8), yes("\1\0\0\0", 4);
+    struct {
+        const char* member;
+        const char* signature;
+        std::string body;
+    } cases[] = {{"dismissFollowUpForSerialNumber", "s", std::string("\x64\0\0\0text", 8)},  // a hundred bytes follow
+                 {"dismissFollowUpForSerialNumber", "s", text + "left"},
+                 {"defaultDevice", "", "left"},
+                 {"getAllDeviceInfosUsingPolicy", "tb", policy + std::string("\2\0\0\0", 4)},
+                 {"getAllDeviceInfosUsingPolicy", "tb", policy + std::string("\0\0\0\1", 4)},
+                 {"getAllDeviceInfosUsingPolicy", "tb", policy + yes + "left"}};
+    for (const auto& [member, signature, body] : cases) {
+        RawClient client = rawClient(RawClient::authentication() + RawClient::call(member, 1, signature, body));
+        EXPECT_TRUE(client.readUntil("InvalidArgs")) << member << testing::PrintToString(body);
+    }
+    EXPECT_TRUE(agent->requests().empty()) << "nothing is dismissed";
+    RawClient client =
+        rawClient(RawClient::authentication() + RawClient::call("getAllDeviceInfosUsingPolicy", 1, "tb", policy + yes) +
+                  RawClient::call("dismissFollowUpForSerialNumber", 2, "s", text));
+    EXPECT_TRUE(client.readUntil("Phone"));
+    eventually([&] { return agent->requests().size() == 2; }, "what is sound");
+}
+
+TEST_F(HostileClients, SendNothingMoreAndReadOn) {
+    holdOutreach();
+    RawClient client = rawClient(RawClient::authentication() + RawClient::call("scheduleOutreachWithReply", 1));
+    shutdown(client.file(), SHUT_WR);
+    awaitHeld();
+    answerHeld();
+    EXPECT_TRUE(client.readUntil("\x01u"));
+    EXPECT_TRUE(client.isClosedByAgent());
+}
+
+// What is written is answered; the rest is not accepted.
+TEST_F(HostileClients, WriteWhileTheAgentEnds) {
+    RawClient client = rawClient(RawClient::authentication() + RawClient::call("defaultDevice", 1));
+    ASSERT_TRUE(client.readUntil("Phone"));
+    std::atomic<bool> isWritten = true;
+    service->onEnding = [&] { isWritten = client.write(RawClient::call("readWebURLOverride", 2)); };
+    service->exitCleanWhenIdle();
+    service->waitForEnd(1);
+    EXPECT_FALSE(isWritten);
 }
 
 TEST_F(HostileClients, VanishWithARequestOpen) {
@@ -97,6 +146,74 @@ TEST_F(HostileClients, ComeTwoHundredAtOnce) {
     clients.clear();
     client::AgentConnection connection(options());
     eventually([&] { return bool(connection.defaultDevice()); }, "a free place");
+}
+
+TEST_F(HostileClients, HangUpAndLeaveTheirRequests) {
+    serve({.requests = 2});
+    holdOutreach();
+    const auto leaveRequest = [&] {
+        RawClient leaving = rawClient(RawClient::authentication() + RawClient::call("scheduleOutreachWithReply", 1));
+        EXPECT_TRUE(leaving.readUntil("OK"));
+    };
+    for (int i = 1; i <= 2; ++i) {
+        leaveRequest();
+        awaitHeld(i);
+    }
+    for (int i = 0; i < 20; ++i) leaveRequest();
+    RawClient client = rawClient(RawClient::authentication() + RawClient::call("defaultDevice", 1));
+    EXPECT_TRUE(client.readUntil("OK")) << "it is let in";
+    EXPECT_EQ(held, 2);
+    answerHeld();
+    EXPECT_TRUE(client.readUntil("Phone")) << "and served once there is a place";
+}
+
+TEST_F(HostileClients, TakeEverySeatWithoutLeavingOneForAnotherUser) {
+    if (getuid() != 0) GTEST_SKIP() << "needs another user";
+    serve({.connections = 3});
+    holdOutreach();
+    std::vector<RawClient> clients;
+    for (const char* call : {"scheduleOutreachWithReply", "defaultDevice", "defaultDevice"}) {
+        clients.push_back(rawClient(RawClient::authentication() + RawClient::call(call, 1)));
+        if (clients.size() > 1) {
+            ASSERT_TRUE(clients.back().readUntil("Phone"));
+        }
+    }
+    awaitHeld();
+    const std::string path = service->socketPath();
+    std::filesystem::permissions(path, std::filesystem::perms(0666));
+    std::filesystem::permissions(path.substr(0, path.rfind('/')), std::filesystem::perms(0711));
+    const auto isServed = [&] {
+        return host::endOf(host::inChild([&] {
+                   if (setuid(65534) != 0) _exit(2);
+                   RawClient other(path);
+                   other.write(RawClient::authentication() + RawClient::call("defaultDevice", 1));
+                   _exit(other.readUntil("Phone") ? 0 : 1);
+               })) == 0;
+    };
+    eventually(isServed, "a seat, once the agent is done with the others' requests");
+    pollfd idle[] = {{clients[1].file(), POLLRDHUP, 0}, {clients[2].file(), POLLRDHUP, 0}};
+    EXPECT_EQ(poll(idle, 2, 60'000), 1) << "one that has been idle";
+    clients[0].write(RawClient::call("defaultDevice", 2));
+    EXPECT_TRUE(clients[0].readUntil("Phone")) << "one with a request open keeps its seat";
+    answerHeld();
+}
+
+// Without a rest the listener would try again as fast as it can.
+TEST_F(HostileClients, UseUpTheDescriptors) {
+    if (host::isSanitized) GTEST_SKIP() << "the sanitizers need descriptors themselves";
+    expectGoesOn();
+    rlimit before{};
+    getrlimit(RLIMIT_NOFILE, &before);
+    const host::Descriptor client(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+    rlimit low = before;
+    low.rlim_cur = static_cast<rlim_t>(client.number()) + 1;
+    setrlimit(RLIMIT_NOFILE, &low);
+    EXPECT_TRUE(connectTo(client.number(), addressOf(service->socketPath())));
+    const auto hasSaidSo = [&] { return service->logged("Clients have to wait") > 0; };
+    eventually(hasSaidSo, "the line in the log");
+    setrlimit(RLIMIT_NOFILE, &before);
+    expectGoesOn();
+    EXPECT_EQ(service->logged("Clients have to wait"), 1);
 }
 
 // The programs of others must not use what this one was entitled to.

@@ -81,13 +81,15 @@ public:
     }
     // A call of an operation with no arguments, or with one string.
     static std::string call(const std::string& member, std::uint32_t serial, const std::string* argument = nullptr) {
+        std::string body;
+        if (argument) addString(body, *argument);
+        return call(member, serial, argument ? "s" : "", body);
+    }
+    static std::string call(const std::string& member, std::uint32_t serial, const std::string& signature,
+                            const std::string& body) {
         std::vector<Field> fields{
             {1, 'o', "/com/orvane/vrxagent"}, {2, 's', "com.orvane.VRXAgentProtocol"}, {3, 's', member}};
-        std::string body;
-        if (argument) {
-            fields.push_back({8, 'g', "s"});
-            addString(body, *argument);
-        }
+        if (!signature.empty()) fields.push_back({8, 'g', signature});
         return message('\x01', serial, fields, body);
     }
 

@@ -1,6 +1,4 @@
 // Stock D-Bus tools as clients: they share no code with the agent's own ends.
-#include <gmock/gmock.h>
-
 #include <array>
 #include <cstdio>
 
@@ -10,9 +8,6 @@
 
 namespace vrx::test {
 namespace {
-
-using testing::AllOf;
-using testing::HasSubstr;
 
 // What a tool says, and then the status with which it ended.
 std::string run(const std::string& command) {
@@ -45,10 +40,9 @@ constexpr const char* busctlCall =
 
 // A document as deep as one may be, dictionaries throughout, with what takes most room in the encoding at its bottom.
 Value deepestRecord() {
-    Value value = platform::Dictionary{
-        {"date", platform::dateFromEpoch(1.25)}, {"text", std::string("bot\0tom", 7)}, {"last", "the very bottom"}};
-    for (int depth = 1; depth < platform::limits::documentDepth; ++depth)
-        value = platform::Dictionary{{"inner", value}};
+    Value value =
+        Dictionary{{"date", dateFromEpoch(1.25)}, {"text", std::string("bot\0tom", 7)}, {"last", "the very bottom"}};
+    for (int depth = 1; depth < platform::limits::documentDepth; ++depth) value = Dictionary{{"inner", value}};
     return value;
 }
 

@@ -9,11 +9,7 @@ namespace vrx::codec {
 namespace {
 
 TEST(DecimalText, GroupsAsTheLocaleDoes) {
-    struct {
-        std::uint64_t number;
-        const char* locale;
-        const char* text;
-    } const cases[] = {
+    const std::tuple<std::uint64_t, const char*, const char*> cases[] = {
         {0, "en_US", "0"},
         {1234, "en_US", "1,234"},
         {1234567, "de_DE", "1.234.567"},
@@ -23,7 +19,7 @@ TEST(DecimalText, GroupsAsTheLocaleDoes) {
         {1234, "en_QQ", "1,234"},
         {18446744073709551615u, "en_US", "18,446,744,073,709,551,615"},
     };
-    for (const auto& c : cases) EXPECT_EQ(decimalText(c.number, c.locale), c.text) << c.locale;
+    for (const auto& [number, locale, text] : cases) EXPECT_EQ(decimalText(number, locale), text) << locale;
 }
 
 TEST(DecimalText, GivesAnUnknownLocaleTheCommonStyleWhateverTheEnvironment) {

@@ -46,7 +46,7 @@ TEST(AccountStoreContract, Real) {
     RealHost real;
     host::AccountStore store{real.profile, real.folder.path()};
     expectContract(store, real.queues(), [&](const std::optional<std::string>& token) {
-        host::writeFile(real.profile.path(),
+        host::writeFile(real.profile.layers().front(),
                         "[account]\nidentifier = 'user@cloud'\nalt_dsid = 'ALT-1'\n"
                         "credential_helper = ['/bin/sh', '-c', 'echo token=" +
                             token.value_or("") + "']");

@@ -1,8 +1,6 @@
 // What every registry of background activities does, simulated or real. Times are seconds since the test began.
 #include "vrx/platform/background_activity_scheduler.h"
 
-#include <gmock/gmock.h>
-
 #include <chrono>
 
 #include "contract/hosts.h"
@@ -12,12 +10,8 @@
 namespace vrx {
 namespace {
 
-using namespace std::chrono_literals;
 using platform::ActivityCriteria;
 using platform::BackgroundActivityResult;
-using platform::Duration;
-using testing::ElementsAre;
-using testing::IsEmpty;
 using testing::UnorderedElementsAre;
 using enum BackgroundActivityResult;
 
@@ -38,6 +32,7 @@ public:
     }
     void setNetworkAvailable(bool isAvailable) { host_.activities.setNetworkAvailable(isAvailable); }
     void setShouldDefer(bool shouldDefer) { host_.activities.setShouldDefer(shouldDefer); }
+    void setNetworkMetered(bool isMetered) { host_.activities.setNetworkMetered(isMetered); }
 
 private:
     sim::Host host_;
@@ -112,10 +107,13 @@ TYPED_TEST(BackgroundActivitiesContract, NeverFireARunTwice) {
     this->open(Finished);  // which is not the new registration's
     EXPECT_THAT(this->firingsAfter(899s), IsEmpty());
     EXPECT_THAT(this->firingsAfter(1h), ElementsAre("own 8100"));
+    this->schedule({.delay = 300}, "own ", true);
+    this->open(Finished);
+    EXPECT_THAT(this->firingsAfter(1h), ElementsAre("own 12000")) << "the quarter of an hour is for no delay";
     this->schedule({.delay = 0}, "own ", true);
     this->schedule({.delay = 1}, "other ");
     this->open(Finished);
-    EXPECT_THAT(this->firingsAfter(1h), ElementsAre("other 11701"));
+    EXPECT_EQ(this->firingsAfter(1h).size(), 1u);
     this->open(Deferred);
     this->answer = Finished;
     EXPECT_EQ(this->firingsAfter(1h).size(), 1u);
@@ -136,6 +134,20 @@ TYPED_TEST(BackgroundActivitiesContract, WaitForNetworkAndForTheGracePeriod) {
     EXPECT_EQ(this->firingsAfter(1s).size(), 1u);
 }
 
+TYPED_TEST(BackgroundActivitiesContract, DeferOnAMeteredNetworkWhatNeedsIt) {
+    this->subject.setNetworkMetered(true);
+    this->schedule({.delay = 0, .gracePeriod = 500});
+    EXPECT_EQ(this->firingsAfter(1s).size(), 1u);
+    this->answer.reset();
+    this->schedule({.delay = 0, .gracePeriod = 500, .requiresNetwork = true});
+    EXPECT_THAT(this->firingsAfter(499s), IsEmpty());
+    EXPECT_EQ(this->firingsAfter(2s).size(), 1u);
+    EXPECT_TRUE(this->subject.activities().shouldDefer("a")) << "while it runs";
+    this->subject.setNetworkMetered(false);
+    EXPECT_FALSE(this->subject.activities().shouldDefer("a"));
+    this->open(BackgroundActivityResult::Finished);
+}
+
 TYPED_TEST(BackgroundActivitiesContract, OutliveTheProcess) {
     this->schedule({.delay = 99});
     this->subject.restart();
@@ -149,15 +161,18 @@ TYPED_TEST(BackgroundActivitiesContract, OutliveTheProcess) {
         [&](const std::string& identifier) { return identifier == "a" ? this->handler("made ") : nullptr; });
     EXPECT_THAT(this->firingsAfter(200s), ElementsAre("made 301"));
 
-    // The end of the process cuts a run off: it begins anew.
+    // The end of the process cuts a run off: it begins anew, each time later, as after a deferral.
     this->answer.reset();
     this->schedule({.delay = 0});
     EXPECT_EQ(this->firingsAfter(2s).size(), 1u);
-    this->open.letGo();
-    this->subject.restart();
-    this->answer = Finished;
-    this->monitor();
-    EXPECT_EQ(this->firingsAfter(2s).size(), 1u);
+    for (Duration wait : {Duration(1s), Duration(60s)}) {
+        this->open.letGo();
+        this->subject.restart();
+        this->monitor();
+        EXPECT_THAT(this->firingsAfter(wait - 0.5s), IsEmpty());
+        EXPECT_EQ(this->firingsAfter(1s).size(), 1u);
+    }
+    this->open(Finished);
 }
 
 TYPED_TEST(BackgroundActivitiesContract, CountDelaysByTheWallClockOverABootOnly) {
@@ -210,6 +225,20 @@ TYPED_TEST(BackgroundActivitiesContract, FireTheSystemsOwnOncePerVersionAndBoot)
                                             completion(Finished);
                                         });
     EXPECT_THAT(this->firingsAfter(1h), ElementsAre("taken up 7221"));
+
+    // With a wrong clock the boot activity finds much too long a delay. Once the clock is set, it is what is left.
+    this->schedule({.delay = 3599}, "far ");
+    this->subject.boot(10s);
+    this->subject.setWallClock(-100000h);
+    this->monitor("far ");
+    this->subject.activities().schedule({.identifier = "com.orvane.vrxagent.boot", .isPreregistered = true},
+                                        [&](platform::OnceCallback<BackgroundActivityResult> completion) {
+                                            this->schedule({.delay = 100000 * 3600 + 3589}, "far ");
+                                            completion(Finished);
+                                        });
+    EXPECT_THAT(this->firingsAfter(2h), IsEmpty());
+    this->subject.setWallClock(100000h);
+    EXPECT_THAT(this->firingsAfter(2s), ElementsAre(testing::StartsWith("far ")));
 }
 
 }  // namespace

@@ -1,20 +1,12 @@
 // What every store of settings does, simulated or real.
 #include "vrx/platform/defaults_store.h"
 
-#include <gmock/gmock.h>
-
 #include <limits>
 
 #include "contract/hosts.h"
 
 namespace vrx {
 namespace {
-
-using platform::Array;
-using platform::Data;
-using platform::Date;
-using platform::Dictionary;
-using platform::Value;
 
 template <class Host>
 using DefaultsStoreContract = ContractTest<Host>;
@@ -29,7 +21,7 @@ TYPED_TEST(DefaultsStoreContract, KeepsEveryKindOfValueAcrossProcesses) {
         {"infinite", std::numeric_limits<double>::infinity()},
         {"string", std::string("a\0ü", 4)},
         {"empty string", ""},
-        {"date", platform::dateFromEpoch(1769860800.25)},
+        {"date", dateFromEpoch(1769860800.25)},
         {"data", Data{0, 255}},
         {"empty array", Array{}},
         {"dictionary", Dictionary{{"list", Array{1, "two", 3.5}}, {"", Dictionary{}}}},
@@ -68,7 +60,7 @@ TYPED_TEST(DefaultsStoreContract, PutsStoredValuesBeforeRegisteredOnes) {
 
 TYPED_TEST(DefaultsStoreContract, UpdatesWhatIsThere) {
     platform::DefaultsStore& store = this->host.defaults();
-    store.registerDefaults({{"list", Array{0}}});
+    store.registerDefaults({{"list", Array{Value(0)}}});
     auto append = [&](const char* key, int number) {
         store.update(key, [number](const Value& value) {
             Array list = value.asArray() ? *value.asArray() : Array{};
@@ -80,9 +72,9 @@ TYPED_TEST(DefaultsStoreContract, UpdatesWhatIsThere) {
     append("list", 2);
     append("new", 3);
     EXPECT_EQ(store.get("list"), Value(Array{0, 1, 2}));
-    EXPECT_EQ(store.get("new"), Value(Array{3}));
+    EXPECT_EQ(store.get("new"), Value(Array{Value(3)}));
     store.update("list", [](const Value&) { return Value(); });
-    EXPECT_EQ(store.get("list"), Value(Array{0}));
+    EXPECT_EQ(store.get("list"), Value(Array{Value(0)}));
 }
 
 TYPED_TEST(DefaultsStoreContract, LogsAWriteThatFailsAndKeepsTheEarlierValue) {
@@ -100,7 +92,7 @@ TYPED_TEST(DefaultsStoreContract, ReadsByType) {
     for (const auto& [key, value] : Dictionary{{"number", 86400.9},
                                                {"text", "12 days"},
                                                {"true", true},
-                                               {"date", platform::dateFromEpoch(5)},
+                                               {"date", dateFromEpoch(5)},
                                                {"dictionary", Dictionary{{"a", 1}}}})
         store.set(key, value);
     for (auto [key, number] : {std::pair("number", 86400), {"text", 12}, {"true", 1}, {"date", 0}, {"absent", 0}})
@@ -108,7 +100,7 @@ TYPED_TEST(DefaultsStoreContract, ReadsByType) {
     EXPECT_EQ(store.number("number"), 86400.9);
     EXPECT_EQ(store.string("text"), "12 days");
     EXPECT_EQ(store.string("number"), std::nullopt);
-    EXPECT_EQ(store.date("date"), platform::dateFromEpoch(5));
+    EXPECT_EQ(store.date("date"), dateFromEpoch(5));
     EXPECT_EQ(store.date("number"), std::nullopt);
     EXPECT_EQ(store.dictionary("dictionary"), Value(Dictionary{{"a", 1}}));
     EXPECT_TRUE(store.dictionary("text").isNull());

@@ -7,8 +7,6 @@
 namespace vrx {
 namespace {
 
-using platform::Data;
-
 template <class Host>
 class FilesContract : public ContractTest<Host> {
 protected:

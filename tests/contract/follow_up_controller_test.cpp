@@ -1,18 +1,12 @@
 // What every follow-up service does, simulated or real.
 #include "vrx/platform/follow_up_controller.h"
 
-#include <gmock/gmock.h>
-
 #include "contract/hosts.h"
 
 namespace vrx {
 namespace {
 
-using platform::Array;
-using platform::dateFromEpoch;
-using platform::Dictionary;
 using platform::FollowUpItem;
-using testing::ElementsAre;
 
 template <class Host>
 class FollowUpControllerContract : public ContractTest<Host> {

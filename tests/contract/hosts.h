@@ -6,8 +6,6 @@
 //     TYPED_TEST_SUITE(FilesContract, Hosts, HostNames);
 #pragma once
 
-#include <gtest/gtest.h>
-
 #include <optional>
 
 #include "host/support.h"
@@ -29,7 +27,7 @@ public:
     // What is stored stays for the next process.
     void restart() { host.defaults.forgetRegistered(); }
     std::size_t loggedLines() const { return host.log.messages(platform::Level::Default).size(); }
-    platform::Duration time() const { return host.clock.elapsed(); }
+    Duration time() const { return host.clock.elapsed(); }
     // Lets all queues run until the event is set.
     void runUntil(const std::shared_ptr<platform::Event>& event) { event->wait(); }
 
@@ -48,7 +46,7 @@ public:
         followUps_.emplace(*database_);
     }
     std::size_t loggedLines() const { return log_.lines().size(); }
-    platform::Duration time() const { return std::chrono::steady_clock::now().time_since_epoch(); }
+    Duration time() const { return std::chrono::steady_clock::now().time_since_epoch(); }
     void runUntil(const std::shared_ptr<platform::Event>& event) {
         queues_.workers(platform::Priority::UserInitiated).post([this, event] {
             event->wait();

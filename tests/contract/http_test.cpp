@@ -8,9 +8,6 @@
 namespace vrx {
 namespace {
 
-using namespace std::chrono_literals;
-using platform::Data;
-using platform::HttpRequest;
 using platform::HttpResponse;
 using platform::Priority;
 
@@ -64,21 +61,22 @@ private:
 template <class Host>
 class HttpContract : public ContractTest<Host> {
 protected:
-    HttpResponse answerTo(const std::string& url, std::optional<platform::Duration> timeout = {}) {
-        return answerOf(this->host.sessions().shared(), url, timeout);
+    HttpResponse answerTo(const std::string& url, std::optional<Duration> timeout = {}) {
+        const std::shared_ptr<platform::HttpSession> notOwned(&this->host.sessions().shared(), [](auto*) {});
+        return answerOf(notOwned, url, timeout);
     }
-    HttpResponse answerOf(platform::HttpSession& session, const std::string& url,
-                          std::optional<platform::Duration> timeout = {}) {
-        HttpRequest request;
-        request.url = url;
-        request.timeout = timeout;
+    // Of a session that is let go at once, unless the caller keeps it.
+    HttpResponse answerOf(std::shared_ptr<platform::HttpSession> session, const std::string& url,
+                          std::optional<Duration> timeout = {}) {
         HttpResponse answer;
         auto answered = this->host.queues().makeEvent();
-        session.send(request, [&, answered](HttpResponse response) {
-            EXPECT_TRUE(this->host.isOnWorker());
-            answer = std::move(response);
-            answered->set();
-        });
+        session->send({.url = url, .headers = {}, .body = {}, .timeout = timeout},
+                      [&, answered](HttpResponse response) {
+                          EXPECT_TRUE(this->host.isOnWorker());
+                          answer = std::move(response);
+                          answered->set();
+                      });
+        session.reset();
         answered->wait();
         return answer;
     }
@@ -124,15 +122,9 @@ TYPED_TEST(HttpContract, ReadsLocalFiles) {
 }
 
 TYPED_TEST(HttpContract, EndsWhatASessionThatWasLetGoHadUnderWay) {
-    EXPECT_EQ(this->answerOf(*this->host.sessions().makeUncached(), this->host.url("/found")).status, 200);
-    HttpRequest request;
-    request.url = this->host.url("/found");
-    auto answered = this->host.queues().makeEvent();
-    this->host.sessions().makeUncached()->send(request, [answered](HttpResponse response) {
-        EXPECT_EQ(response.status, 200);
-        answered->set();
-    });
-    answered->wait();
+    const auto kept = this->host.sessions().makeUncached();
+    EXPECT_EQ(this->answerOf(kept, this->host.url("/found")).status, 200);
+    EXPECT_EQ(this->answerOf(this->host.sessions().makeUncached(), this->host.url("/found")).status, 200);
 }
 
 }  // namespace

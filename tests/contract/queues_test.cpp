@@ -2,8 +2,6 @@
 // pass but for the shortest of timers.
 #include "vrx/platform/queue.h"
 
-#include <gmock/gmock.h>
-
 #include <algorithm>
 #include <chrono>
 #include <limits>
@@ -14,11 +12,8 @@
 namespace vrx {
 namespace {
 
-using namespace std::chrono_literals;
-using platform::Duration;
 using platform::Event;
 using platform::Priority;
-using testing::ElementsAre;
 
 template <class Host>
 class QueuesContract : public ContractTest<Host> {

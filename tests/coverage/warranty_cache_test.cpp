@@ -43,6 +43,9 @@ TEST_F(WarrantyCacheTest, WhatCannotBeWrittenLeavesTheEarlierFile) {
     host.files.fail(sim::Files::Operation::Replace, ENOSPC);
     record({{"covered", false}})->cacheWarranty("A");
     EXPECT_TRUE(VRXWarranty::cachedWarrantyForSerialNumber("A")->isEqual(first.get()));
+    EXPECT_THAT(host.log.messages(platform::Level::Error),
+                testing::Each(testing::StartsWith("Cannot write the cached record " + pathOf("A") + ": ")));
+    EXPECT_EQ(host.log.messages(platform::Level::Error).size(), 2u);
 }
 
 TEST_F(WarrantyCacheTest, AFileCutAnywhereIsNoRecord) {

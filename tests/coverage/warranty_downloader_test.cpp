@@ -13,6 +13,7 @@ protected:
     WarrantyDownloaderTest() {
         host.defaults.registerDefaults({{"LowServerVersion", 2}, {"HighServerVersion", 3}});
         host.defaults.set("WarrantyURL", "file:///data/Warranty.plist");
+        putRecord("/data/Warranty.plist", Dictionary{{"covered", true}});
     }
     void putRecord(const std::string& path, const Value& record) { host.files.put(path, propertyList(record)); }
     std::shared_ptr<VRXWarranty> download(const std::optional<std::string>& serialNumber) {
@@ -40,7 +41,6 @@ protected:
 };
 
 TEST_F(WarrantyDownloaderTest, StoresTheRecordWithItsMetadata) {
-    putRecord("/data/Warranty.plist", Dictionary{{"covered", true}});
     const auto warranty = download("S");
     ASSERT_TRUE(warranty && warranty->covered());
     EXPECT_TRUE(VRXWarranty::cachedWarrantyForSerialNumber("S")->isEqual(warranty.get()));
@@ -66,7 +66,6 @@ TEST_F(WarrantyDownloaderTest, PrefersTheSerialNumbersOwnFile) {
 }
 
 TEST_F(WarrantyDownloaderTest, AFailureLeavesTheCacheAsItWas) {
-    putRecord("/data/Warranty.plist", Dictionary{{"covered", true}});
     EXPECT_TRUE(download("S"));
     const std::string url = "file:///data/Warranty.plist";
     host.files.put("/data/Warranty.plist", "garbage");
@@ -82,7 +81,6 @@ TEST_F(WarrantyDownloaderTest, AFailureLeavesTheCacheAsItWas) {
 }
 
 TEST_F(WarrantyDownloaderTest, AServerOfOtherVersionsIsNotAsked) {
-    putRecord("/data/Warranty.plist", Dictionary{{"covered", true}});
     Dictionary versions{{"LowServerVersion", 8}, {"HighServerVersion", 9}};
     host.defaults.set("ServerVersionURL", "file:///data/versions.plist");
     putRecord("/data/versions.plist", versions);

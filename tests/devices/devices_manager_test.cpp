@@ -15,6 +15,7 @@ protected:
         host.device.strings["SerialNumber"] = "REAL";
         host.device.strings["UserAssignedDeviceName"] = "Phone";
         host.flags.enabled = {{"Vireo", "Meridian_3_0"}};
+        host.watches.all = {{"One", "Model", "W1", dateFromEpoch(5), true, false}};
         host.defaults.registerDefaults({{"LowServerVersion", 2}, {"HighServerVersion", 3}});
     }
     static std::vector<std::string> serialNumbers(const DevicesBySerialNumber& devices) {
@@ -64,7 +65,6 @@ TEST_F(DevicesManagerTest, ReportsActiveWatches) {
 }
 
 TEST_F(DevicesManagerTest, PairedDevicesNeedFlagAndServer) {
-    host.watches.all = {{"One", "Model", "W1", dateFromEpoch(5), true, false}};
     host.defaults.set("ServerVersionCache", Dictionary{{"LowServerVersion", 2}, {"HighServerVersion", 2}});
     EXPECT_TRUE(manager->pairedDevices().empty());
     EXPECT_TRUE(host.log.contains("Meridian 3.0 disabled by server, ignore paired devices"));
@@ -77,7 +77,6 @@ TEST_F(DevicesManagerTest, PairedDevicesNeedFlagAndServer) {
 }
 
 TEST_F(DevicesManagerTest, InternalBuildsTakeTestWatches) {
-    host.watches.all = {{"One", "Model", "W1", dateFromEpoch(5), true, false}};
     host.defaults.set("PairedWatchesSerialNumbers", Dictionary{{"any", "T1"}, {"other", "T2"}, {"bad", 5}});
     host.defaults.set("T1.activationInterval", -86400);
     EXPECT_EQ(serialNumbers(manager->pairedDevices()), std::vector<std::string>{"W1"});

@@ -1,17 +1,14 @@
 // The agent as a process: what it keeps over restarts, and what it makes of damage.
-#include <gtest/gtest.h>
-
 #include <algorithm>
 #include <csignal>
 
 #include "end_to_end/programs.h"
 #include "host/http/loopback_server.h"
 #include "support/eventually.h"
+#include "vrx/host/home/database.h"
 
 namespace vrx::end_to_end {
 namespace {
-
-using platform::Value;
 
 class Agent : public AtPlace {
 protected:
@@ -59,6 +56,32 @@ TEST_P(AgentEnd, EndsTheRequestUnderWay) {
 INSTANTIATE_TEST_SUITE_P(Signals, AgentEnd, testing::Values(SIGTERM, SIGINT, SIGKILL),
                          [](const auto& signal) { return std::string(sigabbrev_np(signal.param)); });
 
+TEST_F(AtPlace, TakesTheServerFromTheProfileUntilOneIsWritten) {
+    const std::string profile = fileText(place_ / "device.toml") + "\n[defaults]\n";
+    const auto preset = [&](const std::string& key, const std::string& file) {
+        return key + " = 'file://" + place_ / ("coverage/" + file) + "'\n";
+    };
+    const auto refresh = [this] {
+        return place_.vrxctl({"info", "--json", "--policy", "refresh"}).document["coverage"]["coverageLocalizedLabel"];
+    };
+    const auto source = [this](const std::string& key) {
+        return place_.vrxhost({"defaults", "read", key, "--json"}).document["source"];
+    };
+    place_.write("device.toml", profile + preset("ServerVersionURL", "ServerVersion.plist") +
+                                    preset("WarrantyURL", "Warranty.VRXWATCH0001.plist"));
+    place_.start();
+    EXPECT_EQ(refresh(), Value("QX Coverage for Watch"));
+    const auto lines = std::count(profile.begin(), profile.end(), '\n');
+    EXPECT_EQ(source("WarrantyURL"), Value(place_ / "device.toml:" + std::to_string(lines + 2)));
+    EXPECT_EQ(source("OneDayInterval"), Value("the agent's own"));
+    place_.write("device.toml",
+                 profile + preset("ServerVersionURL", "ServerVersion.plist") + preset("WarrantyURL", "Warranty.plist"));
+    EXPECT_NE(refresh(), Value("QX Coverage for Watch")) << "without a restart";
+    place_.useCoverageFiles();
+    EXPECT_EQ(source("WarrantyURL"), Value("written"));
+    EXPECT_EQ(place_.stop(), 0) << place_.agent().errors();
+}
+
 TEST_F(Agent, KeepsTheLastGoodProfileAndStartsWithoutOneAndWithADamagedDatabase) {
     place_.write("device.toml", "[device]\nserial_number = ");  // before anybody asked
     EXPECT_EQ(place_.vrxctl({"device", "--json"}).document["device"]["serialNumber"], Value("VRXPHONE0001"));
@@ -85,6 +108,24 @@ TEST_F(Agent, IsAloneInItsHomeAndAtItsSocket) {
     EXPECT_NE(sameHome.errors.find("another agent"), std::string::npos) << sameHome.errors;
     EXPECT_EQ(second("other-home", "socket").code, 1);
     EXPECT_EQ(place_.vrxctl({"device"}).code, 0);
+
+    std::filesystem::remove_all(place_ / "home");  // and so another agent could take it
+    EXPECT_EQ(place_.agent().wait(), 0) << "it is to begin anew";
+    EXPECT_NE(place_.agent().errors().find("was taken away"), std::string::npos) << place_.agent().errors();
+}
+
+TEST_F(Agent, AnswersWhileAnotherProcessWrites) {
+    host::LogRecorder log;
+    host::Database other(place_ / "home/host.db");
+    EXPECT_FALSE(other.write([&](host::Connection&) {
+        place_.write("device.toml", fileText(place_ / "device.toml") + "\n[[watches]]\nserial_number = 'NEW'\n");
+        for (int i = 0; i < 10; ++i) EXPECT_EQ(place_.vrxctl({"device", "--timeout", "4"}).code, 0);
+    }));
+    const auto isTold = [&] {
+        return place_.agent().errors().find("_pairedOrActiveDevicesDidChange") != std::string::npos;
+    };
+    eventually(isTold, "what the agent could not store at first");
+    EXPECT_EQ(place_.stop(), 0);
 }
 
 }  // namespace

@@ -1,7 +1,5 @@
 // Every verb of vrxctl and vrxhost, whatever has become of the agent: exit codes, one document with --json in every
 // case, and on standard error the cause of a failure and what to try next.
-#include <gtest/gtest.h>
-
 #include <sys/file.h>
 
 #include <algorithm>
@@ -16,8 +14,6 @@
 
 namespace vrx::end_to_end {
 namespace {
-
-using platform::Value;
 
 struct Verb {
     const char* words;
@@ -49,7 +45,7 @@ const std::vector<Verb> vrxhostVerbs{{"why VRXWATCH0001", "rule", 0, 0},
                                      {"defaults list", "defaults", 0, 0},
                                      {"defaults read OneDayInterval", "value", 0, 0},
                                      {"defaults read K", "error", 1, 1},
-                                     {"defaults write L 1", "value"},
+                                     {"defaults write PostUpgradeOutreachDelay 172800", "value"},
                                      {"defaults delete L", "deleted"}};
 
 using Texts = std::vector<std::string>;
@@ -139,8 +135,7 @@ TEST_F(CommandLine, Answers) {
     // What the table leaves open.
     EXPECT_EQ(value(vrxctl_, "device")["device"]["name"], Value("Maya's Phone"));
     EXPECT_EQ(value(vrxctl_, "info X --policy cached")["device"]["name"], Value("<unknown>"));
-    EXPECT_EQ(value(vrxctl_, "support com.example")["availability"],
-              Value(platform::Dictionary{{"AppBundleID", "com.example"}}));
+    EXPECT_EQ(value(vrxctl_, "support com.example")["availability"], Value(Dictionary{{"AppBundleID", "com.example"}}));
     EXPECT_EQ(value(vrxctl_, "paired")["devices"].asArray()->size(), 2u);
     EXPECT_EQ(value(vrxctl_, "all")["devices"].asArray()->size(), 3u);
     EXPECT_EQ(value(vrxhost_, "defaults read FollowupDismissedSerialNumberHashes")["value"].asArray()->size(), 2u);
@@ -151,7 +146,7 @@ TEST_F(CommandLine, Answers) {
     EXPECT_EQ(cached["coverage"], info["coverage"]);
     EXPECT_EQ(value(vrxhost_, "defaults read OneDayInterval")["registered"], Value(true));
     for (const auto& [form, stored, type] :
-         {std::tuple(R"({"a":[1,2.5]})", Value(platform::Dictionary{{"a", platform::Array{1, 2.5}}}), "dictionary"),
+         {std::tuple(R"({"a":[1,2.5]})", Value(Dictionary{{"a", Array{1, 2.5}}}), "dictionary"),
           {"--int -5", Value(-5), "integer"},
           {"--date 2026-01-31T12:00:00Z", Value("2026-01-31T12:00:00Z"), "date"}}) {
         EXPECT_EQ(value(vrxhost_, std::string("defaults write K ") + form)["ok"], Value(true));
@@ -161,6 +156,21 @@ TEST_F(CommandLine, Answers) {
         EXPECT_EQ(setting["registered"], Value(false));
     }
     EXPECT_EQ(value(vrxhost_, "defaults delete K")["deleted"], Value(true));
+    for (const auto& [words, warning] :
+         {std::pair("SerialNumber 5",
+                    "vrxhost: the agent ignores a value of this type, integer: SerialNumber is a string"),
+          {"OneDayInterval --string soon",
+           "vrxhost: the agent ignores a value of this type, string: OneDayInterval is a number"},
+          {"OneDayInterval --string 86400", ""},
+          {"VRXWATCH0001.activationInterval -60", ""},
+          {".activationInterval -60", "vrxhost: no part of the agent reads .activationInterval"},
+          {"AppSupportAvailability --string NO", ""}}) {
+        const Place::Outcome written =
+            place_.runAll({command(vrxhost_, std::string("defaults write ") + words)}).front();
+        EXPECT_EQ(written.code, 0) << words;
+        EXPECT_EQ(written.errors, warning + std::string(*warning ? "\n" : "")) << words;
+    }
+    EXPECT_EQ(value(vrxhost_, "defaults read SerialNumber")["value"], Value(5)) << "written all the same";
 
     // Text of a record cannot steer the terminal.
     place_.write("coverage/Warranty.VRXPHONE0001.plist",

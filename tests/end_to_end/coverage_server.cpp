@@ -7,8 +7,6 @@
 
 namespace vrx::end_to_end {
 
-using platform::Value;
-
 CoverageServer::CoverageServer(const std::string& folder, const Arguments& arguments) {
     host::Pipe pipe;
     process_.emplace(folder, VRX_PROGRAMS "/vrx-coverage-server", arguments, Arguments{},

@@ -11,7 +11,7 @@ public:
     CoverageServer(const std::string& folder, const Arguments& arguments);
 
     const std::string& url() const { return url_; }
-    platform::Value ask(const std::string& method, const std::string& path, const std::string& body = "") const;
+    Value ask(const std::string& method, const std::string& path, const std::string& body = "") const;
     // The requests since they were last forgotten, in order, such as "s200 c1:401 t200 c2:200": for the server-version
     // document (with a ! when past caches), for coverage with the token of a renewal, for a token; and "p200 c200" for
     // the store's purchases and catalogue, without a token. Then the answers' status, 0 for none. Waits until the

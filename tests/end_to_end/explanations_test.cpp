@@ -2,6 +2,8 @@
 #include <gtest/gtest.h>
 
 #include <chrono>
+#include <csignal>
+#include <functional>
 
 #include "end_to_end/programs.h"
 #include "support/eventually.h"
@@ -127,12 +129,15 @@ TEST_F(Explanations, TellWhyAFollowUpIsNotThere) {
                  R"({"uniqueIdentifier": "com.orvane.Vireo.x", "userInfo": {"FollowupSerialNumber": "VRXPHONE0001"}})");
     ASSERT_EQ(vrxhost({"followups", "post", place_ / "item.json"}).code, 0);
     expectWhy("shown", "eligible");
-    place_.write("device.toml", "[device]\nserial_number = 'VRXPHONE0001'\n");
+    // The watches stay: the refresh that follows an unpairing would post the item again beside its clearing.
+    const std::string profile = fileText(place_ / "device.toml");
+    const std::size_t account = profile.find("[account]");
+    ASSERT_NE(account, profile.npos);
+    place_.write("device.toml", std::string(profile).replace(account, 9, "[unknown]"));
     expectWhy("shown", "no-record");
     ASSERT_EQ(vrxhost({"followups", "clear", "com.orvane.Vireo.x"}).code, 0);
     expectWhy("waiting", "no-record", "followuppost");
-    std::filesystem::copy(VRX_SOURCE "/examples/device.toml", place_ / "device.toml",
-                          std::filesystem::copy_options::overwrite_existing);
+    place_.write("device.toml", profile);
     ASSERT_EQ(place_.vrxctl({"dismiss", phone}).code, 0);
     ASSERT_EQ(place_.stop(), 0) << place_.agent().errors();
     const Dictionary before = homeContents();
@@ -190,6 +195,64 @@ TEST_F(Explanations, FindWhatIsWrongAndWriteNothing) {
     expectFirstProblem(1, "database");
     std::filesystem::remove(place_ / "home/host.db");
     expectFirstProblem(3, "database");
+}
+
+class ProfileVerb : public AtPlace {
+protected:
+    // An agent that runs until it has been asked what the verb says.
+    std::string errorsOfAgent(const Arguments& arguments, const std::function<void()>& ask) {
+        const NoticeSocket notices(place_ / "notices");
+        Arguments all{"--home", place_ / "home", "--socket", place_ / "socket"};
+        all.insert(all.end(), arguments.begin(), arguments.end());
+        Process agent(place_.path(), VRX_PROGRAMS "/vrxagent", all,
+                      {notices.variable(), "XDG_CONFIG_HOME=" + place_ / "config"});
+        EXPECT_EQ(notices.next(agent), "READY=1") << agent.errors();
+        ask();
+        agent.signal(SIGTERM);
+        EXPECT_EQ(agent.wait(), 0);
+        return agent.errors();
+    }
+    Value key(const std::string& name) const {
+        const Value document = place_.vrxhost({"profile", "--json"}).document;
+        for (const Value& key : *document["keys"].asArray())
+            if (key["key"] == Value(name)) return key;
+        return nullptr;
+    }
+};
+
+TEST_F(ProfileVerb, TellsWhereEachValueIsFrom) {
+    const std::string folder = place_ / "config/vrxagent/device.d/";
+    place_.write("config/vrxagent/device.toml",
+                 "[device]\nname = 'Ada'\ncolour = 'red'\n[account]\nidentifier = 'a'\n");
+    place_.write("config/vrxagent/device.d/1.toml", "[device]\n\nname = 'Maya'\n[account]\nauthentication = false\n");
+    place_.write("config/vrxagent/device.d/2.toml", "http.ca_file = '/ca.pem'\n[[watches]]\nname = 'W'\n");
+    place_.setMode("config/vrxagent/device.d/2.toml", 0646);
+    errorsOfAgent({}, [&] {
+        EXPECT_EQ(key("device.name")["value"], Value("Maya"));
+        EXPECT_EQ(key("device.name")["source"], Value(folder + "1.toml:3"));
+        EXPECT_EQ(key("account.authentication")["value"], Value(false));
+        EXPECT_EQ(key("watches[0].name")["source"], Value(folder + "2.toml:3"));
+        EXPECT_EQ(key("http.ca_file")["believed"], Value(false));
+        EXPECT_EQ(key("device.internal")["source"], Value("the agent's default"));
+        const Place::Outcome plain = place_.vrxhost({"profile"});
+        EXPECT_NE(plain.output.find(folder + "2.toml:1, not believed: others can write " + folder + "2.toml\n"),
+                  std::string::npos)
+            << plain.output;
+        EXPECT_NE(plain.errors.find("device.toml:3: the key device.colour is not known\n"), std::string::npos);
+    });
+    // Without an agent it is what one would read.
+    EXPECT_EQ(place_.run(place_ / "app/vrxhost", {"--home", place_ / "none", "profile", "--json"}).code, 0);
+    EXPECT_FALSE(std::filesystem::exists(place_ / "none"));
+}
+
+TEST_F(ProfileVerb, WarnsOfANamedFileThatIsNotThere) {
+    const std::string warning = place_ / "missing.toml is not there";
+    const std::string errors = errorsOfAgent({"--device", place_ / "missing.toml"}, [&] {
+        EXPECT_NE(place_.vrxhost({"profile"}).errors.find(warning), std::string::npos);
+        const std::string checks = place_.vrxhost({"doctor", "--timeout", "0.1"}).output;
+        EXPECT_NE(checks.find("note     " + warning), std::string::npos) << checks;
+    });
+    EXPECT_NE(errors.find(warning), std::string::npos) << errors;
 }
 
 }  // namespace

@@ -1,6 +1,4 @@
 // Follow-ups as the settings app would show them, beside a running agent that keeps them true.
-#include <gtest/gtest.h>
-
 #include <chrono>
 
 #include "end_to_end/programs.h"
@@ -9,10 +7,6 @@
 
 namespace vrx::end_to_end {
 namespace {
-
-using platform::Array;
-using platform::Dictionary;
-using platform::Value;
 
 const std::string legacyIdentifier = "com.orvane.Vireo";
 

@@ -1,7 +1,7 @@
 // What a client gets, what is cached afterwards and what went over the wire, whatever coverage server, network, account
 // and credential helper do. The agent runs on its real host, with transfers and helper limited to half a second;
 // clients reach it through its socket, and the server is a process of its own.
-#include <gtest/gtest.h>
+#include <malloc.h>
 
 #include <algorithm>
 #include <array>
@@ -14,6 +14,7 @@
 #include "end_to_end/coverage_server.h"
 #include "vrx/client/agent_connection.h"
 #include "vrx/codec/json.h"
+#include "vrx/codec/property_list.h"
 #include "vrx/coverage/cache_metadata.h"
 #include "vrx/host/host.h"
 #include "vrx/host/ipc/bundle_lookup.h"
@@ -24,14 +25,17 @@
 namespace vrx::end_to_end {
 namespace {
 
-using namespace std::chrono_literals;
 using platform::Platform;
-using platform::Value;
 
-constexpr platform::Duration timeLimit = 500ms;
+constexpr Duration timeLimit = 1000ms;
 constexpr const char* serialNumber = "VRXPHONE0001";
 constexpr std::string_view metadataKeys[] = {cachedWarrantyLastUpdatedDateKey, cachedWarrantyLocaleKey,
                                              cachedWarrantyVersionKey};
+// In KiB, of agent and client together. The most that a document may hold, 100,000 values, takes 40 MiB as what is
+// read, filed, sent and received of it; 8 MiB of texts, for which a document of 25 KB can stand, take 17 MiB.
+constexpr long mostMemory = 64 * 1024;
+// In bytes. An answer is shown twice, in 16 KiB at most each time; all other lines take 10 KiB.
+constexpr std::size_t longestLog = 64 * 1024;
 constexpr const char* signedIn = "identifier = 'maya@orvane.example'\nalt_dsid = '000001-02'\n";
 
 class Network : public AtPlace {
@@ -64,7 +68,10 @@ protected:
         const std::string status = fileText("/proc/self/status"), name = "VmHWM:";
         return std::stol(status.substr(status.find(name) + name.size()));
     }
-    static void resetPeakMemory() { std::ofstream("/proc/self/clear_refs") << 5; }
+    static void resetPeakMemory() {
+        malloc_trim(0);  // what the test itself has used
+        std::ofstream("/proc/self/clear_refs") << 5;
+    }
     static void setDefault(std::string_view key, Value value) {
         Platform::current().defaultsStore().set(std::string(key), std::move(value));
     }
@@ -84,6 +91,7 @@ protected:
     // An agent that has refreshed its record once.
     void SetUp() override {
         setenv("no_proxy", "*", 1);  // nothing leaves this machine
+        if (!host::isSanitized) dup2(log_.number(), 2);
         serveRecord(1);
         server.emplace(place_.path(),
                        Arguments{"--quiet", "--records", place_ / "records", "--cache-control", "no-store"});
@@ -106,12 +114,16 @@ protected:
         loop_->stop();
         mayEnd_.set_value();  // the loop is of no more use to this thread
         thread_.join();
+        dup2(errors_.number(), 2);
+        const std::string logged = fileText(place_ / "log");
+        EXPECT_LT(logged.size(), longestLog);
+        if (HasFailure()) std::cerr << logged;
     }
 
 private:
     // As the agent's main thread.
     void runAgent(std::promise<void>& isReady) {
-        host::Host host({.home = place_ / "home", .profile = place_ / "device.toml"}, platform::Level::Error,
+        host::Host host({.home = place_ / "home", .profile = {place_ / "device.toml"}}, platform::Level::Default,
                         {.http = {.longestTimeout = timeLimit}, .credentialHelper = timeLimit});
         EXPECT_FALSE(host.open(host::HomeUse::Agent));
         host::BundleLookup bundles([&] { return host.profile().content(); });
@@ -126,6 +138,9 @@ private:
         mayEnd_.get_future().wait();
     }
 
+    // The log goes to a file, but what sanitizers find does not.
+    const host::Descriptor errors_{fcntl(2, F_DUPFD_CLOEXEC, 0)};
+    const host::Descriptor log_{open((place_ / "log").c_str(), O_WRONLY | O_CREAT | O_APPEND | O_CLOEXEC, 0600)};
     host::MainLoop* loop_ = nullptr;
     std::promise<void> mayEnd_;
     std::thread thread_;
@@ -145,7 +160,8 @@ struct Change {
     const char* document = nullptr;  // of the server-version document
     const char* helper = nullptr;    // empty: there is none
     const char* account = nullptr;
-    bool isLong = false;  // takes the whole time limit
+    std::string (*file)() = nullptr;  // what stands at fromFile
+    bool isLong = false;              // takes the whole time limit
 };
 
 struct Fault {
@@ -164,10 +180,34 @@ const char* const refusing = "http://127.0.0.1:1/";
 // No host's name is that long: no resolver asks another machine for it.
 const char* const nowhere = "https://0123456789012345678901234567890123456789012345678901234567890123.invalid/";
 const char* const untrusted = "";  // a server with a certificate of its own making
+const char* const fromFile = "file";
 const char* const hangs = "sleep 1000 & wait";
 const char* const babbles = "head -c 1000 /dev/urandom";
 const char* const withoutToken = "identifier = 'ada@orvane.example'\nalt_dsid = '000002-03'\n";
 const char* const withoutAltDSID = "identifier = 'maya@orvane.example'\n";
+
+// A property list whose texts are one, with a reference of two bytes each.
+template <std::size_t uses, std::size_t bytes>
+std::string sharing() {
+    const Value texts = Array(uses, Value(std::string(bytes, 'x')));
+    const Data document =
+        codec::serializePropertyList(Dictionary{{"round", 2}, {"texts", texts}}, platform::PropertyListFormat::Binary)
+            .value();
+    return {document.begin(), document.end()};
+}
+std::string deep() {
+    std::string document = "<plist>";
+    for (int i = 0; i < 100'000; ++i) document += "<array>";
+    return document;
+}
+std::string many() {
+    Dictionary entries{{"round", 2}};
+    for (int i = 0; i < 90'000; ++i) entries["key" + std::to_string(i)] = i;
+    return host::propertyList(entries);
+}
+std::string huge() {
+    return std::string(100 << 20, 'x');
+}
 
 const Fault faults[] = {
     {"Unauthorized", "coverage:status=401", "s200 c1:401 t200 c2:401 t200 c3:401", NoRecord},
@@ -188,11 +228,33 @@ const Fault faults[] = {
     {"Empty", "coverage:empty", "s200 c1:200", NoRecord},
     {"Array", "coverage:array", "s200 c1:200", NoRecord},
     {"Nulls", "coverage:nulls", "s200 c1:200", RecordUnfiled},
+    {"Resets", "coverage:reset", "s200 c1:0", NoRecord},
+    {"Closes", "coverage:close", "s200 c1:0", NoRecord},
+    {"NotHttp", "coverage:not-http", "s200 c1:0", NoRecord},
+    {"Held", "coverage:hold", "s200 c1:0", NoRecord, {.isLong = true}},
+    {"Delayed", "coverage:delay=50ms", "s200 c1:200", NewRecord},
+    {"Number", "coverage:body=7", "s200 c1:200", NoRecord},
+    {"Deep", "coverage:deep", "s200 c1:200", NoRecord},
+    {"TooShort", "coverage:length-long", "s200 c1:200", NoRecord},
+    {"TooLong", "coverage:length-short", "s200 c1:200", NoRecord},
+    {"LargeHeaders", "coverage:large-headers", "s200 c1:200", NoRecord},
+    {"ManyReferences", "", "s200", NewRecord, {.warrantyURL = fromFile, .file = sharing<12'000, 650>}},
+    {"TooManyReferences", "", "s200", NoRecord, {.warrantyURL = fromFile, .file = sharing<60'000, 6'000>}},
+    {"ManyValues", "", "s200", NewRecord, {.warrantyURL = fromFile, .file = many}},
+    {"DeepFile", "", "s200", NoRecord, {.warrantyURL = fromFile, .file = deep}},
+    {"HugeFile", "", "s200", NoRecord, {.warrantyURL = fromFile, .file = huge}},
 
     {"VersionsTwiceAnArray", "server-version:array", "s200 s200! c1:200", NewRecord},
     {"OneVersion", "", "s200", NoRecord, {.document = R"({"highVersion": null})"}},
     {"VersionsAsStrings", "", "s200 c1:200", NewRecord, {.document = R"({"versionsAsStrings": true})"}},
     {"VersionsUnreachable", "", "c1:200", NewRecord, {.serverVersionURL = refusing}},
+    {"VersionsTooManyReferences",
+     "",
+     "c1:200",
+     NewRecord,
+     {.serverVersionURL = fromFile, .file = sharing<60'000, 6'000>}},
+    {"VersionsHuge", "server-version:large", "s200 c1:200", NewRecord},
+    {"VersionsBomb", "server-version:bomb=1100MiB", "s200 c1:200", NewRecord},
     {"VersionsNeverAnswered", "server-version:hang", "s0 c1:200", NewRecord, {.isLong = true}},
 
     {"HelperMissing", "coverage:status=401,count=1", "s200 c1:401 c1:200", NewRecord, {.helper = ""}},
@@ -213,8 +275,12 @@ TEST_P(NetworkFaults, EndAsTheyShould) {
     const Fault& fault = GetParam();
     std::optional<CoverageServer> tls;
     if (fault.change.warrantyURL == untrusted) tls.emplace(place_.path(), Arguments{"--tls"});
-    if (fault.change.warrantyURL) setDefault("WarrantyURL", tls ? tls->url() : fault.change.warrantyURL);
-    if (fault.change.serverVersionURL) setDefault("ServerVersionURL", fault.change.serverVersionURL);
+    if (fault.change.file) place_.write("file", fault.change.file());
+    auto url = [&](const char* meant) {
+        return meant == fromFile ? "file://" + (place_ / "file") : tls ? tls->url() : meant;
+    };
+    if (fault.change.warrantyURL) setDefault("WarrantyURL", url(fault.change.warrantyURL));
+    if (fault.change.serverVersionURL) setDefault("ServerVersionURL", url(fault.change.serverVersionURL));
     if (fault.change.document) server->ask("PATCH", "/document", fault.change.document);
     if (fault.change.helper) useHelper(fault.change.helper);
     if (fault.change.account) useAccount(fault.change.account);
@@ -234,7 +300,7 @@ TEST_P(NetworkFaults, EndAsTheyShould) {
     EXPECT_TRUE(isPending || !fault.change.isLong) << "the other client had to wait";
     const auto record = replied.get()->warranty();
 
-    EXPECT_LT(peakMemory() - memoryBefore, 64 * 1024) << "KiB";
+    EXPECT_TRUE(host::isSanitized || peakMemory() - memoryBefore < mostMemory) << peakMemory() - memoryBefore;
     EXPECT_EQ(server->requests(1 + std::ranges::count(std::string_view(fault.requests), ' ')), fault.requests);
     if (tls) {
         EXPECT_EQ(tls->ask("GET", "/counters")["handshakeFailures"], Value(1));

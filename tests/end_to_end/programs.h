@@ -2,8 +2,6 @@
 // but what they do.
 #pragma once
 
-#include <gtest/gtest.h>
-
 #include <memory>
 #include <optional>
 #include <string>
@@ -70,11 +68,6 @@ public:
     Place();
 
     void write(const std::string& name, const std::string& text) const { host::writeFile(*this / name, text); }
-
-    void setMode(const std::string& name, unsigned mode) const {
-        std::filesystem::permissions(*this / name, std::filesystem::perms(mode));
-    }
-
     // An agent of this place: comes back once it is ready.
     void start();
     Process& agent() { return *agent_; }
@@ -87,7 +80,7 @@ public:
         int code;
         std::string output;
         std::string errors;
-        platform::Value document;  // of the output, null when it is no JSON
+        Value document;  // of the output, null when it is no JSON
     };
     Outcome vrxctl(const Arguments& arguments, const std::string& socket = "socket") const;
     Outcome vrxhost(const Arguments& arguments) const;

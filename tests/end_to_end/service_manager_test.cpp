@@ -1,6 +1,4 @@
 // The agent under a service manager, which the test stands in for: notices, the socket handed over, its capability.
-#include <gtest/gtest.h>
-
 #include <poll.h>
 #include <sys/inotify.h>
 #include <sys/stat.h>

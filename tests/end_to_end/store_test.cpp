@@ -1,6 +1,4 @@
 // What vrxctl tells of an application, and what the agent asked the store for it, whatever the store does.
-#include <gtest/gtest.h>
-
 #include <algorithm>
 #include <cstdlib>
 #include <regex>
@@ -10,8 +8,6 @@
 
 namespace vrx::end_to_end {
 namespace {
-
-using platform::Value;
 
 constexpr const char* storeFile = R"({
     "items": [
@@ -77,7 +73,7 @@ protected:
         EXPECT_EQ(text.code, code) << text.errors;
         Value wanted = answer ? codec::parseJson(answer).value() : Value();
         if (verb == "support") {
-            platform::Dictionary entries = wanted.isNull() ? platform::Dictionary() : *wanted.asDictionary();
+            Dictionary entries = wanted.isNull() ? Dictionary() : *wanted.asDictionary();
             entries["AppBundleID"] = bundle;
             wanted = entries;
         }

@@ -1,7 +1,9 @@
 // Follow-ups as they are decided, filled, posted, refreshed, dismissed and migrated, on the simulated service.
 #include "vrx/followup/follow_up.h"
 
+#include <atomic>
 #include <regex>
+#include <thread>
 
 #include "support/simulated_host.h"
 #include "vrx/devices/records/device_info.h"
@@ -226,6 +228,41 @@ TEST_F(FollowUpTest, RemembersWhatWasDismissed) {
     for (int i = 0; i < 2; ++i) VRXFollowUp().dismissFollowUpForSerialNumber("A");
     EXPECT_EQ(host.defaults.get(dismissedSerialNumberHashesKey), Value(Array{sha256Hash("A"), sha256Hash("A")}));
     EXPECT_EQ(outcome(), "clear A, clear A, clear A -> B");
+}
+
+// A service of one item, whose dismissal comes while a refresh has listed it and not yet posted it.
+class DismissedMeanwhile final : public VRXFollowUpProvider {
+public:
+    explicit DismissedMeanwhile(FollowUpItem item) : item_(std::move(item)) {}
+    bool postFollowUpItem(const FollowUpItem&, MaybeError*) override {
+        isPending = true;
+        return true;
+    }
+    bool clearPendingFollowUpItemsWithUniqueIdentifiers(const std::vector<std::string>&, MaybeError*) override {
+        isPending = false;
+        return true;
+    }
+    std::vector<FollowUpItem> pendingFollowUpItems(MaybeError*) override {
+        dismissal = std::thread([this] {
+            const std::shared_ptr<VRXFollowUpProvider> notOwned(this, [](auto*) {});
+            VRXFollowUp(notOwned).dismissFollowUpForSerialNumber("A");
+        });
+        for (int i = 0; i < 1000 && isPending; ++i) std::this_thread::yield();
+        return {item_};
+    }
+
+    std::atomic<bool> isPending = true;
+    std::thread dismissal;
+
+private:
+    const FollowUpItem item_;
+};
+
+TEST_F(FollowUpTest, ARefreshDoesNotUndoADismissal) {
+    auto provider = std::make_shared<DismissedMeanwhile>(itemOf("A"));
+    VRXFollowUp(provider).refreshFollowupWithDeviceInfos({a});
+    provider->dismissal.join();
+    EXPECT_FALSE(provider->isPending);
 }
 
 TEST_F(FollowUpTest, MigratesTheOneItemOfTheOlderLayout) {

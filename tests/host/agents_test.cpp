@@ -1,6 +1,4 @@
 // The agent on the host's real queues: what races would show here, under the thread sanitizer.
-#include <gtest/gtest.h>
-
 #include <atomic>
 #include <future>
 #include <latch>
@@ -33,14 +31,14 @@ protected:
         defaults().set("WarrantyURL", "file://" + folder_ / "Warranty.plist");
         defaults().set("ServerVersionURL", "file://" + folder_ / "versions.plist");
     }
-    void writeRecord(const std::string& name, const platform::Dictionary& entries) const {
+    void writeRecord(const std::string& name, const Dictionary& entries) const {
         writeFile(folder_ / (name + ".plist"), propertyList(entries));
     }
     static platform::DefaultsStore& defaults() { return platform::Platform::current().defaultsStore(); }
 
 private:
     TemporaryFolder folder_;
-    Host host_{{.home = folder_ / "home", .profile = folder_ / "device.toml"}, platform::Level::Error};
+    Host host_{{.home = folder_ / "home", .profile = {folder_ / "device.toml"}}, platform::Level::Error};
 };
 
 TEST_F(Agents, AnswerOverlappingAllDevicesRequests) {
@@ -61,7 +59,7 @@ TEST_F(Agents, AnswerOverlappingAllDevicesRequests) {
 }
 
 TEST_F(Agents, FindTheEarliestOfDatesThatComeAtOnce) {
-    const platform::Dictionary offer{{"qxOfferDisplay", true}};
+    const Dictionary offer{{"qxOfferDisplay", true}};
     for (auto [serialNumber, date] : {std::pair("PHONE", 3000000000), {"W1", 2900000000}, {"W2", 2950000000}})
         writeRecord(std::string("Warranty.") + serialNumber,
                     {{"featureToggleParameters", offer}, {"qxOfferFollowupDisplayDate", date}});
@@ -73,7 +71,7 @@ TEST_F(Agents, FindTheEarliestOfDatesThatComeAtOnce) {
         outreach->performActivityForScheduler(VRXScheduler::newSchedulerWithActivityDelegate(outreach),
                                               [&](auto given) { result.set_value(given); });
         ASSERT_EQ(result.get_future().get(), platform::BackgroundActivityResult::Finished);
-        ASSERT_EQ(defaults().date(targetDate), platform::dateFromEpoch(2900000000));
+        ASSERT_EQ(defaults().date(targetDate), dateFromEpoch(2900000000));
     }
 }
 

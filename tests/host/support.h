@@ -3,7 +3,6 @@
 #pragma once
 
 #include <fcntl.h>
-#include <gtest/gtest.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -16,6 +15,7 @@
 #include <string>
 #include <vector>
 
+#include "support/values.h"
 #include "vrx/codec/codec.h"
 #include "vrx/codec/property_list.h"
 #include "vrx/host/base/descriptor.h"
@@ -24,6 +24,15 @@
 #include "vrx/platform/platform.h"
 
 namespace vrx::host {
+
+// Under the address or the thread sanitizer.
+#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
+inline constexpr bool isSanitized = true;
+#elif defined(__has_feature)
+inline constexpr bool isSanitized = __has_feature(address_sanitizer) || __has_feature(thread_sanitizer);
+#else
+inline constexpr bool isSanitized = false;
+#endif
 
 class TemporaryFolder {
 public:
@@ -43,12 +52,15 @@ public:
         std::sort(names.begin(), names.end());
         return names;
     }
+    void setMode(const std::string& name, unsigned mode) const {
+        std::filesystem::permissions(*this / name, std::filesystem::perms(mode));
+    }
 
 private:
     std::string path_;
 };
 
-inline platform::Data bytes(std::string_view text) {
+inline Data bytes(std::string_view text) {
     return {text.begin(), text.end()};
 }
 
@@ -64,17 +76,16 @@ inline std::string fileText(const std::string& path) {
 }
 
 // What a folder's files hold, and when each was written; without the index that a database's readers share.
-inline platform::Dictionary contentsOf(const std::string& folder) {
-    platform::Dictionary contents;
+inline Dictionary contentsOf(const std::string& folder) {
+    Dictionary contents;
     for (const auto& entry : std::filesystem::recursive_directory_iterator(folder))
         if (entry.is_regular_file() && !entry.path().string().ends_with("-shm"))
-            contents[entry.path()] =
-                platform::Array{fileText(entry.path()), entry.last_write_time().time_since_epoch().count()};
+            contents[entry.path()] = Array{fileText(entry.path()), entry.last_write_time().time_since_epoch().count()};
     return contents;
 }
 
 // A property list in XML.
-inline std::string propertyList(const platform::Dictionary& entries) {
+inline std::string propertyList(const Dictionary& entries) {
     const auto written = codec::serializePropertyList(entries, platform::PropertyListFormat::Xml);
     return {written->begin(), written->end()};
 }
@@ -120,7 +131,7 @@ struct Pipe {
 
 class SettableClock final : public platform::Clock {
 public:
-    platform::Date now() const override { return platform::dateFromEpoch(seconds); }
+    Date now() const override { return dateFromEpoch(seconds); }
     std::chrono::seconds timeZoneOffset() const override { return {}; }
     std::atomic<double> seconds = 784'111'777;  // 1994-11-06 08:49:37
 };
@@ -144,6 +155,13 @@ private:
     codec::Digest digest_;
     platform::Platform platform_{{.digest = &digest_, .systemLog = this}};
     platform::ScopedPlatform current_{platform_};
+};
+
+// A test that has a folder and sees what is logged.
+class InFolder : public testing::Test {
+protected:
+    LogRecorder log;
+    TemporaryFolder folder;
 };
 
 }  // namespace vrx::host

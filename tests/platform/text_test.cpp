@@ -1,18 +1,15 @@
 // The texts that log lines are made of, and the lines.
 #include "vrx/platform/text.h"
 
-#include <gmock/gmock.h>
-
 #include <thread>
 
+#include "support/values.h"
 #include "vrx/platform/sha256_hash.h"
 #include "vrx/platform/value.h"
 #include "vrx/sim/host.h"
 
 namespace vrx::platform {
 namespace {
-
-using testing::ElementsAre;
 
 TEST(Describe, GivesTheTextOfAnyValue) {
     EXPECT_EQ(Value().description(), "(null)");
@@ -67,6 +64,17 @@ TEST(Log, FillsEachPlaceholderAndRedactsWhatIsPrivate) {
     EXPECT_EQ(entry.message(true), "-[Class operation:]: (null) S%@1 (1/-2) -3 4 -0.12 s key");
     EXPECT_TRUE(std::string_view(entry.file).ends_with("text_test.cpp"));
     EXPECT_FALSE(host.log.contains("%s")) << "asked for by whole formats";
+}
+
+TEST(Log, DescribesNoMoreOfAnArgumentThanItsLimit) {
+    sim::Host host;
+    const std::string text = std::string(limits::logArgumentBytes - 1, 'x') + "é" + std::string(9, 'y');
+    log(Level::Default, "%@", text);
+    log(Level::Default, "%@", Value(Array(100'000, Value(std::string(1000, 'x')))));
+    const std::vector<std::string> lines = host.log.messages(Level::Default);
+    EXPECT_EQ(lines.at(0), std::string(limits::logArgumentBytes - 1, 'x') + "... (11 more bytes)");
+    EXPECT_LT(lines.at(1).size(), limits::logArgumentBytes + 100);
+    EXPECT_EQ(describe(text), text) << "only the log is brief";
 }
 
 TEST(Log, PutsNoLineTogetherThatNobodyReads) {

@@ -13,11 +13,7 @@ TEST(Url, NeedsAScheme) {
 }
 
 TEST(Url, GivesThePathOfALocalFileOnly) {
-    struct Case {
-        const char* url;
-        std::optional<std::string> path;
-    };
-    const Case cases[] = {
+    const std::pair<const char*, std::optional<std::string>> cases[] = {
         {"file:///a/b", "/a/b"},         {"FILE:/a", "/a"},
         {"file://localhost/a", "/a"},    {"file:///a%20%C3%A9?query#fragment", "/a \xC3\xA9"},
         {"file:///a%2e%2E/b", "/a../b"}, {"file://elsewhere/a", std::nullopt},
@@ -31,12 +27,7 @@ TEST(Url, GivesThePathOfALocalFileOnly) {
 }
 
 TEST(Url, ReplacesTheExtensionOfTheLastComponent) {
-    struct Case {
-        const char* url;
-        const char* extension;
-        const char* replaced;  // by S.x
-    };
-    const Case cases[] = {
+    const std::tuple<const char*, const char*, const char*> cases[] = {
         {"file:///d/Warranty.plist", "plist", "file:///d/Warranty.S.x"},
         {"file:///d.e/Warranty", "", "file:///d.e/Warranty.S.x"},
         {"file:///d/.hidden", "", "file:///d/.hidden.S.x"},

@@ -3,6 +3,7 @@
 #include <cmath>
 
 #include "scheduling/agent_world.h"
+#include "vrx/platform/known_settings.h"
 
 namespace vrx {
 namespace {
@@ -139,6 +140,11 @@ TEST(AgentLife, TakesTheLastDayEasy) {
     const std::size_t firings = world.host.activities.firings().size();
     world.runToDay(50);
     EXPECT_EQ(world.host.activities.firings().size(), firings);
+    for (const auto& [key, value] : world.host.defaults.dictionaryRepresentation()) {
+        const platform::KnownSetting* setting = platform::findSetting(key);
+        ASSERT_TRUE(setting) << key;
+        EXPECT_TRUE(platform::isOfType(value, setting->type)) << key;
+    }
 }
 
 // An offer that ended without ever being posted has its post tried for as long as the server asks for it.

@@ -41,6 +41,8 @@ struct Case {
     const char* name;
     std::vector<Device> devices{};
     std::optional<double> expected{};
+    bool isInitial = true;  // else there is a refresh a day from now
+    double oneDay = 1;
 };
 
 void expectDate(const Case& c, const std::optional<Date>& date) {
@@ -91,6 +93,7 @@ TEST(RefreshDate, FollowsTheRule) {
     const Device changesIn75{.activated = -3, .until = 10.75}, changesIn25{.activated = -3, .until = 7.25};
     const Device withoutEnd{.activated = -3}, withoutActivation{.shownFrom = -4, .until = 10.5},
         shownSoon{.activated = -1.9, .until = 30};
+    const Device shownIn3{.activated = 1, .until = 10.5}, changesInHalfAnHour{.activated = -3, .until = 10.5 / 24};
     const Case cases[] = {
         {.name = "no device"},
         {.name = "shown, the day count changes", .devices = {shown}, .expected = 0.5},
@@ -110,26 +113,15 @@ TEST(RefreshDate, FollowsTheRule) {
         {.name = "no activation, the record's day to come", .devices = {{.shownFrom = 4, .until = 20}}, .expected = 4},
         {.name = "no activation, the record's day passed", .devices = {withoutActivation}},
         {.name = "no activation, after a date", .devices = {changesIn75, withoutActivation}, .expected = 0.5},
+        {.name = "a later call, no device", .expected = 1, .isInitial = false},
+        {.name = "a later call, shown", .devices = {shown}, .expected = 0.5, .isInitial = false},
+        {.name = "a later call, the count changes first", .devices = {shownIn3}, .expected = 0.5, .isInitial = false},
+        {.name = "a later call, ended", .devices = {ended}, .expected = -3, .isInitial = false},
+        {.name = "days of an hour", .devices = {changesInHalfAnHour}, .expected = 0.5 / 24, .oneDay = 1.0 / 24},
+        {.name = "days of no length", .devices = {shown}, .oneDay = 0},
     };
-    for (const Case& c : cases) expectDate(c, nextRefreshDate(infos(c.devices), true, {days(1), days(2)}, now));
-}
-
-TEST(RefreshDate, BeginsADayFromNowUnlessTheCallIsInitial) {
-    sim::Host host;
-    const Device notYet{.activated = 1, .until = 10.5}, changesInHalfAnHour{.activated = -3, .until = 10.5 / 24};
-    const Case cases[] = {
-        {.name = "no device", .expected = 1},
-        {.name = "shown", .devices = {shown}, .expected = 0.5},
-        {.name = "not shown yet, the count changes first", .devices = {notYet}, .expected = 0.5},
-        {.name = "ended", .devices = {ended}, .expected = -3},
-    };
-    for (const Case& c : cases) expectDate(c, nextRefreshDate(infos(c.devices), false, {days(1), days(2)}, now));
-
-    // In days of their set length.
-    const RefreshDateSettings hours{.oneDay = days(1.0 / 24)}, noLength{.oneDay = Duration(0)};
-    expectDate({.name = "hours", .expected = 0.5 / 24},
-               nextRefreshDate(infos({changesInHalfAnHour}), true, hours, now));
-    expectDate({.name = "no length"}, nextRefreshDate(infos({shown}), true, noLength, now));
+    for (const Case& c : cases)
+        expectDate(c, nextRefreshDate(infos(c.devices), c.isInitial, {days(c.oneDay), days(2)}, now));
 }
 
 }  // namespace

@@ -42,18 +42,14 @@ protected:
 };
 
 TEST_F(SchedulerTest, RegistersTruncatedCriteriaAndStoresTheDateAsItIs) {
-    struct Case {
-        double delay;
-        std::int64_t registered, gracePeriod;
-    };
-    for (const Case& c : {Case{172800, 172800, 17280}, {1, 1, 0}, {9.99, 9, 0}, {95, 95, 9}, {-50, 0, 0}}) {
-        const Date date = host.clock.now() + Duration(c.delay);
+    for (const auto& [delay, registered, gracePeriod] :
+         {std::tuple(172800.0, 172800, 17280), {1, 1, 0}, {9.99, 9, 0}, {95, 95, 9}, {-50, 0, 0}}) {
+        const Date date = host.clock.now() + Duration(delay);
         for (bool isByDate : {false, true}) {
             host.defaults.remove(key);
-            isByDate ? scheduler->scheduleActivityForDate(date)
-                     : scheduler->scheduleActivityWithDelay(Duration(c.delay));
-            EXPECT_EQ(host.activities.criteria("activity"), (ActivityCriteria{c.registered, c.gracePeriod, true}));
-            EXPECT_EQ(scheduler->scheduledActivityDate(), date) << c.delay;
+            isByDate ? scheduler->scheduleActivityForDate(date) : scheduler->scheduleActivityWithDelay(Duration(delay));
+            EXPECT_EQ(host.activities.criteria("activity"), (ActivityCriteria{registered, gracePeriod, true}));
+            EXPECT_EQ(scheduler->scheduledActivityDate(), date) << delay;
         }
     }
     EXPECT_EQ(host.log.lastMessage("scheduled '%@' with delay: %.02f (%@)"),

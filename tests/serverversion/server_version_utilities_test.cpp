@@ -34,10 +34,7 @@ protected:
 };
 
 TEST_F(ServerVersionTest, SharesTheTwoNamedVersionsOnly) {
-    struct {
-        Value document;
-        bool supported, high;
-    } const cases[] = {
+    const std::tuple<Value, bool, bool> cases[] = {
         {versions(3, 4), true, true},
         {versions(1, 4), false, false},
         {versions(2, 2), true, false},
@@ -51,15 +48,22 @@ TEST_F(ServerVersionTest, SharesTheTwoNamedVersionsOnly) {
         {Dictionary{{"LowServerVersion", 3}}, false, false},
         {Dictionary{{"HighServerVersion", 3}}, false, false},
     };
-    for (const auto& test : cases) {
-        SCOPED_TRACE(test.document.description());
-        serve(test.document);
-        EXPECT_EQ(supported(), test.supported);
-        EXPECT_EQ(host.defaults.get(cacheKey), test.document);
-        EXPECT_EQ(high(VRXServerLookupPolicyLocal), test.high);
-        EXPECT_EQ(Utilities::isHighServerVersionFeaturesetEnabled(), test.high);
+    for (const auto& [document, isSupported, isHigh] : cases) {
+        SCOPED_TRACE(document.description());
+        serve(document);
+        EXPECT_EQ(supported(), isSupported);
+        EXPECT_EQ(host.defaults.get(cacheKey), document);
+        EXPECT_EQ(high(VRXServerLookupPolicyLocal), isHigh);
+        EXPECT_EQ(Utilities::isHighServerVersionFeaturesetEnabled(), isHigh);
     }
     EXPECT_TRUE(host.log.contains("Server version dictionary missing key '%@'"));
+    constexpr std::int64_t large = (std::int64_t{1} << 53) + 1;  // as a double the same as the integer before
+    host.defaults.set("HighServerVersion", large);
+    for (const auto& [number, isHigh] : {std::pair<Value, bool>(large, true), {large - 1, false}, {1e300, false}}) {
+        serve(versions(1, number));
+        EXPECT_EQ(supported(), isHigh) << number.description();
+        EXPECT_EQ(high(VRXServerLookupPolicyLocal), isHigh);
+    }
 }
 
 TEST_F(ServerVersionTest, ARefreshFallsBackToCacheThenClientAndStoresWhatItUsed) {

@@ -165,9 +165,8 @@ TEST_F(AgentTest, OnlyEntitledCallersAreServed) {
     for (const Value& held : {Value(), Value(false), Value("true"), Value(1), Value(Dictionary{})}) {
         host.log.clear();
         EXPECT_FALSE(host.listener.connect(7, {{entitlement, held}})) << held.description();
-        EXPECT_EQ(
-            host.log.messages(platform::Level::Error),
-            std::vector<std::string>{"Rejecting connection to vrxagent: missing entitlement '" + entitlement + "'"});
+        EXPECT_THAT(host.log.messages(platform::Level::Error),
+                    ElementsAre("Rejecting connection to vrxagent: missing entitlement '" + entitlement + "'"));
     }
 
     host.bundles.addApplication(7, "com.example.client");

@@ -12,8 +12,8 @@ Value storedBefore(double seconds) {
     return sim::Clock::start - Duration(seconds);
 }
 
-// What a provider has of a device, and which record answers a lookup then: by the default policy, where the download
-// succeeds and where it fails, and by the policy that never downloads.
+// What a provider has of a device, and which record answers a lookup then: by the default policy, and without a
+// download, because it fails or by the policy that asks for none.
 struct State {
     const char* name;
     bool isCached = true;
@@ -21,7 +21,7 @@ struct State {
     Value version = "2";
     Value locale = "en_US";
     bool isSignedIn = true;
-    Answer byDefault = Downloaded, byDefaultOffline = Nothing, byCachedOnly = Nothing;
+    Answer byDefault = Downloaded, withoutDownload = Nothing;
 };
 
 // Has what a test says; it counts the downloads asked of it.
@@ -78,25 +78,21 @@ TEST_P(LookupPolicyTest, AnswersByPolicyAndCache) {
     const State& state = provider->state = GetParam();
     const int downloads = state.byDefault == Downloaded ? 1 : 0;
     expectAnswer(VRXWarrantyLookupPolicyDefault, true, state.byDefault, downloads);
-    expectAnswer(VRXWarrantyLookupPolicyDefault, false, state.byDefaultOffline, downloads);
+    expectAnswer(VRXWarrantyLookupPolicyDefault, false, state.withoutDownload, downloads);
     expectAnswer(VRXWarrantyLookupPolicyRefresh, true, Downloaded, 1);
     expectAnswer(VRXWarrantyLookupPolicyRefresh, false, Nothing, 1);
     constexpr VRXWarrantyLookupPolicy unknown = 77;
     for (const auto policy : {VRXWarrantyLookupPolicyCachedOnly, VRXWarrantyLookupPolicyRefresh + 1, unknown})
-        expectAnswer(policy, true, state.byCachedOnly, 0);
+        expectAnswer(policy, true, state.withoutDownload, 0);
 }
 
 const State states[] = {
-    {.name = "Fresh", .byDefault = Cached, .byDefaultOffline = Cached, .byCachedOnly = Cached},
-    {.name = "FromTheFuture",
-     .lastUpdated = storedBefore(-1e9),
-     .byDefault = Cached,
-     .byDefaultOffline = Cached,
-     .byCachedOnly = Cached},
-    {.name = "JustExpired", .lastUpdated = storedBefore(86400), .byDefaultOffline = Cached, .byCachedOnly = Cached},
-    {.name = "OneYearOld", .lastUpdated = storedBefore(3e7), .byDefaultOffline = Cached, .byCachedOnly = Cached},
-    {.name = "NoDate", .lastUpdated = nullptr, .byDefaultOffline = Cached, .byCachedOnly = Cached},
-    {.name = "DateOfWrongType", .lastUpdated = "today", .byDefaultOffline = Cached, .byCachedOnly = Cached},
+    {.name = "Fresh", .byDefault = Cached, .withoutDownload = Cached},
+    {.name = "FromTheFuture", .lastUpdated = storedBefore(-1e9), .byDefault = Cached, .withoutDownload = Cached},
+    {.name = "JustExpired", .lastUpdated = storedBefore(86400), .withoutDownload = Cached},
+    {.name = "OneYearOld", .lastUpdated = storedBefore(3e7), .withoutDownload = Cached},
+    {.name = "NoDate", .lastUpdated = nullptr, .withoutDownload = Cached},
+    {.name = "DateOfWrongType", .lastUpdated = "today", .withoutDownload = Cached},
     {.name = "None", .isCached = false},
     {.name = "OldVersion", .version = "1"},
     {.name = "NoVersion", .version = nullptr},
@@ -110,14 +106,13 @@ TEST_F(LookupTest, LogsWhyInOrder) {
     provider->state.lastUpdated = storedBefore(86400);
     host.log.clear();
     expectAnswer(VRXWarrantyLookupPolicyDefault, false, Cached, 1);
-    EXPECT_EQ(host.log.messages(platform::Level::Default),
-              (std::vector<std::string>{
-                  "getting warranty using policy A: 0", "Has cached warranty : A",
-                  "cached warranty is for locale ('en_US') and version ('2') match system, consider it valid",
-                  "Default policy query: cached warranty is valid, examine expiration date",
-                  "warranty validity expired 0.00 seconds ago, refresh it",
-                  "-[VRXAgent getWarrantyUsingPolicy:serialNumber:withReply:]: shouldDownloadWarranty: 1",
-                  "getWarrantyUsingPolicy completionBlock A : 0"}));
+    EXPECT_THAT(host.log.messages(platform::Level::Default),
+                ElementsAre("getting warranty using policy A: 0", "Has cached warranty : A",
+                            "cached warranty is for locale ('en_US') and version ('2') match system, consider it valid",
+                            "Default policy query: cached warranty is valid, examine expiration date",
+                            "warranty validity expired 0.00 seconds ago, refresh it",
+                            "-[VRXAgent getWarrantyUsingPolicy:serialNumber:withReply:]: shouldDownloadWarranty: 1",
+                            "getWarrantyUsingPolicy completionBlock A : 0"));
     host.log.clear();
     expectAnswer(VRXWarrantyLookupPolicyCachedOnly, true, Cached, 0);
     EXPECT_FALSE(host.log.contains("Default policy query: cached warranty is valid, examine expiration date"));

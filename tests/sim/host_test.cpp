@@ -8,7 +8,6 @@
 namespace vrx::sim {
 namespace {
 
-using namespace std::chrono_literals;
 using platform::HttpRequest;
 using platform::HttpResponse;
 
@@ -23,10 +22,8 @@ protected:
         });
     }
     void get(const std::string& url) { send(host.http.shared(), requestTo(url)); }
-    static HttpRequest requestTo(const std::string& url) {
-        HttpRequest request;
-        request.url = url;
-        return request;
+    static HttpRequest requestTo(const std::string& url, std::optional<Duration> timeout = {}) {
+        return {.url = url, .headers = {}, .body = {}, .timeout = timeout};
     }
     std::vector<std::string> texts() const {
         std::vector<std::string> texts;
@@ -59,9 +56,7 @@ TEST_F(SimHttp, AnswersAsLaidDownOnceBeforeStanding) {
 TEST_F(SimHttp, HonoursDelaysAndTimeouts) {
     host.http.answer("http://slow/", HttpAnswer::ok("x").after(45s));
     host.http.answer("http://silent/", HttpAnswer::silence());
-    HttpRequest impatient = requestTo("http://slow/");
-    impatient.timeout = 30s;
-    send(host.http.shared(), impatient);
+    send(host.http.shared(), requestTo("http://slow/", 30s));
     get("http://slow/");
     get("http://silent/");
     host.runFor(2min);

@@ -6,8 +6,6 @@
 namespace vrx::sim {
 namespace {
 
-using namespace std::chrono_literals;
-
 class SimProcess : public testing::Test {
 protected:
     void launch() {

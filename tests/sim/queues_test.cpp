@@ -6,7 +6,6 @@
 namespace vrx::sim {
 namespace {
 
-using namespace std::chrono_literals;
 using platform::Priority;
 using platform::Task;
 
@@ -30,6 +29,7 @@ protected:
     Host host;
     platform::Queue& main = host.queues.mainQueue();
     platform::Queue& worker = host.queues.workers(Priority::Background);
+    const std::shared_ptr<platform::Event> event = host.queues.makeEvent();
 };
 
 TEST_F(SimQueues, RunWhatIsDueInTheOrderOfTimeThenOfPosting) {
@@ -84,10 +84,7 @@ TEST_F(SimQueues, EndWaitsInTheOrderOfTheirEventsNotOfTheirNesting) {
 }
 
 TEST_F(SimQueues, LimitWaitsInVirtualTime) {
-    auto event = host.queues.makeEvent();
-    auto outcome = [&](Duration limit) {
-        return [this, event, limit] { note(event->waitFor(limit) ? "set" : "late"); };
-    };
+    auto outcome = [this](Duration limit) { return [this, limit] { note(event->waitFor(limit) ? "set" : "late"); }; };
     worker.post(outcome(0s));
     worker.post(outcome(4s));
     worker.post(outcome(6s));
@@ -101,7 +98,6 @@ TEST_F(SimQueues, LimitWaitsInVirtualTime) {
 }
 
 TEST_F(SimQueues, RunWhileTheBodyWaitsAndNoLonger) {
-    auto event = host.queues.makeEvent();
     main.postAfter(5s, [&] { event->set(); });
     main.postAfter(6s, noting("later"));
     EXPECT_FALSE(event->waitFor(2s));
@@ -112,7 +108,6 @@ TEST_F(SimQueues, RunWhileTheBodyWaitsAndNoLonger) {
 }
 
 TEST_F(SimQueues, ReportAWaitThatNothingCanEnd) {
-    auto event = host.queues.makeEvent();
     auto serial = host.queues.makeSerialQueue("stuck");
     serial->post([&] { event->wait(); });
     serial->post([&] { event->set(); });
@@ -124,8 +119,7 @@ TEST_F(SimQueues, ReportAWaitThatNothingCanEnd) {
 TEST_F(SimQueues, ReportATaskThatStillWaitsAtTheEndAndFreeWhatItHolds) {
     auto held = std::make_shared<int>();
     std::weak_ptr<int> watch = held;
-    auto event = host.queues.makeEvent();
-    worker.post([held = std::move(held), event] {
+    worker.post([this, held = std::move(held)] {
         auto alsoHeld = held;
         event->waitFor(1h);
         ADD_FAILURE() << "the wait of an abandoned task returned";
@@ -161,7 +155,6 @@ TEST_F(SimQueues, ReportWorkThatNeverEndsAndATaskThatRunsTheQueuesItself) {
 }
 
 TEST_F(SimQueues, ReuseStacksAndLetAThousandTasksWait) {
-    auto event = host.queues.makeEvent();
     int done = 0;
     for (int round = 0; round < 2; ++round) {
         for (int i = 0; i < 1000; ++i)

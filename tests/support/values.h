@@ -1,4 +1,4 @@
-// The names of property values and of matchers that tests speak, whatever layer they test.
+// The names of property values, durations and matchers that tests speak, whatever layer they test.
 #pragma once
 
 #include <gmock/gmock.h>
@@ -15,10 +15,13 @@ using platform::Date;
 using platform::dateFromEpoch;
 using platform::Dictionary;
 using platform::Duration;
+using platform::MaybeError;
 using platform::Value;
+using testing::AllOf;
 using testing::ElementsAre;
 using testing::HasSubstr;
 using testing::IsEmpty;
+using namespace std::chrono_literals;
 
 // Why there is no result; nothing when there is one.
 template <class T>

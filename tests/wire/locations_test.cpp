@@ -1,5 +1,6 @@
 #include "vrx/wire/locations.h"
 
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <map>
@@ -7,6 +8,8 @@
 
 namespace vrx::wire {
 namespace {
+
+using ::testing::ElementsAre;
 
 const std::string bareHome = "/home/ada/.local/state/vrxagent";
 
@@ -27,28 +30,29 @@ struct Machine {
 TEST(Locations, GoFromTheCommandLineToTheBareMachine) {
     Machine machine;
     EXPECT_EQ(machine.find().home.path, bareHome);
-    EXPECT_EQ(machine.find().profile.path, "");
     EXPECT_EQ(machine.find().socket.path, bareHome + "/com.orvane.vrxagent");
 
-    machine.files = {"/etc/vrxagent/device.toml", "/run/vrxagent"};
-    EXPECT_EQ(machine.find().profile.path, "/etc/vrxagent/device.toml");
+    machine.files = {"/run/vrxagent"};
     EXPECT_EQ(machine.find().socket.path, "/run/vrxagent/com.orvane.vrxagent");
 
     machine.variables["XDG_STATE_HOME"] = "/state";
     machine.variables["XDG_CONFIG_HOME"] = "/config";
     machine.variables["XDG_RUNTIME_DIR"] = "/run/user/7";
     EXPECT_EQ(machine.find().home.path, "/state/vrxagent");
-    EXPECT_EQ(machine.find().profile.path, "/etc/vrxagent/device.toml") << "the user has none";
     EXPECT_EQ(machine.find().socket.path, "/run/user/7/com.orvane.vrxagent");
-    machine.files.insert("/config/vrxagent/device.toml");
-    EXPECT_EQ(machine.find().profile.path, "/config/vrxagent/device.toml");
+    EXPECT_THAT(machine.find().profile,
+                ElementsAre("/usr/lib/vrxagent/device.d/", "/etc/vrxagent/device.toml", "/etc/vrxagent/device.d/",
+                            "/run/vrxagent/device.d/", "/config/vrxagent/device.toml", "/config/vrxagent/device.d/"));
+    machine.variables["XDG_CONFIG_HOME"] = "";
+    EXPECT_EQ(machine.find().profile.size(), 4u) << "of a device, not of a user";
 
     machine.variables["STATE_DIRECTORY"] = "/var/lib/vrxagent:/var/lib/other";
     EXPECT_EQ(machine.find().home.path, "/var/lib/vrxagent");
     EXPECT_EQ(machine.find().home.chosenBy, "$STATE_DIRECTORY");
 
     Locations chosen = machine.find({.home = "h", .profile = "p", .socket = "s"});
-    EXPECT_EQ(chosen.home.path + chosen.profile.path + chosen.socket.path, "hps");
+    EXPECT_EQ(chosen.home.path + chosen.socket.path, "hs");
+    EXPECT_THAT(chosen.profile, ElementsAre("p")) << "the only layer";
     EXPECT_EQ(machine.find({.home = "h"}).socket.path, "/run/user/7/com.orvane.vrxagent");
 }
 

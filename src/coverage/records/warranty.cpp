@@ -219,7 +219,7 @@ std::optional<Date> VRXWarranty::_dateWithEpochNumber(const Value& number) {
     constexpr std::uint64_t largestSeconds = 10'000'000'000;  // above it, milliseconds
     constexpr double twoTo64 = 18446744073709551616.0;
     std::optional<double> real = number.asNumber();
-    if (!real || !std::isfinite(*real) || *real < 0) return std::nullopt;
+    if (!real || !std::isfinite(*real) || *real <= -1) return std::nullopt;
     std::uint64_t whole =
         *real < twoTo64 ? static_cast<std::uint64_t>(*real) : std::numeric_limits<std::uint64_t>::max();
     if (auto integer = number.asInteger()) whole = static_cast<std::uint64_t>(*integer);  // exact beyond 2^53 too

@@ -58,7 +58,7 @@ RenewalResult AccountStore::renew(const CredentialRenewals::Question& question, 
     const std::shared_ptr<const ProfileContent> content = profile_.content();
     if (!content->account || content->account->credentialHelper.empty())
         return failed(credentialError(CredentialFailure::NotConfigured, "no credential helper is configured"));
-    if (const auto open = content->findOpenToOthers())
+    if (const auto open = content->account->credentialHelperSource.findOpenToOthers())
         return failed(credentialError(CredentialFailure::NotTrusted,
                                       "the credential helper is not run: others can write " + open->path));
     for (const std::string& service : question.options.services) {

@@ -5,15 +5,23 @@
 #include <signal.h>
 #include <spawn.h>
 #include <sys/mman.h>
+#include <sys/prctl.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <array>
+#include <atomic>
 #include <cerrno>
 #include <chrono>
 #include <cstdlib>
 #include <cstring>
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <optional>
+#include <thread>
+#include <utility>
 
 #include "vrx/host/account/credentials.h"
 #include "vrx/host/base/descriptor.h"
@@ -51,7 +59,49 @@ Error cannotStart(const std::string& program, int number) {
                            "the credential helper " + program + " cannot be run: " + std::strerror(number));
 }
 
-// The helper and its process group, which are killed when this object is destroyed.
+constexpr std::string_view markName = "VRXAGENT_HELPER=";
+
+std::vector<std::string> childrenOfThisProcess() {
+    std::vector<std::string> identifiers;
+    std::error_code error;
+    std::filesystem::directory_iterator thread("/proc/self/task", error);
+    for (; !error && thread != std::filesystem::directory_iterator(); thread.increment(error)) {
+        std::ifstream children(thread->path() / "children");
+        for (std::string identifier; children >> identifier;) identifiers.push_back(identifier);
+    }
+    return identifiers;
+}
+
+// Nothing while the process has no environment: it is executing another program just now, or has ended.
+std::optional<bool> isMarked(const std::string& process, const std::string& mark) {
+    std::ifstream file("/proc/" + process + "/environ", std::ios::binary);
+    const std::string environment(std::istreambuf_iterator<char>(file), {});
+    if (environment.empty()) return std::nullopt;
+    return ('\0' + environment).find('\0' + mark + '\0') != environment.npos;
+}
+
+bool endChild(pid_t child) {
+    if (kill(child, SIGKILL) != 0) return false;
+    while (waitpid(child, nullptr, 0) < 0 && errno == EINTR) {
+    }
+    return true;
+}
+
+// Ends what a helper has left behind outside of its process group. Orphans become this process's children, and are
+// known by the mark that they have inherited in their environment. One that hides it, or runs as another user, goes on.
+// The children of those that end come next.
+void endOrphans(const std::string& mark) {
+    constexpr int generations = 16;
+    bool mayBeMore = true;
+    for (int i = 0; i < generations && std::exchange(mayBeMore, false); ++i)
+        for (const std::string& child : childrenOfThisProcess()) {
+            const std::optional<bool> isOfHelper = isMarked(child, mark);
+            if (!isOfHelper) std::this_thread::sleep_for(std::chrono::milliseconds(1));
+            mayBeMore |= !isOfHelper || (*isOfHelper && endChild(std::atoi(child.c_str())));
+        }
+}
+
+// The helper and its process group, which are killed when this object is destroyed, and all that left the group.
 class Helper {
 public:
     Helper() = default;
@@ -65,6 +115,13 @@ public:
     int end();
 
 private:
+    // Tells this helper's processes from those of others.
+    static std::string newMark() {
+        static std::atomic<unsigned> count = 0;
+        return std::string(markName) + std::to_string(getpid()) + "." + std::to_string(++count);
+    }
+
+    const std::string mark_ = newMark();
     pid_t identifier_ = -1;
     Descriptor process_;
 };
@@ -89,7 +146,8 @@ MaybeError Helper::start(const std::vector<std::string>& command, int input, int
     sigfillset(&signals);
     posix_spawnattr_setsigdefault(&attributes, &signals);
 
-    std::vector<std::string> settings;
+    prctl(PR_SET_CHILD_SUBREAPER, 1, 0, 0, 0);
+    std::vector<std::string> settings{mark_};
     for (const char* name : {"PATH", "HOME", "LANG"})
         if (const char* value = std::getenv(name)) settings.push_back(std::string(name) + "=" + value);
     auto pointers = [](const std::vector<std::string>& texts) {
@@ -123,6 +181,7 @@ int Helper::end() {
     do ended = waitpid(identifier_, &status, options);
     while (ended < 0 && errno == EINTR);
     identifier_ = -1;
+    endOrphans(mark_);
     return ended > 0 ? status : -1;
 }
 
@@ -157,7 +216,10 @@ MaybeError listen(const Helper& helper, int output, Answer& answer, Duration lim
     while (true) {
         const auto left = std::chrono::ceil<std::chrono::milliseconds>(deadline - SteadyClock::now()).count();
         const int ready = left > 0 ? poll(files.data(), files.size(), static_cast<int>(left)) : 0;
-        if (ready < 0) continue;  // EINTR
+        if (ready < 0 && errno == EINTR) continue;
+        if (ready < 0)
+            return credentialError(CredentialFailure::Status,
+                                   "the credential helper cannot be waited for: " + std::string(std::strerror(errno)));
         if (ready == 0) return credentialError(CredentialFailure::TimedOut, "the credential helper took too long");
         if (files[1].revents) return credentialError(CredentialFailure::Ended, "the agent is ending");
         // Before its end is noticed, what it printed is read.

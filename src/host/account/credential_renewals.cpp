@@ -3,6 +3,7 @@
 #include <system_error>
 
 #include "vrx/host/account/credential_helper.h"
+#include "vrx/host/base/requester.h"
 
 namespace vrx::host {
 
@@ -19,6 +20,10 @@ void CredentialRenewals::stop() {
 
 // Holds the lock throughout. A renewal needs it before it answers, so none answers before this returns.
 void CredentialRenewals::begin(Question question, Completion completion) {
+    completion = [requester = RequesterScope::current(), completion = std::move(completion)](auto result) mutable {
+        const RequesterScope scope(requester);
+        completion(std::move(result));
+    };
     std::unique_lock lock(mutex_);
     removeEnded();
     for (Run& run : runs_) {

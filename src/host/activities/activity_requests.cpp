@@ -1,6 +1,8 @@
 #include "vrx/host/activities/activity_requests.h"
 
 #include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
 
 #include <chrono>
 #include <thread>
@@ -14,9 +16,13 @@ using platform::MaybeError;
 
 namespace {
 
-// The agent sees that the file is closed after writing.
-void touch(const std::string& path) {
+// The agent sees that the file is closed after writing. Made by root, it belongs to the home's owner all the same.
+void touch(const std::string& home) {
+    const std::string path = home + "/" + requestFileName;
     const Descriptor file(::open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600));
+    struct stat owner;
+    if (file && geteuid() == 0 && stat(home.c_str(), &owner) == 0) [[maybe_unused]]
+        const int result = fchown(file.number(), owner.st_uid, owner.st_gid);
 }
 
 void removeRequest(Database& database, std::int64_t number) {
@@ -67,7 +73,7 @@ platform::Result<std::optional<FiringAnswer>> requestFiring(const std::string& h
         number = connection.integer("SELECT last_insert_rowid()");
     });
     if (error) return *error;
-    touch(home + "/" + requestFileName);
+    touch(home);
 
     const auto end = std::chrono::steady_clock::now() + limit;
     std::optional<FiringAnswer> answer;

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <utility>
 
+#include "vrx/host/base/lock_wait.h"
 #include "vrx/host/home/stored_facts.h"
 #include "vrx/platform/log.h"
 #include "vrx/platform/vendor.h"
@@ -20,8 +21,6 @@ using platform::MaybeError;
 using platform::Moment;
 
 namespace {
-
-constexpr Duration retryAfterFailure{60.0};
 
 void carryOverAll(ActivityRegistry& registry, const Moment& now) {
     for (const ScheduledActivity& activity : registry.scheduled()) {
@@ -73,27 +72,37 @@ void BackgroundActivities::start(std::string agentVersion) {
 // The handler is in place before the row, so that a row that is due finds it.
 void BackgroundActivities::schedule(const platform::ActivityRegistration& registration, ActivityHandler handler) {
     const std::string& identifier = registration.identifier;
+    const platform::ActivityCriteria criteria = registration.criteria.value_or(platform::ActivityCriteria{});
     {
         std::lock_guard lock(mutex_);
         handlers_[identifier].swap(handler);  // the old one is destroyed outside the lock: it may own what calls here
         if (!registration.isPreregistered) {
             registeredByOwnRun_.erase(identifier);
-            if (registration.isByOwnRun && running_.contains(identifier)) registeredByOwnRun_.insert(identifier);
+            if (registration.isByOwnRun && criteria.delay <= 0 && running_.contains(identifier))
+                registeredByOwnRun_.insert(identifier);
         }
     }
     if (!registration.isPreregistered) {
-        const platform::ActivityCriteria criteria = registration.criteria.value_or(platform::ActivityCriteria{});
         const Duration interval = registration.isByOwnRun ? around_.conditions.minimumInterval() : Duration(0);
-        const platform::DueTime due = dueTime(criteria, interval, around_.conditions.now());
-        store([identifier, criteria, due](Connection& connection) {
-            ActivityRegistry(connection).schedule(identifier, criteria, due);
+        const Moment now = around_.conditions.now();
+        const platform::DueTime due = dueTime(criteria, interval, now);
+        const bool isAfterBoot = isRunning(platform::vendorIdentifier(platform::bootActivityRemainder));
+        store([identifier, criteria, due, isAfterBoot, now](Connection& connection) {
+            ActivityRegistry registry(connection);
+            const std::optional<ScheduledActivity> earlier = registry.scheduled(identifier);
+            registry.schedule(identifier, criteria, isAfterBoot && earlier ? takenUp(due, earlier->due, now) : due);
         });
     }
-    around_.mainQueue.post([this] { reconsider(); });
+    around_.mainLoop.post([this] { reconsider(); });
 }
 
-bool BackgroundActivities::shouldDefer(std::string_view) const {
-    return around_.conditions.shouldDefer();
+bool BackgroundActivities::shouldDefer(std::string_view identifier) const {
+    bool needsNetwork = false;
+    {
+        std::lock_guard lock(mutex_);
+        needsNetwork = needingNetwork_.contains(identifier);
+    }
+    return around_.conditions.shouldDefer(needsNetwork);
 }
 
 void BackgroundActivities::setHandlerFactory(std::function<ActivityHandler(const std::string&)> factory) {
@@ -101,13 +110,23 @@ void BackgroundActivities::setHandlerFactory(std::function<ActivityHandler(const
         std::lock_guard lock(mutex_);
         factory_.swap(factory);
     }
-    around_.mainQueue.post([this] { reconsider(); });
+    around_.mainLoop.post([this] { reconsider(); });
 }
 
 void BackgroundActivities::reconsider() {
-    if (!isStarted_) return;
-    if (!takeUpIfReplaced() || !answerRequests() || !fireDue())
-        around_.conditions.wakeAt(around_.conditions.now().sinceBoot + retryAfterFailure, false);
+    if (!isStarted_ || isAbandoned_) return;
+    if (takeUpIfReplaced() && answerRequests() && fireDue())
+        failures_ = 0;
+    else
+        around_.conditions.wakeAt(around_.conditions.now().sinceBoot + nextRetry(), {});
+}
+
+void BackgroundActivities::abandon() {
+    isAbandoned_ = true;
+    platform::WorkInFlight released;
+    std::lock_guard lock(unsavedMutex_);
+    unsaved_.clear();
+    released.swap(unsavedWork_);
 }
 
 void BackgroundActivities::carryOver() {
@@ -120,6 +139,9 @@ void BackgroundActivities::carryOver() {
 
 // Logs the first of several failures. Returns false.
 bool BackgroundActivities::failed(const Error& error) {
+    isBusy_ = error.code == SQLITE_BUSY;
+    constexpr int quietFailures = 6;  // another process may be writing for a moment
+    if (isBusy_ && failures_ < quietFailures) return false;
     if (!isFailing_.exchange(true))
         log(Level::Error, "No background activity is fired until this works: %@", error.text);
     return false;
@@ -131,33 +153,55 @@ bool BackgroundActivities::write(const Change& change) {
     return true;
 }
 
+// After a second at first, or sooner while another process writes, then after twice the time, up to a minute.
+Duration BackgroundActivities::nextRetry() {
+    constexpr int doublings = 12;
+    const int failures = std::min(failures_++, doublings);
+    return std::min(Duration(isBusy_ ? 0.02 : 1.0) * (1 << failures), Duration(60.0));
+}
+
 // Stores the change after the earlier ones. Returns false when it is kept for later.
 bool BackgroundActivities::store(Change change) {
-    std::lock_guard lock(storing_);
-    unsaved_.push_back(std::move(change));
+    {
+        std::lock_guard lock(unsavedMutex_);
+        unsaved_.push_back(std::move(change));
+    }
     return storeUnsaved();
 }
 
+// One thread at a time, so that changes are stored in their order. The main loop's does not wait for one that waits for
+// the file, but tries again later.
 bool BackgroundActivities::storeUnsaved() {
-    const bool isStored = write([this](Connection& connection) {
-        for (const Change& change : unsaved_) change(connection);
-    });
-    if (isStored) {
-        unsaved_.clear();
-        unsavedWork_.reset();
-    } else if (!unsavedWork_) {
-        unsavedWork_ = around_.lifecycle.beginWork();
+    const auto storing = LockWait::take(storing_);
+    std::vector<Change> changes;
+    platform::WorkInFlight work;
+    {
+        std::lock_guard lock(unsavedMutex_);
+        if (isAbandoned_) unsaved_.clear();
+        if (unsaved_.empty()) return true;
+        changes = unsaved_;
+        if (!unsavedWork_) unsavedWork_ = around_.lifecycle.beginWork();
     }
-    return isStored;
+    const bool isStored = storing && write([&](Connection& connection) {
+                              for (const Change& change : changes) change(connection);
+                          });
+    if (!isStored) return false;
+    std::lock_guard lock(unsavedMutex_);
+    if (isAbandoned_) return true;
+    unsaved_.erase(unsaved_.begin(), unsaved_.begin() + static_cast<std::ptrdiff_t>(changes.size()));
+    if (unsaved_.empty()) work.swap(unsavedWork_);
+    return true;
+}
+
+bool BackgroundActivities::hasUnsaved() {
+    std::lock_guard lock(unsavedMutex_);
+    return !unsaved_.empty();
 }
 
 // Takes the registry up at the start, and again when the file was replaced: carries due times over to this boot, and
 // schedules interrupted and own activities.
 bool BackgroundActivities::takeUpIfReplaced() {
-    {
-        std::lock_guard lock(storing_);
-        if (!unsaved_.empty() && !storeUnsaved()) return false;
-    }
+    if (hasUnsaved() && !storeUnsaved()) return false;
     std::uint64_t opening = 0;
     const MaybeError error =
         around_.database.peek([&](Connection&, const Database::Stamp& stamp) { opening = stamp.opening; });
@@ -193,22 +237,23 @@ bool BackgroundActivities::fireDue() {
 
     const Moment now = conditions.now();
     std::optional<Duration> next;
-    bool isWaitingForNetwork = false;
+    ActivityConditions::Watched watched;
     for (const ScheduledActivity& activity : activities) {
         const bool isHeld = isRunning(boot) && platform::waitsForBootActivity(activity.identifier);
         if (isHeld || isRunning(activity.identifier)) continue;  // reconsidered at the end of that run
         const bool isDue = timeLeft(activity.due, now) == Duration(0);
-        const FiringDecision decision =
-            decideFiring(activity.due, activity.criteria, now,
-                         isDue && activity.criteria.requiresNetwork && conditions.isNetworkAvailable(),
-                         isDue && activity.criteria.gracePeriod > 0 && conditions.shouldDefer());
-        isWaitingForNetwork |= decision.isWaitingForNetwork;
+        const FiringDecision decision = decideFiring(
+            activity.due, activity.criteria, now,
+            isDue && activity.criteria.requiresNetwork && conditions.isNetworkAvailable(),
+            isDue && activity.criteria.gracePeriod > 0 && conditions.shouldDefer(activity.criteria.requiresNetwork));
+        watched.network |= decision.isWaitingForNetwork;
+        watched.deferral |= decision.isHeldBack;
         if (decision.askAgainIn) next = std::min(next.value_or(*decision.askAgainIn), *decision.askAgainIn);
         if (!decision.isFired) continue;
         const ActivityHandler handler = handlerFor(activity.identifier);
         if (handler && !fire(activity, handler)) return false;
     }
-    conditions.wakeAt(next ? std::optional(now.sinceBoot + *next) : std::nullopt, isWaitingForNetwork);
+    conditions.wakeAt(next ? std::optional(now.sinceBoot + *next) : std::nullopt, watched);
     return true;
 }
 
@@ -219,6 +264,7 @@ bool BackgroundActivities::answerRequests() {
     if (error) return failed(*error);
     for (const FiringRequest& request : requests) {
         const FiringAnswer answer = fireRequested(request.identifier);
+        if (answer == FiringAnswer::NotStored && isBusy_) return false;
         if (!store([number = request.number, answer](Connection& connection) {
                 answerRequest(connection, number, answer);
             }))
@@ -257,6 +303,7 @@ bool BackgroundActivities::fire(const ScheduledActivity& activity, const Activit
     {
         std::lock_guard lock(mutex_);
         running_.insert(run.identifier);
+        if (activity.criteria.requiresNetwork) needingNetwork_.insert(run.identifier);
     }
     platform::OnceCallback<BackgroundActivityResult> completion =
         [this, run, work = around_.lifecycle.beginWork()](BackgroundActivityResult result) { end(run, result); };
@@ -286,8 +333,9 @@ void BackgroundActivities::end(const Run& run, BackgroundActivityResult result) 
     {
         std::lock_guard lock(mutex_);
         running_.erase(run.identifier);
+        needingNetwork_.erase(run.identifier);
     }
-    around_.mainQueue.post([this] { reconsider(); });
+    around_.mainLoop.post([this] { reconsider(); });
 }
 
 // An activity of an earlier process for which this one has no handler gets one from the factory.

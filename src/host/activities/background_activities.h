@@ -29,7 +29,7 @@ public:
     // All must outlive this object. Handlers run on the workers.
     struct Surroundings {
         Database& database;
-        platform::Queue& mainQueue;
+        platform::Queue& mainLoop;
         platform::Queue& workers;
         ActivityConditions& conditions;
         platform::ProcessLifecycle& lifecycle;
@@ -42,6 +42,9 @@ public:
     // Fires what is due and what testers have requested. To be called after a change that is not noticed here. Main
     // thread.
     void reconsider();
+    // Stores nothing any more, because the home is lost. What could not be stored keeps the process no longer. Main
+    // thread.
+    void abandon();
 
     // A scheduled activity fires once: none repeats, and all are of background quality.
     void schedule(const platform::ActivityRegistration& registration, platform::ActivityHandler handler) override;
@@ -58,9 +61,11 @@ private:
     };
 
     bool failed(const platform::Error& error);
+    platform::Duration nextRetry();
     bool write(const Change& change);
     bool store(Change change);
     bool storeUnsaved();
+    bool hasUnsaved();
     bool takeUpIfReplaced();
     void carryOver();
     bool answerRequests();
@@ -82,11 +87,16 @@ private:
     std::map<std::string, platform::ActivityHandler, std::less<>> handlers_;
     std::function<platform::ActivityHandler(const std::string&)> factory_;
     std::set<std::string, std::less<>> running_;
+    std::set<std::string, std::less<>> needingNetwork_;      // identifiers that are running
     std::set<std::string, std::less<>> registeredByOwnRun_;  // identifiers that are running
 
     std::atomic<bool> isFailing_ = false;  // whether the database fails, which is logged once
-    std::mutex storing_;                   // taken before the database
-    std::vector<Change> unsaved_;
+    std::atomic<bool> isBusy_ = false;     // whether that is because another process writes it
+    std::atomic<int> failures_ = 0;        // in a row
+    std::atomic<bool> isAbandoned_ = false;
+    std::mutex storing_;  // taken before the database
+    std::mutex unsavedMutex_;
+    std::vector<Change> unsaved_;         // in their order; only who stores removes some
     platform::WorkInFlight unsavedWork_;  // while there are unsaved changes
 };
 

@@ -7,8 +7,7 @@
 #include <array>
 #include <cerrno>
 #include <limits>
-
-#include "vrx/host/activities/power_supply.h"
+#include <utility>
 
 namespace vrx::host {
 
@@ -37,9 +36,11 @@ Duration minimumInterval(const DeviceProfile& profile) {
     return std::min(profile.content()->minimumInterval.value_or(platform::minimumInterval), platform::minimumInterval);
 }
 
-bool MachineConditions::shouldDefer() const {
+// On a network that costs by the byte, what needs the network defers, too.
+bool MachineConditions::shouldDefer(bool needsNetwork) const {
     const std::optional<bool> override = profile_.content()->shouldDefer;
-    return override ? *override : isOnLowBattery();
+    if (override) return *override;
+    return services_.isSavingPower() || (needsNetwork && services_.isNetworkMetered()) || isOnLowBattery();
 }
 
 Duration MachineConditions::minimumInterval() const {
@@ -48,6 +49,7 @@ Duration MachineConditions::minimumInterval() const {
 
 void MachineConditions::start(Calls calls) {
     calls_ = std::move(calls);
+    services_.setOnChange([this] { servicesChanged(); });
     timer_ = addBootTimer(loop_, onTimer, this);
     wallClock_ = Descriptor(timerfd_create(CLOCK_REALTIME, TFD_CLOEXEC | TFD_NONBLOCK));
     if (!wallClock_) throw std::system_error(errno, std::generic_category(), "wall clock");
@@ -57,15 +59,35 @@ void MachineConditions::start(Calls calls) {
 
 bool MachineConditions::isNetworkAvailable() {
     const std::optional<bool> override = profile_.content()->networkAvailable;
-    return override ? *override : routes_.hasDefaultRoute();
+    if (override) return *override;
+    switch (services_.connectivity()) {
+        case Connectivity::Full: return true;
+        case Connectivity::None:
+        case Connectivity::Portal: return false;
+        case Connectivity::Limited: return *endOfDoubt() <= bootTime() && routes_.hasDefaultRoute();
+        case Connectivity::Unknown: break;
+    }
+    return routes_.hasDefaultRoute();
 }
 
-void MachineConditions::wakeAt(std::optional<Duration> sinceBoot, bool whenNetworkChanges) {
-    const bool isNewlyReported = whenNetworkChanges && !isNetworkReported_;
-    isNetworkReported_ = whenNetworkChanges;
-    routes_.setReporting(whenNetworkChanges);
-    // The network may have appeared before reports began.
-    if (isNewlyReported && isNetworkAvailable()) sinceBoot = Duration(0);
+// Connectivity is "limited" for ever on some machines that are well connected, behind a virtual private network or with
+// several uplinks: after a day the routes tell again.
+std::optional<Duration> MachineConditions::endOfDoubt() const {
+    constexpr Duration day = std::chrono::hours(24);
+    if (services_.connectivity() != Connectivity::Limited) return std::nullopt;
+    return services_.connectivitySince() + day;
+}
+
+void MachineConditions::wakeAt(std::optional<Duration> sinceBoot, Watched watched) {
+    const Watched before = std::exchange(watched_, watched);
+    routes_.setReporting(watched.network);
+    powerSupply_.setReporting(watched.deferral);
+    constexpr bool needsNetwork = true;
+    // Either may have changed before reports began.
+    if ((watched.network && !before.network && isNetworkAvailable()) ||
+        (watched.deferral && !before.deferral && !shouldDefer(needsNetwork)))
+        sinceBoot = Duration(0);
+    if (const auto end = endOfDoubt(); watched.network && end) sinceBoot = std::min(sinceBoot.value_or(*end), *end);
     sinceBoot ? armTimer(timer_, *sinceBoot) : disarmTimer(timer_);
 }
 
@@ -75,6 +97,16 @@ void MachineConditions::watchWallClock() const {
     itimerspec end{};
     end.it_value.tv_sec = std::time(nullptr) + farAhead;
     timerfd_settime(wallClock_.number(), TFD_TIMER_ABSTIME | TFD_TIMER_CANCEL_ON_SET, &end, nullptr);
+}
+
+// A discharging battery reports itself often.
+void MachineConditions::powerSupplyChanged() const {
+    constexpr bool needsNetwork = false;
+    if (!shouldDefer(needsNetwork)) calls_.wake();
+}
+
+void MachineConditions::servicesChanged() const {
+    if (watched_.network || watched_.deferral) calls_.wake();
 }
 
 int MachineConditions::onTimer(sd_event_source*, std::uint64_t, void* self) {

@@ -30,8 +30,10 @@ bool isLow(const std::filesystem::path& battery) {
 // Skips batteries of mice and the like, whose scope is "Device".
 bool isOnLowBattery(const std::string& root) {
     bool hasBattery = false;
-    std::error_code none;
-    for (const auto& supply : std::filesystem::directory_iterator(root + "/sys/class/power_supply", none)) {
+    std::error_code error;
+    std::filesystem::directory_iterator entry(root + "/sys/class/power_supply", error);
+    for (; !error && entry != std::filesystem::directory_iterator(); entry.increment(error)) {
+        const std::filesystem::path& supply = entry->path();
         if (attribute(supply, "scope") == "Device") continue;
         if (attribute(supply, "type") == "Battery") {
             if (attribute(supply, "status") != "Discharging" || !isLow(supply)) return false;
@@ -41,6 +43,21 @@ bool isOnLowBattery(const std::string& root) {
         }
     }
     return hasBattery;
+}
+
+void PowerSupplyWatch::setReporting(bool isReporting) {
+    if (isReporting == (monitor_ != nullptr)) return;
+    monitor_.reset();
+    sd_device_monitor* monitor = nullptr;
+    if (!isReporting || sd_device_monitor_new(&monitor) < 0) return;
+    monitor_.reset(monitor);
+    constexpr auto onDevice = [](sd_device_monitor*, sd_device*, void* self) {
+        static_cast<PowerSupplyWatch*>(self)->onChange_();
+        return 0;
+    };
+    sd_device_monitor_filter_add_match_subsystem_devtype(monitor, "power_supply", nullptr);
+    sd_device_monitor_attach_event(monitor, loop_);
+    sd_device_monitor_start(monitor, onDevice, this);
 }
 
 }  // namespace vrx::host

@@ -18,48 +18,6 @@ using platform::Error;
 using platform::MaybeError;
 using platform::Result;
 
-int FileCalls::open(const char* path, int flags, mode_t mode) {
-    return ::open(path, flags | O_CLOEXEC, mode);
-}
-int FileCalls::close(int file) {
-    return ::close(file);
-}
-ssize_t FileCalls::read(int file, void* buffer, std::size_t size) {
-    return ::read(file, buffer, size);
-}
-ssize_t FileCalls::write(int file, const void* bytes, std::size_t size) {
-    return ::write(file, bytes, size);
-}
-int FileCalls::lock(int file) {
-    return ::flock(file, LOCK_EX);
-}
-int FileCalls::truncate(int file) {
-    return ::ftruncate(file, 0);
-}
-int FileCalls::sync(int file) {
-    return ::fsync(file);
-}
-int FileCalls::status(int file, struct stat* status) {
-    return ::fstat(file, status);
-}
-int FileCalls::status(const char* path, struct stat* status) {
-    return ::lstat(path, status);
-}
-int FileCalls::rename(const char* from, const char* to) {
-    return ::rename(from, to);
-}
-int FileCalls::remove(const char* path) {
-    return ::unlink(path);
-}
-int FileCalls::makeDirectory(const char* path, mode_t mode) {
-    return ::mkdir(path, mode);
-}
-
-FileCalls& FileCalls::system() {
-    static FileCalls calls;
-    return calls;
-}
-
 Error systemError(const std::string& what, const std::string& path, int number) {
     return Error{platform::error_domain::system, number, "cannot " + what + " " + path + ": " + std::strerror(number)};
 }
@@ -68,34 +26,33 @@ namespace {
 
 class OpenFile {
 public:
-    OpenFile(FileCalls& calls, const char* path, int flags) : calls_(calls) {
-        do file_ = calls.open(path, flags, 0600);
+    OpenFile(const char* path, int flags) {
+        do file_ = ::open(path, flags | O_CLOEXEC, 0600);
         while (file_ < 0 && errno == EINTR);
     }
-    ~OpenFile() { close(); }
+    ~OpenFile() {
+        if (file_ >= 0) ::close(file_);
+    }
     OpenFile(const OpenFile&) = delete;
     OpenFile& operator=(const OpenFile&) = delete;
 
     explicit operator bool() const { return file_ >= 0; }
     int number() const { return file_; }
-    // Some file systems report a failed write only here.
-    int close() { return file_ < 0 ? 0 : calls_.close(std::exchange(file_, -1)); }
 
 private:
-    FileCalls& calls_;
     int file_;
 };
 
-int lockFile(FileCalls& calls, int file) {
+int lockFile(int file) {
     int result;
-    do result = calls.lock(file);
+    do result = ::flock(file, LOCK_EX);
     while (result != 0 && errno == EINTR);
     return result;
 }
 
-bool writeAll(FileCalls& calls, int file, std::span<const std::uint8_t> bytes) {
+bool writeAll(int file, std::span<const std::uint8_t> bytes) {
     while (!bytes.empty()) {
-        ssize_t written = calls.write(file, bytes.data(), bytes.size());
+        ssize_t written = ::write(file, bytes.data(), bytes.size());
         if (written < 0 && errno == EINTR) continue;
         if (written <= 0) return false;
         bytes = bytes.subspan(static_cast<std::size_t>(written));
@@ -109,19 +66,19 @@ std::string folderOf(const std::string& path) {
     return slash == 0 ? "/" : path.substr(0, slash);
 }
 
-MaybeError syncFolder(FileCalls& calls, const std::string& folder) {
-    OpenFile directory(calls, folder.c_str(), O_RDONLY | O_DIRECTORY);
-    if (!directory || calls.sync(directory.number()) != 0) return systemError("sync", folder, errno);
+MaybeError syncFolder(const std::string& folder) {
+    OpenFile directory(folder.c_str(), O_RDONLY | O_DIRECTORY);
+    if (!directory || ::fsync(directory.number()) != 0) return systemError("sync", folder, errno);
     return std::nullopt;
 }
 
 }  // namespace
 
-Result<FileContent> readFile(const std::string& path, FileCalls& calls) {
-    OpenFile file(calls, path.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY);
+Result<FileContent> readFile(const std::string& path) {
+    OpenFile file(path.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY);
     if (!file) return systemError("open", path, errno);
     FileContent content;
-    if (calls.status(file.number(), &content.status) != 0) return systemError("examine", path, errno);
+    if (::fstat(file.number(), &content.status) != 0) return systemError("examine", path, errno);
     if (!S_ISREG(content.status.st_mode)) return systemError("read", path, EINVAL);
 
     // The size is only a first guess: the file may grow meanwhile, and those of /proc and /sys have none.
@@ -130,7 +87,7 @@ Result<FileContent> readFile(const std::string& path, FileCalls& calls) {
     Data& bytes = content.bytes;
     bytes.resize(std::min(static_cast<std::size_t>(content.status.st_size), limit) + 1);
     while (true) {
-        ssize_t count = calls.read(file.number(), bytes.data() + size, bytes.size() - size);
+        ssize_t count = ::read(file.number(), bytes.data() + size, bytes.size() - size);
         if (count < 0 && errno == EINTR) continue;
         if (count < 0) return systemError("read", path, errno);
         if (count == 0) break;
@@ -144,17 +101,17 @@ Result<FileContent> readFile(const std::string& path, FileCalls& calls) {
 
 // The temporary file has one name for each target. Writers of the same target take turns by a lock on it. One that a
 // killed process left behind is used by the next writer, so that none pile up.
-MaybeError replaceFile(const std::string& path, std::span<const std::uint8_t> content, FileCalls& calls) {
+MaybeError replaceFile(const std::string& path, std::span<const std::uint8_t> content) {
     const std::string temporary = path + ".tmp";
     while (true) {
-        OpenFile file(calls, temporary.c_str(), O_WRONLY | O_CREAT | O_NOFOLLOW | O_NONBLOCK);
+        OpenFile file(temporary.c_str(), O_WRONLY | O_CREAT | O_NOFOLLOW | O_NONBLOCK);
         if (!file) return systemError("create", temporary, errno);
 
         struct stat mine, named;
-        if (lockFile(calls, file.number()) != 0 || calls.status(file.number(), &mine) != 0)
+        if (lockFile(file.number()) != 0 || ::fstat(file.number(), &mine) != 0)
             return systemError("lock", temporary, errno);
         // Whoever held the lock before has renamed or removed the file by now: this is no longer the temporary one.
-        if (calls.status(temporary.c_str(), &named) != 0) {
+        if (::lstat(temporary.c_str(), &named) != 0) {
             if (errno == ENOENT) continue;
             return systemError("examine", temporary, errno);
         }
@@ -162,22 +119,22 @@ MaybeError replaceFile(const std::string& path, std::span<const std::uint8_t> co
 
         auto giveUp = [&](const char* what) {
             Error error = systemError(what, temporary, errno);
-            calls.remove(temporary.c_str());
+            ::unlink(temporary.c_str());
             return error;
         };
-        if (calls.truncate(file.number()) != 0) return giveUp("empty");
-        if (!writeAll(calls, file.number(), content)) return giveUp("write");
-        if (calls.sync(file.number()) != 0) return giveUp("sync");
-        if (calls.rename(temporary.c_str(), path.c_str()) != 0) return giveUp("rename");
-        return syncFolder(calls, folderOf(path));
+        if (::ftruncate(file.number(), 0) != 0) return giveUp("empty");
+        if (!writeAll(file.number(), content)) return giveUp("write");
+        if (::fsync(file.number()) != 0) return giveUp("sync");
+        if (::rename(temporary.c_str(), path.c_str()) != 0) return giveUp("rename");
+        return syncFolder(folderOf(path));
     }
 }
 
-MaybeError createDirectories(const std::string& path, FileCalls& calls) {
-    if (calls.makeDirectory(path.c_str(), 0700) == 0) return syncFolder(calls, folderOf(path));
+MaybeError createDirectories(const std::string& path) {
+    if (::mkdir(path.c_str(), 0700) == 0) return syncFolder(folderOf(path));
     if (errno == ENOENT && folderOf(path) != path) {
-        if (MaybeError error = createDirectories(folderOf(path), calls)) return error;
-        if (calls.makeDirectory(path.c_str(), 0700) == 0) return syncFolder(calls, folderOf(path));
+        if (MaybeError error = createDirectories(folderOf(path))) return error;
+        if (::mkdir(path.c_str(), 0700) == 0) return syncFolder(folderOf(path));
     }
     if (errno != EEXIST) return systemError("create", path, errno);
     struct stat status;
@@ -187,22 +144,22 @@ MaybeError createDirectories(const std::string& path, FileCalls& calls) {
 }
 
 Result<Data> Files::read(const std::string& path) const {
-    Result<FileContent> content = readFile(path, calls_);
+    Result<FileContent> content = readFile(path);
     if (!content) return content.error();
     return std::move(content).value().bytes;
 }
 
 MaybeError Files::replace(const std::string& path, const Data& content) {
-    return replaceFile(path, content, calls_);
+    return replaceFile(path, content);
 }
 
 MaybeError Files::createDirectories(const std::string& path) {
-    return host::createDirectories(path, calls_);
+    return host::createDirectories(path);
 }
 
 MaybeError Files::remove(const std::string& path) {
-    if (calls_.remove(path.c_str()) != 0) return systemError("remove", path, errno);
-    return syncFolder(calls_, folderOf(path));
+    if (::unlink(path.c_str()) != 0) return systemError("remove", path, errno);
+    return syncFolder(folderOf(path));
 }
 
 }  // namespace vrx::host

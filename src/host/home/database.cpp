@@ -5,6 +5,7 @@
 
 #include <array>
 #include <cerrno>
+#include <cstdlib>
 #include <cstring>
 #include <ctime>
 #include <thread>
@@ -47,9 +48,18 @@ void check(int result, sqlite3* connection) {
     throw DatabaseError(result, connection ? sqlite3_errmsg(connection) : sqlite3_errstr(result));
 }
 
-bool isDamage(const DatabaseError& error) {
-    const int primary = error.code & 0xff;
+bool isDamage(int code) {
+    const int primary = code & 0xff;
     return primary == SQLITE_CORRUPT || primary == SQLITE_NOTADB;
+}
+
+// The code of the error that a row of quick_check names, in one of SQLite's two ways; 0 when it names none.
+int errorCodeIn(std::string_view row) {
+    for (const std::string_view name : {"error code=", "error code "}) {
+        const auto at = row.find(name);
+        if (at != std::string_view::npos) return std::atoi(std::string(row.substr(at + name.size())).c_str());
+    }
+    return 0;
 }
 
 std::string timeSuffix() {
@@ -67,31 +77,38 @@ struct FileIdentity {
     bool operator==(const FileIdentity&) const = default;
     explicit operator bool() const { return inode != 0; }
 
-    // Empty when there is no file.
-    static FileIdentity of(const std::string& path) {
+    // Empty when there is no file; absent when that cannot be told, which says nothing of the file.
+    static std::optional<FileIdentity> of(const std::string& path) {
         struct stat status;
-        if (stat(path.c_str(), &status) != 0) return {};
-        return {status.st_dev, status.st_ino};
+        if (stat(path.c_str(), &status) == 0) return FileIdentity{status.st_dev, status.st_ino};
+        if (errno == ENOENT || errno == ENOTDIR) return FileIdentity{};
+        return std::nullopt;
+    }
+    // For what must not be done on a guess.
+    static FileIdentity known(const std::string& path) {
+        if (const auto identity = of(path)) return *identity;
+        throw DatabaseError(SQLITE_IOERR_FSTAT, systemError("look at", path, errno).text);
     }
 };
 
-// Held while the database is opened: of several processes that find it damaged, the first sets it aside and the others
-// find the fresh one.
+// Held while the database is opened, and while it is tidied up at closing: of several processes that find it damaged,
+// the first sets it aside and the others find the fresh one; and nobody who opens it finds its log without its index.
 class FolderLock {
 public:
-    FolderLock(const std::string& folder, std::chrono::milliseconds limit)
-        : file_(::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC)) {
+    FolderLock(const std::string& path, std::chrono::milliseconds limit) {
+        const std::string folder = path.substr(0, path.rfind('/') + 1);
+        file_ = Descriptor(::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
         if (!file_) throw DatabaseError(SQLITE_CANTOPEN, systemError("open", folder, errno).text);
-        const auto end = std::chrono::steady_clock::now() + limit;
+        const LockWait wait(limit);
         while (flock(file_.number(), LOCK_EX | LOCK_NB) != 0) {
-            if (std::chrono::steady_clock::now() >= end)
-                throw DatabaseError(SQLITE_BUSY, "another process keeps " + folder + " locked");
-            std::this_thread::sleep_for(std::chrono::milliseconds(2));
+            if (errno != EWOULDBLOCK && errno != EINTR)
+                throw DatabaseError(SQLITE_IOERR_LOCK, systemError("lock", folder, errno).text);
+            if (!wait.again()) throw DatabaseError(SQLITE_BUSY, "another process keeps " + folder + " locked");
         }
     }
 
 private:
-    const Descriptor file_;
+    Descriptor file_;
 };
 
 // Keeps SQLite small: the whole database is some ten pages, and by default each connection would reserve memory for
@@ -108,7 +125,9 @@ void createPrivately(const std::string& path) {
 }
 
 // For read-only access. With a log beside the database, SQLite reads the shared index, or builds one in memory when no
-// process keeps it; without a log it needs no index.
+// process keeps it; without a log it needs no index. A process that was killed while it opened the database can leave
+// an empty log without an index, or one that ends with its header, which SQLite would read again and again for ten
+// seconds.
 std::string readOnlyUri(const std::string& path) {
     std::string uri = "file:";
     for (const char character : path) {
@@ -117,7 +136,13 @@ std::string readOnlyUri(const std::string& path) {
         else
             uri.push_back(character);
     }
-    return uri + (FileIdentity::of(path + "-wal") ? "?readonly_shm=1" : "?immutable=1");
+    const std::string log = path + "-wal";
+    constexpr off_t headerBytes = 32;
+    struct stat status {};
+    const bool hasLog = static_cast<bool>(FileIdentity::known(log));
+    const bool isVoid = hasLog && stat(log.c_str(), &status) == 0 &&
+                        (status.st_size == headerBytes || (status.st_size == 0 && !FileIdentity::known(path + "-shm")));
+    return uri + (hasLog && !isVoid ? "?readonly_shm=1" : "?immutable=1");
 }
 
 }  // namespace
@@ -171,15 +196,22 @@ void Statement::reset() {
 
 std::string_view Statement::text(int column) const {
     const auto* start = reinterpret_cast<const char*>(sqlite3_column_text(statement_, column));
+    if (!start) requireMemory();  // a text gets its final zero in a copy
     return {start ? start : "", static_cast<std::size_t>(sqlite3_column_bytes(statement_, column))};
 }
 
 std::span<const std::uint8_t> Statement::bytes(int column) const {
     const auto* start = static_cast<const std::uint8_t*>(sqlite3_column_blob(statement_, column));
+    if (!start) requireMemory();
     return {start, start ? static_cast<std::size_t>(sqlite3_column_bytes(statement_, column)) : 0};
 }
 
-Connection::Connection(const std::string& path, std::chrono::milliseconds busyLimit, bool isReadOnly) {
+void Statement::requireMemory() const {
+    if (sqlite3_errcode(connection_) == SQLITE_NOMEM) throw DatabaseError(SQLITE_NOMEM, sqlite3_errmsg(connection_));
+}
+
+Connection::Connection(const std::string& path, std::chrono::milliseconds busyLimit, bool isReadOnly)
+    : busyLimit_(busyLimit) {
     static const bool isConfigured = configure();
     static_cast<void>(isConfigured);
     const int flags = isReadOnly ? SQLITE_OPEN_READONLY | SQLITE_OPEN_URI : SQLITE_OPEN_READWRITE;
@@ -189,12 +221,19 @@ Connection::Connection(const std::string& path, std::chrono::milliseconds busyLi
         check(result, connection_);
         sqlite3_extended_result_codes(connection_, 1);
         keepLogAtClose(true);
-        sqlite3_busy_timeout(connection_, static_cast<int>(busyLimit.count()));
+        sqlite3_busy_handler(connection_, onBusy, this);
         execute("PRAGMA synchronous = FULL");
     } catch (...) {
         sqlite3_close(connection_);
         throw;
     }
+}
+
+// Called for each attempt that has failed, the first of a row with 0.
+int Connection::onBusy(void* userdata, int attempts) {
+    auto& self = *static_cast<Connection*>(userdata);
+    if (attempts == 0) self.wait_.emplace(self.busyLimit_);
+    return self.wait_->again() ? 1 : 0;
 }
 
 Connection::~Connection() {
@@ -226,9 +265,17 @@ std::int64_t Connection::integer(const char* sql) {
     return result;
 }
 
+// A page that could not be read, or for which there was no memory, is reported in a row as well, and may bring on rows
+// that look like damage: then nothing is known of the file.
 void Connection::checkSoundness() {
-    Statement check(connection_, "PRAGMA quick_check(1)");
-    if (!check.step() || check.text(0) != "ok") throw DatabaseError(SQLITE_CORRUPT, std::string(check.text(0)));
+    Statement check(connection_, "PRAGMA quick_check");
+    std::string firstRow;
+    while (check.step()) {
+        const std::string row(check.text(0));
+        if (const int code = errorCodeIn(row); code != 0 && !isDamage(code)) throw DatabaseError(code, row);
+        if (firstRow.empty()) firstRow = row;
+    }
+    if (firstRow != "ok") throw DatabaseError(SQLITE_CORRUPT, firstRow);
 }
 
 void Connection::endStatements() {
@@ -265,21 +312,33 @@ struct Database::Opening {
     Opening(const std::string& path, std::chrono::milliseconds busyLimit) : path(path), busyLimit(busyLimit) {}
 
     ~Opening() {
-        // Closing the last connection removes the -wal file by its name. When another database has taken this path,
-        // that file is not ours.
-        if (FileIdentity::of(path) == file) return;
+        if (writer && tidyUp()) return;
         for (auto* connection : {&writer, &reader})
             if (*connection) (*connection)->keepLogAtClose(true);
+    }
+
+    // Closing the last connection removes the -wal file by its name. When another database has taken this path, that
+    // file is not ours; nor may it go while that cannot be told, or while another process opens the database.
+    bool tidyUp() noexcept {
+        try {
+            if (FileIdentity::of(path) != file) return false;
+            const FolderLock lock(path, busyLimit);
+            reader.reset();
+            writer.reset();
+            return true;
+        } catch (const DatabaseError&) {
+            return false;
+        }
     }
 
     // Called once the database is known to be sound: opens it for reading, and lets closing tidy it up.
     void passed() {
         reader.emplace(path, busyLimit);
         reader->findIndexHeader();
+        wal = FileIdentity::known(path + "-wal");
+        shm = FileIdentity::known(path + "-shm");
+        file = FileIdentity::known(path);  // last: who fails before is closed under the lock of its opening
         for (auto* connection : {&writer, &reader}) (*connection)->keepLogAtClose(false);
-        file = FileIdentity::of(path);
-        wal = FileIdentity::of(path + "-wal");
-        shm = FileIdentity::of(path + "-shm");
     }
 
     const std::string path;
@@ -302,10 +361,17 @@ MaybeError Database::open() {
 }
 
 std::shared_ptr<Database::Opening> Database::opening(MaybeError& error) {
-    std::lock_guard lock(mutex_);
-    if (opening_ && FileIdentity::of(path_) == opening_->file) return opening_;
+    const auto lock = LockWait::take(mutex_);
+    if (!lock) {
+        error = busy();
+        return nullptr;
+    }
+    if (opening_) {
+        const auto present = FileIdentity::of(path_);
+        if (!present || *present == opening_->file) return opening_;
+    }
     try {
-        const FolderLock folder(path_.substr(0, path_.rfind('/') + 1), busyLimit_);
+        const FolderLock folder(path_, busyLimit_);
         if (opening_) leaveReplacedFile();
         opening_ = openChecked();
         opening_->number = ++openings_;
@@ -323,8 +389,8 @@ std::shared_ptr<Database::Opening> Database::opening(MaybeError& error) {
 void Database::leaveReplacedFile() {
     log(Level::Error, "%@ was replaced and is opened again", path_);
     const std::string aside = freeAsideName("replaced");
-    if (FileIdentity::of(path_ + "-wal") == opening_->wal) moveAside(aside, "-wal");
-    if (FileIdentity::of(path_ + "-shm") == opening_->shm) moveAside(aside, "-shm");
+    if (FileIdentity::known(path_ + "-wal") == opening_->wal) moveAside(aside, "-wal");
+    if (FileIdentity::known(path_ + "-shm") == opening_->shm) moveAside(aside, "-shm");
     opening_.reset();
 }
 
@@ -333,7 +399,12 @@ std::shared_ptr<Database::Opening> Database::openChecked() {
     try {
         return openOnce();
     } catch (const DatabaseError& error) {
-        if (!isDamage(error)) throw;
+        if (!isDamage(error.code)) throw;
+    }
+    try {
+        return openOnce();  // one look alone proves no damage
+    } catch (const DatabaseError& error) {
+        if (!isDamage(error.code)) throw;
         const std::string aside = freeAsideName("damaged");
         for (const char* suffix : {"-wal", "-shm", ""}) moveAside(aside, suffix);
         log(Level::Error, "%@ is damaged (%@); it was set aside as %@ and a new one is made", path_, error.what(),
@@ -360,7 +431,7 @@ std::shared_ptr<Database::Opening> Database::openReadOnly() const {
     if (checkedVersion(reader) < static_cast<std::int64_t>(schema_.size()))
         throw DatabaseError(SQLITE_ERROR,
                             "it was made by an older version of the program, and the agent has not taken it over yet");
-    opening->file = FileIdentity::of(path_);
+    opening->file = FileIdentity::known(path_);
     return opening;
 }
 
@@ -386,7 +457,7 @@ std::string Database::freeAsideName(const std::string& reason) const {
     const std::string name = path_ + "." + reason + "-" + timeSuffix();
     auto isTaken = [](const std::string& candidate) {
         for (const char* suffix : {"", "-wal", "-shm"})
-            if (FileIdentity::of(candidate + suffix)) return true;
+            if (FileIdentity::known(candidate + suffix)) return true;
         return false;
     };
     std::string candidate = name;
@@ -400,10 +471,16 @@ void Database::moveAside(const std::string& asideName, const char* suffix) const
         throw DatabaseError(SQLITE_CANTOPEN, systemError("set aside", from, errno).text);
 }
 
-// After damage that shows in use, the next operation opens the database again and examines it.
+Error Database::busy() const {
+    return Error{platform::error_domain::database, SQLITE_BUSY, path_ + ": it is in use"};
+}
+
+// After damage that shows in use, the next operation opens the database again and examines it. So it does after a call
+// that failed: what SQLite could not unlock would stay locked for as long as the connections are open.
 Error Database::failed(const std::shared_ptr<Opening>& opening, const DatabaseError& error) {
-    if (isDamage(error)) {
-        std::lock_guard lock(mutex_);
+    const int primary = error.code & 0xff;
+    if (isDamage(error.code) || primary == SQLITE_IOERR || primary == SQLITE_PROTOCOL) {
+        const std::lock_guard lock(mutex_);
         if (opening_ == opening) opening_.reset();
     }
     return Error{platform::error_domain::database, error.code, path_ + ": " + error.what()};
@@ -428,14 +505,16 @@ MaybeError Database::transaction(Connection& connection, const std::shared_ptr<O
 }
 
 MaybeError Database::read(const std::function<void(Connection&)>& body) {
-    std::lock_guard lock(reading_);
+    const auto lock = LockWait::take(reading_);
+    if (!lock) return busy();
     MaybeError error;
     std::shared_ptr<Opening> current = opening(error);
     return current ? transaction(*current->reader, current, "BEGIN", body) : error;
 }
 
 MaybeError Database::write(const std::function<void(Connection&)>& body) {
-    std::lock_guard lock(writing_);
+    const auto lock = LockWait::take(writing_);
+    if (!lock) return busy();
     MaybeError error;
     std::shared_ptr<Opening> current = opening(error);
     if (current && !current->writer)
@@ -444,7 +523,8 @@ MaybeError Database::write(const std::function<void(Connection&)>& body) {
 }
 
 MaybeError Database::peek(const std::function<void(Connection&, const Stamp&)>& body) {
-    std::lock_guard lock(reading_);
+    const auto lock = LockWait::take(reading_);
+    if (!lock) return busy();
     MaybeError error;
     std::shared_ptr<Opening> current = opening(error);
     if (!current) return error;

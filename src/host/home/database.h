@@ -20,6 +20,7 @@
 #include <string_view>
 #include <unordered_map>
 
+#include "vrx/host/base/lock_wait.h"
 #include "vrx/platform/error.h"
 #include "vrx/platform/value.h"
 
@@ -58,6 +59,9 @@ public:
     std::span<const std::uint8_t> bytes(int column) const;
 
 private:
+    // Tells a column that is empty from one for which there was no memory.
+    void requireMemory() const;
+
     sqlite3* connection_;
     sqlite3_stmt* statement_ = nullptr;
 };
@@ -90,7 +94,11 @@ private:
     // Resets unfinished statements, which would keep the transaction open.
     void endStatements();
 
+    static int onBusy(void* self, int attempts);
+
     sqlite3* connection_ = nullptr;
+    const std::chrono::milliseconds busyLimit_;
+    std::optional<LockWait> wait_;
     const std::uint32_t* indexHeader_ = nullptr;  // mapped by SQLite while the connection is open
     std::unordered_map<const char*, std::unique_ptr<Statement>> statements_;
 };
@@ -101,7 +109,8 @@ public:
     using Schema = std::span<const char* const>;
     static const Schema currentSchema;
 
-    // Opens nothing before the first use or open(). A write waits for other writers up to the limit.
+    // Opens nothing before the first use or open(). A write waits for other writers up to the limit, on a thread that
+    // may wait (lock_wait.h).
     explicit Database(std::string path, Schema schema = currentSchema,
                       std::chrono::milliseconds busyLimit = std::chrono::seconds(5))
         : Database(std::move(path), schema, busyLimit, false) {}
@@ -142,6 +151,7 @@ private:
     void moveAside(const std::string& asideName, const char* suffix) const;
     platform::MaybeError transaction(Connection& connection, const std::shared_ptr<Opening>& opening, const char* begin,
                                      const std::function<void(Connection&)>& body);
+    platform::Error busy() const;
     platform::Error failed(const std::shared_ptr<Opening>& opening, const DatabaseError& error);
 
     const std::string path_;

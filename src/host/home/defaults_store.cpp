@@ -86,7 +86,7 @@ Value DefaultsStore::get(std::string_view key) const {
         value = copy->second;
     }),
                "read", key);
-    return value.isNull() ? registered(key) : value;
+    return value.isNull() ? unwritten(key) : value;
 }
 
 void DefaultsStore::set(std::string_view key, Value value) {
@@ -100,7 +100,7 @@ MaybeError DefaultsStore::write(std::string_view key, const Value& value) {
 void DefaultsStore::update(std::string_view key, const std::function<Value(const Value&)>& change) {
     logFailure(database_.write([&](Connection& connection) {
         Value present = load(connection, key);
-        store(connection, key, change(present.isNull() ? registered(key) : present));
+        store(connection, key, change(present.isNull() ? unwritten(key) : present));
     }),
                "write", key);
 }
@@ -116,6 +116,8 @@ Dictionary DefaultsStore::dictionaryRepresentation() const {
         std::lock_guard lock(mutex_);
         all = registered_;
     }
+    if (presets_)
+        for (const auto& [key, value] : *presets_()) all[key] = value;
     logFailure(database_.read([&](Connection& connection) {
         Statement& rows = connection.statement(selectAll);
         while (rows.step())
@@ -125,7 +127,11 @@ Dictionary DefaultsStore::dictionaryRepresentation() const {
     return all;
 }
 
-Value DefaultsStore::registered(std::string_view key) const {
+Value DefaultsStore::unwritten(std::string_view key) const {
+    if (presets_) {
+        const std::shared_ptr<const Dictionary> presets = presets_();
+        if (const auto preset = presets->find(key); preset != presets->end()) return preset->second;
+    }
     std::lock_guard lock(mutex_);
     auto entry = registered_.find(key);
     return entry == registered_.end() ? Value() : entry->second;

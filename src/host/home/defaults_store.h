@@ -1,7 +1,9 @@
-// The agent's settings in host.db, over registered defaults in memory. Any number of threads and processes may use
-// them. A value that was read is kept in memory until something is committed to the database.
+// The agent's settings in host.db, over presets, over registered defaults in memory. Any number of threads and
+// processes may use them. A value that was read is kept in memory until something is committed to the database.
 #pragma once
 
+#include <functional>
+#include <memory>
 #include <mutex>
 #include <string>
 #include <unordered_map>
@@ -22,11 +24,16 @@ public:
     void registerDefaults(const platform::Dictionary& values) override;
     platform::Dictionary dictionaryRepresentation() const override;
 
+    // Values that hold while none is written, before the registered ones. Asked at each read; any thread may call it.
+    using Presets = std::function<std::shared_ptr<const platform::Dictionary>()>;
+    // Before any other thread uses the store.
+    void setPresets(Presets presets) { presets_ = std::move(presets); }
+
     // Like set(), but returns a failure instead of logging it.
     platform::MaybeError write(std::string_view key, const platform::Value& value);
 
 private:
-    platform::Value registered(std::string_view key) const;
+    platform::Value unwritten(std::string_view key) const;
 
     struct TextHash : std::hash<std::string_view> {
         using is_transparent = void;
@@ -38,6 +45,7 @@ private:
     };
 
     Database& database_;
+    Presets presets_;
     mutable Copies copies_;  // used within Database::peek only, so by one thread at a time
     mutable std::mutex mutex_;
     platform::Dictionary registered_;

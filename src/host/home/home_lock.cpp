@@ -74,6 +74,14 @@ MaybeError HomeLock::take(const std::string& home) {
     return std::nullopt;
 }
 
+bool HomeLock::isLost(const std::string& home) const {
+    struct stat own;
+    struct stat present;
+    if (!file_ || fstat(file_.number(), &own) != 0) return false;
+    if (stat(pathIn(home).c_str(), &present) != 0) return errno == ENOENT || errno == ENOTDIR;
+    return own.st_dev != present.st_dev || own.st_ino != present.st_ino;
+}
+
 bool HomeLock::isInUse(const std::string& home) {
     const Descriptor file(::open(pathIn(home).c_str(), O_RDWR | O_CLOEXEC | O_NOFOLLOW));
     struct flock lock = wholeFile();

@@ -15,6 +15,9 @@ public:
     // another agent has the home, the error's code is EWOULDBLOCK and its text names the process.
     platform::MaybeError take(const std::string& home);
     bool isTaken() const { return static_cast<bool>(file_); }
+    // Whether the lock's file is gone from the home, or another is in its place, so that another agent may have taken
+    // the home. False when that cannot be told.
+    bool isLost(const std::string& home) const;
     // Gives up the locked file. The home stays locked while that file is open.
     Descriptor release() { return std::move(file_); }
 

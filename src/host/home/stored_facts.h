@@ -13,7 +13,7 @@ namespace stored_facts {
 inline constexpr std::string_view agentVersion = "agentVersion";    // for which the upgrade activity was fired
 inline constexpr std::string_view boot = "boot";                    // for which the boot activity was fired
 inline constexpr std::string_view language = "language";            // the effective one, as last notified
-inline constexpr std::string_view profile = "profile";              // the agent's device profile, a path; may be empty
+inline constexpr std::string_view profile = "profile";              // the profile's layers: a line each, absolute
 inline constexpr std::string_view pairedWatches = "pairedWatches";  // a line for each watch, as last notified
 }  // namespace stored_facts
 

@@ -37,7 +37,6 @@ public:
     decltype(&::curl_multi_remove_handle) multiRemoveHandle = library_.function("curl_multi_remove_handle");
     decltype(&::curl_multi_perform) multiPerform = library_.function("curl_multi_perform");
     decltype(&::curl_multi_poll) multiPoll = library_.function("curl_multi_poll");
-    decltype(&::curl_multi_wakeup) multiWakeup = library_.function("curl_multi_wakeup");
     decltype(&::curl_multi_info_read) multiInfoRead = library_.function("curl_multi_info_read");
 
     // Why the functions must not be called. Empty when they may be.

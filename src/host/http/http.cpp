@@ -1,5 +1,8 @@
 #include "vrx/host/http/http.h"
 
+#include <sys/eventfd.h>
+
+#include <algorithm>
 #include <climits>
 #include <csignal>
 #include <map>
@@ -8,10 +11,12 @@
 #include <thread>
 #include <vector>
 
+#include "vrx/host/base/descriptor.h"
 #include "vrx/host/base/files.h"
 #include "vrx/host/http/curl.h"
 #include "vrx/host/http/http_cache.h"
 #include "vrx/host/http/http_transfer.h"
+#include "vrx/host/http/transfer_line.h"
 #include "vrx/platform/url.h"
 
 namespace vrx::host {
@@ -27,7 +32,7 @@ class HttpTransfers {
 public:
     HttpTransfers(platform::Queue& answers, const platform::Clock& clock, const DeviceProfile& profile,
                   const HttpLimits& limits)
-        : answers_(answers), limits_(limits), profile_(profile), cache_(clock, limits.storedBytes) {}
+        : answers_(answers), limits_(limits), profile_(profile), cache_(clock, limits.storedBytes), line_(limits_) {}
     ~HttpTransfers() { stop(); }
 
     void send(HttpRequest request, bool isUncached, Completion completion);
@@ -36,10 +41,13 @@ public:
 private:
     void sendFile(const Url& url, Completion completion);
     bool start();
+    void wake();
     void run();
+    void beginWaiting();
     void begin(std::unique_ptr<HttpTransfer> transfer);
     void finishEnded();
-    void answer(Completion completion, HttpResponse response);
+    int untilFirstOverdue() const;
+    void answer(HttpTransfer& transfer, HttpResponse response);
 
     platform::Queue& answers_;
     const HttpLimits limits_;
@@ -50,9 +58,11 @@ private:
     bool isStopping_ = false;
     std::thread thread_;
     CURLM* multi_ = nullptr;
+    Descriptor wakeFile_;  // the library's own way to wake it can be missing without a word
 
     // Used by the transfer thread only.
     HttpCache cache_;
+    TransferLine line_;
     std::map<HttpTransfer*, std::unique_ptr<HttpTransfer>> running_;
 };
 
@@ -71,11 +81,10 @@ void HttpTransfers::send(HttpRequest request, bool isUncached, Completion comple
     if (!start()) {
         lock.unlock();
         const std::string& why = curl().problem;
-        return answer(transfer->takeCompletion(),
-                      httpFailure(httpError(CURLE_FAILED_INIT, why.empty() ? "cannot begin" : why)));
+        return answer(*transfer, httpFailure(httpError(CURLE_FAILED_INIT, why.empty() ? "cannot begin" : why)));
     }
     sent_.push_back(std::move(transfer));
-    curl().multiWakeup(multi_);
+    wake();
 }
 
 // Reads the file here: the library could wait for ever on one that is not regular.
@@ -95,6 +104,7 @@ bool HttpTransfers::start() {
     if (!curl().problem.empty() || !(multi_ = curl().multiInit())) return false;
     curl().multiSetopt(multi_, CURLMOPT_MAXCONNECTS, 8L);
     try {
+        wakeFile_ = makeEventFile();
         thread_ = std::thread([this] { run(); });
     } catch (const std::system_error&) {
         curl().multiCleanup(std::exchange(multi_, nullptr));
@@ -103,16 +113,21 @@ bool HttpTransfers::start() {
     return true;
 }
 
+void HttpTransfers::wake() {
+    eventfd_write(wakeFile_.number(), 1);
+}
+
 void HttpTransfers::stop() {
     platform::ShutdownScope shutdown;
     {
         std::lock_guard lock(mutex_);
         if (std::exchange(isStopping_, true)) return;
         if (!multi_) return;
-        curl().multiWakeup(multi_);
+        wake();
     }
     thread_.join();
     sent_.clear();
+    line_.clear();
     for (auto& [transfer, owned] : running_) curl().multiRemoveHandle(multi_, transfer->easy());
     running_.clear();
     curl().multiCleanup(multi_);
@@ -132,18 +147,39 @@ void HttpTransfers::run() {
             if (isStopping_) return;
             sent.swap(sent_);
         }
-        for (auto& transfer : sent) begin(std::move(transfer));
+        for (auto& transfer : sent) line_.add(std::move(transfer));
+        beginWaiting();
         int running = 0;
         curl().multiPerform(multi_, &running);
         finishEnded();
-        // Wakes only for bytes, for the library's own timers and for a new request.
-        curl().multiPoll(multi_, nullptr, 0, INT_MAX, nullptr);
+        beginWaiting();
+        // Wakes only for bytes, for the library's own timers, for a new request and for one that waits for too long.
+        curl_waitfd woken{wakeFile_.number(), CURL_WAIT_POLLIN, 0};
+        curl().multiPoll(multi_, &woken, 1, untilFirstOverdue(), nullptr);
+        eventfd_t count;
+        eventfd_read(wakeFile_.number(), &count);
     }
 }
 
+// The library can wait as well, but counts connections, and its waiting as the request's time.
+void HttpTransfers::beginWaiting() {
+    while (auto transfer = line_.next()) begin(std::move(transfer));
+    for (auto& transfer : line_.removeOverdue(TransferLine::SteadyClock::now()))
+        answer(*transfer, httpFailure(httpError(CURLE_OPERATION_TIMEDOUT, "too many requests are under way")));
+}
+
+int HttpTransfers::untilFirstOverdue() const {
+    const auto first = line_.firstOverdue();
+    if (!first) return INT_MAX;
+    const auto left = std::chrono::ceil<std::chrono::milliseconds>(*first - TransferLine::SteadyClock::now()).count();
+    return static_cast<int>(std::clamp<decltype(left)>(left, 0, INT_MAX));
+}
+
 void HttpTransfers::begin(std::unique_ptr<HttpTransfer> transfer) {
-    if (std::optional<HttpResponse> response = transfer->prepare())
-        return answer(transfer->takeCompletion(), std::move(*response));
+    if (std::optional<HttpResponse> response = transfer->prepare()) {
+        line_.ended(*transfer);
+        return answer(*transfer, std::move(*response));
+    }
     curl().multiAddHandle(multi_, transfer->easy());
     HttpTransfer* key = transfer.get();
     running_.emplace(key, std::move(transfer));
@@ -159,15 +195,18 @@ void HttpTransfers::finishEnded() {
         curl().multiRemoveHandle(multi_, ended->easy());
         std::unique_ptr<HttpTransfer> transfer = std::move(running_.extract(ended).mapped());
 
-        if (std::optional<HttpResponse> response = transfer->finish(result))
-            answer(transfer->takeCompletion(), std::move(*response));
-        else
+        if (std::optional<HttpResponse> response = transfer->finish(result)) {
+            line_.ended(*transfer);
+            answer(*transfer, std::move(*response));
+        } else {
             begin(std::move(transfer));
+        }
     }
 }
 
-void HttpTransfers::answer(Completion completion, HttpResponse response) {
-    answers_.post([completion = std::move(completion), response = std::move(response)]() mutable {
+void HttpTransfers::answer(HttpTransfer& transfer, HttpResponse response) {
+    const RequesterScope scope(transfer.requester());
+    answers_.post([completion = transfer.takeCompletion(), response = std::move(response)]() mutable {
         completion(std::move(response));
     });
 }

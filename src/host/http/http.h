@@ -7,6 +7,9 @@
 //
 // The shared session keeps answers as their headers allow (http_cache.h). An uncached one does not use them, but stores
 // its own answer in their place, so that nobody gets an older one afterwards.
+//
+// A request reaches its server once; only a GET, which changes nothing, is sent a second time after a connection that
+// broke before the answer.
 #pragma once
 
 #include <memory>
@@ -24,6 +27,11 @@ struct HttpLimits {
     platform::Duration longestTimeout = std::chrono::hours(24);  // of any request
     std::size_t answerBytes = platform::limits::answerBytes;     // after decompression; headers count apart
     int redirects = 5;
+    // Transfers at the same time, in all and to one host. The others wait for their turn, and fail after the longest
+    // wait; the time of a request begins with its turn.
+    std::size_t transfers = platform::limits::transfers;
+    std::size_t transfersPerHost = platform::limits::transfersPerHost;
+    platform::Duration longestWait = std::chrono::seconds(60);
     std::size_t storedBytes = 1024 * 1024;  // of all stored answers together
 };
 

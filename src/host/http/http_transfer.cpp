@@ -44,10 +44,11 @@ bool isSafeHeader(const std::string& name, const std::string& value) {
     return isHeaderName(name) && value.find_first_of(std::string_view("\r\n\0", 3)) == value.npos;
 }
 
-std::chrono::steady_clock::time_point deadlineAfter(Duration timeout, Duration longest) {
-    const Duration bounded = timeout < longest ? timeout : longest;
-    return std::chrono::steady_clock::now() +
-           std::chrono::ceil<std::chrono::steady_clock::duration>(bounded > Duration(0) ? bounded : Duration(0));
+// Of any address, also of one that will be refused. A host that is spelled in two ways counts as two.
+std::string hostOf(const std::string& address) {
+    const std::size_t scheme = address.find("://");
+    const std::size_t begin = scheme == address.npos ? 0 : scheme + 3;
+    return address.substr(begin, address.find_first_of("/?#", begin) - begin);
 }
 
 }  // namespace
@@ -75,13 +76,19 @@ HttpTransfer::HttpTransfer(HttpRequest request, bool isUncached, HttpSurrounding
     : request_(std::move(request)),
       isUncached_(isUncached),
       surroundings_(surroundings),
-      deadline_(
-          deadlineAfter(request_.timeout.value_or(surroundings.limits.timeout), surroundings.limits.longestTimeout)),
       completion_(std::move(completion)),
+      host_(hostOf(request_.url)),
       address_(request_.url) {}
 
 HttpTransfer::~HttpTransfer() {
     for (auto& [name, value] : request_.headers) wipe(value);
+}
+
+void HttpTransfer::beginTime() {
+    if (deadline_) return;
+    const HttpLimits& limits = surroundings_.limits;
+    const Duration timeout = std::clamp(request_.timeout.value_or(limits.timeout), Duration(0), limits.longestTimeout);
+    deadline_ = SteadyClock::now() + std::chrono::ceil<SteadyClock::duration>(timeout);
 }
 
 MaybeError HttpTransfer::checkAddress() {
@@ -106,6 +113,7 @@ const HttpHeaders& HttpTransfer::ownHeaders() const {
 }
 
 std::optional<HttpResponse> HttpTransfer::prepare() {
+    beginTime();
     if (MaybeError error = checkAddress()) return httpFailure(std::move(*error));
     if (redirects_ == 0) nameSourceApplication();
     if (std::optional<HttpResponse> stored = storedAnswer()) return stored;
@@ -147,6 +155,8 @@ void HttpTransfer::setOptions() {
     set(CURLOPT_NOSIGNAL, 1L);
     set(CURLOPT_QUICK_EXIT, 1L);  // the time-out does not wait for a slow resolver
     set(CURLOPT_ERRORBUFFER, errorText_.data());
+    set(CURLOPT_PREREQFUNCTION, &HttpTransfer::onSend);
+    set(CURLOPT_PREREQDATA, this);
     set(CURLOPT_HEADERFUNCTION, &HttpTransfer::onHeader);
     set(CURLOPT_HEADERDATA, this);
     set(CURLOPT_WRITEFUNCTION, &HttpTransfer::onBody);
@@ -157,12 +167,16 @@ void HttpTransfer::setOptions() {
     // Requests sent together share a connection where the server can. Without TLS this is known only after the first
     // answer, and a server that stays silent would block the others.
     if (!isPlain_) set(CURLOPT_PIPEWAIT, 1L);
+    // What cannot be sent again uses no connection that the server may just be closing.
+    if (!isRepeatable()) set(CURLOPT_MAXAGE_CONN, 5L);
     // Requests to this machine bypass any proxy that the environment names.
     if (isLoopback_) set(CURLOPT_NOPROXY, "*");
-    // Trusted in addition to the system's authorities, and only if root or our user alone can write the profile.
+    // Trusted in addition to the system's authorities, and only if root or our user alone can write the file that says
+    // so.
     const std::shared_ptr<const ProfileContent> content = surroundings_.profile.content();
-    if (content->http.caFile && content->isTrusted()) set(CURLOPT_CAINFO, content->http.caFile->c_str());
-    const auto left = std::chrono::ceil<std::chrono::milliseconds>(deadline_ - SteadyClock::now()).count();
+    if (content->http.caFile && content->http.caFileSource.isTrusted())
+        set(CURLOPT_CAINFO, content->http.caFile->c_str());
+    const auto left = std::chrono::ceil<std::chrono::milliseconds>(*deadline_ - SteadyClock::now()).count();
     set(CURLOPT_TIMEOUT_MS, static_cast<long>(std::max<decltype(left)>(left, 1)));
 }
 
@@ -203,6 +217,19 @@ MaybeError HttpTransfer::setHeaders() {
     return std::nullopt;
 }
 
+// Called before each sending. The library itself sends again what a connection that broke has not answered, as often as
+// it takes; but the server may have done what it was asked.
+int HttpTransfer::onSend(void* self, char*, char*, int, int) {
+    auto& transfer = *static_cast<HttpTransfer*>(self);
+    const int most = transfer.isRepeatable() ? 2 : 1;
+    if (transfer.sent_ == most) {
+        transfer.failure_ = httpError(CURLE_GOT_NOTHING, "the connection ended before the answer");
+        return CURL_PREREQFUNC_ABORT;
+    }
+    ++transfer.sent_;
+    return CURL_PREREQFUNC_OK;
+}
+
 std::size_t HttpTransfer::onHeader(char* bytes, std::size_t, std::size_t size, void* self) {
     auto& transfer = *static_cast<HttpTransfer*>(self);
     const std::string_view line = trimmed({bytes, size});
@@ -210,7 +237,7 @@ std::size_t HttpTransfer::onHeader(char* bytes, std::size_t, std::size_t size, v
     if (line.starts_with("HTTP/")) transfer.headers_.clear();
     transfer.headerSize_ += size;
     if (transfer.headerSize_ > headerBytes) {
-        transfer.tooLarge_ = "the answer's headers are too large";
+        transfer.failure_ = httpError(CURLE_FILESIZE_EXCEEDED, "the answer's headers are too large");
         return 0;
     }
     const std::size_t colon = line.find(':');
@@ -224,7 +251,7 @@ std::size_t HttpTransfer::onHeader(char* bytes, std::size_t, std::size_t size, v
 std::size_t HttpTransfer::onBody(char* bytes, std::size_t, std::size_t size, void* self) {
     auto& transfer = *static_cast<HttpTransfer*>(self);
     if (size > transfer.surroundings_.limits.answerBytes - transfer.body_.size()) {
-        transfer.tooLarge_ = "the answer is too large";
+        transfer.failure_ = httpError(CURLE_FILESIZE_EXCEEDED, "the answer is too large");
         return 0;
     }
     transfer.body_.insert(transfer.body_.end(), bytes, bytes + size);
@@ -234,8 +261,7 @@ std::size_t HttpTransfer::onBody(char* bytes, std::size_t, std::size_t size, voi
 // The redirect to follow, or null.
 const char* HttpTransfer::redirect() const {
     const char* location = nullptr;
-    if (request_.method == "GET" || request_.method == "HEAD")
-        curl().easyGetinfo(easy_.get(), CURLINFO_REDIRECT_URL, &location);
+    if (isRepeatable()) curl().easyGetinfo(easy_.get(), CURLINFO_REDIRECT_URL, &location);
     return location;
 }
 
@@ -255,8 +281,7 @@ std::optional<HttpResponse> HttpTransfer::finish(CURLcode result) {
     curl().easyGetinfo(easy_.get(), CURLINFO_RESPONSE_CODE, &status);
     if (result != CURLE_OK) {
         const char* text = errorText_[0] ? errorText_.data() : curl().easyStrerror(result);
-        HttpResponse response =
-            httpFailure(tooLarge_ ? httpError(CURLE_FILESIZE_EXCEEDED, tooLarge_) : httpError(result, text));
+        HttpResponse response = httpFailure(failure_ ? *std::move(failure_) : httpError(result, text));
         response.status = static_cast<int>(status);  // of an answer that broke off
         return response;
     }
@@ -271,6 +296,7 @@ std::optional<HttpResponse> HttpTransfer::finish(CURLcode result) {
         if (redirects_++ == surroundings_.limits.redirects)
             return httpFailure(httpError(CURLE_TOO_MANY_REDIRECTS, "too many redirects"));
         address_ = location;
+        sent_ = 0;
         isSecured_ = !isPlain_;
         return std::nullopt;
     }
@@ -278,7 +304,7 @@ std::optional<HttpResponse> HttpTransfer::finish(CURLcode result) {
     HttpResponse response = httpSuccess(static_cast<int>(status), std::move(headers_), std::move(body_));
     if (isKept) cache.store(address_, asked_, response);
     // A successful change makes what is kept of the address out of date.
-    if (request_.method != "GET" && request_.method != "HEAD" && status < 400) cache.forget(address_);
+    if (!isRepeatable() && status < 400) cache.forget(address_);
     return response;
 }
 

@@ -8,6 +8,7 @@
 #include <optional>
 #include <string>
 
+#include "vrx/host/base/requester.h"
 #include "vrx/host/http/curl.h"
 #include "vrx/host/http/http.h"
 #include "vrx/host/http/http_cache.h"
@@ -36,10 +37,14 @@ public:
     HttpTransfer& operator=(const HttpTransfer&) = delete;
 
     CURL* easy() const { return easy_.get(); }
+    // For whom it is sent.
+    Requester requester() const { return requester_; }
+    // Of the request's own address, port included; redirects may lead elsewhere.
+    const std::string& host() const { return host_; }
     Completion takeCompletion() { return std::move(completion_); }
 
-    // Prepares the request to the next address, the request's own or a redirect's. Returns the response when nothing is
-    // to be sent: a stored answer that is fresh, or a failure.
+    // Prepares the request to the next address, the request's own or a redirect's. The request's time begins with the
+    // first call. Returns the response when nothing is to be sent: a stored answer that is fresh, or a failure.
     std::optional<platform::HttpResponse> prepare();
     // To be called when the library is done. Returns the response, or nothing when another address has to be asked:
     // then prepare() is next.
@@ -52,6 +57,8 @@ private:
     };
     using SteadyClock = std::chrono::steady_clock;
 
+    void beginTime();
+    bool isRepeatable() const { return request_.method == "GET" || request_.method == "HEAD"; }
     platform::MaybeError checkAddress();
     const platform::HttpHeaders& ownHeaders() const;
     void nameSourceApplication();
@@ -67,20 +74,24 @@ private:
         curl().easySetopt(easy_.get(), option, value);
     }
 
+    static int onSend(void* self, char* address, char* localAddress, int port, int localPort);
     static std::size_t onHeader(char* bytes, std::size_t one, std::size_t size, void* self);
     static std::size_t onBody(char* bytes, std::size_t one, std::size_t size, void* self);
 
     platform::HttpRequest request_;
     const bool isUncached_;
     const HttpSurroundings surroundings_;
-    const SteadyClock::time_point deadline_;
+    std::optional<SteadyClock::time_point> deadline_;
     Completion completion_;
+    const Requester requester_ = RequesterScope::current();
+    const std::string host_;
 
     std::string address_;
     bool isPlain_ = false;     // not over TLS
     bool isLoopback_ = false;  // to this machine
     bool isSecured_ = false;   // what redirected there came over TLS
     int redirects_ = 0;
+    int sent_ = 0;  // times, to this address
 
     bool isCached_ = false;     // may be answered from the cache and stored in it
     HttpCache::Stored stored_;  // the answer that the request asks to confirm
@@ -93,7 +104,7 @@ private:
     platform::HttpHeaders headers_;
     std::size_t headerSize_ = 0;
     platform::Data body_;
-    const char* tooLarge_ = nullptr;
+    platform::MaybeError failure_;  // why this side ended the transfer
 };
 
 }  // namespace vrx::host

@@ -63,7 +63,10 @@ Result<platform::Array> listOf(const HttpResponse& response, const char* key) {
     if (!root) return root.error();
     const platform::Array* list = (*root)[key].asArray();
     if (!list) return Error{platform::error_domain::store, 0, std::string("the answer holds no list of ") + key};
-    return *list;
+    platform::Array entries;  // of another type they count as missing
+    for (const Value& entry : *list)
+        if (entry.asDictionary()) entries.push_back(entry);
+    return entries;
 }
 
 std::optional<std::string> text(const Value& dictionary, std::string_view key) {

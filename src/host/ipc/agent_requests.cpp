@@ -1,5 +1,6 @@
 #include "vrx/host/ipc/agent_requests.h"
 
+#include <cerrno>
 #include <cstring>
 #include <utility>
 
@@ -10,6 +11,10 @@
 
 namespace vrx::host {
 
+namespace error_domain = platform::error_domain;
+namespace limits = platform::limits;
+using platform::Error;
+using platform::Result;
 using platform::Value;
 using wire::OperationIndex;
 
@@ -52,22 +57,34 @@ private:
 
 }  // namespace
 
-std::optional<RequestArguments> readArguments(sd_bus_message* call, const wire::Operation& operation) {
+// The bus has compared the signature; that the body holds what it promises shows only here. sd-bus looks neither at
+// what follows the last argument nor at whether a flag is one: that is read from the bytes.
+Result<RequestArguments> readArguments(sd_bus_message* call, std::string_view body, std::endian order,
+                                       const wire::Operation& operation) {
+    const Error isWrong{error_domain::wire, EBADMSG, "the request does not hold its arguments, and only them"};
     RequestArguments arguments;
+    const char* text = "";
+    std::size_t end = 0;  // of what was read
+    const auto moveTo = [&end](std::size_t alignment) { end = (end + alignment - 1) / alignment * alignment; };
     for (const char* type = operation.signature; *type != '\0'; ++type) {
-        if (*type == 's') {
-            const char* text = "";
-            sd_bus_message_read_basic(call, *type, &text);
-            if (std::strlen(text) > platform::limits::argumentBytes) return std::nullopt;
-            arguments.text = text;
-        } else if (*type == 't') {
-            sd_bus_message_read_basic(call, *type, &arguments.policy);
-        } else {
-            int flag = 0;
-            sd_bus_message_read_basic(call, *type, &flag);
+        int flag = 0;
+        void* const argument = *type == 's'   ? static_cast<void*>(&text)
+                               : *type == 't' ? static_cast<void*>(&arguments.policy)
+                                              : static_cast<void*>(&flag);
+        if (sd_bus_message_read_basic(call, *type, argument) <= 0) return isWrong;
+        moveTo(*type == 't' ? 8 : 4);
+        if (*type == 'b') {
             arguments.flag = flag != 0;
+            const std::string_view yes(order == std::endian::little ? "\1\0\0\0" : "\0\0\0\1", 4);
+            if (arguments.flag && body.substr(end, 4) != yes) return isWrong;
         }
+        end += *type == 's' ? 4 + std::strlen(text) + 1 : *type == 't' ? 8 : 4;
     }
+    if (end != body.size()) return isWrong;
+    if (std::strlen(text) > limits::argumentBytes)
+        return Error{error_domain::wire, EBADMSG,
+                     "a string argument is longer than " + std::to_string(limits::argumentBytes) + " bytes"};
+    arguments.text = text;
     return arguments;
 }
 

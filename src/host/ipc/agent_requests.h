@@ -3,10 +3,12 @@
 
 #include <systemd/sd-bus.h>
 
-#include <optional>
+#include <bit>
 #include <string>
+#include <string_view>
 
 #include "vrx/host/ipc/reply_box.h"
+#include "vrx/platform/error.h"
 #include "vrx/protocols/agent_protocol.h"
 #include "vrx/wire/names.h"
 
@@ -19,8 +21,10 @@ struct RequestArguments {
     bool flag = false;
 };
 
-// Reads the arguments of a call with the operation's signature. Nothing when a string is too long.
-std::optional<RequestArguments> readArguments(sd_bus_message* call, const wire::Operation& operation);
+// Reads the arguments of a call with the operation's signature. The body's bytes are given as well. An error when it
+// does not hold the arguments and nothing else, or a string is too long.
+platform::Result<RequestArguments> readArguments(sd_bus_message* call, std::string_view body, std::endian order,
+                                                 const wire::Operation& operation);
 
 // Calls the operation, which answers through the pending reply.
 void performRequest(VRXAgentProtocol& agent, wire::OperationIndex operation, RequestArguments arguments,

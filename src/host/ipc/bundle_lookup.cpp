@@ -7,6 +7,7 @@
 #include <array>
 #include <cerrno>
 
+#include "vrx/host/base/files.h"
 #include "vrx/host/base/trust.h"
 #include "vrx/platform/log.h"
 
@@ -27,6 +28,10 @@ bool isSameFile(const std::string& one, const std::string& other) {
     struct stat otherStatus;
     return stat(one.c_str(), &oneStatus) == 0 && stat(other.c_str(), &otherStatus) == 0 &&
            oneStatus.st_dev == otherStatus.st_dev && oneStatus.st_ino == otherStatus.st_ino;
+}
+
+void logWhyNone(const std::string& executable, const platform::Error& error) {
+    if (error.code != ENOENT) log(Level::Default, "%@ has no bundle: %@", executable, error.text);
 }
 
 bool isGroup(gid_t number, const std::string& name) {
@@ -62,37 +67,43 @@ std::optional<Bundle> BundleLookup::bundleContaining(const std::string& executab
     return Bundle{file->folder, file->identifier};
 }
 
-Value BundleLookup::entitlement(const PeerIdentity& peer, std::string_view name) const {
-    std::optional<BundleFile> file = bundleOf(peer.executable());
-    if (!file || (file->group && !isGroup(peer.group(), *file->group))) return nullptr;
+Result<Value> BundleLookup::entitlement(const PeerIdentity& peer, std::string_view name) const {
+    const Result<BundleFile> file = find(peer.executable());
+    if (!file) {
+        if (isShortage(file.error().code)) return file.error();
+        logWhyNone(peer.executable(), file.error());
+        return Value();
+    }
+    if (file->group && !isGroup(peer.group(), *file->group)) return Value();
     auto entry = file->entitlements.find(name);
     return entry == file->entitlements.end() ? Value() : entry->second;
 }
 
 std::optional<BundleFile> BundleLookup::bundleOf(const std::string& executable) const {
-    if (executable.empty()) return std::nullopt;
-    if (const auto open = findOpenToOthers(executable, Links::Refused)) {
-        log(Level::Default, "%@ has no bundle: %@", executable, open->error.text);
-        return std::nullopt;
-    }
-    if (std::optional<BundleFile> file = profileBundle(executable)) return file;
+    Result<BundleFile> file = find(executable);
+    if (file) return std::move(file).value();
+    logWhyNone(executable, file.error());
+    return std::nullopt;
+}
+
+Result<BundleFile> BundleLookup::find(const std::string& executable) const {
+    if (executable.empty()) return systemError("find", "the program", ENOENT);
+    if (const auto open = findOpenToOthers(executable, Links::Refused)) return open->error;
+    if (std::optional<BundleFile> file = profileBundle(executable)) return *std::move(file);
     for (std::string folder = executable.substr(0, executable.rfind('/')); !folder.empty();
          folder.resize(folder.rfind('/'))) {
         Result<BundleFile> file = readBundleFile(folder);
-        if (file) return std::move(file).value();
-        if (file.error().code == ENOENT) continue;
-        log(Level::Default, "%@ has no bundle: %@", executable, file.error().text);
-        return std::nullopt;
+        if (file || file.error().code != ENOENT) return file;
     }
-    return std::nullopt;
+    return systemError("find", "a bundle of " + executable, ENOENT);
 }
 
 std::optional<BundleFile> BundleLookup::profileBundle(const std::string& executable) const {
     const std::shared_ptr<const ProfileContent> content = profile_ ? profile_() : nullptr;
-    if (!content || content->bundles.empty() || !content->isTrusted()) return std::nullopt;
+    if (!content) return std::nullopt;
     for (const ProfileBundle& bundle : content->bundles)
         for (const std::string& named : bundle.executables)
-            if (isSameFile(named, executable))
+            if (isSameFile(named, executable) && bundle.source.isTrusted())
                 return BundleFile{executable,    bundle.identifier, bundle.name,
                                   bundle.vendor, bundle.group,      bundle.entitlements};
     return std::nullopt;

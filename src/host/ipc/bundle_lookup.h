@@ -26,8 +26,9 @@ public:
     std::size_t executablePath(std::int32_t processIdentifier, std::span<char> buffer) const override;
     std::optional<platform::Bundle> bundleContaining(const std::string& executablePath) const override;
 
-    // Null when the peer's bundle does not hold the entitlement, or requires another group than the peer's.
-    platform::Value entitlement(const PeerIdentity& peer, std::string_view name) const;
+    // Null when the peer's bundle does not hold the entitlement, or requires another group than the peer's. An error
+    // when there is no descriptor or memory left to look.
+    platform::Result<platform::Value> entitlement(const PeerIdentity& peer, std::string_view name) const;
     // The bundle of a program, whoever runs it. For tools.
     std::optional<BundleFile> bundleOf(const std::string& executable) const;
 
@@ -41,6 +42,8 @@ public:
     };
 
 private:
+    // An error with ENOENT when there is none.
+    platform::Result<BundleFile> find(const std::string& executable) const;
     std::optional<BundleFile> profileBundle(const std::string& executable) const;
 
     const Profile profile_;

@@ -1,10 +1,12 @@
 #include "vrx/host/ipc/client_session.h"
 
+#include <malloc.h>
 #include <poll.h>
+#include <sys/socket.h>
 
 #include <cerrno>
 
-#include "vrx/host/ipc/agent_requests.h"
+#include "vrx/host/base/requester.h"
 #include "vrx/platform/log.h"
 #include "vrx/wire/encoding.h"
 
@@ -14,12 +16,22 @@ using platform::Level;
 using platform::log;
 using wire::MessagePointer;
 
+namespace {
+
+// Replies above it leave memory behind that the allocator would keep.
+constexpr std::size_t muchBytes = 1024 * 1024;
+
+}  // namespace
+
 ClientSession::ClientSession(Descriptor socket, const PeerIdentity& peer, std::shared_ptr<VRXAgentProtocol> agent,
-                             std::shared_ptr<ReplyBox> box, const ServiceLimits& limits, ProcessLifecycle& lifecycle)
+                             std::shared_ptr<ReplyBox> box, const ServiceLimits& limits, RequestLine& line,
+                             ProcessLifecycle& lifecycle)
     : peer_(peer),
       agent_(std::move(agent)),
       box_(std::move(box)),
       limits_(limits),
+      line_(line),
+      waiter_{peer.user(), [box = box_] { box->wake(); }},
       lifecycle_(lifecycle),
       authenticationEnd_(std::chrono::steady_clock::now() + limits.authentication),
       work_(lifecycle.beginWorkUnlessEnding()),
@@ -33,6 +45,8 @@ ClientSession::ClientSession(Descriptor socket, const PeerIdentity& peer, std::s
 
 ClientSession::~ClientSession() {
     box_->close();
+    line_.leave(waiter_);
+    line_.changeUnsent(unsentBytes_, 0);
 }
 
 // One row for each operation; its offset selects the operation's place among `methods_`.
@@ -57,18 +71,54 @@ const std::vector<sd_bus_vtable>& ClientSession::methodTable() {
     return table;
 }
 
-void ClientSession::serve(const std::atomic<bool>& isStopping) {
-    while (!isStopping && !isCutOff_ && !isAuthenticationOverdue()) {
+void ClientSession::serve(SessionState& state) {
+    while (true) {
         if (!work_) work_ = lifecycle_.beginWorkUnlessEnding();
         if (!work_) return;
+        state.idleSince = 0;
         box_->sendPending();
+        if (state.isStopping || isCutOff_ || isAuthenticationOverdue()) break;
         const ServerBus::Step step = bus_.step();
         if (step == ServerBus::Step::Ended) return;
+        countUnsent();
+        performWaiting();
         if (step == ServerBus::Step::Progress) continue;
-        if (bus_.unsentMessages() == 0) work_.reset();
+        if (isIdle()) {
+            if (bus_.isReadToTheEnd()) break;
+            if (state.isGivenUp) {
+                shutdown(bus_.socket(), SHUT_RD);  // what has come until now is answered, and the rest not accepted
+                continue;
+            }
+            state.idleSince = std::chrono::steady_clock::now().time_since_epoch().count();
+        }
+        if (bus_.unsentMessages() == 0 && waiting_.empty()) work_.reset();
         if (!waitUntilReady()) break;
     }
     if (!work_) work_ = lifecycle_.beginWorkUnlessEnding();
+}
+
+// Performs what has been read, in its order, as far as there are places for it. A client that has taken all its replies
+// gets one more in any case.
+void ClientSession::performWaiting() {
+    while (!waiting_.empty() && unsentBytes_ < limits_.unsentBytesPerConnection) {
+        RequestLine::Place place = line_.take(waiter_, unsentBytes_ > 0);
+        if (!place) return;
+        auto [number, operation, arguments] = std::move(waiting_.front());
+        waiting_.pop_front();
+        const RequesterScope scope(peer_.user());
+        performRequest(*agent_, operation, std::move(arguments),
+                       PendingReply(box_, number, agent_, {work_, std::move(place)}));
+    }
+}
+
+// The bus tells how many messages it has not sent, not how large they are. Others than replies are small.
+void ClientSession::countUnsent() {
+    if (unsentBytes_ == 0) return;
+    const std::size_t before = unsentBytes_;
+    for (std::size_t left = bus_.unsentMessages(); unsentReplies_.size() > left; unsentReplies_.pop_front())
+        unsentBytes_ -= unsentReplies_.front();
+    line_.changeUnsent(before, unsentBytes_);
+    if (unsentBytes_ == 0 && std::exchange(hasSentMuch_, false)) malloc_trim(0);
 }
 
 bool ClientSession::isAuthenticationOverdue() const {
@@ -105,13 +155,12 @@ int ClientSession::handle(sd_bus_message* call, wire::OperationIndex operation, 
         return sd_bus_error_setf(error, wire::limitsExceeded, "more than %zu requests of this connection are open",
                                  limits_.requestsPerConnection);
     }
-    std::optional<RequestArguments> arguments = readArguments(call, wire::operation(operation));
-    if (!arguments)
-        return sd_bus_error_setf(error, wire::invalidArguments, "a string argument is longer than %zu bytes",
-                                 platform::limits::argumentBytes);
+    platform::Result<RequestArguments> arguments =
+        readArguments(call, bus_.body(), bus_.byteOrder(), wire::operation(operation));
+    if (!arguments) return sd_bus_error_set(error, wire::invalidArguments, arguments.error().text.c_str());
     const RequestNumber request = ++lastRequest_;
     openCalls_.emplace(request, MessagePointer(sd_bus_message_ref(call)));
-    performRequest(*agent_, operation, std::move(*arguments), PendingReply(box_, request, agent_, work_));
+    waiting_.push_back({request, operation, std::move(arguments).value()});
     return 1;
 }
 
@@ -128,7 +177,15 @@ void ClientSession::send(const RequestReply& reply) {
     const MessagePointer owner(message);
     if (r >= 0) r = wire::appendReply(message, *reply.root);
     if (r >= 0) r = sd_bus_send(bus_.bus(), message, nullptr);
-    if (r < 0) sd_bus_reply_method_errorf(request, wire::limitsExceeded, "the reply cannot be sent: %s", strerror(-r));
+    if (r >= 0 && bus_.unsentMessages() > 0) {
+        unsentReplies_.push_back(wire::encodedBytes(*reply.root));
+        line_.changeUnsent(unsentBytes_, unsentBytes_ + unsentReplies_.back());
+        unsentBytes_ += unsentReplies_.back();
+        hasSentMuch_ = hasSentMuch_ || unsentReplies_.back() >= muchBytes;
+    }
+    if (r < 0)
+        r = sd_bus_reply_method_errorf(request, wire::limitsExceeded, "the reply cannot be sent: %s", strerror(-r));
+    if (r < 0) isCutOff_ = true;  // else the client would wait for a reply that never comes
 }
 
 }  // namespace vrx::host

@@ -1,17 +1,23 @@
 // Serves one accepted client, on the thread that calls serve(), until the client goes or the service ends. Takes the
-// next request when the operation of the one before has returned. Sends replies as they come, from any thread. A
-// request keeps the process alive until its reply is sent; a silent client does not.
+// next request when the operation of the one before has returned, and waits with it while too much is under way, or
+// while the client does not take its replies. Sends replies as they come, from any thread. A request keeps the process
+// alive until its reply is sent; a silent client does not.
 #pragma once
 
 #include <systemd/sd-bus.h>
 
 #include <array>
 #include <atomic>
+#include <chrono>
+#include <deque>
 #include <memory>
+#include <optional>
 #include <unordered_map>
 
+#include "vrx/host/ipc/agent_requests.h"
 #include "vrx/host/ipc/peer_identity.h"
 #include "vrx/host/ipc/reply_box.h"
+#include "vrx/host/ipc/request_line.h"
 #include "vrx/host/ipc/server_bus.h"
 #include "vrx/host/ipc/service_limits.h"
 #include "vrx/host/loop/process_lifecycle.h"
@@ -21,14 +27,24 @@
 
 namespace vrx::host {
 
+// What the thread that serves a session and the one that owns it tell each other. After a change of the first two the
+// owner wakes the session's box.
+struct SessionState {
+    std::atomic<bool> isStopping = false;  // it is to end at once
+    std::atomic<bool> isGivenUp = false;   // it is to end as soon as nothing is under way
+    // Since when nothing is under way, by the steady clock; 0 while something is.
+    std::atomic<std::chrono::steady_clock::rep> idleSince = 0;
+};
+
 class ClientSession final : public ReplySender {
 public:
     ClientSession(Descriptor socket, const PeerIdentity& peer, std::shared_ptr<VRXAgentProtocol> agent,
-                  std::shared_ptr<ReplyBox> box, const ServiceLimits& limits, ProcessLifecycle& lifecycle);
+                  std::shared_ptr<ReplyBox> box, const ServiceLimits& limits, RequestLine& line,
+                  ProcessLifecycle& lifecycle);
     ~ClientSession() override;
 
-    // To stop it, set the flag and wake the box. The session has work in flight while the socket is read or closed.
-    void serve(const std::atomic<bool>& isStopping);
+    // The session has work in flight while the socket is read or closed.
+    void serve(SessionState& state);
 
     void send(const RequestReply& reply) override;
 
@@ -41,13 +57,24 @@ private:
     static const std::vector<sd_bus_vtable>& methodTable();
     static int onCall(sd_bus_message* call, void* method, sd_bus_error* error);
     int handle(sd_bus_message* call, wire::OperationIndex operation, sd_bus_error* error);
+    void performWaiting();
+    void countUnsent();
+    bool isIdle() const { return openCalls_.empty() && bus_.unsentMessages() == 0; }
     bool waitUntilReady() const;
     bool isAuthenticationOverdue() const;
+
+    struct Waiting {
+        RequestNumber number;
+        wire::OperationIndex operation;
+        RequestArguments arguments;
+    };
 
     const PeerIdentity& peer_;
     const std::shared_ptr<VRXAgentProtocol> agent_;
     const std::shared_ptr<ReplyBox> box_;
     const ServiceLimits& limits_;
+    RequestLine& line_;
+    RequestLine::Waiter waiter_;
     ProcessLifecycle& lifecycle_;
     const std::chrono::steady_clock::time_point authenticationEnd_;
     platform::WorkInFlight work_;  // outlives the bus
@@ -55,6 +82,10 @@ private:
     ServerBus bus_;
     RequestNumber lastRequest_ = 0;
     std::unordered_map<RequestNumber, wire::MessagePointer> openCalls_;
+    std::deque<Waiting> waiting_;            // some of the open calls
+    std::deque<std::size_t> unsentReplies_;  // bytes of each
+    std::size_t unsentBytes_ = 0;
+    bool hasSentMuch_ = false;  // since memory was given back
     bool isCutOff_ = false;
 };
 

@@ -71,33 +71,42 @@ std::string pathOfProgram(const Descriptor& process, const struct stat& program)
 Result<PeerIdentity> PeerIdentity::ofPeer(int socket) {
     timespec now{};
     clock_gettime(CLOCK_BOOTTIME, &now);
-    ucred credentials{};
-    socklen_t size = sizeof credentials;
-    if (getsockopt(socket, SOL_SOCKET, SO_PEERCRED, &credentials, &size) != 0)
-        return systemError("identify", "the peer", errno);
+    const Result<ucred> found = credentialsOf(socket);
+    if (!found) return found.error();
+    const ucred& credentials = *found;
 
     int pidfd = -1;
-    size = sizeof pidfd;
+    socklen_t size = sizeof pidfd;
     const bool isExact = getsockopt(socket, SOL_SOCKET, peerPidfdOption, &pidfd, &size) == 0;
     const Descriptor guard(isExact ? pidfd : openProcess(credentials.pid).release());
     if (!guard) return systemError("identify", "process " + std::to_string(credentials.pid), errno);
 
     PeerIdentity peer;
-    peer.processIdentifier_ = credentials.pid;
-    peer.user_ = credentials.uid;
-    peer.group_ = credentials.gid;
+    peer.credentials_ = credentials;
     peer.process_ = openProcessFolder(credentials.pid);
+    if (!peer.process_ && isShortage(errno)) return systemError("identify", "the peer", errno);
     // The process still lives, so the folder opened above is its own. A signal of 0 would not detect a zombie.
     if (!peer.process_ || hasEnded(guard) || (!isExact && !hasStartedBefore(peer.process_, now)))
         return systemError("identify", "process " + std::to_string(credentials.pid), ESRCH);
-    peer.findExecutable();
+    if (platform::MaybeError error = peer.findExecutable()) return *error;
     return peer;
 }
 
-void PeerIdentity::findExecutable() {
+Result<ucred> PeerIdentity::credentialsOf(int socket) {
+    ucred credentials{};
+    socklen_t size = sizeof credentials;
+    if (getsockopt(socket, SOL_SOCKET, SO_PEERCRED, &credentials, &size) != 0)
+        return systemError("identify", "the peer", errno);
+    return credentials;
+}
+
+// Another user's program may be hidden, which is no error.
+platform::MaybeError PeerIdentity::findExecutable() {
     program_ = Descriptor(openat(process_.number(), "exe", O_PATH | O_CLOEXEC));
+    if (!program_ && isShortage(errno)) return systemError("identify", "the peer's program", errno);
     if (program_ && fstat(program_.number(), &programStatus_) == 0)
         executable_ = pathOfProgram(process_, programStatus_);
+    return std::nullopt;
 }
 
 bool PeerIdentity::runsSameProgram() const {

@@ -3,6 +3,7 @@
 // calls, but proves nothing against hostile code of the same user, which can trace or preload it. One thread at a time.
 #pragma once
 
+#include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/types.h>
 
@@ -15,12 +16,15 @@ namespace vrx::host {
 
 class PeerIdentity {
 public:
-    // An error when the peer has already ended.
+    // An error when the peer has already ended, or when there is no descriptor or memory left (isShortage).
     static platform::Result<PeerIdentity> ofPeer(int socket);
+    // Its process, user and group alone, for which no descriptor is needed.
+    static platform::Result<ucred> credentialsOf(int socket);
 
-    pid_t processIdentifier() const { return processIdentifier_; }
-    uid_t user() const { return user_; }
-    gid_t group() const { return group_; }
+    pid_t processIdentifier() const { return credentials_.pid; }
+    uid_t user() const { return credentials_.uid; }
+    gid_t group() const { return credentials_.gid; }
+    const ucred& credentials() const { return credentials_; }
 
     // The program's absolute path. Empty when it cannot be read (another user's or a protected process), and when
     // another file is at that path by now.
@@ -31,11 +35,9 @@ public:
 
 private:
     PeerIdentity() = default;
-    void findExecutable();
+    platform::MaybeError findExecutable();
 
-    pid_t processIdentifier_ = 0;
-    uid_t user_ = 0;
-    gid_t group_ = 0;
+    ucred credentials_{};
     Descriptor process_;  // /proc/PID of this very process
     Descriptor program_;  // the program's file, held so that its inode is not used again
     struct stat programStatus_ {};

@@ -1,8 +1,10 @@
 #include "vrx/host/ipc/refusals.h"
 
+#include <fcntl.h>
 #include <poll.h>
 
 #include <algorithm>
+#include <map>
 #include <system_error>
 #include <vector>
 
@@ -15,8 +17,8 @@ using std::chrono::steady_clock;
 // One refused client.
 class Refusals::Refused {
 public:
-    Refused(Descriptor socket, pid_t peer, const char* errorName, std::string text, steady_clock::time_point end)
-        : bus_(std::move(socket), peer), errorName_(errorName), text_(std::move(text)), end_(end) {
+    Refused(Descriptor socket, const ucred& peer, const char* errorName, std::string text, steady_clock::time_point end)
+        : user_(peer.uid), bus_(std::move(socket), peer.pid), errorName_(errorName), text_(std::move(text)), end_(end) {
         if (bus_.bus()) sd_bus_add_filter(bus_.bus(), nullptr, onMessage, this);
     }
 
@@ -24,11 +26,12 @@ public:
     bool goesOn(steady_clock::time_point now) {
         ServerBus::Step step = ServerBus::Step::Progress;
         while (step == ServerBus::Step::Progress && !(isAnswered_ && bus_.unsentMessages() == 0)) step = bus_.step();
-        return step == ServerBus::Step::Idle && now < end_;
+        return step == ServerBus::Step::Idle && now < end_ && !(bus_.isReadToTheEnd() && bus_.unsentMessages() == 0);
     }
 
     pollfd waitFor() const { return {bus_.socket(), bus_.events(), 0}; }
     steady_clock::time_point end() const { return end_; }
+    uid_t user() const { return user_; }
 
 private:
     static int onMessage(sd_bus_message* message, void* self, sd_bus_error*) {
@@ -46,6 +49,7 @@ private:
         return 1;
     }
 
+    const uid_t user_;
     ServerBus bus_;
     const char* const errorName_;
     const std::string text_;
@@ -53,7 +57,13 @@ private:
     bool isAnswered_ = false;
 };
 
-Refusals::Refusals(const ServiceLimits& limits) : limits_(limits) {}
+Refusals::Refusals(const ServiceLimits& limits) : limits_(limits) {
+    keepSpare();
+}
+
+void Refusals::keepSpare() {
+    for (Descriptor& file : spare_) file = Descriptor(fcntl(wakeFile_.number(), F_DUPFD_CLOEXEC, 0));
+}
 
 Refusals::~Refusals() {
     {
@@ -64,7 +74,7 @@ Refusals::~Refusals() {
     if (thread_.joinable()) thread_.join();
 }
 
-void Refusals::refuse(Descriptor socket, pid_t peer, const char* errorName, std::string text) {
+void Refusals::refuse(Descriptor socket, const ucred& peer, const char* errorName, std::string text) {
     if (!thread_.joinable()) {
         try {
             thread_ = std::thread([this] { run(); });
@@ -72,13 +82,13 @@ void Refusals::refuse(Descriptor socket, pid_t peer, const char* errorName, std:
             return;  // without a thread the client learns nothing
         }
     }
+    for (Descriptor& file : spare_) file = Descriptor();
     {
         std::lock_guard lock(mutex_);
-        if (count_ >= limits_.refusals) return;
-        ++count_;
         arriving_.push_back(std::make_unique<Refused>(std::move(socket), peer, errorName, std::move(text),
                                                       steady_clock::now() + limits_.refusal));
     }
+    keepSpare();
     eventfd_write(wakeFile_.number(), 1);
 }
 
@@ -100,15 +110,21 @@ void Refusals::run() {
     present_.clear();
 }
 
+void Refusals::removeSurplus() {
+    while (present_.size() > limits_.refusals) {
+        std::map<uid_t, std::size_t> counts;
+        for (const auto& refused : present_) ++counts[refused->user()];
+        const uid_t user = std::ranges::max_element(counts, {}, [](const auto& count) { return count.second; })->first;
+        present_.erase(std::ranges::find(present_, user, [](const auto& refused) { return refused->user(); }));
+    }
+}
+
 // Serves all, and removes those that have ended. Returns the milliseconds until the first of the others times out, or
 // -1.
 int Refusals::serveAll() {
     const auto now = steady_clock::now();
-    const std::size_t ended = std::erase_if(present_, [now](auto& refused) { return !refused->goesOn(now); });
-    {
-        std::lock_guard lock(mutex_);
-        count_ -= ended;
-    }
+    std::erase_if(present_, [now](auto& refused) { return !refused->goesOn(now); });
+    removeSurplus();
     if (present_.empty()) return -1;
     const auto first = std::ranges::min_element(present_, {}, [](auto& refused) { return refused->end(); });
     return static_cast<int>(std::chrono::ceil<std::chrono::milliseconds>((*first)->end() - now).count());

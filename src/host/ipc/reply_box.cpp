@@ -9,8 +9,7 @@ void ReplyBox::put(RequestReply reply) {
         if (!sender_) return;
         if (std::this_thread::get_id() != servingThread_) {
             pending_.push_back(std::move(reply));
-            if (!hasPending_.exchange(true)) wake();
-            return;
+            return wakeLocked();
         }
         sender = sender_;
     }
@@ -18,8 +17,12 @@ void ReplyBox::put(RequestReply reply) {
 }
 
 void ReplyBox::wake() {
-    // It can only fail when the counter is full, and then the thread is awake.
-    [[maybe_unused]] int result = eventfd_write(wakeFile_.number(), 1);
+    std::lock_guard lock(mutex_);
+    wakeLocked();
+}
+
+void ReplyBox::wakeLocked() {
+    if (!isAwake_.exchange(true)) eventfd_write(wakeFile_.number(), 1);
 }
 
 void ReplyBox::open(ReplySender& sender) {
@@ -29,12 +32,12 @@ void ReplyBox::open(ReplySender& sender) {
 }
 
 void ReplyBox::sendPending() {
-    if (!hasPending_) return;
+    if (!isAwake_) return;
     std::vector<RequestReply> pending;
     {
         std::lock_guard lock(mutex_);
         pending.swap(pending_);
-        hasPending_ = false;
+        isAwake_ = false;
         eventfd_t count;
         eventfd_read(wakeFile_.number(), &count);
     }

@@ -1,11 +1,14 @@
 #include "vrx/host/ipc/server_bus.h"
 
+#include <endian.h>
 #include <poll.h>
 #include <sys/socket.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <cstring>
+#include <utility>
 
 #include "vrx/platform/limits.h"
 
@@ -13,95 +16,137 @@ namespace vrx::host {
 
 namespace {
 
-// Far above what a request needs. sd-bus alone would accept 128 MiB.
-constexpr std::uint64_t messageBytes = platform::limits::documentBytes;
-
-int answerHello(sd_bus_message* message, void*, sd_bus_error*) {
-    if (sd_bus_message_is_method_call(message, "org.freedesktop.DBus", "Hello") <= 0) return 0;
-    const int r = sd_bus_reply_method_return(message, "s", ":1.1");
-    return r < 0 ? r : 1;
-}
-
-std::uint32_t numberAt(const std::array<unsigned char, 16>& header, std::size_t position) {
-    std::uint32_t number;
-    std::memcpy(&number, header.data() + position, sizeof number);
-    constexpr unsigned char nativeOrder = 'l';
-    return header[0] == nativeOrder ? number : __builtin_bswap32(number);
-}
-
-// Whether these bytes begin a message that is too long. Bytes in the middle of a message can look like it only by
-// chance, and only in one that is long already.
-bool beginsLongMessage(const std::array<unsigned char, 16>& header) {
-    const bool isHeader =
-        (header[0] == 'l' || header[0] == 'B') && header[1] >= 1 && header[1] <= 4 && header[2] < 8 && header[3] == 1;
-    return isHeader && std::uint64_t{numberAt(header, 4)} + numberAt(header, 12) > messageBytes;
-}
+// sd-bus alone would accept 128 MiB.
+constexpr std::uint64_t messageBytes = platform::limits::requestBytes;
+// A message's header of fixed size, and the places of two numbers in it. Fields and body follow.
+constexpr std::size_t headerBytes = 16, bodyBytesAt = 4, fieldBytesAt = 12;
 
 }  // namespace
 
 ServerBus::ServerBus(Descriptor socket, pid_t peer) : socket_(socket.number()), peer_(peer) {
     const int on = 1;  // for a connection that was made before the listener had it
     setsockopt(socket_, SOL_SOCKET, SO_PASSCRED, &on, sizeof on);
+    int ends[2] = {-1, -1};
     sd_id128_t identifier{};
     auto tryTo = [this](int result) { state_ = state_ < 0 ? state_ : result; };
+    tryTo(socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0, ends) == 0 ? 0 : -errno);
+    input_ = Descriptor(ends[0]);
+    Descriptor output(ends[1]);
     tryTo(sd_id128_randomize(&identifier));
     tryTo(sd_bus_new(&bus_));
     if (state_ < 0) return;
-    tryTo(sd_bus_set_fd(bus_, socket_, socket_));
-    if (state_ >= 0) socket.release();
+    tryTo(sd_bus_set_fd(bus_, output.number(), socket_));
+    if (state_ >= 0) {
+        output.release();
+        socket.release();
+    }
     tryTo(sd_bus_set_server(bus_, 1, identifier));
+    tryTo(sd_bus_set_anonymous(bus_, 1));  // who may call was decided at the connection
+    tryTo(sd_bus_set_trusted(bus_, 1));
     tryTo(sd_bus_negotiate_fds(bus_, 0));
-    tryTo(sd_bus_set_trusted(bus_, 1));  // who may call was decided at the connection
     tryTo(sd_bus_start(bus_));
-    tryTo(sd_bus_add_filter(bus_, nullptr, answerHello, nullptr));
+    tryTo(sd_bus_add_filter(bus_, nullptr, onMessage, this));
+    state_ = std::min(state_, 0);
 }
 
 ServerBus::~ServerBus() {
     sd_bus_close_unref(bus_);
 }
 
+int ServerBus::onMessage(sd_bus_message* message, void* self, sd_bus_error*) {
+    static_cast<ServerBus*>(self)->state_ = 0;
+    if (sd_bus_message_is_method_call(message, "org.freedesktop.DBus", "Hello") <= 0) return 0;
+    const int r = sd_bus_reply_method_return(message, "s", ":1.1");
+    return r < 0 ? r : 1;
+}
+
 ServerBus::Step ServerBus::step() {
-    if (state_ >= 0) {
-        const Incoming incoming = examineIncoming();
-        // Otherwise sd-bus would read bytes that arrived after this examination.
-        if (incoming == Incoming::Nothing && isDrained_ && !hasQueued()) return Step::Idle;
-        state_ = incoming == Incoming::Refused ? -EACCES : sd_bus_process(bus_, nullptr);
-        isDrained_ = isDrained_ || (state_ == 0 && isAuthenticated());
-    }
+    const bool hasMore = state_ > 0 || (state_ == 0 && passOn());
+    if (state_ < 0 || (isReadToTheEnd_ && hasHungUp())) return Step::Ended;
+    if (!hasMore && unsentMessages() == 0) return Step::Idle;
+    state_ = sd_bus_process(bus_, nullptr);
     if (state_ < 0 || sd_bus_is_open(bus_) <= 0) return Step::Ended;
-    return state_ > 0 ? Step::Progress : Step::Idle;
+    return hasMore || state_ > 0 ? Step::Progress : Step::Idle;
 }
 
-// Peeks at what sd-bus reads next: who wrote it, and the length of the message that begins there. sd-bus tells neither.
-// It reads a message in several reads, but never beyond it in one step, and the kernel never joins in one read what
-// different processes wrote: so no message begins with another process's bytes.
-ServerBus::Incoming ServerBus::examineIncoming() const {
-    std::array<unsigned char, 16> header{};
-    iovec content{header.data(), header.size()};
-    // No room for descriptors: peeking would leave copies of them open here.
-    alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(ucred))> control;
-    msghdr peeked{};
-    peeked.msg_iov = &content;
-    peeked.msg_iovlen = 1;
-    peeked.msg_control = control.data();
-    peeked.msg_controllen = control.size();
-    const ssize_t size = recvmsg(socket_, &peeked, MSG_PEEK | MSG_DONTWAIT | MSG_CMSG_CLOEXEC);
-    if (size < 0 && errno == EAGAIN) return Incoming::Nothing;
-    if (size <= 0) return Incoming::End;
-    if (size == static_cast<ssize_t>(header.size()) && beginsLongMessage(header)) return Incoming::Refused;
-    for (cmsghdr* part = CMSG_FIRSTHDR(&peeked); part; part = CMSG_NXTHDR(&peeked, part)) {
-        if (part->cmsg_level != SOL_SOCKET || part->cmsg_type != SCM_CREDENTIALS) continue;
-        ucred writer;
-        std::memcpy(&writer, CMSG_DATA(part), sizeof writer);
-        return writer.pid == peer_ ? Incoming::Admitted : Incoming::Refused;
+// Gives sd-bus the next line of the authentication, or the next message. Whether there was one.
+bool ServerBus::passOn() {
+    received_.erase(0, std::exchange(passedOn_, 0));
+    std::size_t length = nextLength();
+    while (length == 0 && receive()) length = nextLength();
+    if (length == 0) return false;
+    const ssize_t sent = send(input_.number(), received_.data(), length, MSG_DONTWAIT | MSG_NOSIGNAL);
+    if (sent != static_cast<ssize_t>(length)) state_ = sent < 0 ? -errno : -ENOBUFS;
+    passedOn_ = length;
+    return state_ >= 0;
+}
+
+// The length of the line or message with which the bytes begin; 0 when the rest of it is to come. One that is too long
+// ends the connection.
+std::size_t ServerBus::nextLength() {
+    if (!isAuthenticated()) {
+        const auto end = received_.find("\r\n");
+        if (end == received_.npos && received_.size() > messageBytes) state_ = -EMSGSIZE;
+        return end == received_.npos ? 0 : end + 2;
     }
-    return Incoming::Refused;
+    if (received_.size() < headerBytes) return 0;
+    const std::uint64_t bodyBytes = numberAt(bodyBytesAt), fieldBytes = numberAt(fieldBytesAt);
+    if (bodyBytes + fieldBytes > messageBytes) {
+        state_ = -EMSGSIZE;
+        return 0;
+    }
+    const std::uint64_t length = headerBytes + (fieldBytes + 7) / 8 * 8 + bodyBytes;
+    return length <= received_.size() ? length : 0;
 }
 
-bool ServerBus::hasQueued() const {
-    std::uint64_t read = 0;
-    sd_bus_get_n_queued_read(bus_, &read);
-    return read + unsentMessages() > 0;
+// Of the message with which the bytes begin. sd-bus ends the connection at one that names no order.
+std::endian ServerBus::byteOrder() const {
+    return received_[0] == 'B' ? std::endian::big : std::endian::little;
+}
+
+std::uint64_t ServerBus::numberAt(std::size_t position) const {
+    std::uint32_t number;
+    std::memcpy(&number, received_.data() + position, sizeof number);
+    return byteOrder() == std::endian::big ? be32toh(number) : le32toh(number);
+}
+
+std::string_view ServerBus::body() const {
+    const auto size = static_cast<std::size_t>(numberAt(bodyBytesAt));
+    return std::string_view(received_).substr(passedOn_ - size, size);
+}
+
+// Reads what has come, from the peer alone: the kernel never joins in one read what different processes wrote. Whether
+// there was anything.
+bool ServerBus::receive() {
+    if (state_ < 0 || isReadToTheEnd_) return false;
+    std::array<char, 4096> content;
+    iovec place{content.data(), content.size()};
+    // No room for descriptors.
+    alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(ucred))> control;
+    msghdr message{};
+    message.msg_iov = &place;
+    message.msg_iovlen = 1;
+    message.msg_control = control.data();
+    message.msg_controllen = control.size();
+    const ssize_t size = recvmsg(socket_, &message, MSG_DONTWAIT | MSG_CMSG_CLOEXEC);
+    if (size == 0) isReadToTheEnd_ = true;
+    if (size < 0 && errno != EAGAIN && errno != EINTR) state_ = -errno;
+    if (size <= 0) return false;
+    ucred writer{};
+    for (cmsghdr* part = CMSG_FIRSTHDR(&message); part; part = CMSG_NXTHDR(&message, part))
+        if (part->cmsg_level == SOL_SOCKET && part->cmsg_type == SCM_CREDENTIALS)
+            std::memcpy(&writer, CMSG_DATA(part), sizeof writer);
+    if (writer.pid != peer_) {
+        state_ = -EACCES;
+        return false;
+    }
+    received_.append(content.data(), static_cast<std::size_t>(size));
+    return true;
+}
+
+bool ServerBus::hasHungUp() const {
+    pollfd file{socket_, 0, 0};
+    return poll(&file, 1, 0) > 0 && (file.revents & (POLLHUP | POLLERR)) != 0;
 }
 
 bool ServerBus::isAuthenticated() const {
@@ -115,8 +160,9 @@ std::size_t ServerBus::unsentMessages() const {
 }
 
 short ServerBus::events() const {
-    const int events = sd_bus_get_events(bus_);
-    return events < 0 ? short{POLLIN} : static_cast<short>(events);
+    const int ofBus = sd_bus_get_events(bus_);
+    const int output = ofBus < 0 ? 0 : ofBus & POLLOUT;
+    return static_cast<short>(output | (isReadToTheEnd_ ? 0 : POLLIN));
 }
 
 }  // namespace vrx::host

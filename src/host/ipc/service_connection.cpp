@@ -2,21 +2,25 @@
 
 #include <poll.h>
 #include <pthread.h>
+#include <sys/ioctl.h>
+#include <sys/socket.h>
 
-#include "vrx/host/ipc/client_session.h"
+#include <system_error>
+
 #include "vrx/platform/log.h"
 
 namespace vrx::host {
 
 using platform::Value;
 
-ServiceConnection::ServiceConnection(Descriptor socket, PeerIdentity peer, const BundleLookup& bundles,
-                                     const ServiceLimits& limits, ProcessLifecycle& lifecycle,
+ServiceConnection::ServiceConnection(Descriptor&& socket, PeerIdentity&& peer, const BundleLookup& bundles,
+                                     const ServiceLimits& limits, RequestLine& line, ProcessLifecycle& lifecycle,
                                      std::function<void()> onEnd)
     : socket_(std::move(socket)),
       peer_(std::move(peer)),
       bundles_(bundles),
       limits_(limits),
+      line_(line),
       lifecycle_(lifecycle),
       onEnd_(std::move(onEnd)) {}
 
@@ -26,12 +30,24 @@ ServiceConnection::~ServiceConnection() {
 }
 
 void ServiceConnection::stop() {
-    isStopping_ = true;
+    state_.isStopping = true;
     box_->wake();
 }
 
+void ServiceConnection::giveUp() {
+    state_.isGivenUp = true;
+    box_->wake();
+}
+
+std::optional<std::chrono::steady_clock::rep> ServiceConnection::idleSince() const {
+    const auto since = state_.idleSince.load();
+    return since == 0 || hasUnread() ? std::nullopt : std::optional(since);
+}
+
 Value ServiceConnection::valueForEntitlement(std::string_view name) const {
-    Value value = bundles_.entitlement(peer_, name);
+    platform::Result<Value> found = bundles_.entitlement(peer_, name);
+    if (!found) throw std::system_error(found.error().code, std::generic_category());
+    Value value = std::move(found).value();
     if (!value.asBool().value_or(false)) missingEntitlement_ = name;
     return value;
 }
@@ -42,7 +58,7 @@ void ServiceConnection::setExportedInterface(std::string_view protocolName) {
         throw std::invalid_argument("cannot export " + std::string(protocolName));
 }
 
-void ServiceConnection::resume() {
+void ServiceConnection::start() {
     servedSocket_ = socket_.number();
     thread_ = std::thread([this] { serve(); });
 }
@@ -50,12 +66,19 @@ void ServiceConnection::resume() {
 void ServiceConnection::serve() {
     pthread_setname_np(pthread_self(), "connection");
     {
-        ClientSession session(std::move(socket_), peer_, std::move(object_), box_, limits_, lifecycle_);
-        session.serve(isStopping_);
+        ClientSession session(std::move(socket_), peer_, std::move(object_), box_, limits_, line_, lifecycle_);
+        session.serve(state_);
         servedSocket_ = -1;  // before the session closes it
     }
     hasEnded_ = true;
     onEnd_();
+}
+
+bool ServiceConnection::readsLast() {
+    if (servedSocket_ < 0) return false;
+    shutdown(servedSocket_, SHUT_RD);
+    int bytes = 0;
+    return ioctl(servedSocket_, FIONREAD, &bytes) == 0 && bytes > 0;
 }
 
 bool ServiceConnection::hasUnread() const {

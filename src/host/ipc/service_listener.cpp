@@ -1,15 +1,19 @@
 #include "vrx/host/ipc/service_listener.h"
 
-#include <fcntl.h>
 #include <malloc.h>
 #include <sys/socket.h>
 
 #include <algorithm>
 #include <cerrno>
+#include <cstring>
 #include <list>
+#include <map>
 #include <system_error>
 
+#include "vrx/host/base/files.h"
+#include "vrx/host/base/repeated_line.h"
 #include "vrx/host/ipc/refusals.h"
+#include "vrx/host/ipc/request_line.h"
 #include "vrx/host/ipc/service_connection.h"
 #include "vrx/host/loop/event_source.h"
 #include "vrx/platform/log.h"
@@ -20,14 +24,6 @@ namespace vrx::host {
 using platform::Level;
 using platform::log;
 using platform::Result;
-
-namespace {
-
-Descriptor openSpare() {
-    return Descriptor(open("/dev/null", O_RDONLY | O_CLOEXEC));
-}
-
-}  // namespace
 
 class ServiceListenerFactory::Listener final : public platform::ServiceListener {
 public:
@@ -40,9 +36,10 @@ public:
           limits_(limits),
           refusals_(limits),
           endedFile_(makeEventFile()),
-          spare_(openSpare()) {
+          line_(limits),
+          restTimer_(addBootTimer(loop, onRested, this)) {
         endedSource_ = addReadSource(loop_, endedFile_.number(), onEnded, this);
-        lifecycle_.setUnreadQuestion([this] { return hasUnread(); });
+        lifecycle_.setUnreadQuestion([this] { return readLast(); });
     }
 
     ~Listener() override {
@@ -75,9 +72,9 @@ private:
         if (ended > 0 && connections_.empty()) malloc_trim(0);
     }
 
-    bool hasUnread() const {
-        return std::any_of(connections_.begin(), connections_.end(),
-                           [](const auto& connection) { return connection->hasUnread(); });
+    // Each connection has to be asked: none takes more after that.
+    bool readLast() const {
+        return std::ranges::count_if(connections_, [](const auto& connection) { return connection->readsLast(); }) > 0;
     }
 
     void acceptAll() {
@@ -85,49 +82,88 @@ private:
             Descriptor client(accept4(socket_, nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
             if (client)
                 take(std::move(client));
-            else if (errno == EMFILE || errno == ENFILE)
-                turnAway();
+            else if (isShortage(errno))
+                return rest();
             else if (errno != ECONNABORTED && errno != EINTR)
                 return;
         }
     }
 
-    // Without a free descriptor, accepts the client with the spare one and closes it. Left in the queue, it would wake
-    // the loop without end.
-    void turnAway() {
-        log(Level::Error, "A client was turned away: too many open files");
-        spare_ = Descriptor();
-        Descriptor client(accept4(socket_, nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
-        client = Descriptor();
-        spare_ = openSpare();
+    // Clients wait in the socket's queue meanwhile. Watched on, it would wake the loop without end.
+    void rest() {
+        shortage_.write(Level::Error, std::string("Clients have to wait: ") + std::strerror(errno));
+        sd_event_source_set_enabled(acceptSource_.get(), SD_EVENT_OFF);
+        armTimer(restTimer_, bootTime() + std::chrono::seconds(1));
     }
 
-    // A refused client gets no thread of its own, and no object is made for it.
+    static int onRested(sd_event_source*, std::uint64_t, void* self) {
+        sd_event_source_set_enabled(static_cast<Listener*>(self)->acceptSource_.get(), SD_EVENT_ON);
+        return 0;
+    }
+
+    // A refused client gets no thread of its own.
     void take(Descriptor client) {
         Result<PeerIdentity> peer = PeerIdentity::ofPeer(client.number());
-        if (!peer) return;  // it has already ended
+        if (!peer) {
+            const Result<ucred> credentials = PeerIdentity::credentialsOf(client.number());
+            if (credentials && isShortage(peer.error().code))
+                refuseForNow(std::move(client), *credentials, "too much at the same time: " + peer.error().text);
+            return;  // else it has already ended
+        }
         removeEnded();
-        if (connections_.size() >= limits_.connections)
-            return refusals_.refuse(std::move(client), peer->processIdentifier(), wire::limitsExceeded,
-                                    "too many connections: " + std::to_string(connections_.size()));
-        auto connection =
-            std::make_unique<ServiceConnection>(std::move(client), std::move(peer).value(), bundles_, limits_,
-                                                lifecycle_, [this] { eventfd_write(endedFile_.number(), 1); });
+        const ucred credentials = peer->credentials();
+        std::unique_ptr<ServiceConnection> connection;
         try {
+            connection = std::make_unique<ServiceConnection>(std::move(client), std::move(peer).value(), bundles_,
+                                                             limits_, line_, lifecycle_,
+                                                             [this] { eventfd_write(endedFile_.number(), 1); });
             const BundleLookup::Acceptance acceptance(connection->peer());
-            if (delegate_->shouldAcceptNewConnection(*this, *connection) && connection->isResumed())
-                connections_.push_back(std::move(connection));
-            else
-                refuse(*connection, wire::accessDenied, connection->refusal());
+            if (!delegate_->shouldAcceptNewConnection(*this, *connection) || !connection->isResumed())
+                return refusals_.refuse(connection->takeSocket(), credentials, wire::accessDenied,
+                                        connection->refusal());
+            if (!makeRoom(credentials.uid))
+                return refuseForNow(connection->takeSocket(), credentials,
+                                    "too many connections: " + std::to_string(connections_.size()));
+            connection->start();
+            connections_.push_back(std::move(connection));
         } catch (const std::system_error& error) {
-            refuse(*connection, wire::limitsExceeded, std::string("cannot serve: ") + error.what());
+            refuseForNow(connection ? connection->takeSocket() : std::move(client), credentials,
+                         std::string("too much at the same time: ") + error.what());
         }
     }
 
-    void refuse(ServiceConnection& connection, const char* errorName, std::string text) {
-        if (connection.isResumed()) return;  // it ends with its object
-        if (Descriptor socket = connection.takeSocket())
-            refusals_.refuse(std::move(socket), connection.processIdentifier(), errorName, std::move(text));
+    void refuseForNow(Descriptor socket, const ucred& peer, std::string text) {
+        turnedAway_.write(Level::Error, "A client is turned away, " + text);
+        refusals_.refuse(std::move(socket), peer, wire::limitsExceeded, std::move(text));
+    }
+
+    // A user may have every seat that nobody else wants. When all are taken, the users who have more than the
+    // newcomer's give one up, first of all the user with the most: the connection under which nothing has been under
+    // way for the longest time. It may read what has just come before it ends.
+    bool makeRoom(uid_t newcomer) {
+        std::map<uid_t, std::size_t> seats;
+        std::size_t taken = 0;
+        for (const auto& connection : connections_) {
+            if (connection->isGivenUp()) continue;
+            ++seats[connection->peer().user()];
+            ++taken;
+        }
+        if (taken < limits_.connections) return true;
+        if (connections_.size() >= 2 * limits_.connections) return false;  // those given up take their time
+        ServiceConnection* chosen = nullptr;
+        std::pair<std::size_t, std::chrono::steady_clock::rep> best;
+        for (const auto& connection : connections_) {
+            const auto idleSince = connection->idleSince();
+            const std::size_t ofUser = seats[connection->peer().user()];
+            if (connection->isGivenUp() || !idleSince || ofUser <= seats[newcomer]) continue;
+            const std::pair rank(ofUser, -*idleSince);
+            if (chosen && rank <= best) continue;
+            best = rank;
+            chosen = connection.get();
+        }
+        if (!chosen) return false;
+        chosen->giveUp();
+        return true;
     }
 
     sd_event* const loop_;
@@ -138,10 +174,13 @@ private:
     platform::ServiceListenerDelegate* delegate_ = nullptr;
     Refusals refusals_;
     const Descriptor endedFile_;
-    Descriptor spare_;
+    RequestLine line_;
+    RepeatedLine shortage_;
+    RepeatedLine turnedAway_;
     std::list<std::unique_ptr<ServiceConnection>> connections_;
     EventSource endedSource_;
     EventSource acceptSource_;
+    const EventSource restTimer_;
 };
 
 std::unique_ptr<platform::ServiceListener> ServiceListenerFactory::makeListener(std::string /*serviceName*/) {

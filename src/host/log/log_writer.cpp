@@ -1,8 +1,11 @@
 #include "vrx/host/log/log_writer.h"
 
 #define SD_JOURNAL_SUPPRESS_LOCATION  // the records bring their own
+#include <fcntl.h>
+#include <poll.h>
 #include <pthread.h>
 #include <sys/socket.h>
+#include <sys/stat.h>
 #include <sys/uio.h>
 #include <sys/un.h>
 #include <systemd/sd-journal.h>
@@ -15,6 +18,7 @@
 #include <chrono>
 #include <climits>
 #include <csignal>
+#include <cstdio>
 #include <ctime>
 #include <utility>
 
@@ -38,6 +42,13 @@ Descriptor openJournal() {
     constexpr int size = 8 * 1024 * 1024;  // the journal may be slow for a while
     if (journal) setsockopt(journal.number(), SOL_SOCKET, SO_SNDBUF, &size, sizeof size);
     return journal;
+}
+
+// Others may share the open pipe, whose mode would then change for them as well.
+Descriptor openPipe(int file) {
+    struct stat status;
+    if (fstat(file, &status) != 0 || !S_ISFIFO(status.st_mode)) return Descriptor();
+    return Descriptor(open(("/proc/self/fd/" + std::to_string(file)).c_str(), O_WRONLY | O_NONBLOCK | O_CLOEXEC));
 }
 
 }  // namespace
@@ -92,7 +103,7 @@ private:
 };
 
 LogWriter::LogWriter(int file, Form form)
-    : file_(file), journal_(form == Form::Journal ? openJournal() : Descriptor()) {
+    : file_(file), pipe_(openPipe(file)), journal_(form == Form::Journal ? openJournal() : Descriptor()) {
     CrashGuard::add(this);
 }
 
@@ -159,7 +170,7 @@ void LogWriter::flush() {
     write(writtenBatch_);
 }
 
-void LogWriter::write(const Batch& batch) const {
+void LogWriter::write(const Batch& batch) {
     if (journal_) return sendToJournal(batch);
     // Joins lines up to PIPE_BUF: a write of that size is not mixed with those of other processes.
     for (std::size_t begin = 0, next = 0; next < batch.ends.size();) {
@@ -170,18 +181,33 @@ void LogWriter::write(const Batch& batch) const {
     }
 }
 
-// Drops what a full pipe refuses.
-void LogWriter::writeToFile(std::string_view bytes) const {
+void LogWriter::writeToFile(std::string_view bytes) {
+    if (leftOut_ > 0 && hasRoomInPipe()) {
+        std::array<char, 96> line;  // on the stack, for a crash may have been in the allocator
+        const int size =
+            std::snprintf(line.data(), line.size(), "(%zu bytes of the log were left out: nobody read it)\n", leftOut_);
+        if (::write(pipe_.number(), line.data(), static_cast<std::size_t>(size)) > 0) leftOut_ = 0;
+    }
     while (!bytes.empty()) {
-        const ssize_t count = ::write(file_, bytes.data(), bytes.size());
-        if (count < 0 && errno == EINTR) continue;
-        if (count <= 0) return;
+        const ssize_t count = ::write(pipe_ ? pipe_.number() : file_, bytes.data(), bytes.size());
+        if (count < 0 && (errno == EINTR || (errno == EAGAIN && hasRoomInPipe()))) continue;
+        if (count <= 0) {
+            leftOut_ += pipe_ ? bytes.size() : 0;
+            return;
+        }
         bytes.remove_prefix(static_cast<std::size_t>(count));
     }
 }
 
+// Gives the reader a moment, but not again and again.
+bool LogWriter::hasRoomInPipe() {
+    constexpr int moment = 100;  // milliseconds
+    pollfd room{pipe_.number(), POLLOUT, 0};
+    return pipe_ && poll(&room, 1, leftOut_ > 0 ? 0 : moment) > 0 && (room.revents & POLLOUT) != 0;
+}
+
 // Sends as many datagrams as possible with one system call.
-void LogWriter::sendToJournal(const Batch& batch) const {
+void LogWriter::sendToJournal(const Batch& batch) {
     constexpr std::size_t most = 64;
     sockaddr_un address = journalAddress();
     for (std::size_t next = 0; next < batch.ends.size();) {
@@ -206,7 +232,7 @@ void LogWriter::sendToJournal(const Batch& batch) const {
 }
 
 // For a record that is too large for a datagram, which the journal's library can send, or when there is no journal.
-void LogWriter::sendLargeToJournal(std::string_view record) const {
+void LogWriter::sendLargeToJournal(std::string_view record) {
     std::vector<iovec> fields;
     for (std::string_view rest = record; !rest.empty();) {
         const std::size_t end = std::min(rest.find('\n'), rest.size() - 1);

@@ -2,6 +2,9 @@
 // wait for the file or the journal. A record is written within milliseconds, at once by flush(), and before the process
 // ends, also when it crashes; kill -9 loses the last milliseconds. The thread starts with the first record and sleeps
 // while there is none.
+//
+// A pipe that nobody reads stops nobody who logs: records that it does not take in time are left out, and counted in
+// the next line.
 #pragma once
 
 #include <condition_variable>
@@ -44,17 +47,20 @@ private:
 
     void run();
     bool isEnough() const;  // under mutex_
-    void write(const Batch& batch) const;
-    void writeToFile(std::string_view bytes) const;
-    void sendToJournal(const Batch& batch) const;
-    void sendLargeToJournal(std::string_view record) const;
+    void write(const Batch& batch);
+    void writeToFile(std::string_view bytes);
+    bool hasRoomInPipe();
+    void sendToJournal(const Batch& batch);
+    void sendLargeToJournal(std::string_view record);
     void flushInCrash();
 
     const int file_;
+    const Descriptor pipe_;     // the file, opened anew so as not to block, if it is a pipe
     const Descriptor journal_;  // a socket; none for lines
 
-    std::mutex writing_;  // taken before mutex_
-    Batch writtenBatch_;  // its memory is used again; under writing_
+    std::mutex writing_;       // taken before mutex_
+    Batch writtenBatch_;       // its memory is used again; under writing_
+    std::size_t leftOut_ = 0;  // bytes; under writing_
 
     std::mutex mutex_;
     std::condition_variable changed_;

@@ -1,22 +1,21 @@
-// Calls when one of some files may have changed: was written in place, replaced or removed, or came or went with its
-// folder. It watches the folders, because editors replace files by renaming. It calls after a short pause, so that a
-// row of changes makes one call. Costs nothing while nothing happens. Main thread.
+// Calls when one of some files may have changed (folder_changes.h), after a short pause, so that a row of changes makes
+// one call. Costs nothing while nothing happens. Main thread.
 #pragma once
 
 #include <functional>
-#include <set>
 #include <string>
 #include <vector>
 
-#include "vrx/host/base/descriptor.h"
 #include "vrx/host/loop/event_source.h"
+#include "vrx/host/loop/folder_changes.h"
 #include "vrx/platform/date.h"
 
 namespace vrx::host {
 
 class FileWatch {
 public:
-    // A file need not exist, nor its folder, if the one above exists. The event loop must outlive the watch.
+    // A file need not exist, nor its folder; a path that ends in "/" is a folder with all in it. The event loop must
+    // outlive the watch.
     FileWatch(sd_event* loop, std::vector<std::string> paths, platform::Duration pause, std::function<void()> onChange);
     FileWatch(const FileWatch&) = delete;
     FileWatch& operator=(const FileWatch&) = delete;
@@ -27,14 +26,10 @@ public:
 private:
     static int onEvents(sd_event_source*, int file, std::uint32_t, void* self);
     static int onPause(sd_event_source*, std::uint64_t, void* self);
-    void watchFolders();
-    void addFolders(const std::string& path, std::set<int>& watches) const;
 
-    const std::vector<std::string> paths_;
     const platform::Duration pause_;
     const std::function<void()> onChange_;
-    Descriptor file_;
-    std::set<int> watches_;
+    FolderChanges changes_;
     EventSource eventSource_;
     EventSource pauseSource_;
     bool isPausing_ = false;

@@ -5,6 +5,10 @@
 #include <algorithm>
 #include <ctime>
 #include <iterator>
+#include <list>
+
+#include "vrx/host/base/lock_wait.h"
+#include "vrx/host/base/requester.h"
 
 namespace vrx::host {
 
@@ -46,7 +50,9 @@ MainLoop::MainLoop()
       sigtermSource_(addSignalSource(event_.get(), SIGTERM, onSignal, this)),
       sigintSource_(addSignalSource(event_.get(), SIGINT, onSignal, this)),
       timerSource_(addBootTimer(event_.get(), onTimer, this)),
-      wakeSource_(addReadSource(event_.get(), wakeFile_.number(), onWake, this)) {}
+      wakeSource_(addReadSource(event_.get(), wakeFile_.number(), onWake, this)) {
+    LockWait::setEnding(false);
+}
 
 MainLoop::~MainLoop() {
     // Repeats, because destroying a task may post another.
@@ -62,6 +68,7 @@ MainLoop::~MainLoop() {
 }
 
 void MainLoop::run() {
+    const LockWait::Forbidden forbidden;
     while (true) {
         {
             std::lock_guard lock(mutex_);
@@ -82,7 +89,7 @@ void MainLoop::stop() {
 void MainLoop::post(Task task) {
     {
         std::lock_guard lock(mutex_);
-        posted_.push_back(std::move(task));
+        posted_.push_back(forCurrentRequester(std::move(task)));
     }
     wake();
 }
@@ -91,13 +98,17 @@ void MainLoop::postAfter(Duration delay, Task task) {
     postAfter(delay, nullptr, std::move(task));
 }
 
-void MainLoop::postAfter(Duration delay, std::shared_ptr<Queue> queue, Task task) {
+void MainLoop::postAfterWhile(std::weak_ptr<const void> owner, Duration delay, Task task) {
+    postAfter(delay, nullptr, std::move(task), std::move(owner));
+}
+
+void MainLoop::postAfter(Duration delay, std::shared_ptr<Queue> queue, Task task, Owner owner) {
     if (!(delay.count() > 0)) return queue ? queue->post(std::move(task)) : post(std::move(task));
-    std::uint64_t due = dueTime(delay);
+    Timer timer{std::move(queue), forCurrentRequester(std::move(task)), std::move(owner)};
     bool isFirst;
     {
         std::lock_guard lock(mutex_);
-        auto position = timers_.emplace(due, Timer{std::move(queue), std::move(task)});
+        auto position = timers_.emplace(dueTime(delay), std::move(timer));
         isFirst = position == timers_.begin();
     }
     if (isFirst) wake();
@@ -110,6 +121,7 @@ void MainLoop::wake() {
 
 int MainLoop::onSignal(sd_event_source*, const signalfd_siginfo*, void* self) {
     static_cast<MainLoop*>(self)->wasStoppedBySignal_ = true;
+    LockWait::setEnding(true);
     static_cast<MainLoop*>(self)->stop();
     return 0;
 }
@@ -161,7 +173,12 @@ void MainLoop::postDueTimers() {
 }
 
 void MainLoop::armTimer() {
+    std::list<Timer> removed;  // destroyed outside the lock
     std::unique_lock lock(mutex_);
+    while (!timers_.empty() && timers_.begin()->second.isVoid()) {
+        removed.push_back(std::move(timers_.begin()->second));
+        timers_.erase(timers_.begin());
+    }
     const bool isNeeded = !timers_.empty();
     const std::uint64_t due = isNeeded ? timers_.begin()->first : 0;
     lock.unlock();

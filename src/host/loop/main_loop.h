@@ -1,5 +1,6 @@
-// The event loop of the main thread, on sd-event: the main queue, and the timers of every queue. Made, run and
-// destroyed on the main thread; any thread may call the rest. Sleeps without a time limit while nothing is due.
+// The event loop of the main thread, on sd-event: the host's own events, and the timers of every queue. Made, run and
+// destroyed on the main thread; any thread may call the rest. Sleeps without a time limit while nothing is due. While
+// it runs, its thread waits for no lock that another process can hold (lock_wait.h).
 #pragma once
 
 #include <csignal>
@@ -7,6 +8,7 @@
 #include <map>
 #include <memory>
 #include <mutex>
+#include <optional>
 
 #include "vrx/host/base/descriptor.h"
 #include "vrx/host/loop/event_source.h"
@@ -31,8 +33,12 @@ public:
 
     void post(platform::Task task) override;
     void postAfter(platform::Duration delay, platform::Task task) override;
-    // Posts the task to another queue after the delay on the boot clock, time asleep included.
-    void postAfter(platform::Duration delay, std::shared_ptr<platform::Queue> queue, platform::Task task);
+    void postAfterWhile(std::weak_ptr<const void> owner, platform::Duration delay, platform::Task task) override;
+    // Posts the task to another queue after the delay on the boot clock, time asleep included. With an owner, it is
+    // dropped once that is gone.
+    using Owner = std::optional<std::weak_ptr<const void>>;
+    void postAfter(platform::Duration delay, std::shared_ptr<platform::Queue> queue, platform::Task task,
+                   Owner owner = std::nullopt);
 
     // For other sources of events, which belong to the main thread.
     sd_event* event() const { return event_.get(); }
@@ -41,6 +47,9 @@ private:
     struct Timer {
         std::shared_ptr<platform::Queue> queue;
         platform::Task task;
+        Owner owner;
+
+        bool isVoid() const { return owner && owner->expired(); }
     };
 
     // SIGTERM and SIGINT, blocked for as long as it lives.

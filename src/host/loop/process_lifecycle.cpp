@@ -32,6 +32,11 @@ void ProcessLifecycle::setUnreadQuestion(std::function<bool()> hasUnread) {
     state_->hasUnread = std::move(hasUnread);
 }
 
+void ProcessLifecycle::setMainQueue(std::weak_ptr<platform::Queue> queue) {
+    std::lock_guard lock(state_->mutex);
+    state_->mainQueue = std::move(queue);
+}
+
 bool ProcessLifecycle::isEnding() const {
     std::lock_guard lock(state_->mutex);
     return state_->isEnding;
@@ -48,7 +53,14 @@ WorkInFlight ProcessLifecycle::begin(const std::shared_ptr<State>& state) {
 
 // Decides on the main thread, after the tasks that are posted already: they may begin work.
 void ProcessLifecycle::considerEnd(const std::shared_ptr<State>& state) {
-    if (state->isExitWanted && state->inFlight == 0 && state->mainLoop)
+    if (!state->isExitWanted || state->inFlight > 0 || !state->mainLoop) return;
+    auto decide = [state] {
+        std::lock_guard lock(state->mutex);
+        if (state->mainLoop) state->mainLoop->post([state] { endIfIdle(*state); });
+    };
+    if (auto queue = state->mainQueue.lock())
+        queue->post(decide);
+    else
         state->mainLoop->post([state] { endIfIdle(*state); });
 }
 

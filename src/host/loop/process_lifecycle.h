@@ -27,6 +27,9 @@ public:
     // begins work. It is asked on the main thread while no work is in flight and none can begin. Main thread.
     void setUnreadQuestion(std::function<bool()> hasUnread);
 
+    // The end is decided after the tasks that this queue holds at the time: they may begin work.
+    void setMainQueue(std::weak_ptr<platform::Queue> queue);
+
     // Whether the end is decided.
     bool isEnding() const;
 
@@ -36,6 +39,7 @@ private:
 
         std::mutex mutex;
         MainLoop* mainLoop;  // null once the lifecycle is gone
+        std::weak_ptr<platform::Queue> mainQueue;
         std::function<bool()> hasUnread;
         int inFlight = 0;
         bool isExitWanted = false;

@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <system_error>
 
+#include "vrx/host/base/requester.h"
 #include "vrx/platform/log.h"
 
 namespace vrx::host {
@@ -41,7 +42,7 @@ void WorkerPool::post(Priority priority, Task task) {
         task = nullptr;
         return;
     }
-    tasks_[static_cast<std::size_t>(priority)].push_back(std::move(task));
+    tasks_[static_cast<std::size_t>(priority)].push_back(forCurrentRequester(std::move(task)));
     if (idle_ > 0) hasWork_.notify_one();
     addThreadIfNeeded();
 }
@@ -128,7 +129,9 @@ namespace {
 // Runs one task at a time, in the order of posting, on whatever worker is free.
 class SerialQueue final : public platform::Queue, public std::enable_shared_from_this<SerialQueue> {
 public:
-    SerialQueue(std::weak_ptr<WorkerPool> pool, MainLoop& mainLoop) : pool_(std::move(pool)), mainLoop_(mainLoop) {}
+    // One that is held keeps its tasks until it is released.
+    SerialQueue(std::weak_ptr<WorkerPool> pool, MainLoop& mainLoop, std::string label, bool isHeld = false)
+        : pool_(std::move(pool)), mainLoop_(mainLoop), label_(std::move(label)), isRunning_(isHeld) {}
     ~SerialQueue() override {
         platform::ShutdownScope shutdown;
         tasks_.clear();
@@ -137,7 +140,7 @@ public:
     void post(Task task) override {
         {
             std::lock_guard lock(mutex_);
-            tasks_.push_back(std::move(task));
+            tasks_.push_back(forCurrentRequester(std::move(task)));
             if (std::exchange(isRunning_, true)) return;
         }
         schedule();
@@ -146,6 +149,10 @@ public:
     void postAfter(Duration delay, Task task) override {
         mainLoop_.postAfter(delay, shared_from_this(), std::move(task));
     }
+    void postAfterWhile(std::weak_ptr<const void> owner, Duration delay, Task task) override {
+        mainLoop_.postAfter(delay, shared_from_this(), std::move(task), std::move(owner));
+    }
+    void release() { schedule(); }
 
 private:
     // The queue's turn on a worker. One that a stopping pool discards destroys the queue's tasks, which may own the
@@ -164,6 +171,7 @@ private:
     };
 
     void schedule() {
+        const RequesterScope scope(std::nullopt);  // each task of the turn has its own
         Turn turn(shared_from_this());
         if (std::shared_ptr<WorkerPool> pool = pool_.lock()) pool->post(Priority::UserInitiated, std::move(turn));
     }
@@ -174,6 +182,9 @@ private:
         std::lock_guard lock(mutex_);
         discarded.swap(tasks_);
         isRunning_ = false;
+        if (!discarded.empty())
+            log(platform::Level::Default, "Tasks of the queue %@ that the end leaves undone: %lu", label_,
+                discarded.size());
     }
 
     void runAll() {
@@ -194,9 +205,10 @@ private:
 
     const std::weak_ptr<WorkerPool> pool_;
     MainLoop& mainLoop_;
+    const std::string label_;
     std::mutex mutex_;
     std::deque<Task> tasks_;
-    bool isRunning_ = false;
+    bool isRunning_;  // or held
 };
 
 class Event final : public platform::Event {
@@ -237,6 +249,15 @@ private:
     bool isSet_ = false;
 };
 
+std::shared_ptr<platform::Queue> makeHeldQueue(const std::shared_ptr<WorkerPool>& pool, MainLoop& mainLoop) {
+    constexpr bool isHeld = true;
+    auto queue = std::make_shared<SerialQueue>(pool, mainLoop, "main", isHeld);
+    mainLoop.post([held = std::weak_ptr(queue)] {
+        if (auto self = held.lock()) self->release();
+    });
+    return queue;
+}
+
 }  // namespace
 
 class Queues::Workers final : public platform::Queue, public std::enable_shared_from_this<Workers> {
@@ -258,14 +279,15 @@ Queues::Queues(MainLoop& mainLoop, std::size_t size)
     : mainLoop_(mainLoop),
       pool_(std::make_shared<WorkerPool>(size)),
       workers_{std::make_shared<Workers>(*pool_, mainLoop, Priority::Background),
-               std::make_shared<Workers>(*pool_, mainLoop, Priority::UserInitiated)} {}
+               std::make_shared<Workers>(*pool_, mainLoop, Priority::UserInitiated)},
+      mainQueue_(makeHeldQueue(pool_, mainLoop)) {}
 
 Queues::~Queues() {
     stop();
 }
 
-std::shared_ptr<platform::Queue> Queues::makeSerialQueue(std::string) {
-    return std::make_shared<SerialQueue>(pool_, mainLoop_);
+std::shared_ptr<platform::Queue> Queues::makeSerialQueue(std::string label) {
+    return std::make_shared<SerialQueue>(pool_, mainLoop_, std::move(label));
 }
 
 platform::Queue& Queues::workers(Priority priority) {

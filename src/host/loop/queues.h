@@ -1,6 +1,9 @@
-// The host's queues: the main queue on the main loop, and a pool of workers that carries the parallel and the serial
-// queues. The pool has as many threads as the machine has processors; a worker that waits for an event is replaced by
-// another thread for as long as it waits. Any thread may use them. Timers of all queues fire while the main loop runs.
+// The host's queues: a pool of workers that carries the parallel and the serial queues, the main queue among them. The
+// pool has as many threads as the machine has processors; a worker that waits for an event is replaced by another
+// thread for as long as it waits. Any thread may use them. Timers of all queues fire while the main loop runs.
+//
+// The main queue begins when the main loop first runs, after all start-up. It is not the loop's own thread, so that its
+// tasks may wait while the loop goes on accepting clients.
 #pragma once
 
 #include <array>
@@ -71,7 +74,8 @@ public:
     // Waits for running tasks; discards those that have not begun.
     ~Queues() override;
 
-    platform::Queue& mainQueue() override { return mainLoop_; }
+    platform::Queue& mainQueue() override { return *mainQueue_; }
+    std::weak_ptr<platform::Queue> weakMainQueue() const { return mainQueue_; }
     std::shared_ptr<platform::Queue> makeSerialQueue(std::string label) override;
     platform::Queue& workers(platform::Priority priority) override;
     std::shared_ptr<platform::Event> makeEvent() override;
@@ -85,6 +89,7 @@ private:
     MainLoop& mainLoop_;
     std::shared_ptr<WorkerPool> pool_;
     std::array<std::shared_ptr<platform::Queue>, 2> workers_;
+    const std::shared_ptr<platform::Queue> mainQueue_;
 };
 
 }  // namespace vrx::host

@@ -3,10 +3,11 @@
 #include <sys/utsname.h>
 #include <unistd.h>
 
-#include <array>
 #include <cstdlib>
+#include <cstring>
 #include <initializer_list>
 
+#include "vrx/host/base/firmware_text.h"
 #include "vrx/host/base/text.h"
 #include "vrx/platform/sha256_hash.h"
 #include "vrx/platform/vendor.h"
@@ -18,26 +19,26 @@ namespace {
 using OptionalText = std::optional<std::string>;
 using File = platform::Result<FileContent>;
 
-// Placeholders that firmware gives when its maker filled in nothing count as nothing.
+constexpr const char* firmware = "firmware";
+constexpr const char* deviceTree = "device tree";
+constexpr const char* environment = "the environment";
+
 std::shared_ptr<const OptionalText> firmwareText(const File& file, std::shared_ptr<const OptionalText>) {
-    OptionalText result;
-    if (file) {
-        const std::string_view text = trimmed(file->text());
-        constexpr std::string_view fillers[] = {"",
-                                                "0",
-                                                "None",
-                                                "Not Specified",
-                                                "Not Applicable",
-                                                "Default string",
-                                                "To Be Filled By O.E.M.",
-                                                "To be filled by O.E.M.",
-                                                "System Serial Number",
-                                                "System Product Name"};
-        bool isFiller = false;
-        for (std::string_view filler : fillers) isFiller = isFiller || text == filler;
-        if (!isFiller) result = std::string(text);
+    return std::make_shared<const OptionalText>(file ? meaningfulFirmwareText(file->text()) : std::nullopt);
+}
+
+// Without its quotation marks, and without the backslashes that a double one needs.
+std::string unquoted(std::string_view text) {
+    if (text.size() < 2 || text.back() != text.front() || (text.front() != '"' && text.front() != '\''))
+        return std::string(text);
+    const bool isEscaped = text.front() == '"';
+    text = text.substr(1, text.size() - 2);
+    std::string result;
+    for (std::size_t i = 0; i < text.size(); ++i) {
+        if (isEscaped && text[i] == '\\' && i + 1 < text.size() && std::strchr("\"\\$`", text[i + 1])) ++i;
+        result += text[i];
     }
-    return std::make_shared<const OptionalText>(std::move(result));
+    return result;
 }
 
 // The value of the first line NAME=value, without its quotation marks.
@@ -48,9 +49,7 @@ OptionalText assignment(std::string_view text, std::string_view name) {
         text = end == text.npos ? std::string_view() : text.substr(end + 1);
         if (!line.starts_with(name) || !line.substr(name.size()).starts_with('=')) continue;
         line.remove_prefix(name.size() + 1);
-        if (line.size() >= 2 && (line.front() == '"' || line.front() == '\'') && line.back() == line.front())
-            line = line.substr(1, line.size() - 2);
-        if (!line.empty()) return std::string(line);
+        if (std::string value = unquoted(line); !value.empty()) return value;
     }
     return std::nullopt;
 }
@@ -82,13 +81,21 @@ utsname kernel() {
 BareMachine::BareMachine(const std::string& root)
     : firmwareSerial_(root + "/sys/class/dmi/id/product_serial", firmwareText),
       firmwareProduct_(root + "/sys/class/dmi/id/product_name", firmwareText),
+      treeSerial_(root + "/sys/firmware/devicetree/base/serial-number", firmwareText),
+      treeModel_(root + "/sys/firmware/devicetree/base/model", firmwareText),
+      machineInfo_(root + "/etc/machine-info", assignedText({"PRETTY_HOSTNAME"})),
       machineId_(root + "/etc/machine-id", firmwareText),
       versionId_(root + "/etc/os-release", assignedText({"VERSION_ID"})),
       localeConf_(root + "/etc/locale.conf", assignedText({"LC_ALL", "LC_MESSAGES", "LANG"})),
       defaultLocale_(root + "/etc/default/locale", assignedText({"LC_ALL", "LC_MESSAGES", "LANG"})) {}
 
-std::optional<std::string> BareMachine::serialNumber() const {
-    if (OptionalText serial = *firmwareSerial_.get()) return serial;
+std::optional<MachineFact> BareMachine::serialNumber() const {
+    if (OptionalText serial = *firmwareSerial_.get()) return MachineFact{*serial, firmware};
+    if (OptionalText serial = *treeSerial_.get()) return MachineFact{*serial, deviceTree};
+    return std::nullopt;
+}
+
+std::optional<MachineFact> BareMachine::derivedSerialNumber() const {
     OptionalText machineId = *machineId_.get();
     if (!machineId) return std::nullopt;
     // Twelve characters, digits and capitals, like a serial number.
@@ -96,27 +103,35 @@ std::optional<std::string> BareMachine::serialNumber() const {
     derived.resize(12);
     for (char& c : derived)
         if (c >= 'a') c = static_cast<char>(c - 'a' + 'A');
-    return derived;
+    return MachineFact{derived, "derived from " + machineId_.path()};
 }
 
-std::string BareMachine::name() const {
-    return kernel().nodename;
+MachineFact BareMachine::name() const {
+    if (OptionalText name = *machineInfo_.get()) return {*name, machineInfo_.path()};
+    return {kernel().nodename, "the host name"};
 }
 
-std::string BareMachine::productType() const {
-    return firmwareProduct_.get()->value_or(kernel().machine);
+MachineFact BareMachine::productType() const {
+    if (OptionalText product = *firmwareProduct_.get()) return {*product, firmware};
+    if (OptionalText model = *treeModel_.get()) return {*model, deviceTree};
+    return {kernel().machine, "the processor"};
 }
 
-std::string BareMachine::productVersion() const {
-    return versionId_.get()->value_or(kernel().release);
+MachineFact BareMachine::productVersion() const {
+    if (OptionalText version = *versionId_.get()) return {*version, versionId_.path()};
+    return {kernel().release, "the kernel"};
 }
 
-std::string BareMachine::localeIdentifier() const {
-    for (const OptionalText& name : {*localeConf_.get(), *defaultLocale_.get(), environmentText("LC_ALL"),
-                                     environmentText("LC_MESSAGES"), environmentText("LANG")})
+MachineFact BareMachine::localeIdentifier() const {
+    const std::pair<OptionalText, std::string> places[] = {{*localeConf_.get(), localeConf_.path()},
+                                                           {*defaultLocale_.get(), defaultLocale_.path()},
+                                                           {environmentText("LC_ALL"), environment},
+                                                           {environmentText("LC_MESSAGES"), environment},
+                                                           {environmentText("LANG"), environment}};
+    for (const auto& [name, source] : places)
         if (name)
-            if (OptionalText identifier = localeIdentifierFromPosix(*name)) return *identifier;
-    return "en_US";
+            if (OptionalText identifier = localeIdentifierFromPosix(*name)) return {*identifier, source};
+    return {"en_US", "the machine's default"};
 }
 
 std::optional<std::string> localeIdentifierFromPosix(std::string_view name) {

@@ -12,6 +12,7 @@
 
 #include <optional>
 #include <string>
+#include <string_view>
 
 #include "vrx/platform/error.h"
 #include "vrx/platform/value.h"
@@ -32,5 +33,7 @@ inline constexpr const char* bundleFileName = "bundle.toml";
 // The file of a folder, believed only while others can change neither it nor a folder above it (trust.h). An error's
 // text is for people; its code is ENOENT when there is no file.
 platform::Result<BundleFile> readBundleFile(const std::string& folder);
+// What a document says that would lie in the folder, whether believed or not.
+platform::Result<BundleFile> parseBundleFile(std::string_view document, const std::string& folder);
 
 }  // namespace vrx::host

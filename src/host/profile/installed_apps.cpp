@@ -1,9 +1,11 @@
 #include "vrx/host/profile/installed_apps.h"
 
+#include <cerrno>
 #include <filesystem>
 #include <set>
 
 #include "vrx/host/profile/bundle_file.h"
+#include "vrx/platform/log.h"
 
 namespace vrx::host {
 
@@ -34,9 +36,20 @@ InstalledAppRecord InstalledApps::record(const std::string& bundleIdentifier) co
             platform::Result<BundleFile> bundle = readBundleFile(candidate);
             if (bundle && bundle->identifier == bundleIdentifier)
                 return {.isInstalled = true, .vendorName = bundle->vendor, .localizedName = bundle->name};
+            if (!bundle && bundle.error().code != ENOENT)
+                log(platform::Level::Default, "Not taken for an installed application: %@", bundle.error().text);
         }
     }
     return {};
+}
+
+std::vector<std::string> InstalledApps::problems() const {
+    std::vector<std::string> texts;
+    for (const std::string& folder : profile_.content()->applicationFolders)
+        for (const std::string& candidate : candidates(folder))
+            if (auto bundle = readBundleFile(candidate); !bundle && bundle.error().code != ENOENT)
+                texts.push_back(bundle.error().text);
+    return texts;
 }
 
 }  // namespace vrx::host

@@ -14,6 +14,9 @@ public:
     // Of several bundles with the identifier the first one counts, by the order of the folders and then of their names.
     platform::InstalledAppRecord record(const std::string& bundleIdentifier) const override;
 
+    // Why bundles in the folders are not taken for applications. For tools.
+    std::vector<std::string> problems() const;
+
 private:
     const DeviceProfile& profile_;
 };

@@ -1,8 +1,9 @@
 #include "vrx/host/profile/localized_strings.h"
 
-#include <toml++/toml.h>
+#include <cerrno>
 
 #include "vrx/host/base/files.h"
+#include "vrx/host/profile/toml_value.h"
 #include "vrx/platform/log.h"
 
 namespace vrx::host {
@@ -26,13 +27,11 @@ std::vector<std::string> languages(std::string identifier) {
 std::optional<std::string> textIn(const std::string& path, std::string_view key) {
     platform::Result<FileContent> file = readFile(path);
     if (!file) return std::nullopt;
-    try {
-        const std::string_view document(reinterpret_cast<const char*>(file->bytes.data()), file->bytes.size());
-        return toml::parse(document, path)[key].value_exact<std::string>();
-    } catch (const toml::parse_error& error) {
-        log(platform::Level::Error, "%@: %@", path, std::string(error.description()));
-        return std::nullopt;
-    }
+    const platform::Result<toml::table> table =
+        parseToml(file->text(), path, {platform::error_domain::bundle, EINVAL, ""});
+    if (table) return (*table)[key].value_exact<std::string>();
+    log(platform::Level::Error, "%@", table.error().text);
+    return std::nullopt;
 }
 
 }  // namespace

@@ -16,6 +16,7 @@ using platform::PairedWatch;
 namespace {
 
 constexpr platform::Duration retryAfterFailure{60.0};
+constexpr platform::Duration retryAfterBusy{1.0};  // another process is writing
 
 // A line for each paired watch, told apart by its serial number, else by its names. A watch that is paired anew counts
 // as another. Only hashes of serial numbers are stored.
@@ -57,15 +58,28 @@ void ProfileNotifier::start(sd_event* loop, std::function<void()> onEdit, platfo
     compare();
 }
 
+void ProfileNotifier::release() {
+    heldUntil_.reset();
+    factsChanged();
+}
+
 // Stores before it raises: in the opposite order a database that cannot be written would have the same notifications
 // raised at every start. The first profile of a home is stored only.
 void ProfileNotifier::compare() {
     if (profile_.content()->isSubstitute) return;  // the file could not be read
+    if (heldUntil_) {
+        if (const platform::Duration left = *heldUntil_ - bootTime(); left > platform::Duration(0))
+            return watch_->callIn(left);
+        heldUntil_.reset();
+    }
+    const std::string machine = profile_.machine().identifier();
+    const std::shared_ptr<const ToldFacts> told = profile_.told();
     const std::string language = profile_.preferredLocaleIdentifier();
     const std::set<std::string> watches = pairedWatches(profile_);
     std::vector<std::string_view> raised;
     const MaybeError error = database_.write([&](Connection& connection) {
         raised.clear();
+        if (*told != keptFacts(connection, machine)) keepFacts(connection, machine, *told);
         const std::optional<std::string> lastLanguage = storedFact(connection, stored_facts::language);
         const std::optional<std::string> lastWatches = storedFact(connection, stored_facts::pairedWatches);
         if (lastLanguage && *lastLanguage != language) raised.push_back(platform::languageChangedNotification);
@@ -77,6 +91,7 @@ void ProfileNotifier::compare() {
         setStoredFact(connection, stored_facts::language, language);
         setStoredFact(connection, stored_facts::pairedWatches, textOf(watches));
     });
+    if (error && error->code == SQLITE_BUSY && watch_) return watch_->callIn(retryAfterBusy);
     if (error) {
         log(platform::Level::Error, "Cannot tell what has changed in the profile, trying again: %@", error->text);
         if (watch_) watch_->callIn(retryAfterFailure);

@@ -1,10 +1,12 @@
 // Raises the system's notifications when the device profile pairs or unpairs a watch, or when the language changes in
-// it or in the machine's settings. It compares the present state with the one for which notifications were last raised,
-// which host.db keeps, so that a change made while no agent runs is told to the next one. Main thread.
+// it or in the machine's settings, or when the machine's services tell so. It compares the present state with the one
+// for which notifications were last raised, which host.db keeps, so that a change made while no agent runs is told to
+// the next one. Main thread.
 #pragma once
 
 #include <functional>
 #include <memory>
+#include <optional>
 
 #include "vrx/host/base/notification_center.h"
 #include "vrx/host/home/database.h"
@@ -22,7 +24,12 @@ public:
     // Compares, and watches the files from now on. To be called once all listeners have registered. After each edit it
     // raises the notifications and then calls onEdit. The pause joins edits that come together.
     void start(sd_event* loop, std::function<void()> onEdit, platform::Duration pause = std::chrono::milliseconds(100));
-    // Raises what is due. For start(), and for tests.
+    // Before start(): raises nothing until release(), or until the time is over.
+    void holdFor(platform::Duration time) { heldUntil_ = bootTime() + time; }
+    void release();
+    // Compares soon, as after an edit.
+    void factsChanged() { watch_->callIn(platform::Duration(0)); }
+    // Raises what is due, and keeps what services have told. For start(), and for tests.
     void compare();
 
 private:
@@ -30,6 +37,7 @@ private:
     Database& database_;
     NotificationCenter& center_;
     std::unique_ptr<FileWatch> watch_;
+    std::optional<platform::Duration> heldUntil_;  // on the boot clock
 };
 
 }  // namespace vrx::host

@@ -1,4 +1,5 @@
-// The cellular subscriptions that the device profile lists; the bare machine has none. Any thread may ask.
+// The cellular subscriptions that the device profile lists, else those that the machine's services tell. Any thread may
+// ask.
 #pragma once
 
 #include "vrx/host/profile/device_profile.h"
@@ -11,7 +12,7 @@ public:
     // The profile must outlive it.
     explicit TelephonyNetworkInfo(const DeviceProfile& profile) : profile_(profile) {}
     std::map<std::string, platform::Carrier> serviceSubscriberCellularProviders() const override {
-        return profile_.content()->carriers;
+        return profile_.carriers();
     }
     std::string description() const override;
 

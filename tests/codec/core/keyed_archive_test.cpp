@@ -9,6 +9,9 @@ namespace {
 
 using platform::AllowedKinds;
 
+constexpr AllowedKinds everyKind = {AllowedKinds::Strings, AllowedKinds::Numbers, AllowedKinds::Dates,
+                                    AllowedKinds::Arrays, AllowedKinds::Dictionaries};
+
 struct Part final : platform::Archivable {
     static constexpr std::string_view archiveClassName = "Part";
     explicit Part(Value content) : content(std::move(content)) {}
@@ -16,8 +19,7 @@ struct Part final : platform::Archivable {
     void encodeWithCoder(platform::KeyedEncoder& coder) const override { coder.encodeObject("content", content); }
     // Like a record, there is none without its content.
     static std::shared_ptr<Part> initWithCoder(platform::KeyedDecoder& coder) {
-        using enum AllowedKinds::Kind;
-        const Value content = coder.decodeValue("content", {Strings, Numbers, Dates, Arrays, Dictionaries});
+        const Value content = coder.decodeValue("content", everyKind);
         return content.isNull() ? nullptr : std::make_shared<Part>(content);
     }
     Value content;
@@ -43,9 +45,6 @@ struct Whole final : platform::Archivable {
     std::shared_ptr<Part> part;
 };
 
-constexpr AllowedKinds everyKind = {AllowedKinds::Strings, AllowedKinds::Numbers, AllowedKinds::Dates,
-                                    AllowedKinds::Arrays, AllowedKinds::Dictionaries};
-
 TEST(KeyedArchive, RestoresObjectsAndLists) {
     auto whole = std::make_shared<Whole>();
     whole->name = "n";
@@ -64,9 +63,7 @@ TEST(KeyedArchive, RestoresObjectsAndLists) {
 }
 
 TEST(KeyedArchive, EscapesAndLeavesOut) {
-    struct {
-        Value value, archived, restored;
-    } const cases[] = {
+    const std::tuple<Value, Value, Value> cases[] = {
         {nullptr, nullptr, nullptr},
         {Data{1}, nullptr, nullptr},
         {Array{nullptr, 1, Data{}, Array{nullptr}}, Array{1, Array{}}, Array{1, Array{}}},
@@ -76,11 +73,11 @@ TEST(KeyedArchive, EscapesAndLeavesOut) {
          Dictionary{{"$$class", "Part"}, {"$$", 1}, {"$$$x", 2}, {"x$", 3}},
          Dictionary{{"$class", "Part"}, {"$", 1}, {"$$x", 2}, {"x$", 3}}},
     };
-    for (const auto& c : cases) {
-        EXPECT_EQ(archiveValue(c.value), c.archived) << c.value.description();
-        EXPECT_EQ(archive(Part(c.value))["content"], c.archived) << c.value.description();
-        if (c.archived.isNull()) continue;
-        EXPECT_EQ(valueOf(unarchiveValue(c.archived, everyKind)), c.restored);
+    for (const auto& [value, archived, restored] : cases) {
+        EXPECT_EQ(archiveValue(value), archived) << value.description();
+        EXPECT_EQ(archive(Part(value))["content"], archived) << value.description();
+        if (archived.isNull()) continue;
+        EXPECT_EQ(valueOf(unarchiveValue(archived, everyKind)), restored);
     }
 }
 

@@ -135,13 +135,13 @@ TEST_F(WarrantyTest, ReadsFlagsFromTheirPlaces) {
 }
 
 TEST_F(WarrantyTest, ReadsDatesFromTheirPlaces) {
-    expectReading(epochs, dateFromEpoch(0), {0});
+    expectReading(epochs, dateFromEpoch(0), {0, -0.5});
     expectReading(epochs, dateFromEpoch(1700000000), {1700000000, 1700000000.9, 1700000000123});
     expectReading(epochs, dateFromEpoch(10000000000), {10000000000});
     expectReading(epochs, dateFromEpoch(10000000), {10000000001});
     expectReading(epochs, dateFromEpoch(9223372036854775.0), {std::numeric_limits<std::int64_t>::max()});
     expectReading(epochs, dateFromEpoch(18446744073709551.0), {1e308});
-    expectReading(epochs, {}, {-1, -0.5, "1700000000", true, nullptr, std::nan(""), infinity, Dictionary{}});
+    expectReading(epochs, {}, {-1, -1.5, "1700000000", true, nullptr, std::nan(""), infinity, Dictionary{}});
     expectDefault(epochs);
 }
 

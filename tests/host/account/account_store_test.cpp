@@ -1,7 +1,6 @@
 #include "vrx/host/account/account_store.h"
 
 #include <fcntl.h>
-#include <gmock/gmock.h>
 #include <sys/stat.h>
 
 #include <future>
@@ -16,13 +15,14 @@ namespace {
 using platform::RenewalResult;
 using namespace ::testing;
 
-class AccountStoreTest : public Test {
+class AccountStoreTest : public InFolder {
 protected:
     // The helper is this script, run with the folder as its first argument.
     void setHelper(const std::string& script) {
-        writeFile(profile.path(), "[account]\nidentifier = 'ada'\ncredential_helper = ['/bin/sh', '-c', '''\n" +
-                                      script + "''', 'helper', '" + folder.path() + "']\n");
-        chmod(profile.path().c_str(), 0600);
+        writeFile(profile.layers().front(),
+                  "[account]\nidentifier = 'ada'\ncredential_helper = ['/bin/sh', '-c', '''\n" + script +
+                      "''', 'helper', '" + folder.path() + "']\n");
+        folder.setMode("device.toml", 0600);
     }
     std::future<RenewalResult> begin(AccountStore& accounts, const std::string& service = "S") {
         auto promise = std::make_shared<std::promise<RenewalResult>>();
@@ -33,9 +33,7 @@ protected:
     RenewalResult renew() { return begin(store).get(); }
     std::string token() const { return store.credentialToken(account, "S").value_or("(none)"); }
 
-    LogRecorder log;
     MainLoop loop;  // whose signals its threads leave to it
-    TemporaryFolder folder;
     DeviceProfile profile{folder / "device.toml"};
     AccountStore store{profile, folder.path()};
     const platform::AuthenticationAccount account{"ada", "A1"};
@@ -101,16 +99,16 @@ INSTANTIATE_TEST_SUITE_P(Each, BadHelpers, ValuesIn(badHelpers),
 
 TEST_F(AccountStoreTest, RunsOnlyAHelperThatATrustedProfileNames) {
     setHelper("echo token=new");
-    chmod(profile.path().c_str(), 0666);
+    folder.setMode("device.toml", 0666);
     EXPECT_EQ(renew().code, static_cast<int>(CredentialFailure::NotTrusted));
-    writeFile(profile.path(), "[account]\nidentifier = 'ada'\ncredential_helper = ['/no/helper']");
-    chmod(profile.path().c_str(), 0600);
+    writeFile(profile.layers().front(), "[account]\nidentifier = 'ada'\ncredential_helper = ['/no/helper']");
+    folder.setMode("device.toml", 0600);
     EXPECT_THAT(renew().error->text, HasSubstr("/no/helper cannot be run: No such file"));
-    writeFile(profile.path(), "");
+    writeFile(profile.layers().front(), "");
     EXPECT_EQ(renew().code, static_cast<int>(CredentialFailure::NotConfigured));
 }
 
-TEST_F(AccountStoreTest, EndsTheHelpersWholeProcessGroup) {
+TEST_F(AccountStoreTest, EndsAllThatTheHelperBegan) {
     const std::string path = folder / "fifo";
     ASSERT_EQ(mkfifo(path.c_str(), 0600), 0);
     auto renewing = [&](AccountStore& accounts, const std::string& script, bool isStopped = false) {
@@ -130,6 +128,7 @@ TEST_F(AccountStoreTest, EndsTheHelpersWholeProcessGroup) {
     AccountStore impatient{profile, folder.path(), std::chrono::milliseconds(100)};
     EXPECT_THAT(renewing(impatient, "sleep 100000 & sleep 100000"), HasSubstr("took too long"));
     EXPECT_EQ(renewing(store, "sleep 100000 & echo token=T"), "");  // the child keeps the output open
+    EXPECT_EQ(renewing(store, "setsid sh -c 'sleep 100000 & sleep 100000' & echo token=T"), "") << "its own group";
     EXPECT_THAT(renewing(store, "sleep 100000", true), HasSubstr("agent is ending"));
     EXPECT_THAT(renewing(store, "sleep 100000"), HasSubstr("agent is ending"));
 }

@@ -1,8 +1,6 @@
 // What only a registry that is stored does; what every registry does is in tests/contract.
 #include "vrx/host/activities/background_activities.h"
 
-#include <gmock/gmock.h>
-
 #include <chrono>
 #include <csignal>
 #include <filesystem>
@@ -13,12 +11,8 @@
 namespace vrx::host {
 namespace {
 
-using namespace std::chrono_literals;
 using platform::BackgroundActivityResult;
 using platform::OnceCallback;
-using ::testing::ElementsAre;
-using ::testing::HasSubstr;
-using ::testing::IsEmpty;
 using ::testing::IsSupersetOf;
 using ::testing::SizeIs;
 using enum BackgroundActivityResult;
@@ -33,7 +27,7 @@ protected:
                                           completions.push_back(std::move(completion));
                                       });
     }
-    std::vector<std::string> firingsAfter(platform::Duration time) {
+    std::vector<std::string> firingsAfter(Duration time) {
         subject.pass(time);
         return std::exchange(firings, {});
     }

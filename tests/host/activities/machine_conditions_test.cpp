@@ -1,6 +1,5 @@
 #include "vrx/host/activities/machine_conditions.h"
 
-#include <gmock/gmock.h>
 #include <linux/rtnetlink.h>
 #include <net/if.h>
 #include <sched.h>
@@ -59,17 +58,18 @@ int followRoutes() {
     TemporaryFolder folder;
     MainLoop loop;
     DeviceProfile profile(folder / "device.toml");
-    MachineConditions conditions(loop.event(), profile);
+    MachineServices services(loop.event());  // which nobody starts
+    MachineConditions conditions(loop.event(), profile, services);
     int wakeUps = 0;
     conditions.start({.wake = [&] { ++wakeUps, loop.stop(); }, .wallClockSet = [] {}});
     if (conditions.isNetworkAvailable()) return 1;
-    conditions.wakeAt(std::nullopt, true);
+    conditions.wakeAt(std::nullopt, {.network = true});
     loop.post([] { addDefaultRoute(); });
     loop.postAfter(std::chrono::minutes(1), [&] { loop.stop(); });
     const auto hasRoute = [&] { return conditions.isNetworkAvailable() || (loop.run(), false); };
     if (!eventually(hasRoute, "the route")) return 4;
     if (wakeUps == 0) return 2;
-    writeFile(profile.path(), "[network]\navailable = false\n");
+    writeFile(profile.layers().front(), "[network]\navailable = false\n");
     return conditions.isNetworkAvailable() ? 3 : 0;
 }
 

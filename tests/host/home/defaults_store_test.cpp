@@ -1,7 +1,5 @@
 #include "vrx/host/home/defaults_store.h"
 
-#include <gmock/gmock.h>
-
 #include <cmath>
 #include <csignal>
 #include <limits>
@@ -11,14 +9,6 @@
 
 namespace vrx::host {
 namespace {
-
-using platform::Array;
-using platform::Dictionary;
-using platform::MaybeError;
-using platform::Value;
-using ::testing::AllOf;
-using ::testing::ElementsAre;
-using ::testing::HasSubstr;
 
 constexpr auto append = [](const Value& element) {
     return [element](const Value& list) {
@@ -43,12 +33,9 @@ struct Opened {
     DefaultsStore store{database};
 };
 
-class DefaultsStoreTest : public ::testing::Test {
+class DefaultsStoreTest : public InFolder {
 protected:
     std::string path() const { return folder / "host.db"; }
-
-    LogRecorder log;
-    TemporaryFolder folder;
 };
 
 TEST_F(DefaultsStoreTest, KeepsItsFilesForItsUserAndWhatIsNotANumber) {
@@ -57,6 +44,23 @@ TEST_F(DefaultsStoreTest, KeepsItsFilesForItsUserAndWhatIsNotANumber) {
     EXPECT_TRUE(std::isnan(opened.store.get("nan").asNumber().value_or(0)));
     for (const char* suffix : {"", "-wal", "-shm"}) EXPECT_EQ(modeOf(path() + suffix), 0600u) << suffix;
     EXPECT_THAT(log.lines(), ElementsAre());
+}
+
+TEST_F(DefaultsStoreTest, PresetsStandBetweenWhatIsWrittenAndWhatIsRegistered) {
+    Opened opened(path());
+    auto presets = std::make_shared<const Dictionary>(Dictionary{{"a", "preset"}, {"b", "preset"}});
+    opened.store.setPresets([&] { return presets; });
+    opened.store.registerDefaults({{"b", "registered"}, {"c", "registered"}});
+    opened.store.set("a", "written");
+    EXPECT_EQ(opened.store.dictionaryRepresentation(),
+              (Dictionary{{"a", "written"}, {"b", "preset"}, {"c", "registered"}}));
+    for (const auto& [key, value] : opened.store.dictionaryRepresentation())
+        EXPECT_EQ(opened.store.get(key), value) << key;
+    opened.store.update("b", [](const Value& present) { return Value(present.asString()->substr(1)); });
+    EXPECT_EQ(opened.store.get("b"), Value("reset"));
+    opened.store.remove("a");
+    presets = std::make_shared<const Dictionary>(Dictionary{{"a", "another"}});
+    EXPECT_EQ(opened.store.get("a"), Value("another"));
 }
 
 TEST_F(DefaultsStoreTest, UpdatesOfProcessesAndThreadsAtOnceLoseNothing) {
@@ -189,6 +193,11 @@ TEST_F(DefaultsStoreTest, LookingReadsWhatIsThereAndChangesNothing) {
     EXPECT_THAT(folder.names(), ElementsAre("host.db"));
     expectLook("ended");
     EXPECT_THAT(folder.names(), ElementsAre("host.db"));
+    writeFile(path() + "-wal", "");  // as a process leaves it that is killed while it opens the database
+    expectLook("ended");
+    writeFile(path() + "-wal", std::string(32, 'x'));  // or before its first page is in the log
+    expectLook("ended");
+    std::filesystem::remove(path() + "-wal");
 
     std::vector<const char*> next(Database::currentSchema.begin(), Database::currentSchema.end());
     next.push_back("CREATE TABLE more (x)");
@@ -197,6 +206,26 @@ TEST_F(DefaultsStoreTest, LookingReadsWhatIsThereAndChangesNothing) {
     for (const char* name : {"absent.db", "damaged 1%?#.db"})
         EXPECT_TRUE(Database::readOnly(folder / name).open()) << name;
     EXPECT_THAT(folder.names(), ElementsAre("damaged 1%?#.db", "host.db"));
+}
+
+// The shared index comes and goes with the last process that writes, and is not valid at every moment.
+TEST_F(DefaultsStoreTest, LookingIsDoneBesideProcessesThatOpenAndClose) {
+    Opened(path()).store.set("key", "kept");
+    std::vector<pid_t> others;
+    for (int process = 0; process < 2; ++process)
+        others.push_back(inChild([&] {
+            while (true) Opened(path()).store.set("other", "changed");
+        }));
+    for (int look = 0; look < (isSanitized ? 100 : 300) && !HasFailure(); ++look) {
+        Database database = Database::readOnly(path());
+        const MaybeError error = database.open();
+        EXPECT_FALSE(error) << look << ": " << error->text << " " << error->code;
+        EXPECT_EQ(DefaultsStore(database).get("key"), Value("kept")) << look;
+    }
+    for (const pid_t other : others) {
+        kill(other, SIGKILL);
+        endOf(other);
+    }
 }
 
 TEST_F(DefaultsStoreTest, ChangesTheSchemaAsAWholeOrNotAtAll) {
@@ -232,6 +261,20 @@ TEST_F(DefaultsStoreTest, OpensAReplacedFileAgainAndKeepsItsOwnLogOutOfIt) {
     EXPECT_EQ(store.get("whose"), Value());
     store.set("whose", "again");
     EXPECT_EQ(store.get("whose"), Value("again"));
+}
+
+TEST_F(DefaultsStoreTest, TakesNoFailedLookForAReplacedFile) {
+    Opened opened(path());
+    opened.store.set("key", 1);
+    std::filesystem::rename(path(), folder / "kept");
+    std::filesystem::create_symlink("host.db", path());  // a look at it fails: it leads to itself
+    opened.store.set("key", 2);
+    std::filesystem::remove(path());
+    std::filesystem::rename(folder / "kept", path());
+    EXPECT_EQ(opened.store.get("key"), Value(2));
+    EXPECT_EQ(Opened(path()).store.get("key"), Value(2));
+    EXPECT_THAT(folder.names(), ElementsAre("host.db", "host.db-shm", "host.db-wal"));
+    EXPECT_THAT(log.lines(), ElementsAre());
 }
 
 TEST_F(DefaultsStoreTest, ReadsAsEmptyWhereThereIsNoFolderAndRecoversWhenThereIs) {

@@ -1,7 +1,5 @@
 // Follow-ups on the real host: a service that fails, processes that work at once, and processes that are killed at
 // work.
-#include <gmock/gmock.h>
-
 #include <csignal>
 #include <thread>
 
@@ -19,13 +17,7 @@
 namespace vrx::host {
 namespace {
 
-using platform::Array;
-using platform::Dictionary;
 using platform::FollowUpItem;
-using platform::MaybeError;
-using platform::Value;
-using ::testing::ElementsAre;
-using ::testing::IsEmpty;
 using ::testing::SizeIs;
 
 std::shared_ptr<VRXDeviceInfo> offered(const std::string& serialNumber) {
@@ -62,7 +54,7 @@ private:
 class FollowUps : public ::testing::Test {
 protected:
     void openHost() {
-        host.emplace(HostLocations{folder / "home", folder / "device.toml"}, platform::Level::Error);
+        host.emplace(HostLocations{folder / "home", {folder / "device.toml"}}, platform::Level::Error);
         ASSERT_FALSE(host->open(HomeUse::Tool));
     }
     // Does the work in a process with a host of its own.

@@ -1,14 +1,10 @@
 #include "vrx/host/http/http_cache.h"
 
-#include <gmock/gmock.h>
-
 #include "host/support.h"
 #include "vrx/host/http/http_cache_rules.h"
 
 namespace vrx::host {
 namespace {
-
-using namespace std::chrono_literals;
 
 TEST(HttpCacheRules, ReadCacheControlAndDates) {
     // Storable, to be revalidated, max-age.
@@ -31,7 +27,7 @@ TEST(HttpCacheRules, ReadCacheControlAndDates) {
     }
     for (const char* text :
          {"Sun, 06 Nov 1994 08:49:37 GMT", "Sunday, 06-Nov-94 08:49:37 GMT", "Sun Nov  6 08:49:37 1994"})
-        EXPECT_EQ(parseHttpDate(text), platform::dateFromEpoch(784'111'777)) << text;
+        EXPECT_EQ(parseHttpDate(text), dateFromEpoch(784'111'777)) << text;
     for (const char* text : {"", "0", "-1", "now", "Sun, 06 Nov 1994 25:49:37 GMT", "Nov 1994"})
         EXPECT_EQ(parseHttpDate(text), std::nullopt) << text;
 }
@@ -41,7 +37,7 @@ TEST(HttpCache, StaysWithinItsBound) {
     HttpCache cache(clock, 4000);
     auto add = [&](const std::string& url, std::size_t size) {
         platform::HttpResponse answer{.status = 200, .headers = {{"Cache-Control", "max-age=9"}}};
-        answer.body = platform::Data(size);
+        answer.body = Data(size);
         cache.store(url, clock.now(), answer);
         EXPECT_LE(cache.bytes(), 4000u);
     };

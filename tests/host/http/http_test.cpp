@@ -1,25 +1,22 @@
 #include "vrx/host/http/http.h"
 
-#include <gmock/gmock.h>
-#include <sys/stat.h>
-
 #include <array>
 #include <csignal>
 #include <cstdio>
 #include <future>
+#include <map>
 
 #include "host/http/loopback_server.h"
 #include "host/support.h"
+#include "support/eventually.h"
+#include "vrx/host/http/transfer_line.h"
 #include "vrx/host/loop/queues.h"
 
 namespace vrx::host {
 namespace {
 
-using namespace std::chrono_literals;
 using platform::HttpRequest;
 using platform::HttpResponse;
-using ::testing::ElementsAre;
-using ::testing::HasSubstr;
 using ::testing::Not;
 
 std::string redirectTo(const std::string& url) {
@@ -32,15 +29,11 @@ constexpr std::string_view packed(
     "\x00\x00\x00\x00\x00\x00\x1c\x18\x75\xb1\x0e\xc3\x11\x27\x00\x00",
     44);
 
-HttpRequest requestTo(std::string url, std::string method = "GET", std::optional<platform::Duration> timeout = {}) {
-    HttpRequest request;
-    request.url = std::move(url);
-    request.method = std::move(method);
-    request.timeout = timeout;
-    return request;
+HttpRequest requestTo(std::string url, std::string method = "GET", std::optional<Duration> timeout = {}) {
+    return {.url = std::move(url), .method = std::move(method), .headers = {}, .body = {}, .timeout = timeout};
 }
 
-class HttpTest : public ::testing::Test {
+class HttpTest : public InFolder {
 protected:
     HttpResponse fetch(HttpRequest request) { return fetch(http.shared(), std::move(request)); }
     HttpResponse fetch(platform::HttpSession& session, HttpRequest request) {
@@ -66,11 +59,9 @@ protected:
     }
 
     std::vector<std::string> requests;  // as the test's server notes them
-    LogRecorder log;
     MainLoop loop;
     Queues queues{loop, 2};
     SettableClock clock;
-    TemporaryFolder folder;
     DeviceProfile profile{folder / "device.toml"};
     platform::Queue& workers = queues.workers(platform::Priority::UserInitiated);
     HttpSessions http{workers, clock, profile, {.timeout = 10s, .answerBytes = 10'000}};
@@ -100,7 +91,7 @@ TEST_F(HttpTest, CarriesRequestAndAnswerAndReusesTheConnection) {
     EXPECT_THAT(requests[0], Not(HasSubstr("Cache-Control")));
     EXPECT_THAT(requests[1], HasSubstr("Cache-Control: no-cache"));
     EXPECT_THAT(requests[1], Not(HasSubstr("Source-Application")));
-    writeFile(profile.path(), "[http]\nsource_application_header = true");
+    writeFile(profile.layers().front(), "[http]\nsource_application_header = true");
     HttpRequest named = requestTo(server.url());
     named.sourceApplication = "com.example.app";
     fetch(named);
@@ -273,11 +264,11 @@ TEST_F(HttpTest, TrustsTheProfilesAuthorityWhileTheProfileIsTrusted) {
               3);
     setenv("https_proxy", "http://proxy.invalid:1", 1);  // not for this machine
     EXPECT_THAT(error(get(url.data())), HasSubstr("certificate"));
-    writeFile(profile.path(), "[http]\nca_file = '" + std::string(certificate.data()) + "'");
-    chmod(profile.path().c_str(), 0600);
+    writeFile(profile.layers().front(), "[http]\nca_file = '" + std::string(certificate.data()) + "'");
+    folder.setMode("device.toml", 0600);
     EXPECT_EQ(get(url.data()).status, 404);
     EXPECT_EQ(error(get(url.data() + std::string("/library/ORVANE/asset/vrxV2.plist"))), "a redirect leaves https");
-    chmod(profile.path().c_str(), 0666);
+    folder.setMode("device.toml", 0666);
     EXPECT_THAT(error(get(url.data())), HasSubstr("certificate"));
     kill(std::stoi(process.data()), SIGTERM);
     pclose(server);
@@ -294,6 +285,68 @@ TEST_F(HttpTest, NamesTheLibraryThatItCannotOpen) {
     };
     EXPECT_EXIT(tellError(), ::testing::ExitedWithCode(0), "libcurl.so.4");
     unsetenv("LD_LIBRARY_PATH");
+}
+
+// The first request of each connection is answered, the next one finds the connection closed.
+TEST_F(HttpTest, SendsOnceWhatCannotBeRepeated) {
+    std::map<std::string, int> sent;
+    LoopbackServer server([&](const std::string& request) {
+        const std::string method = request.substr(0, request.find(' '));
+        ++sent[method];
+        return requests.empty() ? answer("200 OK", "x") : std::string("HTTP/1.0");  // no answer, and the end
+    });
+    for (const char* method : {"POST", "GET"}) {
+        requests.clear();
+        sent.clear();
+        EXPECT_EQ(fetch(requestTo(server.url(), method)).status, 200);
+        requests.emplace_back("break");
+        const HttpResponse response = fetch(requestTo(server.url(), method));
+        EXPECT_TRUE(response.error) << method;
+        EXPECT_LE(sent[method], method == std::string("POST") ? 2 : 3);
+    }
+    LoopbackServer closing([](const std::string&) { return "HTTP/1.0 200 OK\r\nContent-Length: 1\r\n\r\nx"; });
+    for (int i = 0; i < 5; ++i) EXPECT_EQ(fetch(requestTo(closing.url(), "POST")).status, 200);
+}
+
+TEST_F(HttpTest, LetsTransfersWaitForTheirTurn) {
+    const platform::ShutdownScope shutdown;  // nobody answers
+    HttpCache cache(clock, 1000);
+    const auto add = [&](TransferLine& line, const char* host, Requester requester, const HttpLimits& limits) {
+        const RequesterScope scope(requester);
+        line.add(std::make_unique<HttpTransfer>(requestTo(std::string("https://") + host + "/x"), false,
+                                                HttpSurroundings{limits, profile, cache}, [](HttpResponse) {}));
+    };
+    const HttpLimits one{.transfers = 1}, three{.transfers = 3, .transfersPerHost = 1, .longestWait = 0s};
+    TransferLine line(one);
+    for (const char* host : {"a1", "a2", "a3"}) add(line, host, 1000, one);
+    for (const char* host : {"b1", "b2"}) add(line, host, 1001, one);
+    add(line, "own", std::nullopt, one);
+    std::vector<std::string> order;
+    while (const auto transfer = line.next()) {
+        order.push_back(transfer->host());
+        EXPECT_FALSE(line.next());
+        line.ended(*transfer);
+    }
+    EXPECT_THAT(order, ElementsAre("own", "a1", "b1", "a2", "b2", "a3"));
+    TransferLine hosts(three);
+    for (const char* host : {"h", "h", "h", "k"}) add(hosts, host, 1000, three);
+    const auto first = hosts.next(), second = hosts.next();
+    EXPECT_EQ(first->host() + second->host(), "hk");
+    EXPECT_FALSE(hosts.next());
+    hosts.ended(*first);
+    EXPECT_EQ(hosts.next()->host(), "h");
+    EXPECT_EQ(hosts.removeOverdue(std::chrono::steady_clock::now()).size(), 1u);
+    EXPECT_FALSE(hosts.firstOverdue());
+
+    LoopbackServer server([](const std::string&) { return answer("200 OK", "x"); });
+    HttpSessions impatient(workers, clock, profile, {.transfersPerHost = 1, .longestWait = 10ms});
+    LoopbackServer silent([](const std::string&) { return std::string(); });
+    auto held = begin(impatient.shared(), requestTo(silent.url(), "GET", 10s));
+    eventually([&] { return silent.connections() == 1; }, "the one that is held");
+    EXPECT_THAT(error(fetch(impatient.shared(), requestTo(silent.url()))), HasSubstr("too many requests"));
+    EXPECT_EQ(fetch(impatient.shared(), requestTo(server.url())).status, 200) << "another host";
+    impatient.stop();
+    EXPECT_THROW(held.get(), std::future_error);
 }
 
 TEST_F(HttpTest, AnswersRequestsAtOnceAndLetsGoOfThoseUnderWayAtItsEnd) {

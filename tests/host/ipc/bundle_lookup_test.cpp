@@ -11,17 +11,14 @@
 namespace vrx::host {
 namespace {
 
-using platform::Value;
-
-class BundleLookupTest : public testing::Test {
+class BundleLookupTest : public InFolder {
 protected:
     BundleLookupTest() {
         umask(022);  // a bundle that others can write is none
         writeFile(viewer, "program");
-        makeMode("app/bin/viewer", 0755);
+        folder.setMode("app/bin/viewer", 0755);
         writeFile(folder / "app/bundle.toml", "identifier = 'com.example.viewer'\n[entitlements]\n'e' = true\n");
     }
-    void makeMode(const std::string& name, mode_t mode) const { chmod((folder / name).c_str(), mode); }
     // Another program takes the place of what is there.
     static void copyProgram(const std::string& program, const std::string& path) {
         std::filesystem::copy_file(program, path + ".new");
@@ -36,8 +33,6 @@ protected:
         return bundle ? bundle->identifier : std::nullopt;
     }
 
-    LogRecorder log;
-    TemporaryFolder folder;
     const std::string viewer = folder / "app/bin/viewer";
 };
 
@@ -56,15 +51,15 @@ TEST_F(BundleLookupTest, FindsTheNearestBundleFile) {
 TEST_F(BundleLookupTest, BelievesNothingThatOthersCanChange) {
     for (const char* part : {"app/bundle.toml", "app", "app/bin", "app/bin/viewer"}) {
         for (mode_t open : {0775u, 0757u}) {
-            makeMode(part, open);
+            folder.setMode(part, open);
             EXPECT_EQ(identifier(), std::nullopt) << part;
         }
-        makeMode(part, 0755);
+        folder.setMode(part, 0755);
         EXPECT_EQ(identifier(), "com.example.viewer") << part;
     }
     // One that is not believed is not passed over for one further up.
     writeFile(folder / "app/bin/bundle.toml", "identifier = 'com.example.inner'");
-    makeMode("app/bin/bundle.toml", 0666);
+    folder.setMode("app/bin/bundle.toml", 0666);
     EXPECT_EQ(identifier(), std::nullopt);
     std::filesystem::remove(folder / "app/bin/bundle.toml");
     std::filesystem::create_symlink(folder / "app", folder / "link");
@@ -75,12 +70,12 @@ TEST_F(BundleLookupTest, ReadsEntitlementsOfAnyType) {
     writeFile(folder / "app/bundle.toml",
               "[entitlements]\n'a.b' = true\nt = 'x'\nn = 7\nd = 0.5\nl = [1, [2]]\no = {k = false}\n");
     BundleFile file = readBundleFile(folder / "app").value();
-    EXPECT_EQ(Value(file.entitlements), Value(platform::Dictionary{{"a.b", true},
-                                                                   {"t", "x"},
-                                                                   {"n", 7},
-                                                                   {"d", 0.5},
-                                                                   {"l", platform::Array{1, platform::Array{2}}},
-                                                                   {"o", platform::Dictionary{{"k", false}}}}));
+    EXPECT_EQ(Value(file.entitlements), Value(Dictionary{{"a.b", true},
+                                                         {"t", "x"},
+                                                         {"n", 7},
+                                                         {"d", 0.5},
+                                                         {"l", Array{1, Array{2}}},
+                                                         {"o", Dictionary{{"k", false}}}}));
     EXPECT_EQ(readBundleFile(folder.path()).error().code, ENOENT);
 }
 
@@ -89,11 +84,11 @@ TEST_F(BundleLookupTest, TakesTestersBundlesFromATrustedProfile) {
     std::filesystem::create_symlink(viewer, folder / "other-name");
     facts->bundles.push_back({{"/nowhere", folder / "other-name"}, "com.example.tester", {}, {}, {}, {}});
     BundleLookup lookup([facts] { return facts; });
-    facts->path = folder / "device.toml";
-    writeFile(facts->path, "");
-    makeMode("device.toml", 0666);
+    facts->bundles.back().source.path = folder / "device.toml";
+    writeFile(folder / "device.toml", "");
+    folder.setMode("device.toml", 0666);
     EXPECT_EQ(identifier(lookup), "com.example.viewer");
-    makeMode("device.toml", 0644);
+    folder.setMode("device.toml", 0644);
     EXPECT_EQ(identifier(lookup), "com.example.tester");
 }
 
@@ -113,21 +108,24 @@ TEST_F(BundleLookupTest, EntitlesThePeerByItsProgramAndGroup) {
     EXPECT_EQ(peer.executable(), viewer);
     EXPECT_TRUE(peer.runsSameProgram());
 
-    EXPECT_EQ(BundleLookup().entitlement(peer, "e"), Value(true));
-    EXPECT_TRUE(BundleLookup().entitlement(peer, "other").isNull());
+    auto entitlement = [&](const char* name, const BundleLookup& lookup = BundleLookup()) {
+        return lookup.entitlement(peer, name).value();
+    };
+    EXPECT_EQ(entitlement("e"), Value(true));
+    EXPECT_TRUE(entitlement("other").isNull());
     auto requireGroup = [this](const std::string& name) {
         writeFile(folder / "app/bundle.toml", "group = '" + name + "'\n[entitlements]\ne = true\n");
     };
     requireGroup(getgrgid(getgid())->gr_name);
-    EXPECT_EQ(BundleLookup().entitlement(peer, "e"), Value(true));
+    EXPECT_EQ(entitlement("e"), Value(true));
     requireGroup("nogroup");
-    EXPECT_TRUE(BundleLookup().entitlement(peer, "e").isNull());
+    EXPECT_TRUE(entitlement("e").isNull());
     auto facts = std::make_shared<ProfileContent>();
     facts->bundles.push_back({{viewer}, "com.example.tester", {}, {}, "nogroup", {{"e", true}}});
     BundleLookup tester([facts] { return facts; });
-    EXPECT_TRUE(tester.entitlement(peer, "e").isNull());
+    EXPECT_TRUE(entitlement("e", tester).isNull());
     facts->bundles[0].group = getgrgid(getgid())->gr_name;
-    EXPECT_EQ(tester.entitlement(peer, "e"), Value(true));
+    EXPECT_EQ(entitlement("e", tester), Value(true));
 
     pclose(process);
     EXPECT_FALSE(peer.runsSameProgram());

@@ -1,6 +1,7 @@
 #include "vrx/host/log/system_log.h"
 
-#include <gmock/gmock.h>
+#include <fcntl.h>
+#include <poll.h>
 
 #include <csignal>
 #include <numeric>
@@ -12,6 +13,7 @@ namespace {
 
 using platform::Level;
 using platform::LogEntry;
+using ::testing::MatchesRegex;
 
 std::string written(const LogEntry& entry, Level lowest) {
     Pipe pipe;
@@ -57,6 +59,26 @@ TEST_P(LogWriterAtEnd, HasWrittenEverythingInOrder) {
 
 INSTANTIATE_TEST_SUITE_P(Of, LogWriterAtEnd, ::testing::Values(0, SIGABRT),
                          [](const auto& signal) { return signal.param == 0 ? "TheProcess" : "ACrash"; });
+
+TEST(LogWriter, IsNotStoppedByAPipeThatNobodyReads) {
+    const Pipe pipe;
+    const auto readAll = [&] {
+        std::string text(1 << 20, '\0');
+        pollfd ready{pipe.reader.number(), POLLIN, 0};
+        std::size_t size = 0;
+        while (poll(&ready, 1, 0) > 0)
+            size += static_cast<std::size_t>(read(pipe.reader.number(), text.data() + size, text.size() - size));
+        return text.substr(0, size);
+    };
+    LogWriter writer(pipe.writer.number(), LogWriter::Form::Lines);
+    for (int i = 0; i < 4000; ++i) writer.add(std::string(99, 'x') + "\n");
+    writer.flush();
+    EXPECT_LT(readAll().size(), 400'000u);
+    writer.add("after\n");
+    writer.flush();
+    EXPECT_THAT(readAll(), MatchesRegex("\\([0-9]+ bytes of the log were left out: nobody read it\\)\nafter\n"));
+    EXPECT_EQ(fcntl(pipe.writer.number(), F_GETFL) & O_NONBLOCK, 0) << "the mode is others' as well";
+}
 
 }  // namespace
 }  // namespace vrx::host

@@ -1,7 +1,5 @@
 #include "vrx/host/loop/process_lifecycle.h"
 
-#include <gmock/gmock.h>
-
 #include <thread>
 
 #include "host/support.h"

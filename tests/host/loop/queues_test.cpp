@@ -1,17 +1,15 @@
 #include "vrx/host/loop/queues.h"
 
-#include <gmock/gmock.h>
-
 #include <csignal>
 #include <latch>
 
 #include "host/support.h"
 #include "support/eventually.h"
+#include "vrx/host/base/requester.h"
 
 namespace vrx::host {
 namespace {
 
-using namespace std::chrono_literals;
 using platform::Priority;
 
 class HostQueues : public ::testing::Test {
@@ -74,6 +72,39 @@ TEST_F(HostQueues, ASerialQueueKeepsNothingBeyondTheEndOfTheWorkers) {
     for (int i = 0; i < 2; ++i) queue->post([queue, held] {});
     queue.reset();
     EXPECT_EQ(held.use_count(), 1);
+    EXPECT_THAT(log.lines(), ElementsAre(HasSubstr("queue serial"), HasSubstr("undone: 1")));
+}
+
+TEST_F(HostQueues, ReleasesATimersTaskWithItsOwner) {
+    auto held = std::make_shared<int>(), owner = std::make_shared<int>(), other = std::make_shared<int>();
+    loop.postAfterWhile(owner, 1h, [held] {});
+    loop.postAfterWhile(other, 2h, [held] {});
+    owner.reset();
+    loop.post([&] { loop.stop(); });
+    loop.run();
+    EXPECT_EQ(held.use_count(), 2) << "one is left";
+}
+
+TEST_F(HostQueues, CarryForWhomTheyWork) {
+    std::vector<Requester> seen;
+    const auto note = [&] { seen.push_back(RequesterScope::current()); };
+    {
+        const RequesterScope scope(1000);
+        const auto serial = queues.makeSerialQueue("serial");
+        serial->post([&] {
+            note();
+            queues.workers(platform::Priority::Background).post([&] {
+                note();
+                loop.postAfter(1ms, [&] {
+                    note();
+                    loop.stop();
+                });
+            });
+        });
+    }
+    loop.run();
+    note();
+    EXPECT_THAT(seen, ::testing::ElementsAre(1000, 1000, 1000, std::nullopt));
 }
 
 TEST_F(HostQueues, SignalsAndStopEndTheLoopAndWhatIsLeftRunsTheNextTime) {

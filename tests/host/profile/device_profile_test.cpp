@@ -1,8 +1,5 @@
 #include "vrx/host/profile/device_profile.h"
 
-#include <gmock/gmock.h>
-#include <sys/stat.h>
-
 #include <cstdlib>
 
 #include "host/support.h"
@@ -11,9 +8,6 @@
 namespace vrx::host {
 namespace {
 
-using platform::Value;
-using ::testing::ElementsAre;
-using ::testing::HasSubstr;
 using ::testing::StartsWith;
 
 constexpr const char* everything = R"(
@@ -68,17 +62,14 @@ identifier = "com.example.tester"
 entitlements = { "com.example.flag" = true, list = ["a"] }
 )";
 
-class DeviceProfileTest : public ::testing::Test {
+class DeviceProfileTest : public InFolder {
 protected:
     std::string path() const { return folder / "device.toml"; }
-
-    LogRecorder log;
-    TemporaryFolder folder;
 };
 
 TEST_F(DeviceProfileTest, GivesEveryFactOfTheFile) {
     writeFile(path(), everything);
-    chmod(path().c_str(), 0644);
+    folder.setMode("device.toml", 0644);
     const DeviceProfile profile(path());
     EXPECT_EQ(profile.string("SerialNumber"), "SN1");
     EXPECT_EQ(profile.string("UserAssignedDeviceName"), "Ada's device");
@@ -96,10 +87,10 @@ TEST_F(DeviceProfileTest, GivesEveryFactOfTheFile) {
     ASSERT_EQ(watches.size(), 2u);
     EXPECT_EQ(watches[0].serialNumber, "W1");
     EXPECT_EQ(watches[0].localizedModelName, "Watch 3");
-    EXPECT_EQ(watches[0].pairedDate, platform::dateFromEpoch(1769860800));
+    EXPECT_EQ(watches[0].pairedDate, dateFromEpoch(1769860800));
     EXPECT_TRUE(watches[0].isPaired && !watches[0].isArchived);
     EXPECT_EQ(watches[1].name, std::nullopt);
-    EXPECT_EQ(watches[1].pairedDate, platform::dateFromEpoch(1769817600));
+    EXPECT_EQ(watches[1].pairedDate, dateFromEpoch(1769817600));
     EXPECT_TRUE(!watches[1].isPaired && watches[1].isArchived);
 
     const TelephonyNetworkInfo telephony(profile);
@@ -120,10 +111,10 @@ TEST_F(DeviceProfileTest, GivesEveryFactOfTheFile) {
     ASSERT_EQ(facts->bundles.size(), 1u);
     EXPECT_THAT(facts->bundles[0].executables, ElementsAre("/usr/bin/busctl"));
     EXPECT_EQ(facts->bundles[0].entitlements.at("com.example.flag"), Value(true));
-    EXPECT_TRUE(facts->isTrusted());
+    EXPECT_TRUE(facts->bundles[0].source.isTrusted());
     EXPECT_THAT(log.lines(), ElementsAre());
-    chmod(path().c_str(), 0664);  // somebody else may write it now
-    EXPECT_FALSE(profile.content()->isTrusted());
+    folder.setMode("device.toml", 0664);  // somebody else may write it now
+    EXPECT_FALSE(profile.content()->http.caFileSource.isTrusted());
     EXPECT_THAT(log.lines(), ElementsAre(HasSubstr("others can write it")));
 
     writeFile(path(), "account = { identifier = 'ada', authentication = false }");
@@ -137,7 +128,7 @@ TEST_F(DeviceProfileTest, EachReadSeesTheFileAsItIsEvenWithinOneTickOfTheClock) 
         if (i % 2) {
             writeFile(path(), "[device]\nserial_number = '" + serial + "'");
         } else {
-            ASSERT_FALSE(replaceFile(path(), platform::Data()));
+            ASSERT_FALSE(replaceFile(path(), Data()));
             std::ofstream(path()) << "[device]\nserial_number = '" << serial << "'";
         }
         ASSERT_EQ(profile.string("SerialNumber"), serial);
@@ -152,22 +143,30 @@ TEST_F(DeviceProfileTest, AFileThatIsWrongIsReportedOnceWithItsLineAndTheLastGoo
     const DeviceProfile profile(path());
     writeFile(path(), "[device]\nserial_number = 'GOOD'");
     EXPECT_EQ(profile.string("SerialNumber"), "GOOD");
+    std::string manyKeys = "# a comment.......................\na";
+    for (int i = 0; i < 30'000; ++i) manyKeys += ".a";
+    const std::string manyArrays = "text = '''..................\n[[[[[[[[[[[[[[[[[[['''\na = " + std::string(17, '[');
+    const std::string longFile(64 * 1024 + 1, '\n');
     const std::pair<const char*, const char*> cases[] = {
         {"[device]\nserial_number = = 'X'", ":2: "},
         {"[device]\n\nserial_number = 5", ":3: device.serial_number must be a string; "},
         {"[features.Domain]\nFlag = 1", ":2: features.Domain.Flag must be true or false; "},
-        {"[[watches]]\npaired_date = 'yesterday'", ":2: watches.paired_date must be a date; "},
+        {"[[watches]]\npaired_date = 'yesterday'", ":2: watches[0].paired_date must be a date; "},
         {"[watches]\nname = 'X'", ":1: watches must be a list of tables, [[watches]]; "},
         {"[activities]\nminimum_interval = -1", ":2: activities.minimum_interval must be a number of seconds; "},
-        {"\n[[bundles]]\nexecutables = ['/bin/x']", ":2: bundles.identifier is missing; "},
+        {"\n[[bundles]]\nexecutables = ['/bin/x']", ":2: bundles[0].identifier is missing; "},
         {"[account]\nidentifier = \"a\\nb\"", ":2: account.identifier must be without control characters; "},
         {"[account]\ncredential_helper = ['helper']",
          ":2: account.credential_helper must be a list that begins with an absolute path; "},
         {"[account.headers]\nX-A = \"1\\r\\nX-B: 2\"",
          ":2: account.headers.X-A must be a header's name, and its value "},
         {"[http]\nca_file = 'ca.pem'", ":2: http.ca_file must be an absolute path; "},
+        {"[applications]\nfolders = ['apps']", ":2: applications.folders must be a list of absolute paths; "},
+        {manyKeys.c_str(), ":2: it is nested too deeply; "},
+        {manyArrays.c_str(), ":3: it is nested too deeply; "},
+        {longFile.c_str(), ":1: it is longer than 65536 bytes; "},
         {"[[bundles]]\nidentifier = 'x'\nentitlements = { a = { b = 1 } }",
-         ":3: bundles.entitlements.a must be a boolean, number, string or list of strings; "},
+         ":3: bundles[0].entitlements.a must be a boolean, number, string or list of strings; "},
     };
     std::size_t reports = 0;
     for (const auto& [text, complaint] : cases) {
@@ -181,59 +180,92 @@ TEST_F(DeviceProfileTest, AFileThatIsWrongIsReportedOnceWithItsLineAndTheLastGoo
     ASSERT_EQ(log.lines().size(), ++reports);
     EXPECT_EQ(log.lines().back(),
               path() + ":3: the key device.colour is not known; " + path() + ":4: the key colours is not known");
+    const auto report = [&](const std::string& locale) {
+        writeFile(path(), "[locale]\n" + locale);
+        profile.preferredLocaleIdentifier();
+        return log.lines().size() == reports ? "" : log.lines()[reports++].substr(path().size());
+    };
+    EXPECT_EQ(report("language = 'english'"), ":2: locale.language is not a language");
+    EXPECT_EQ(report("\ntime_zone = 'Europe/Pari'"), ":3: locale.time_zone is not the name of a time zone");
+    EXPECT_EQ(report("language = 'zh-Hant_TW.UTF-8'\ntime_zone = 'Europe/Paris'"), "");
 }
 
 TEST(BareMachine, TakesItsFactsFromTheSystemsFiles) {
+    LogRecorder log;  // and digests
     TemporaryFolder root;
     const BareMachine machine(root.path());
     setenv("LC_ALL", "", 1);
     setenv("LC_MESSAGES", "C.UTF-8", 1);
-    EXPECT_EQ(machine.localeIdentifier(), "en_US");
+    EXPECT_EQ(machine.localeIdentifier().value, "en_US");
     setenv("LC_ALL", "fr_CA.UTF-8", 1);
-    EXPECT_EQ(machine.localeIdentifier(), "fr_CA");
+    EXPECT_EQ(machine.localeIdentifier().value, "fr_CA");
     writeFile(root / "etc/default/locale", "LANG=\"de_AT.UTF-8@euro\"\n");
-    EXPECT_EQ(machine.localeIdentifier(), "de_AT");
+    EXPECT_EQ(machine.localeIdentifier().value, "de_AT");
     writeFile(root / "etc/locale.conf", "# LANG=it_IT\nLANG=C.UTF-8\nLC_MESSAGES=pt_BR\n");
-    EXPECT_EQ(machine.localeIdentifier(), "pt_BR");
+    EXPECT_EQ(machine.localeIdentifier().value, "pt_BR");
 
-    EXPECT_EQ(machine.serialNumber(), std::nullopt);
-    writeFile(root / "sys/class/dmi/id/product_serial", " SERIAL 1 \n");
+    DeviceProfile profile("", root.path());
+    EXPECT_FALSE(profile.machineSerialNumber());
+    writeFile(root / "etc/machine-id", "0123456789abcdef0123456789abcdef\n");
+    const std::string derived = profile.machineSerialNumber()->value;
+    EXPECT_EQ(profile.machineSerialNumber()->source, "derived from " + root / "etc/machine-id");
+    const auto serial = [&] {
+        return profile.machineSerialNumber()->value + " by " + profile.machineSerialNumber()->source.substr(0, 11);
+    };
+    const auto serialOf = [&](const char* file, std::string_view content) {
+        writeFile(root / file, content);
+        return serial();
+    };
+    const char *tree = "sys/firmware/devicetree/base/serial-number", *dmi = "sys/class/dmi/id/product_serial";
+    for (const std::string_view filler : {std::string_view("\0", 1), std::string_view("0000000000000000\0", 17),
+                                          std::string_view("Unknown\0", 8), std::string_view("A\nB\0", 4)})
+        EXPECT_EQ(serialOf(tree, filler), derived + " by derived fro");
+    profile.tell({.serialNumber = "TOLD"});
+    EXPECT_EQ(serial(), "TOLD by hostname1");
+    EXPECT_EQ(serialOf(tree, {"100000003d1d1c36\0", 17}), "100000003d1d1c36 by device tree");
+    EXPECT_EQ(serialOf(dmi, "To Be Filled By O.E.M.\n"), "100000003d1d1c36 by device tree");
+    EXPECT_EQ(serialOf(dmi, " SERIAL 1 \n"), "SERIAL 1 by firmware");
+    writeFile(root / "sys/firmware/devicetree/base/model", {"Slate Model B\0", 14});
+    EXPECT_EQ(machine.productType().value + machine.productType().source, "Slate Model Bdevice tree");
     writeFile(root / "sys/class/dmi/id/product_name", "Default string\n");
     writeFile(root / "etc/os-release", "NAME='X'\nVERSION_ID='12'\n");
-    EXPECT_EQ(machine.serialNumber(), "SERIAL 1");
-    EXPECT_EQ(machine.productVersion(), "12");
-    EXPECT_NE(machine.productType(), "Default string");
-    EXPECT_FALSE(machine.productType().empty());
-    EXPECT_FALSE(machine.name().empty());
+    EXPECT_EQ(machine.productVersion().value, "12");
+    EXPECT_EQ(machine.productType().source, "device tree") << "and not the filler";
+    EXPECT_EQ(machine.name().source, "the host name");
+    writeFile(root / "etc/machine-info", "CHASSIS=handset\nPRETTY_HOSTNAME=\"Ada's \\\"phone\\\"\"\n");
+    EXPECT_EQ(machine.name().value, "Ada's \"phone\"");
+    EXPECT_EQ(machine.name().source, root / "etc/machine-info");
+    EXPECT_THAT(DeviceProfile("", root.path()).sources(), ::testing::Contains(root / "etc/machine-info"));
 }
 
 TEST_F(DeviceProfileTest, IsBelievedOnlyWhileEveryFolderOnTheWayIsKeptFromOthers) {
     std::filesystem::create_directories(folder / "open/inner");
     const std::string inner = folder / "open/inner/device.toml", link = folder / "link.toml";
     writeFile(inner, everything);
-    for (const std::string& name : {inner, folder / "open/inner"}) chmod(name.c_str(), 0755);
+    for (const char* name : {"open/inner/device.toml", "open/inner"}) folder.setMode(name, 0755);
     std::filesystem::create_symlink("open/inner/../inner/device.toml", link);
     const std::filesystem::path before = std::filesystem::current_path();
     std::filesystem::current_path(folder.path());
     for (const std::string& path : {inner, link, std::string("open/inner/device.toml")}) {
         const DeviceProfile profile(path);
-        chmod((folder / "open").c_str(), 0755);
-        EXPECT_TRUE(profile.content()->isTrusted()) << path;
-        chmod((folder / "open").c_str(), 0777);
-        EXPECT_EQ(profile.content()->findOpenToOthers().value().path, folder / "open") << path;
-        chmod((folder / "open").c_str(), 01777);
-        EXPECT_TRUE(profile.content()->isTrusted()) << path;
+        folder.setMode("open", 0755);
+        EXPECT_TRUE(profile.content()->http.caFileSource.isTrusted()) << path;
+        folder.setMode("open", 0777);
+        EXPECT_EQ(profile.content()->http.caFileSource.findOpenToOthers().value().path, folder / "open") << path;
+        folder.setMode("open", 01777);
+        EXPECT_TRUE(profile.content()->http.caFileSource.isTrusted()) << path;
     }
     std::filesystem::current_path(before);
-    chmod((folder / "open").c_str(), 0775);
+    folder.setMode("open", 0775);
     EXPECT_EQ(DeviceProfile(inner).string("SerialNumber"), "SN1") << "this is believed all the same";
     EXPECT_THAT(log.lines().back(), StartsWith(folder / "open: others can write it; the bundles, "));
 
-    chmod((folder / "open").c_str(), 0755);
+    folder.setMode("open", 0755);
     std::filesystem::create_directory(folder / "shared");
-    chmod((folder / "shared").c_str(), 0777);
+    folder.setMode("shared", 0777);
     std::filesystem::create_symlink(inner, folder / "shared/link.toml");
-    EXPECT_EQ(DeviceProfile(folder / "shared/link.toml").content()->findOpenToOthers().value().path, folder / "shared");
+    const DeviceProfile shared(folder / "shared/link.toml");
+    EXPECT_EQ(shared.content()->bundles[0].source.findOpenToOthers().value().path, folder / "shared");
 }
 
 }  // namespace

@@ -1,7 +1,5 @@
 #include "vrx/host/profile/profile_notifier.h"
 
-#include <gmock/gmock.h>
-
 #include <thread>
 
 #include "host/support.h"
@@ -12,8 +10,6 @@
 namespace vrx::host {
 namespace {
 
-using namespace std::chrono_literals;
-using ::testing::ElementsAre;
 using ::testing::Lt;
 
 std::string watch(const std::string& serialNumber, const std::string& more = "") {
@@ -24,7 +20,7 @@ std::string language(const std::string& identifier) {
     return "[locale]\nlanguage = '" + identifier + "'\n";
 }
 
-class ProfileNotifierTest : public ::testing::Test {
+class ProfileNotifierTest : public InFolder {
 protected:
     ProfileNotifierTest() {
         writeFile(folder / "machine/etc/locale.conf", "LANG=nl_NL.UTF-8\n");
@@ -33,9 +29,10 @@ protected:
         listen(platform::deviceUnpairedNotification, "unpaired");
     }
 
-    // Begins anew, as a process does.
-    void start(platform::Duration pause = 20ms) {
+    // Begins anew with that profile, as a process does.
+    void start(const std::string& text, Duration pause = 20ms) {
         notifier.reset();
+        writeFile(path, text);
         profile.emplace(path, folder / "machine");
         notifier.emplace(*profile, database, center);
         notifier->start(
@@ -55,8 +52,6 @@ protected:
         return std::exchange(raised, {});
     }
 
-    TemporaryFolder folder;
-    LogRecorder log;
     MainLoop loop;
     Database database{folder / "host.db"};
     NotificationCenter center;
@@ -68,8 +63,7 @@ protected:
 };
 
 TEST_F(ProfileNotifierTest, TellsWhatEachEditHasChanged) {
-    writeFile(path, language("de") + watch("A"));
-    start();
+    start(language("de") + watch("A"));
     writeFile(path, language("de") + watch("A") + watch("B"));
     EXPECT_THAT(raisedUntil("paired"), ElementsAre("paired")) << "and nothing at the first start";
 
@@ -99,22 +93,36 @@ TEST_F(ProfileNotifierTest, TellsWhatEachEditHasChanged) {
 }
 
 TEST_F(ProfileNotifierTest, TellsTheNextProcessWhatChangedMeanwhile) {
-    writeFile(path, language("de") + watch("A"));
-    start();
-    notifier.reset();
-    writeFile(path, language("de") + watch("B"));
-    start();
+    start(language("de") + watch("A"));
+    start(language("de") + watch("B"));
     EXPECT_THAT(raisedUntil("unpaired"), ElementsAre("paired", "unpaired"));
 
-    writeFile(path, "[[watches]");  // what nobody understands says nothing of watches
-    start();
+    start("[[watches]");  // what nobody understands says nothing of watches
     writeFile(path, language("fr") + watch("B"));
     EXPECT_THAT(raisedUntil("language"), ElementsAre("language"));
 }
 
+TEST_F(ProfileNotifierTest, SeesWhatAppearsInAFolderThatIsMadeLater) {
+    start("");
+    notifier.reset();
+    profile.emplace(std::vector{path, folder / "later/on/device.d/"}, folder / "machine");
+    notifier.emplace(*profile, database, center);
+    notifier->start(
+        loop.event(), [] {}, 20ms);
+    std::filesystem::create_directories(folder / "later/on");
+    writeFile(folder / "later/on/device.d/1.toml", watch("A"));
+    EXPECT_THAT(raisedUntil("paired"), ElementsAre("paired"));
+    std::filesystem::rename(folder / "later/on/device.d/1.toml", folder / "later/on/device.d/1.toml.old");
+    EXPECT_THAT(raisedUntil("unpaired"), ElementsAre("unpaired"));
+    writeFile(folder / "elsewhere/x", watch("B"));
+    std::filesystem::create_symlink(folder / "elsewhere/x", folder / "later/on/device.d/2.toml");
+    EXPECT_THAT(raisedUntil("paired"), ElementsAre("paired"));
+    writeFile(folder / "elsewhere/x", watch("C"));
+    EXPECT_THAT(raisedUntil("unpaired"), ElementsAre("paired", "unpaired")) << "edited where the link leads to";
+}
+
 TEST_F(ProfileNotifierTest, GathersAStormOfEdits) {
-    writeFile(path, language("de") + watch("A", "paired = true "));
-    start(100ms);
+    start(language("de") + watch("A", "paired = true "), 100ms);
     std::thread editor([this] {
         const std::string unpaired = language("de") + watch("A", "paired = false"),
                           paired = language("de") + watch("A", "paired = true ");
@@ -126,6 +134,40 @@ TEST_F(ProfileNotifierTest, GathersAStormOfEdits) {
     editor.join();
     writeFile(path, language("es") + watch("A"));
     EXPECT_THAT(raisedUntil("language"), ElementsAre("language")) << "the last edit was not missed";
+}
+
+// The first answers of a start say what is so; what changes after that is a change.
+TEST_F(ProfileNotifierTest, WaitsForWhatServicesTellAndKeepsIt) {
+    const auto begin = [&](const ToldFacts& kept) {
+        writeFile(path, "");
+        profile.emplace(path, folder / "machine");
+        profile->tell(kept);
+        notifier.emplace(*profile, database, center);
+        notifier->holdFor(1h);
+        notifier->start(
+            loop.event(), [] {}, 1ms);
+    };
+    begin({});
+    notifier->compare();
+    EXPECT_FALSE(storedFact(database, stored_facts::language)) << "held";
+    const KnownWatch first{.address = "1", .serialNumber = "W1"}, second{.address = "2", .serialNumber = "W2"};
+    profile->tell({.language = "de_DE", .watches = {first}});
+    notifier->release();
+    notifier->compare();
+    EXPECT_EQ(storedFact(database, stored_facts::language), "de_DE");
+    profile->tell({.language = "de_DE", .watches = {first, second}});
+    notifier->factsChanged();
+    EXPECT_THAT(raisedUntil("paired"), ElementsAre("paired"));
+
+    ToldFacts kept;
+    database.read([&](Connection& connection) { kept = keptFacts(connection, profile->machine().identifier()); });
+    EXPECT_EQ(kept, *profile->told());
+    begin(kept);
+    notifier->release();
+    profile->tell({.language = "de_DE", .watches = {second}});
+    EXPECT_THAT(raisedUntil("unpaired"), ElementsAre("unpaired"));
+    writeFile(path, "watches = []\n");
+    EXPECT_THAT(raisedUntil("unpaired"), ElementsAre("unpaired")) << "the profile has the whole list";
 }
 
 }  // namespace

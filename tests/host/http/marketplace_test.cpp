@@ -1,8 +1,6 @@
 // The Marketplace, the installed applications and the companion's texts, as the device profile names them.
 #include "vrx/host/http/marketplace.h"
 
-#include <gmock/gmock.h>
-
 #include <future>
 
 #include "host/http/loopback_server.h"
@@ -11,9 +9,6 @@
 
 namespace vrx::host {
 namespace {
-
-using ::testing::ElementsAre;
-using ::testing::HasSubstr;
 
 class StoreTest : public ::testing::Test {
 protected:
@@ -44,7 +39,7 @@ protected:
     TemporaryFolder folder;
     std::vector<std::string> asked;
     std::unique_ptr<LoopbackServer> server;
-    Host host{{.home = folder / "home", .profile = folder / "device.toml"}, platform::Level::Error};
+    Host host{{.home = folder / "home", .profile = {folder / "device.toml"}}, platform::Level::Error};
 };
 
 TEST_F(StoreTest, AsksTheAddressesOfTheProfile) {
@@ -53,7 +48,7 @@ TEST_F(StoreTest, AsksTheAddressesOfTheProfile) {
               "purchases": [{"bundleIdentifier": "com.app", "title": "App"}]})");
     const auto items = lookUp();
     ASSERT_TRUE(items);
-    ASSERT_EQ(items->size(), 2U);
+    ASSERT_EQ(items->size(), 1U);
     EXPECT_EQ(items->at(0).displayName, "App");
     EXPECT_EQ(items->at(0).artistName, std::nullopt);
     EXPECT_EQ(items->at(0).artwork.at(1).imageURL, "i");
@@ -74,13 +69,16 @@ TEST_F(StoreTest, WithoutAUsableAnswerNothingIsOfferedOrPurchased) {
         EXPECT_FALSE(lookUp()) << body;
         EXPECT_TRUE(purchases().empty()) << body;
     }
+    start(R"({"items": [5, null], "purchases": [[]]})", "200 OK");
+    EXPECT_TRUE(lookUp()->empty());
+    EXPECT_TRUE(purchases().empty());
 }
 
 TEST_F(StoreTest, AnInstalledAppIsOneWhoseBundleIsBelieved) {
     start("", "200 OK", "[applications]\nfolders = ['" + folder.path() + "/none', '" + folder.path() + "/apps']\n");
     writeFile(folder / "apps/good/bundle.toml", "identifier = 'com.good'\nname = 'Good'\nvendor = 'Ltd.'\n");
     writeFile(folder / "apps/open/bundle.toml", "identifier = 'com.open'\n");
-    std::filesystem::permissions(folder / "apps/open/bundle.toml", std::filesystem::perms::all);
+    folder.setMode("apps/open/bundle.toml", 0777);
     const auto& apps = platform::Platform::current().installedApps();
     EXPECT_TRUE(apps.record("com.good").isInstalled);
     EXPECT_EQ(apps.record("com.good").localizedName, "Good");
