@@ -25,12 +25,16 @@ std::size_t pastTextOrComment(std::string_view document, std::size_t begin) {
     const bool hasLines = document.substr(begin).starts_with(threefold);
     const std::string end = hasLines ? threefold : std::string(1, quote);
     for (std::size_t at = begin + end.size(); at < document.size(); ++at) {
-        if (document[at] == '\\' && quote == '"')
+        if (document[at] == '\\' && quote == '"') {
             ++at;
-        else if (document.substr(at).starts_with(end))
-            return at + end.size();
-        else if (document[at] == '\n' && !hasLines)
+        } else if (document.substr(at).starts_with(end)) {
+            at += end.size();
+            // The last three of up to five quotes end a text of several lines.
+            for (int i = 0; i < 2 && hasLines && document.substr(at).starts_with(quote); ++i) ++at;
             return at;
+        } else if (document[at] == '\n' && !hasLines) {
+            return at;
+        }
     }
     return document.size();
 }

@@ -162,6 +162,9 @@ TEST_F(DeviceProfileTest, AFileThatIsWrongIsReportedOnceWithItsLineAndTheLastGoo
          ":2: account.headers.X-A must be a header's name, and its value "},
         {"[http]\nca_file = 'ca.pem'", ":2: http.ca_file must be an absolute path; "},
         {"[applications]\nfolders = ['apps']", ":2: applications.folders must be a list of absolute paths; "},
+        {"# \u3041 \u00E9\n\u3041 = 1", ":2: "},
+        {"[device]\nname = \"\"\"a \\\u00E9\"\"\"", ":2: "},
+        {"[device]\nname = 0x'\u00E9'", ":2: "},
         {manyKeys.c_str(), ":2: it is nested too deeply; "},
         {manyArrays.c_str(), ":3: it is nested too deeply; "},
         {longFile.c_str(), ":1: it is longer than 65536 bytes; "},
@@ -175,6 +178,10 @@ TEST_F(DeviceProfileTest, AFileThatIsWrongIsReportedOnceWithItsLineAndTheLastGoo
         ASSERT_EQ(log.lines().size(), ++reports) << text;
         EXPECT_THAT(log.lines().back(), StartsWith(path() + complaint));
     }
+    writeFile(path(),
+              "\xEF\xBB\xBF[device]\nname = \"\"\"a\\\"\\\\ \\\n \n \u3041\u00E9\"\"\"\"\"\ncarrier = '\u3000'");
+    EXPECT_EQ(profile.string("UserAssignedDeviceName"), "a\"\\ \u3041\u00E9\"\"");
+    ASSERT_EQ(log.lines().size(), ++reports);
     writeFile(path(), "[device]\nname = 'N'\ncolour = 'red'\n[colours]\n");
     EXPECT_EQ(profile.string("UserAssignedDeviceName"), "N");
     ASSERT_EQ(log.lines().size(), ++reports);
