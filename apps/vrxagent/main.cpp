@@ -3,10 +3,12 @@
 // cleanly, 1 could not start or go on, 2 usage.
 #include <sys/prctl.h>
 #include <systemd/sd-daemon.h>
+#include <unistd.h>
 
 #include <CLI/CLI.hpp>
 #include <cstdio>
 #include <exception>
+#include <filesystem>
 #include <map>
 #include <optional>
 
@@ -14,6 +16,7 @@
 #include "common/manual.h"
 #include "vrx/host/host.h"
 #include "vrx/host/ipc/bundle_lookup.h"
+#include "vrx/host/ipc/host_requests.h"
 #include "vrx/host/ipc/service_listener.h"
 #include "vrx/host/restart.h"
 #include "vrx/platform/log.h"
@@ -25,6 +28,7 @@ namespace {
 using vrx::host::BundleLookup;
 using vrx::host::HomeUse;
 using vrx::host::Host;
+using vrx::host::HostRequests;
 using vrx::host::ServiceListenerFactory;
 using vrx::platform::Level;
 using vrx::platform::MaybeError;
@@ -46,15 +50,27 @@ std::string joined(const std::vector<std::string>& layers) {
     return text;
 }
 
+vrx::wire::Locations absolute(vrx::wire::Locations places) {
+    places.home.path = vrx::apps::absolutePath(places.home.path);
+    places.socket.path = vrx::apps::absolutePath(places.socket.path);
+    for (std::string& layer : places.profile) layer = std::filesystem::absolute(layer);
+    return places;
+}
+
 // Runs the agent. Fills in the hand-over when the agent has to be executed again.
 int serve(const vrx::wire::Locations& places, Level logLevel, std::optional<HandOver>& handOver) {
     // A capability from the service manager is for the agent alone, not for programs that it starts.
     prctl(PR_CAP_AMBIENT, PR_CAP_AMBIENT_CLEAR_ALL, 0, 0, 0);
-    Host host({.home = vrx::apps::absolutePath(places.home.path), .profile = places.profile, .systemBus = ""},
-              logLevel);
+    Host host({.home = places.home.path, .profile = places.profile, .systemBus = ""}, logLevel);
     if (MaybeError error = host.open(HomeUse::Agent)) return cannotStart(error->text);
     BundleLookup bundles([&] { return host.profile().content(); });
-    ServiceListenerFactory factory(host.mainLoop().event(), bundles, host.lifecycle());
+    const HostRequests requests({.process = getpid(),
+                                 .user = getuid(),
+                                 .version = VRX_VERSION,
+                                 .home = host.home(),
+                                 .profile = places.profile,
+                                 .socket = places.socket.path});
+    ServiceListenerFactory factory(host.mainLoop().event(), bundles, host.lifecycle(), {}, &requests);
     if (MaybeError error = factory.open(places.socket.path)) return cannotStart(error->text);
     host.setBundleLookup(&bundles);
     host.setServiceListenerFactory(&factory);
@@ -98,7 +114,7 @@ int main(int argc, char** argv) {
     }
     try {
         std::optional<HandOver> handOver;
-        const int code = serve(vrx::wire::findLocations(places), logLevel, handOver);
+        const int code = serve(absolute(vrx::wire::findLocations(places)), logLevel, handOver);
         if (!handOver) return code;
         restart.execute(argv, std::move(handOver->socket), std::move(handOver->homeLock));
         return cannotStart("cannot execute the agent again");

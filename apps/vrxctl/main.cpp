@@ -2,6 +2,7 @@
 #include <charconv>
 #include <map>
 
+#include "common/agent_place.h"
 #include "common/command_line.h"
 #include "common/progress.h"
 #include "vrx/client/agent_connection.h"
@@ -133,8 +134,8 @@ Outcome outcomeOf(const AgentConnection& agent, const Answer<T>& answer, Show sh
         case Failure::Kind::NotReachable:
             return failed(ExitCode::NotReachable, failure.text,
                           "Is vrxagent running with the socket " + agent.socketPath() +
-                              "? Start it: systemctl --user start vrxagent; or name its socket with --socket. vrxhost "
-                              "doctor tells what is wrong.");
+                              "? Start it: " + unitCommand("start", agent.socketPath()) +
+                              "; or name its socket with --socket. vrxhost doctor tells what is wrong.");
         case Failure::Kind::Refused: return failed(ExitCode::Refused, failure.text, adviceFor(failure.refusal));
         case Failure::Kind::TimedOut:
             return failed(ExitCode::TimedOut, failure.text + ": " + secondsText(agent.timeLimit().count()),

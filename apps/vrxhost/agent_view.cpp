@@ -5,6 +5,7 @@
 #include "vrx/host/home/stored_facts.h"
 #include "vrx/service/register_defaults.h"
 #include "vrxhost/home.h"
+#include "vrxhost/running_agent.h"
 
 namespace vrx::apps {
 
@@ -61,7 +62,8 @@ std::string AgentLocale::preferredLocaleIdentifier() const {
 }
 
 // The platform gets its facilities once all exist. Until then it can only log.
-AgentView::AgentView(const std::string& home, const std::optional<std::string>& profile)
+AgentView::AgentView(const std::string& home, const std::optional<std::string>& profile,
+                     const std::vector<std::string>& usualProfile)
     : home_(home),
       facilities_{.systemLog = &errors_},
       platform_(facilities_),
@@ -71,11 +73,12 @@ AgentView::AgentView(const std::string& home, const std::optional<std::string>& 
       stored_(database_),
       defaults_(stored_),
       followUps_(database_),
-      profile_(agentProfile(database_, profile)),
+      profile_(agentProfile(database_, profile, usualProfile)),
       locale_(profile_, database_),
       accounts_(profile_, home),
       clock_(profile_),
       telephony_(profile_) {
+    judgeAsAgentAt(home);
     vrx_registerDefaults(defaults_);
     defaults_.registerDefaults(*profile_.defaults());
     facilities_ = {.accountStore = &accounts_,
@@ -115,9 +118,10 @@ CommandLine::Verb readOnlyVerb(const wire::LocationOverrides& places,
                                std::shared_ptr<std::optional<std::string>> profile,
                                std::function<Outcome(AgentView&)> verb) {
     return [&places, profile = std::move(profile), verb = std::move(verb)] {
-        const std::string home = absolutePath(wire::findLocations(places).home.path);
+        const wire::Locations found = wire::findAgent(places);
+        const std::string home = absolutePath(found.home.path);
         if (std::optional<Outcome> missing = missingDatabase(home)) return *std::move(missing);
-        AgentView view(home, *profile);
+        AgentView view(home, *profile, found.profile);
         if (MaybeError problem = view.open()) return databaseFailure(*problem, "not-read");
         return verb(view);
     };

@@ -78,8 +78,9 @@ private:
 class AgentView {
 public:
     // The home and everything in it may be missing. The profile is the named one, else the one that the agent noted in
-    // its database.
-    AgentView(const std::string& home, const std::optional<std::string>& profile);
+    // its database, else the usual one.
+    AgentView(const std::string& home, const std::optional<std::string>& profile,
+              const std::vector<std::string>& usualProfile);
 
     // Reads the database from now on, if possible. Until then settings have their registered values, and nothing is
     // pending.

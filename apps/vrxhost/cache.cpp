@@ -89,7 +89,7 @@ void addCacheVerb(CommandLine& line, const wire::LocationOverrides& places) {
     auto options = std::make_shared<Options>();
     CLI::App* verb = line.add(
         "cache", "Shows what is cached for a serial number", inHome(places, Access::ReadOnly, [options](Home& home) {
-            return showCache(home, options->serialNumber, agentProfile(home.database(), options->profile));
+            return showCache(home, options->serialNumber, home.profileLayers(options->profile));
         }));
     verb->add_option("SERIAL", options->serialNumber, "The serial number")->required();
     verb->add_option("--device", options->profile, "The agent's device profile, for the language")->type_name("PATH");

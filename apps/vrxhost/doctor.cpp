@@ -1,5 +1,4 @@
 // vrxhost doctor: checks an agent's surroundings, and says what to do next.
-#include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/un.h>
 #include <unistd.h>
@@ -8,11 +7,9 @@
 #include <cerrno>
 #include <cstring>
 #include <filesystem>
-#include <fstream>
 
+#include "common/agent_place.h"
 #include "vrx/host/activities/machine_conditions.h"
-#include "vrx/host/base/descriptor.h"
-#include "vrx/host/home/home_lock.h"
 #include "vrx/host/ipc/bundle_lookup.h"
 #include "vrx/host/profile/installed_apps.h"
 #include "vrx/platform/defaults_store.h"
@@ -24,6 +21,7 @@
 #include "vrxhost/home.h"
 #include "vrxhost/profile_facts.h"
 #include "vrxhost/reachability.h"
+#include "vrxhost/running_agent.h"
 #include "vrxhost/verbs.h"
 
 namespace vrx::apps {
@@ -37,7 +35,7 @@ using platform::Value;
 
 namespace {
 
-enum class Health : std::uint8_t { Good, Note, Problem, Skipped };
+enum class Health : std::uint8_t { Skipped, Good, Note, Problem };
 
 const char* nameOf(Health health) {
     switch (health) {
@@ -85,25 +83,29 @@ Check skipped(std::string finding) {
 
 class Examination {
 public:
-    Examination(AgentView& view, wire::Locations places, platform::Duration limit)
-        : view_(view), places_(std::move(places)), limit_(limit) {}
+    Examination(AgentView& view, wire::Locations places, RunningAgent agent, platform::Duration limit)
+        : view_(view),
+          places_(std::move(places)),
+          agent_(std::move(agent)),
+          limit_(limit),
+          onlyOthers_(whoElseMayLook(view.home())) {}
 
+    // In the order in which one thing depends on another; what is wrong comes first.
     std::vector<Check> run() {
         add("home", home());
         add("database", database());
-        add("profile", profile());
-        add("device", device());
         add("agent", agent());
         add("socket", socket());
         add("entitlement", entitlement());
+        add("profile", profile());
+        add("network", network());
+        addServers();
         add("account", account());
         add("credential helper", credentialHelper());
-        add("network", network());
-        const Reachability servers = askServers(view_, limit_);
-        add("server version", serverVersion(servers));
-        add("coverage server", coverageServer(servers));
+        add("device", device());
         add("activities", activities());
         add("applications", applications());
+        std::ranges::stable_sort(checks_, std::ranges::greater(), &Check::health);
         return std::move(checks_);
     }
 
@@ -113,11 +115,24 @@ private:
         checks_.push_back(std::move(check));
     }
 
+    // What the agent's settings decide, which stand in its home.
+    void addServers() {
+        if (onlyOthers_) {
+            add("servers", skipped("needs the home"));
+            return;
+        }
+        const Reachability servers = askServers(view_, limit_);
+        add("server version", serverVersion(servers));
+        add("coverage server", coverageServer(servers));
+    }
+
+    std::string startCommand() const { return unitCommand("start", places_.socket.path); }
+
     Check home() const;
     Check database();
     Check profile() const;
     Check device() const;
-    Check agent();
+    Check agent() const;
     Check socket() const;
     Check entitlement() const;
     Check account() const;
@@ -130,25 +145,30 @@ private:
 
     AgentView& view_;
     const wire::Locations places_;
+    const RunningAgent agent_;
     const platform::Duration limit_;
+    const std::optional<std::string> onlyOthers_;  // who may look into the home, when this user may not
     std::vector<Check> checks_;
     bool isDatabaseReadable_ = false;
-    bool isAgentRunning_ = false;
 };
 
 std::string chosen(const wire::Location& place) {
     return place.path + ", by " + place.chosenBy;
 }
 
+bool isSameFile(const std::string& one, const std::string& other) {
+    std::error_code error;
+    return one == other || std::filesystem::equivalent(one, other, error);
+}
+
 Check Examination::home() const {
+    if (onlyOthers_)
+        return note(chosen(places_.home) + ": only " + *onlyOthers_ + " may look into it",
+                    "Run vrxhost as the agent's user or as root, to see what is in the home.");
     struct stat status;
     if (stat(view_.home().c_str(), &status) != 0 || !S_ISDIR(status.st_mode))
         return problem("there is none at " + chosen(places_.home),
                        "Start an agent, which makes it; or name the home of the one that runs with --home.",
-                       ExitCode::NotReachable);
-    if (access(view_.home().c_str(), R_OK | W_OK | X_OK) != 0)
-        return problem(chosen(places_.home) + ": this user may not use it",
-                       "Run vrxhost as the agent's user, number " + std::to_string(status.st_uid) + ".",
                        ExitCode::NotReachable);
     if (const auto open = host::findOpenToOthers(view_.home(), status))
         return problem(open->error.text, "chmod 700 " + view_.home() + ", and chown it to the agent's user.");
@@ -157,6 +177,7 @@ Check Examination::home() const {
 }
 
 Check Examination::database() {
+    if (onlyOthers_) return skipped("needs the home");
     const MaybeError error = view_.open();
     isDatabaseReadable_ = !error;
     if (isDatabaseReadable_) return good("readable, and of this release");
@@ -175,6 +196,10 @@ Check Examination::database() {
 // Mistakes, which keep a whole file from being taken over, come before those in single keys.
 Check Examination::profile() const {
     using Kind = host::ProfileLayers::Problem::Kind;
+    if (onlyOthers_)
+        for (const std::string& file : view_.profile().files())
+            if (access(file.c_str(), R_OK) != 0 && errno == EACCES)
+                return skipped(file + ": this user may not look into it");
     const std::vector<host::ProfileLayers::Problem> problems = view_.profile().problems();
     for (const auto& [kind, advice] :
          {std::pair(Kind::Mistake, "Correct the line; until then the agent goes by what it read before."),
@@ -193,6 +218,7 @@ Check Examination::profile() const {
 
 // Where the facts come from by which servers and people know the device; not the facts.
 Check Examination::device() const {
+    if (onlyOthers_) return skipped("needs the home");
     const auto source = [&](const char* key) { return factInForce(key, view_.profile()).source; };
     const std::string rest = "name: " + source("device.name") + "; model: " + source("device.product_type");
     if (!view_.profile().string("SerialNumber"))
@@ -200,41 +226,46 @@ Check Examination::device() const {
     return good("serial number: " + source("device.serial_number") + "; " + rest);
 }
 
-Check Examination::agent() {
-    isAgentRunning_ = host::HomeLock::isInUse(view_.home());
-    if (isAgentRunning_) return good("one has this home");
-    return problem("none has this home",
-                   "Start it: systemctl --user start vrxagent, or vrxagent with the same --home and --device.",
-                   ExitCode::NotReachable);
+Check Examination::agent() const {
+    using enum RunningAgent::Presence;
+    if (agent_.presence == No)
+        return problem("none has this home",
+                       "Start it: " + startCommand() + ", or vrxagent with the same --home and --device.",
+                       ExitCode::NotReachable);
+    if (agent_.presence == Unknown) return skipped("needs the home");
+    if (agent_.status)
+        return good("release " + agent_.status->version + ", process " + std::to_string(agent_.status->process) +
+                    " of " + userName(static_cast<uid_t>(agent_.status->user)));
+    if (agent_.failure->kind == client::Failure::Kind::TimedOut)
+        return problem("one runs, but does not answer",
+                       "Its log says what it does. Restart it: " + unitCommand("restart", places_.socket.path) + ".",
+                       ExitCode::TimedOut);
+    return good("one runs");
 }
 
-// Whether somebody listens at the path. Does not connect, because a service manager would start an agent.
-bool isListenedAt(const std::string& path) {
-    std::ifstream sockets("/proc/net/unix");
-    constexpr const char* accepting = " 00010000 ";
-    for (std::string line; std::getline(sockets, line);)
-        if (line.ends_with(" " + path) && line.find(accepting) != std::string::npos) return true;
-    return false;
-}
-
-// Connects only when an agent runs: otherwise a service manager would start one.
+// Connects only where an agent has been found: otherwise a service manager would start one.
 Check Examination::socket() const {
     const std::string& path = places_.socket.path;
-    const std::string advice = "Name the agent's socket with --socket, or start an agent.";
-    sockaddr_un address{};
-    address.sun_family = AF_UNIX;
-    if (path.size() >= sizeof address.sun_path)
-        return problem(chosen(places_.socket) + ": the path is too long", "Name a shorter one with --socket.",
+    const std::string place = chosen(places_.socket);
+    const std::string advice = "Name the agent's socket with --socket, or start an agent: " + startCommand() + ".";
+    if (path.size() >= sizeof sockaddr_un{}.sun_path)
+        return problem(place + ": the path is too long", "Name a shorter one with --socket.", ExitCode::NotReachable);
+    if (access(path.c_str(), W_OK) != 0 && errno == EACCES)
+        return problem(place + ": this user may not connect",
+                       "Name another with --socket, or run vrxhost and vrxctl as the agent's user.",
                        ExitCode::NotReachable);
-    if (!isAgentRunning_)
-        return isListenedAt(path)
-                   ? good(chosen(places_.socket) + ": the service manager starts an agent for a client")
-                   : problem(chosen(places_.socket) + ": nobody listens", advice, ExitCode::NotReachable);
-    path.copy(address.sun_path, sizeof address.sun_path - 1);
-    const host::Descriptor client(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
-    if (connect(client.number(), reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0 || errno == EAGAIN)
-        return good(chosen(places_.socket));
-    return problem(chosen(places_.socket) + ": " + std::strerror(errno), advice, ExitCode::NotReachable);
+    if (agent_.status) {
+        if (isSameFile(agent_.status->home, view_.home())) return good(place);
+        return problem(place + ": the agent there has the home " + agent_.status->home,
+                       "Name the socket of this home's agent with --socket, or that home with --home.",
+                       ExitCode::NotReachable);
+    }
+    if (!agent_.failure)
+        return wire::isOnListOfListeners(path)
+                   ? good(place + ": somebody listens, such as a service manager, which starts an agent for a client")
+                   : problem(place + ": nobody listens", advice, ExitCode::NotReachable);
+    if (agent_.failure->kind != client::Failure::Kind::NotReachable) return good(place);
+    return problem(place + ": " + agent_.failure->text, advice, ExitCode::NotReachable);
 }
 
 // Checks the vrxctl that was installed with this program.
@@ -374,10 +405,17 @@ void addDoctorVerb(CommandLine& line, const wire::LocationOverrides& places) {
     };
     auto options = std::make_shared<Options>();
     CLI::App* verb = line.add("doctor", "Checks what an agent needs, and tells what to do next", [&places, options] {
-        const wire::Locations found =
-            wire::findLocations({.home = places.home, .profile = options->profile, .socket = options->socket});
-        AgentView view(absolutePath(found.home.path), options->profile);
-        return report(Examination(view, found, platform::Duration(options->limit)).run());
+        wire::Locations found =
+            wire::findAgent({.home = places.home, .profile = options->profile, .socket = options->socket});
+        const platform::Duration limit(options->limit);
+        found.home.path = absolutePath(found.home.path);
+        if (!options->socket && wire::isHomeOfSystem(found.home.path)) found.socket = wire::systemSocket();
+        RunningAgent agent = findRunningAgent(found, limit);
+        // The system's agent is asked for its home: it may be another than the packaged unit's.
+        if (agent.status && !places.home && whoElseMayLook(found.home.path))
+            found.home = {agent.status->home, "the agent at the socket"};
+        AgentView view(found.home.path, options->profile, agent.status ? agent.status->profile : found.profile);
+        return report(Examination(view, found, std::move(agent), limit).run());
     });
     addProfileOption(verb, options->profile);
     verb->add_option("--socket", options->socket, "The agent's socket")->type_name("PATH");

@@ -75,7 +75,7 @@ void addFireVerb(CommandLine& line, const wire::LocationOverrides& places) {
         inHome(places, Access::ReadWrite, [options](Home& home) { return fire(home, *options); });
     CLI::App* app = line.add("fire", "Fires an activity now, as the system does when it falls due", [&places, verb] {
         // Without an agent the database is not even opened.
-        const std::string home = absolutePath(wire::findLocations(places).home.path);
+        const std::string home = absolutePath(wire::findAgent(places).home.path);
         if (host::HomeLock::isInUse(home)) return verb();
         if (std::optional<Outcome> missing = missingDatabase(home)) return *std::move(missing);
         return failed(ExitCode::NotReachable, "no agent has the home " + home,

@@ -269,7 +269,7 @@ void addFollowUpVerbs(CommandLine& line, const wire::LocationOverrides& places) 
     };
     auto options = std::make_shared<Options>();
     const auto showing = [options, &line](Home& home) {
-        const host::DeviceProfile profile(agentProfile(home.database(), options->profile));
+        const host::DeviceProfile profile(home.profileLayers(options->profile));
         return options->isWatch ? watch(line, home, profile) : list(home, profile).outcome;
     };
     // Watching waits for writers by taking the write lock, so it needs write access.

@@ -8,22 +8,29 @@
 
 #include "vrx/host/home/stored_facts.h"
 #include "vrx/service/register_defaults.h"
+#include "vrxhost/running_agent.h"
 
 namespace vrx::apps {
 
-Home::Home(const std::string& path, Access access)
+Home::Home(const std::string& path, Access access, std::vector<std::string> usualProfile)
     : path_(path),
+      usualProfile_(std::move(usualProfile)),
       files_(path),
       database_(access == Access::ReadOnly ? host::Database::readOnly(databasePath(path))
                                            : host::Database(databasePath(path))) {
+    judgeAsAgentAt(path);
     vrx_registerDefaults(defaults_);
 }
 
 platform::MaybeError Home::open() {
     if (platform::MaybeError error = database_.open()) return error;
-    profile_.emplace(agentProfile(database_, std::nullopt));
+    profile_.emplace(profileLayers(std::nullopt));
     defaults_.setPresets([this] { return profile_->defaults(); });
     return std::nullopt;
+}
+
+std::vector<std::string> Home::profileLayers(const std::optional<std::string>& named) {
+    return agentProfile(database_, named, usualProfile_);
 }
 
 Outcome notReachable(std::string problem) {
@@ -37,10 +44,12 @@ std::optional<Outcome> missingDatabase(const std::string& home) {
     if (stat(database.c_str(), &status) == 0) return std::nullopt;
     const int error = errno;
     if (error == ENOENT) return notReachable("there is no agent's database " + database);
+    if (const auto others = whoElseMayLook(home))
+        return failed(ExitCode::NotReachable, "only " + *others + " may look into the agent's home " + home,
+                      "Run vrxhost as the agent's user or as root, or name another home with --home.");
     return failed(ExitCode::NotReachable,
                   "cannot get at the agent's database " + database + ": " + std::strerror(error),
-                  error == EACCES ? "Run vrxhost as the agent's user, or name another home with --home."
-                                  : "Name the agent's home with --home.");
+                  "Name the agent's home with --home.");
 }
 
 bool isHeldByAnother(const platform::Error& error) {
@@ -54,10 +63,11 @@ Outcome databaseFailure(const platform::Error& error, const char* kind) {
     return failed(ExitCode::NoAnswer, error.text, "vrxhost doctor tells what is wrong, and what to do.", kind);
 }
 
-std::vector<std::string> agentProfile(host::Database& database, const std::optional<std::string>& named) {
-    const std::optional<std::string> told =
-        named ? std::nullopt : host::storedFact(database, host::stored_facts::profile);
-    if (!told) return wire::findLocations({.profile = named}).profile;
+std::vector<std::string> agentProfile(host::Database& database, const std::optional<std::string>& named,
+                                      const std::vector<std::string>& usual) {
+    if (named) return wire::findLocations({.profile = named}).profile;
+    const std::optional<std::string> told = host::storedFact(database, host::stored_facts::profile);
+    if (!told) return usual;
     std::vector<std::string> layers;
     std::istringstream lines(*told);
     for (std::string line; std::getline(lines, line);) layers.push_back(line);
@@ -66,9 +76,10 @@ std::vector<std::string> agentProfile(host::Database& database, const std::optio
 
 CommandLine::Verb inHome(const wire::LocationOverrides& places, Access access, std::function<Outcome(Home&)> verb) {
     return [&places, access, verb = std::move(verb)] {
-        const std::string path = absolutePath(wire::findLocations(places).home.path);
+        const wire::Locations found = wire::findAgent(places);
+        const std::string path = absolutePath(found.home.path);
         if (std::optional<Outcome> missing = missingDatabase(path)) return *std::move(missing);
-        Home home(path, access);
+        Home home(path, access, found.profile);
         if (platform::MaybeError problem = home.open()) return databaseFailure(*problem, "not-read");
         return verb(home);
     };

@@ -25,7 +25,8 @@ enum class Access { ReadOnly, ReadWrite };
 // The home's content, and the platform through which the agent's own classes read it.
 class Home {
 public:
-    Home(const std::string& path, Access access);
+    // The profile's layers are these where the agent has noted none.
+    Home(const std::string& path, Access access, std::vector<std::string> usualProfile);
 
     static std::string databasePath(const std::string& home) { return home + "/host.db"; }
 
@@ -35,6 +36,7 @@ public:
     host::DefaultsStore& defaults() { return defaults_; }
     // The agent's, once the home is open.
     const host::DeviceProfile& profile() const { return *profile_; }
+    std::vector<std::string> profileLayers(const std::optional<std::string>& named);
     // Without the profile's and the registered values.
     const platform::DefaultsStore& stored() const { return stored_; }
     const platform::Files& files() const { return files_; }
@@ -42,6 +44,7 @@ public:
 
 private:
     const std::string path_;
+    const std::vector<std::string> usualProfile_;
     host::SystemLog log_;
     codec::Digest digest_;
     codec::PropertyList propertyList_;
@@ -68,9 +71,9 @@ bool isHeldByAnother(const platform::Error& error);
 // The failure when a database cannot be used. The kind is for errors other than a database that is held.
 Outcome databaseFailure(const platform::Error& error, const char* kind);
 
-// The layers of the device profile: the file that is named, else those that the agent noted, else where an agent would
-// look.
-std::vector<std::string> agentProfile(host::Database& database, const std::optional<std::string>& named);
+// The layers of the device profile: the file that is named, else those that the agent noted, else the usual ones.
+std::vector<std::string> agentProfile(host::Database& database, const std::optional<std::string>& named,
+                                      const std::vector<std::string>& usual);
 
 // A verb that runs in the home, which must exist. The places are read when the verb runs.
 CommandLine::Verb inHome(const wire::LocationOverrides& places, Access access, std::function<Outcome(Home&)> verb);

@@ -45,7 +45,8 @@ void addProfileVerb(CommandLine& line, const wire::LocationOverrides& places) {
     auto device = std::make_shared<std::optional<std::string>>();
     CLI::App* verb =
         line.add("profile", "Shows every key of the device profile, and where its value comes from", [&places, device] {
-            AgentView view(absolutePath(wire::findLocations(places).home.path), *device);
+            const wire::Locations found = wire::findAgent(places);
+            AgentView view(absolutePath(found.home.path), *device, found.profile);
             return showProfile(view);
         });
     addProfileOption(verb, *device);

@@ -93,12 +93,13 @@ int AgentBus::authenticate(Deadline deadline) {
 }
 
 // Order: authenticate, append, send. The first failure ends the call; a refused argument never reaches the agent.
-CallResult AgentBus::call(const wire::Operation& operation, const CallArguments& arguments, Deadline deadline) {
+CallResult AgentBus::call(const wire::Operation& operation, const CallArguments& arguments, Deadline deadline,
+                          const wire::Interface& interface) {
     BusError error;
     if (int r = authenticate(deadline); r < 0) return failed(r, error);
 
     sd_bus_message* message = nullptr;
-    int r = sd_bus_message_new_method_call(bus_, &message, wire::serviceName, wire::objectPath, wire::interfaceName,
+    int r = sd_bus_message_new_method_call(bus_, &message, wire::serviceName, interface.path, interface.name,
                                            operation.member);
     const MessagePointer call(message);
     if (r >= 0) r = appendArguments(message, operation.signature, arguments);

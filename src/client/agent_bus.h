@@ -42,7 +42,8 @@ public:
     platform::MaybeError open(const std::string& socketPath, Deadline deadline);
 
     // Returns the archived root of the operation's reply. After any other result the connection is useless.
-    CallResult call(const wire::Operation& operation, const CallArguments& arguments, Deadline deadline);
+    CallResult call(const wire::Operation& operation, const CallArguments& arguments, Deadline deadline,
+                    const wire::Interface& interface = wire::agentInterface);
 
     // Ends the connection and the call under way.
     void interrupt() const;

@@ -77,7 +77,7 @@ public:
     Implementation(ConnectionOptions options, FailureHandler failureHandler)
         : timeLimit_(options.timeLimit),
           failureHandler_(std::move(failureHandler)),
-          pool_(options.socketPath.empty() ? wire::findLocations().socket.path : std::move(options.socketPath),
+          pool_(options.socketPath.empty() ? wire::findAgent().socket.path : std::move(options.socketPath),
                 options.connections),
           workers_(options.connections) {
         installPlatformIfNone();

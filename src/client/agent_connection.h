@@ -76,7 +76,7 @@ private:
 };
 
 struct ConnectionOptions {
-    std::string socketPath = {};          // empty: the one of wire::findLocations()
+    std::string socketPath = {};          // empty: that of wire::findAgent(), once
     platform::Duration timeLimit{420.0};  // the limit of a call; longer than any download of the agent
     std::size_t connections = 8;
 };

@@ -1,8 +1,11 @@
-// The names of the agent's service on the wire. It speaks D-Bus's protocol peer to peer over a Unix stream socket: one
-// object with one interface, whose members are the operations of VRXAgentProtocol by their first keyword.
+// The names of the agent's service on the wire. It speaks D-Bus's protocol peer to peer over a Unix stream socket: an
+// object with the agent's interface, whose members are the operations of VRXAgentProtocol by their first keyword; and
+// one with the host's, which tells of the process that runs the agent.
 #pragma once
 
 #include <array>
+#include <optional>
+#include <span>
 #include <string_view>
 
 #include "vrx/platform/vendor.h"
@@ -55,6 +58,27 @@ inline constexpr std::array<Operation, 10> operations{{
 constexpr const Operation& operation(OperationIndex index) {
     return operations[static_cast<std::size_t>(index)];
 }
+
+// Null for an operation that is not the agent's.
+constexpr std::optional<OperationIndex> indexOf(const Operation& operation) {
+    for (std::size_t i = 0; i < operations.size(); ++i)
+        if (&operations[i] == &operation) return static_cast<OperationIndex>(i);
+    return std::nullopt;
+}
+
+struct Interface {
+    const char* path;  // of its object
+    const char* name;
+    std::span<const Operation> operations;
+};
+
+inline constexpr Interface agentInterface{objectPath, interfaceName, operations};
+
+// Answers at once, and touches neither a record nor a follow-up.
+inline constexpr std::array<Operation, 1> hostOperations{{{"status", "", "reply\0"}}};
+inline constexpr const Operation& statusOperation = hostOperations[0];
+inline constexpr Interface hostInterface{"/com/orvane/host", "com.orvane.AgentHost", hostOperations};
+static_assert(std::string_view(hostInterface.name).starts_with(platform::vendorPrefix));
 
 // Names of errors: the bus's own where one fits.
 inline constexpr const char* accessDenied = "org.freedesktop.DBus.Error.AccessDenied";      // not entitled

@@ -189,6 +189,22 @@ TEST_F(Explanations, FindWhatIsWrongAndWriteNothing) {
     std::filesystem::remove(place_ / "coverage/ServerVersion.plist");
     expectFirstProblem(1, "server version");
 
+    // The agent at the socket is asked who it is; one that does not answer comes before all else.
+    host::HomeLock lock;
+    host::Database database(place_ / "other/host.db");
+    ASSERT_FALSE(lock.take(place_ / "other") || database.open());
+    const auto doctor = [&](const std::string& home) {
+        return place_.run(place_ / "app/vrxhost", {"--home", place_ / home, "doctor", "--socket", place_ / "socket",
+                                                   "--timeout", "0.5", "--json"});
+    };
+    EXPECT_NE(doctor("other").errors.find("socket: " + (place_ / "socket")), std::string::npos);
+    EXPECT_NE(doctor("other").errors.find("has the home " + (place_ / "home")), std::string::npos);
+    place_.agent().signal(SIGSTOP);
+    const Place::Outcome stopped = doctor("home");
+    place_.agent().signal(SIGCONT);
+    EXPECT_EQ(stopped.code, 5) << stopped.errors;
+    EXPECT_EQ(stopped.document["checks"].asArray()->front()["name"], Value("agent")) << stopped.output;
+
     ASSERT_EQ(place_.stop(), 0) << place_.agent().errors();
     expectFirstProblem(3, "agent");
     place_.write("home/host.db", std::string(8192, 'x'));

@@ -45,6 +45,7 @@ Process::Process(const std::string& folder, const std::string& program, const Ar
     }
     words.insert(words.end(), arguments.begin(), arguments.end());
     variables.emplace_back("DBUS_SYSTEM_BUS_ADDRESS=unix:path=/nowhere/bus");  // whatever this machine has
+    variables.emplace_back("VRXAGENT_SOCKET=" + folder + "/socket");
     for (char** variable = environ; *variable; ++variable) variables.emplace_back(*variable);
     EXPECT_EQ(posix_spawn(&pid_, words.front().c_str(), &actions, nullptr, pointers(words).data(),
                           pointers(variables).data()),

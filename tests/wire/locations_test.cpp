@@ -16,14 +16,21 @@ const std::string bareHome = "/home/ada/.local/state/vrxagent";
 struct Machine {
     std::map<std::string, std::string> variables{{"HOME", "/home/ada"}};
     std::set<std::string> files;
+    std::set<std::string> listeners;
 
-    Locations find(const LocationOverrides& overrides = {}) const {
-        return findLocations(overrides, {[this](const char* name) -> std::optional<std::string> {
-                                             auto entry = variables.find(name);
-                                             return entry == variables.end() ? std::nullopt
-                                                                             : std::optional(entry->second);
-                                         },
-                                         [this](const std::string& path) { return files.contains(path); }});
+    Surroundings surroundings() const {
+        return {[this](const char* name) -> std::optional<std::string> {
+                    auto entry = variables.find(name);
+                    return entry == variables.end() ? std::nullopt : std::optional(entry->second);
+                },
+                [this](const std::string& path) { return files.contains(path) || listeners.contains(path); },
+                [this](const std::string& socket) { return listeners.contains(socket); }};
+    }
+    Locations find(const LocationOverrides& overrides = {}) const { return findLocations(overrides, surroundings()); }
+    // The socket and the home of the agent that is meant.
+    std::pair<std::string, std::string> agent(const LocationOverrides& overrides = {}) const {
+        const Locations found = findAgent(overrides, surroundings());
+        return {found.socket.path, found.home.path};
     }
 };
 
@@ -54,6 +61,30 @@ TEST(Locations, GoFromTheCommandLineToTheBareMachine) {
     EXPECT_EQ(chosen.home.path + chosen.socket.path, "hs");
     EXPECT_THAT(chosen.profile, ElementsAre("p")) << "the only layer";
     EXPECT_EQ(machine.find({.home = "h"}).socket.path, "/run/user/7/com.orvane.vrxagent");
+}
+
+TEST(Locations, OfTheAgentThatIsMeantDependOnWhoListens) {
+    const std::string usersSocket = "/run/user/7/com.orvane.vrxagent", systemsSocket = systemSocket().path;
+    const std::string systemsHome = "/var/lib/vrxagent";
+    Machine machine;
+    machine.variables["XDG_RUNTIME_DIR"] = "/run/user/7";
+    machine.variables["XDG_CONFIG_HOME"] = "/config";
+    EXPECT_EQ(machine.agent(), std::pair(usersSocket, bareHome));
+    machine.files = {usersSocket, systemsSocket, bareHome};  // nobody listens
+    EXPECT_EQ(machine.agent(), std::pair(usersSocket, bareHome));
+    machine.listeners = {systemsSocket};
+    EXPECT_EQ(machine.agent(), std::pair(systemsSocket, systemsHome));
+    EXPECT_EQ(findAgent({}, machine.surroundings()).profile.back(), "/run/vrxagent/device.d/") << "not the user's own";
+    EXPECT_EQ(machine.agent({.home = "h"}), std::pair(systemsSocket, std::string("h")));
+    machine.listeners.insert(usersSocket);
+    EXPECT_EQ(machine.agent(), std::pair(usersSocket, bareHome));
+    EXPECT_EQ(findAgent({}, machine.surroundings()).profile.back(), "/config/vrxagent/device.d/");
+    machine.variables["VRXAGENT_SOCKET"] = "/named";
+    EXPECT_EQ(machine.agent(), std::pair(std::string("/named"), bareHome));
+    EXPECT_EQ(machine.find().socket.path, usersSocket) << "an agent listens at its own place";
+    EXPECT_EQ(machine.agent({.socket = systemsSocket}), std::pair(systemsSocket, systemsHome));
+    machine.files = {systemsHome};
+    EXPECT_EQ(machine.agent().second, systemsHome) << "there is none of the user's";
 }
 
 TEST(Locations, PassOverVariablesThatAreNoPath) {

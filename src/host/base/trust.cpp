@@ -14,10 +14,12 @@ using platform::Error;
 
 namespace {
 
+std::optional<uid_t> agentUser;
+
 constexpr int mostLinks = 40;
 
 bool isOwnedByOthers(const struct stat& status) {
-    return status.st_uid != 0 && status.st_uid != geteuid();
+    return status.st_uid != 0 && status.st_uid != agentUser.value_or(geteuid());
 }
 
 OpenToOthers openToOthers(const std::string& path) {
@@ -68,6 +70,10 @@ std::optional<OpenToOthers> findOpenToOthers(const std::string& path, Links link
         rest.insert(std::next(rest.begin()), target.begin(), target.end());
     }
     return std::nullopt;
+}
+
+void judgeAsAgentOf(uid_t user) {
+    agentUser = user;
 }
 
 }  // namespace vrx::host

@@ -24,22 +24,20 @@ constexpr std::size_t muchBytes = 1024 * 1024;
 }  // namespace
 
 ClientSession::ClientSession(Descriptor socket, const PeerIdentity& peer, std::shared_ptr<VRXAgentProtocol> agent,
-                             std::shared_ptr<ReplyBox> box, const ServiceLimits& limits, RequestLine& line,
-                             ProcessLifecycle& lifecycle)
+                             std::shared_ptr<ReplyBox> box, const SessionSurroundings& surroundings)
     : peer_(peer),
       agent_(std::move(agent)),
       box_(std::move(box)),
-      limits_(limits),
-      line_(line),
+      limits_(surroundings.limits),
+      line_(surroundings.line),
       waiter_{peer.user(), [box = box_] { box->wake(); }},
-      lifecycle_(lifecycle),
-      authenticationEnd_(std::chrono::steady_clock::now() + limits.authentication),
-      work_(lifecycle.beginWorkUnlessEnding()),
+      lifecycle_(surroundings.lifecycle),
+      host_(surroundings.host),
+      authenticationEnd_(std::chrono::steady_clock::now() + limits_.authentication),
+      work_(lifecycle_.beginWorkUnlessEnding()),
       bus_(std::move(socket), peer.processIdentifier()) {
-    for (std::size_t i = 0; i < methods_.size(); ++i) methods_[i] = {this, static_cast<wire::OperationIndex>(i)};
-    if (bus_.bus())
-        sd_bus_add_object_vtable(bus_.bus(), nullptr, wire::objectPath, wire::interfaceName, methodTable().data(),
-                                 methods_.data());
+    serveInterface<wire::agentInterface>(agentMethods_);
+    if (host_) serveInterface<wire::hostInterface>(hostMethods_);
     box_->open(*this);
 }
 
@@ -49,26 +47,31 @@ ClientSession::~ClientSession() {
     line_.changeUnsent(unsentBytes_, 0);
 }
 
-// One row for each operation; its offset selects the operation's place among `methods_`.
-const std::vector<sd_bus_vtable>& ClientSession::methodTable() {
-    static const std::vector<sd_bus_vtable> table = [] {
-        std::vector<sd_bus_vtable> rows{SD_BUS_VTABLE_START(0)};
-        for (const wire::Operation& operation : wire::operations) {
-            sd_bus_vtable row{};
-            row.type = _SD_BUS_VTABLE_METHOD;
-            row.flags = SD_BUS_VTABLE_UNPRIVILEGED;
-            row.x.method.member = operation.member;
-            row.x.method.signature = operation.signature;
-            row.x.method.result = wire::replySignature;
-            row.x.method.handler = onCall;
-            row.x.method.offset = sizeof(Method) * (rows.size() - 1);
-            row.x.method.names = operation.argumentNames;
-            rows.push_back(row);
-        }
-        rows.push_back(SD_BUS_VTABLE_END);
-        return rows;
-    }();
-    return table;
+template <const wire::Interface& interface>
+void ClientSession::serveInterface(std::array<Method, interface.operations.size()>& methods) {
+    static const std::vector<sd_bus_vtable> table = methodTable(interface);  // the bus keeps no copy
+    for (std::size_t i = 0; i < methods.size(); ++i) methods[i] = {this, &interface.operations[i]};
+    if (bus_.bus())
+        sd_bus_add_object_vtable(bus_.bus(), nullptr, interface.path, interface.name, table.data(), methods.data());
+}
+
+// One row for each operation; its offset selects the operation's place among the methods.
+std::vector<sd_bus_vtable> ClientSession::methodTable(const wire::Interface& interface) {
+    std::vector<sd_bus_vtable> rows{SD_BUS_VTABLE_START(0)};
+    for (const wire::Operation& operation : interface.operations) {
+        sd_bus_vtable row{};
+        row.type = _SD_BUS_VTABLE_METHOD;
+        row.flags = SD_BUS_VTABLE_UNPRIVILEGED;
+        row.x.method.member = operation.member;
+        row.x.method.signature = operation.signature;
+        row.x.method.result = wire::replySignature;
+        row.x.method.handler = onCall;
+        row.x.method.offset = sizeof(Method) * (rows.size() - 1);
+        row.x.method.names = operation.argumentNames;
+        rows.push_back(row);
+    }
+    rows.push_back(SD_BUS_VTABLE_END);
+    return rows;
 }
 
 void ClientSession::serve(SessionState& state) {
@@ -106,9 +109,15 @@ void ClientSession::performWaiting() {
         auto [number, operation, arguments] = std::move(waiting_.front());
         waiting_.pop_front();
         const RequesterScope scope(peer_.user());
-        performRequest(*agent_, operation, std::move(arguments),
-                       PendingReply(box_, number, agent_, {work_, std::move(place)}));
+        perform(*operation, std::move(arguments), PendingReply(box_, number, agent_, {work_, std::move(place)}));
     }
+}
+
+void ClientSession::perform(const wire::Operation& operation, RequestArguments arguments, PendingReply reply) {
+    if (const auto index = wire::indexOf(operation))
+        performRequest(*agent_, *index, std::move(arguments), std::move(reply));
+    else
+        reply.send(host_->answer(operation));
 }
 
 // The bus tells how many messages it has not sent, not how large they are. Others than replies are small.
@@ -138,11 +147,11 @@ bool ClientSession::waitUntilReady() const {
 
 int ClientSession::onCall(sd_bus_message* call, void* method, sd_bus_error* error) {
     const auto& [session, operation] = *static_cast<const Method*>(method);
-    return session->handle(call, operation, error);
+    return session->handle(call, *operation, error);
 }
 
 // The peer may have executed another program since it was accepted: checked before each request.
-int ClientSession::handle(sd_bus_message* call, wire::OperationIndex operation, sd_bus_error* error) {
+int ClientSession::handle(sd_bus_message* call, const wire::Operation& operation, sd_bus_error* error) {
     if (!peer_.runsSameProgram()) {
         log(Level::Error, "Dropping connection from %d: it runs another program now", peer_.processIdentifier());
         isCutOff_ = true;
@@ -155,12 +164,11 @@ int ClientSession::handle(sd_bus_message* call, wire::OperationIndex operation, 
         return sd_bus_error_setf(error, wire::limitsExceeded, "more than %zu requests of this connection are open",
                                  limits_.requestsPerConnection);
     }
-    platform::Result<RequestArguments> arguments =
-        readArguments(call, bus_.body(), bus_.byteOrder(), wire::operation(operation));
+    platform::Result<RequestArguments> arguments = readArguments(call, bus_.body(), bus_.byteOrder(), operation);
     if (!arguments) return sd_bus_error_set(error, wire::invalidArguments, arguments.error().text.c_str());
     const RequestNumber request = ++lastRequest_;
     openCalls_.emplace(request, MessagePointer(sd_bus_message_ref(call)));
-    waiting_.push_back({request, operation, std::move(arguments).value()});
+    waiting_.push_back({request, &operation, std::move(arguments).value()});
     return 1;
 }
 

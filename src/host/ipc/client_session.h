@@ -15,6 +15,7 @@
 #include <unordered_map>
 
 #include "vrx/host/ipc/agent_requests.h"
+#include "vrx/host/ipc/host_requests.h"
 #include "vrx/host/ipc/peer_identity.h"
 #include "vrx/host/ipc/reply_box.h"
 #include "vrx/host/ipc/request_line.h"
@@ -36,11 +37,18 @@ struct SessionState {
     std::atomic<std::chrono::steady_clock::rep> idleSince = 0;
 };
 
+// What the sessions of one service share.
+struct SessionSurroundings {
+    const ServiceLimits& limits;
+    RequestLine& line;
+    ProcessLifecycle& lifecycle;
+    const HostRequests* host;  // null where the host answers nothing
+};
+
 class ClientSession final : public ReplySender {
 public:
     ClientSession(Descriptor socket, const PeerIdentity& peer, std::shared_ptr<VRXAgentProtocol> agent,
-                  std::shared_ptr<ReplyBox> box, const ServiceLimits& limits, RequestLine& line,
-                  ProcessLifecycle& lifecycle);
+                  std::shared_ptr<ReplyBox> box, const SessionSurroundings& surroundings);
     ~ClientSession() override;
 
     // The session has work in flight while the socket is read or closed.
@@ -49,14 +57,17 @@ public:
     void send(const RequestReply& reply) override;
 
 private:
-    // The handler's argument: an operation's own place among `methods_`.
+    // The handler's argument: an operation's own place among the interface's.
     struct Method {
         ClientSession* session;
-        wire::OperationIndex operation;
+        const wire::Operation* operation;
     };
-    static const std::vector<sd_bus_vtable>& methodTable();
+    template <const wire::Interface& interface>
+    void serveInterface(std::array<Method, interface.operations.size()>& methods);
+    static std::vector<sd_bus_vtable> methodTable(const wire::Interface& interface);
     static int onCall(sd_bus_message* call, void* method, sd_bus_error* error);
-    int handle(sd_bus_message* call, wire::OperationIndex operation, sd_bus_error* error);
+    int handle(sd_bus_message* call, const wire::Operation& operation, sd_bus_error* error);
+    void perform(const wire::Operation& operation, RequestArguments arguments, PendingReply reply);
     void performWaiting();
     void countUnsent();
     bool isIdle() const { return openCalls_.empty() && bus_.unsentMessages() == 0; }
@@ -65,7 +76,7 @@ private:
 
     struct Waiting {
         RequestNumber number;
-        wire::OperationIndex operation;
+        const wire::Operation* operation;
         RequestArguments arguments;
     };
 
@@ -76,9 +87,11 @@ private:
     RequestLine& line_;
     RequestLine::Waiter waiter_;
     ProcessLifecycle& lifecycle_;
+    const HostRequests* const host_;
     const std::chrono::steady_clock::time_point authenticationEnd_;
     platform::WorkInFlight work_;  // outlives the bus
-    std::array<Method, wire::operations.size()> methods_;
+    std::array<Method, wire::operations.size()> agentMethods_;
+    std::array<Method, wire::hostOperations.size()> hostMethods_;
     ServerBus bus_;
     RequestNumber lastRequest_ = 0;
     std::unordered_map<RequestNumber, wire::MessagePointer> openCalls_;

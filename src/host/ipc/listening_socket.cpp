@@ -12,6 +12,7 @@
 #include <optional>
 
 #include "vrx/host/base/files.h"
+#include "vrx/wire/locations.h"
 
 namespace vrx::host {
 
@@ -99,7 +100,7 @@ PassedSocket ListeningSocket::release() {
 // Prepares the socket under a second name and renames it, so that whoever finds it at the path can connect, and it
 // never shows with a wrong mode.
 MaybeError ListeningSocket::bind(const std::string& path) {
-    const std::string newPath = path + ".new";
+    const std::string newPath = path + wire::newSocketEnding;
     const std::optional<sockaddr_un> address = addressOf(path);
     const std::optional<sockaddr_un> newAddress = addressOf(newPath);
     if (!address || !newAddress) return systemError("listen at", path, ENAMETOOLONG);

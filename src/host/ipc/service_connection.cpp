@@ -14,14 +14,11 @@ namespace vrx::host {
 using platform::Value;
 
 ServiceConnection::ServiceConnection(Descriptor&& socket, PeerIdentity&& peer, const BundleLookup& bundles,
-                                     const ServiceLimits& limits, RequestLine& line, ProcessLifecycle& lifecycle,
-                                     std::function<void()> onEnd)
+                                     const SessionSurroundings& surroundings, std::function<void()> onEnd)
     : socket_(std::move(socket)),
       peer_(std::move(peer)),
       bundles_(bundles),
-      limits_(limits),
-      line_(line),
-      lifecycle_(lifecycle),
+      surroundings_(surroundings),
       onEnd_(std::move(onEnd)) {}
 
 ServiceConnection::~ServiceConnection() {
@@ -66,7 +63,7 @@ void ServiceConnection::start() {
 void ServiceConnection::serve() {
     pthread_setname_np(pthread_self(), "connection");
     {
-        ClientSession session(std::move(socket_), peer_, std::move(object_), box_, limits_, line_, lifecycle_);
+        ClientSession session(std::move(socket_), peer_, std::move(object_), box_, surroundings_);
         session.serve(state_);
         servedSocket_ = -1;  // before the session closes it
     }

@@ -14,8 +14,6 @@
 #include "vrx/host/ipc/client_session.h"
 #include "vrx/host/ipc/peer_identity.h"
 #include "vrx/host/ipc/reply_box.h"
-#include "vrx/host/ipc/service_limits.h"
-#include "vrx/host/loop/process_lifecycle.h"
 #include "vrx/platform/service_listener.h"
 
 namespace vrx::host {
@@ -24,8 +22,7 @@ class ServiceConnection final : public platform::ServiceConnection {
 public:
     // Calls onEnd on the connection's thread when it has ended. Takes the socket only if it does not throw.
     ServiceConnection(Descriptor&& socket, PeerIdentity&& peer, const BundleLookup& bundles,
-                      const ServiceLimits& limits, RequestLine& line, ProcessLifecycle& lifecycle,
-                      std::function<void()> onEnd);
+                      const SessionSurroundings& surroundings, std::function<void()> onEnd);
     // Ends the connection. Waits for a running operation to return; its reply is dropped.
     ~ServiceConnection() override;
 
@@ -66,9 +63,7 @@ private:
     Descriptor socket_;
     const PeerIdentity peer_;
     const BundleLookup& bundles_;
-    const ServiceLimits& limits_;
-    RequestLine& line_;
-    ProcessLifecycle& lifecycle_;
+    const SessionSurroundings& surroundings_;
     const std::function<void()> onEnd_;
     mutable std::string missingEntitlement_;
     std::shared_ptr<VRXAgentProtocol> object_;

@@ -28,7 +28,7 @@ using platform::Result;
 class ServiceListenerFactory::Listener final : public platform::ServiceListener {
 public:
     Listener(sd_event* loop, int socket, const BundleLookup& bundles, ProcessLifecycle& lifecycle,
-             const ServiceLimits& limits)
+             const ServiceLimits& limits, const HostRequests* host)
         : loop_(loop),
           socket_(socket),
           bundles_(bundles),
@@ -37,6 +37,7 @@ public:
           refusals_(limits),
           endedFile_(makeEventFile()),
           line_(limits),
+          surroundings_{limits, line_, lifecycle, host},
           restTimer_(addBootTimer(loop, onRested, this)) {
         endedSource_ = addReadSource(loop_, endedFile_.number(), onEnded, this);
         lifecycle_.setUnreadQuestion([this] { return readLast(); });
@@ -114,9 +115,9 @@ private:
         const ucred credentials = peer->credentials();
         std::unique_ptr<ServiceConnection> connection;
         try {
-            connection = std::make_unique<ServiceConnection>(std::move(client), std::move(peer).value(), bundles_,
-                                                             limits_, line_, lifecycle_,
-                                                             [this] { eventfd_write(endedFile_.number(), 1); });
+            connection =
+                std::make_unique<ServiceConnection>(std::move(client), std::move(peer).value(), bundles_, surroundings_,
+                                                    [this] { eventfd_write(endedFile_.number(), 1); });
             const BundleLookup::Acceptance acceptance(connection->peer());
             if (!delegate_->shouldAcceptNewConnection(*this, *connection) || !connection->isResumed())
                 return refusals_.refuse(connection->takeSocket(), credentials, wire::accessDenied,
@@ -175,6 +176,7 @@ private:
     Refusals refusals_;
     const Descriptor endedFile_;
     RequestLine line_;
+    const SessionSurroundings surroundings_;
     RepeatedLine shortage_;
     RepeatedLine turnedAway_;
     std::list<std::unique_ptr<ServiceConnection>> connections_;
@@ -184,7 +186,7 @@ private:
 };
 
 std::unique_ptr<platform::ServiceListener> ServiceListenerFactory::makeListener(std::string /*serviceName*/) {
-    return std::make_unique<Listener>(loop_, socket_.number(), bundles_, lifecycle_, limits_);
+    return std::make_unique<Listener>(loop_, socket_.number(), bundles_, lifecycle_, limits_, host_);
 }
 
 }  // namespace vrx::host

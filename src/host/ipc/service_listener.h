@@ -15,6 +15,7 @@
 #include <string>
 
 #include "vrx/host/ipc/bundle_lookup.h"
+#include "vrx/host/ipc/host_requests.h"
 #include "vrx/host/ipc/listening_socket.h"
 #include "vrx/host/ipc/service_limits.h"
 #include "vrx/host/loop/process_lifecycle.h"
@@ -25,10 +26,11 @@ namespace vrx::host {
 
 class ServiceListenerFactory final : public platform::ServiceListenerFactory {
 public:
-    // The event loop, the lookup and the lifecycle must outlive the factory, and the factory its listeners.
+    // The event loop, the lookup and the lifecycle must outlive the factory, and the factory its listeners. So must
+    // what the host answers, where it answers.
     ServiceListenerFactory(sd_event* loop, const BundleLookup& bundles, ProcessLifecycle& lifecycle,
-                           const ServiceLimits& limits = {})
-        : loop_(loop), bundles_(bundles), lifecycle_(lifecycle), limits_(limits) {}
+                           const ServiceLimits& limits = {}, const HostRequests* host = nullptr)
+        : loop_(loop), bundles_(bundles), lifecycle_(lifecycle), limits_(limits), host_(host) {}
 
     // Takes the socket that the service manager passed, else binds one at the path. Clients can connect from now on and
     // wait until the listener is resumed. An error's text is for people.
@@ -48,6 +50,7 @@ private:
     const BundleLookup& bundles_;
     ProcessLifecycle& lifecycle_;
     const ServiceLimits limits_;
+    const HostRequests* const host_;
     ListeningSocket socket_;
 };
 
