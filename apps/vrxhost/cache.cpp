@@ -87,10 +87,10 @@ void addCacheVerb(CommandLine& line, const wire::LocationOverrides& places) {
         std::optional<std::string> profile;
     };
     auto options = std::make_shared<Options>();
-    CLI::App* verb = line.add(
-        "cache", "Shows what is cached for a serial number", inHome(places, Access::ReadOnly, [options](Home& home) {
-            return showCache(home, options->serialNumber, home.profileLayers(options->profile));
-        }));
+    CLI::App* verb = line.add("cache", "Shows what is cached for a serial number",
+                              inHome(places, Access::ReadOnly, [options](Home& home) {
+                                  return showCache(home, options->serialNumber, home.profileLayers(options->profile));
+                              }));
     verb->add_option("SERIAL", options->serialNumber, "The serial number")->required();
     verb->add_option("--device", options->profile, "The agent's device profile, for the language")->type_name("PATH");
 }

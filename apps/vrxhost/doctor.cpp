@@ -9,7 +9,6 @@
 #include <filesystem>
 
 #include "common/agent_place.h"
-#include "vrx/host/activities/machine_conditions.h"
 #include "vrx/host/ipc/bundle_lookup.h"
 #include "vrx/host/profile/installed_apps.h"
 #include "vrx/platform/defaults_store.h"
@@ -19,6 +18,7 @@
 #include "vrxhost/agent_activities.h"
 #include "vrxhost/agent_view.h"
 #include "vrxhost/home.h"
+#include "vrxhost/machine_situation.h"
 #include "vrxhost/profile_facts.h"
 #include "vrxhost/reachability.h"
 #include "vrxhost/running_agent.h"
@@ -54,16 +54,6 @@ struct Check {
     std::string advice{};
     ExitCode code = ExitCode::NoAnswer;  // when it is the first problem
 };
-
-// Who says whether there is a network.
-std::string networkJudge(const host::MachineServices& services) {
-    constexpr const char* names[] = {"", "none", "portal", "limited", "full"};
-    const host::Connectivity connectivity = services.connectivity();
-    if (connectivity == host::Connectivity::Unknown) return "by the machine's routes";
-    const bool isChecked = services.isConnectivityChecked().value_or(true);
-    return std::string("by NetworkManager (") + names[static_cast<std::size_t>(connectivity)] +
-           (isChecked ? ")" : ", which does not check it)");
-}
 
 Check good(std::string finding) {
     return {"", Health::Good, std::move(finding)};
@@ -103,6 +93,7 @@ public:
         add("account", account());
         add("credential helper", credentialHelper());
         add("device", device());
+        add("watches", watches());
         add("activities", activities());
         add("applications", applications());
         std::ranges::stable_sort(checks_, std::ranges::greater(), &Check::health);
@@ -132,6 +123,7 @@ private:
     Check database();
     Check profile() const;
     Check device() const;
+    Check watches() const;
     Check agent() const;
     Check socket() const;
     Check entitlement() const;
@@ -219,11 +211,25 @@ Check Examination::profile() const {
 // Where the facts come from by which servers and people know the device; not the facts.
 Check Examination::device() const {
     if (onlyOthers_) return skipped("needs the home");
-    const auto source = [&](const char* key) { return factInForce(key, view_.profile()).source; };
+    const auto source = [&](const char* key) { return factInForce(key, view_.profile(), {}).source; };
     const std::string rest = "name: " + source("device.name") + "; model: " + source("device.product_type");
     if (!view_.profile().string("SerialNumber"))
         return note("no serial number; " + rest, "Name one in the profile: [device] serial_number = \"…\".");
     return good("serial number: " + source("device.serial_number") + "; " + rest);
+}
+
+// A watch tells its serial number over the air, and some never do.
+Check Examination::watches() const {
+    if (onlyOthers_) return skipped("needs the home");
+    if (view_.profile().content()->hasWatches) return good("by the profile");
+    std::string silent;
+    for (const host::KnownWatch& watch : view_.profile().told()->watches)
+        if (!watch.serialNumber) silent += (silent.empty() ? "" : ", ") + watch.name;
+    if (!silent.empty())
+        return note("never told a serial number, and so not reported: " + silent,
+                    "Connect it once; where it has none to tell, name the watches in the profile: [[watches]].");
+    const std::size_t count = view_.profile().told()->watches.size();
+    return good(count == 0 ? "none is paired" : std::to_string(count) + " told by BlueZ");
 }
 
 Check Examination::agent() const {
@@ -321,15 +327,10 @@ Check Examination::credentialHelper() const {
 }
 
 Check Examination::network() const {
-    const host::EventLoop loop = host::makeEventLoop();
-    host::MachineServices services(loop.get());
-    const auto content = view_.profile().content();
-    const bool isOverridden = content->networkAvailable.has_value();
-    if (!isOverridden && content->usesSystemBus) services.waitForNetwork(std::chrono::seconds(1));
-    const std::string by = isOverridden ? "by the profile" : networkJudge(services);
-    if (host::MachineConditions(loop.get(), view_.profile(), services).isNetworkAvailable())
-        return good("there is one, " + by);
-    return note("there is none, " + by + ": activities that need it wait",
+    const MachineSituation machine = examineMachine(view_.profile());
+    if (machine.isNetworkAvailable) return good("there is one, by " + machine.networkJudge);
+    const bool isOverridden = view_.profile().content()->networkAvailable.has_value();
+    return note("there is none, by " + machine.networkJudge + ": activities that need it wait",
                 isOverridden ? "Set [network] available = true in the profile." : "");
 }
 

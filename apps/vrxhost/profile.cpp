@@ -16,8 +16,9 @@ Outcome showProfile(AgentView& view) {
     const host::DeviceProfile& profile = view.profile();
     Array keys, files, problems;
     std::vector<std::vector<std::string>> rows{{"KEY", "VALUE", "SOURCE"}};
+    const MachineSituation machine = examineMachine(profile);
     for (const ProfileKey& key : profileKeys(profile)) {
-        const ProfileFact fact = factInForce(key, profile);
+        const ProfileFact fact = factInForce(key, profile, machine);
         const auto open = key.needsTrust ? key.file.findOpenToOthers() : std::nullopt;
         keys.push_back(Dictionary{
             {"key", key.key}, {"value", fact.value}, {"source", fact.source}, {"believed", !open.has_value()}});
@@ -47,6 +48,7 @@ void addProfileVerb(CommandLine& line, const wire::LocationOverrides& places) {
         line.add("profile", "Shows every key of the device profile, and where its value comes from", [&places, device] {
             const wire::Locations found = wire::findAgent(places);
             AgentView view(absolutePath(found.home.path), *device, found.profile);
+            view.open();  // for what the machine's services told the agent
             return showProfile(view);
         });
     addProfileOption(verb, *device);

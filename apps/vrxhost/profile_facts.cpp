@@ -13,8 +13,22 @@ namespace {
 
 constexpr const char* watchesFlag = "features.Vireo.Meridian_3_0";
 
+platform::Array namesOf(const std::vector<host::KnownWatch>& watches) {
+    platform::Array names;
+    for (const host::KnownWatch& watch : watches) names.emplace_back(watch.name);
+    return names;
+}
+
+// Such as "262-01": of the country and the network.
+platform::Array codesOf(const std::map<std::string, platform::Carrier>& carriers) {
+    platform::Array codes;
+    for (const auto& [service, carrier] : carriers)
+        codes.emplace_back(carrier.mobileCountryCode.value_or("") + "-" + carrier.mobileNetworkCode.value_or(""));
+    return codes;
+}
+
 // What holds where no file gives the key.
-ProfileFact fallback(const std::string& key, const host::DeviceProfile& profile) {
+ProfileFact fallback(const std::string& key, const host::DeviceProfile& profile, const MachineSituation& situation) {
     const auto fact = [](const MachineFact& fact) { return ProfileFact{fact.value, fact.source}; };
     const host::BareMachine& machine = profile.machine();
     if (const auto serial = profile.machineSerialNumber(); serial && key == "device.serial_number")
@@ -24,8 +38,12 @@ ProfileFact fallback(const std::string& key, const host::DeviceProfile& profile)
     if (key == "device.product_version") return fact(machine.productVersion());
     if (key == "locale.language") return fact(profile.machineLocaleIdentifier());
     if (key == "locale.time_zone") return {nullptr, "the machine's time zone"};
-    if (key == "network.available") return {nullptr, "the machine's services, else its routes"};
-    if (key == "activities.should_defer") return {nullptr, "the machine's services and power supply"};
+    if (const auto& watches = profile.told()->watches; key == "watches" && !watches.empty())
+        return {namesOf(watches), "BlueZ"};
+    if (const auto& carriers = profile.told()->carriers; key == "carriers" && !carriers.empty())
+        return {codesOf(carriers), "ModemManager"};
+    if (key == "network.available") return {situation.isNetworkAvailable, situation.networkJudge};
+    if (key == "activities.should_defer") return {situation.shouldDefer, situation.deferralJudge};
     constexpr const char* byDefault = "the agent's default";
     if (key == "activities.minimum_interval") return {platform::minimumInterval.count(), byDefault};
     if (key == "applications.companion") return {host::ProfileContent().companionFolder, byDefault};
@@ -46,14 +64,14 @@ std::vector<ProfileKey> profileKeys(const host::DeviceProfile& profile) {
     return keys;
 }
 
-ProfileFact factInForce(const ProfileKey& key, const host::DeviceProfile& profile) {
-    return key.place.empty() ? fallback(key.key, profile) : ProfileFact{key.value, key.place};
+ProfileFact factInForce(const ProfileKey& key, const host::DeviceProfile& profile, const MachineSituation& machine) {
+    return key.place.empty() ? fallback(key.key, profile, machine) : ProfileFact{key.value, key.place};
 }
 
-ProfileFact factInForce(const std::string& key, const host::DeviceProfile& profile) {
+ProfileFact factInForce(const std::string& key, const host::DeviceProfile& profile, const MachineSituation& machine) {
     const std::vector<ProfileKey> keys = profileKeys(profile);
     const auto found = std::ranges::find(keys, key, &ProfileKey::key);
-    return found == keys.end() ? fallback(key, profile) : factInForce(*found, profile);
+    return found == keys.end() ? fallback(key, profile, machine) : factInForce(*found, profile, machine);
 }
 
 }  // namespace vrx::apps

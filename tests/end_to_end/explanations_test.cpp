@@ -8,6 +8,8 @@
 #include "end_to_end/programs.h"
 #include "support/eventually.h"
 #include "vrx/codec/json.h"
+#include "vrx/host/home/kept_facts.h"
+#include "vrx/host/profile/bare_machine.h"
 
 namespace vrx::end_to_end {
 namespace {
@@ -259,6 +261,24 @@ TEST_F(ProfileVerb, TellsWhereEachValueIsFrom) {
     // Without an agent it is what one would read.
     EXPECT_EQ(place_.run(place_ / "app/vrxhost", {"--home", place_ / "none", "profile", "--json"}).code, 0);
     EXPECT_FALSE(std::filesystem::exists(place_ / "none"));
+}
+
+TEST_F(ProfileVerb, TellsWhatServicesToldTheAgent) {
+    const host::LogRecorder log;
+    std::filesystem::create_directory(place_ / "home");
+    host::Database database(place_ / "home/host.db");
+    ASSERT_FALSE(database.open());
+    ASSERT_FALSE(database.write([](host::Connection& connection) {
+        host::keepFacts(connection, host::BareMachine().identifier(),
+                        {.carriers = {{"m", {"262", "01"}}},
+                         .watches = {{.address = "a", .name = "Lap"}, {.address = "b", .serialNumber = "W1"}}});
+    }));
+    EXPECT_EQ(key("carriers")["value"], Value(Array{"262-01"}));
+    EXPECT_EQ(key("watches")["source"], Value("BlueZ"));
+    const std::string checks = place_.vrxhost({"doctor", "--timeout", "0.1"}).output;
+    EXPECT_NE(checks.find("never told a serial number, and so not reported: Lap\n"), std::string::npos) << checks;
+    // Whether there is a network depends on the machine; that somebody says so does not.
+    EXPECT_NE(key("network.available")["value"], Value());
 }
 
 TEST_F(ProfileVerb, WarnsOfANamedFileThatIsNotThere) {

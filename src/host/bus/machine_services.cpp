@@ -18,10 +18,10 @@ MachineServices::MachineServices(sd_event* loop, std::string address)
               .interface = "net.hadess.PowerProfiles"},
              {{"ActiveProfile", "s"}}, [this] { onChange_(); }) {}
 
-void MachineServices::waitForNetwork(std::chrono::milliseconds limit) {
+void MachineServices::waitForConditions(std::chrono::milliseconds limit) {
     if (!hasBus()) return;
     start();
-    bus_.runUntil([this] { return network_.isSettled(); }, limit);
+    bus_.runUntil([this] { return network_.isSettled() && power_.isSettled(); }, limit);
 }
 
 void MachineServices::followFacts(ToldFacts kept, std::uint32_t user, AccountLanguage::IdentifierOf identifierOf,

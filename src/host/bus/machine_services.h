@@ -28,8 +28,8 @@ public:
     void followFacts(ToldFacts kept, std::uint32_t user, AccountLanguage::IdentifierOf identifierOf,
                      std::function<void()> onFacts);
     void start() { bus_.start(); }
-    // For a tool: starts, and runs the loop until NetworkManager has told what it knows, or the time is over.
-    void waitForNetwork(std::chrono::milliseconds limit);
+    // For a tool: starts, and runs the loop until network and power are known or told by nobody, or the time is over.
+    void waitForConditions(std::chrono::milliseconds limit);
 
     // What is kept, and what has been told since in its place. Main thread.
     ToldFacts facts() const;
