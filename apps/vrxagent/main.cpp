@@ -14,9 +14,11 @@
 
 #include "common/command_line.h"
 #include "common/manual.h"
+#include "vrx/coverage/records/warranty.h"
+#include "vrx/followup/follow_up_content.h"
 #include "vrx/host/host.h"
+#include "vrx/host/host_service.h"
 #include "vrx/host/ipc/bundle_lookup.h"
-#include "vrx/host/ipc/host_requests.h"
 #include "vrx/host/ipc/service_listener.h"
 #include "vrx/host/restart.h"
 #include "vrx/platform/log.h"
@@ -28,7 +30,7 @@ namespace {
 using vrx::host::BundleLookup;
 using vrx::host::HomeUse;
 using vrx::host::Host;
-using vrx::host::HostRequests;
+using vrx::host::HostService;
 using vrx::host::ServiceListenerFactory;
 using vrx::platform::Level;
 using vrx::platform::MaybeError;
@@ -64,13 +66,19 @@ int serve(const vrx::wire::Locations& places, Level logLevel, std::optional<Hand
     Host host({.home = places.home.path, .profile = places.profile, .systemBus = ""}, logLevel);
     if (MaybeError error = host.open(HomeUse::Agent)) return cannotStart(error->text);
     BundleLookup bundles([&] { return host.profile().content(); });
-    const HostRequests requests({.process = getpid(),
-                                 .user = getuid(),
-                                 .version = VRX_VERSION,
-                                 .home = host.home(),
-                                 .profile = places.profile,
-                                 .socket = places.socket.path});
-    ServiceListenerFactory factory(host.mainLoop().event(), bundles, host.lifecycle(), {}, &requests);
+    HostService service(
+        host,
+        {.process = getpid(),
+         .user = getuid(),
+         .version = VRX_VERSION,
+         .home = host.home(),
+         .profile = places.profile,
+         .socket = places.socket.path},
+        {.followUpClient = vrx::followUpClientIdentifier(),
+         .serialNumberOf = vrx::serialNumberOfItem,
+         .followUpIdentifier = [](const std::string& serial) { return vrx::followUpUniqueIdentifier(serial); },
+         .recordsFolder = std::filesystem::path(vrx::VRXWarranty::_legacyWarrantyPath()).parent_path().string() + "/"});
+    ServiceListenerFactory factory(host.mainLoop().event(), bundles, host.lifecycle(), {}, &service);
     if (MaybeError error = factory.open(places.socket.path)) return cannotStart(error->text);
     host.setBundleLookup(&bundles);
     host.setServiceListenerFactory(&factory);

@@ -141,6 +141,7 @@ Outcome outcomeOf(const AgentConnection& agent, const Answer<T>& answer, Show sh
             return failed(ExitCode::TimedOut, failure.text + ": " + secondsText(agent.timeLimit().count()),
                           "The agent may still do what was asked. Try again, or give it longer with --timeout; its log "
                           "says what it does.");
+        case Failure::Kind::Cancelled:
         case Failure::Kind::BadReply: break;
     }
     return failed(ExitCode::NoAnswer, failure.text, "Use a vrxctl of the agent's own release.", "bad-reply");

@@ -2,7 +2,6 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
-#include <cmath>
 #include <cstdio>
 #include <system_error>
 
@@ -10,10 +9,9 @@
 #include "vrx/codec/json.h"
 #include "vrx/followup/follow_up_content.h"
 #include "vrx/host/home/follow_up_document.h"
+#include "vrx/host/home/shown_follow_up.h"
 #include "vrx/host/profile/clock.h"
 #include "vrx/host/profile/device_profile.h"
-#include "vrx/platform/number_text.h"
-#include "vrx/platform/settings_keys.h"
 #include "vrx/platform/text.h"
 #include "vrxhost/home.h"
 #include "vrxhost/home_watch.h"
@@ -41,55 +39,24 @@ std::optional<std::string> deviceName(const host::DeviceProfile& profile, const 
 
 // How an item looks at one moment.
 struct Appearance {
+    host::ShownFollowUp shown{};
     std::optional<std::string> serialNumber{};
     std::optional<std::string> deviceName{};
-    bool hasBadge = false;
-    bool isExpired = false;
-    bool isLegacy = false;                      // of the older single-device layout
-    std::optional<std::int64_t> daysLeft{};     // absent without an expiration date
-    std::optional<std::string> relativeText{};  // their text, if the user info has one
-    std::optional<Date> nextChange{};           // when fewer days will be left, or it expires
+    bool isLegacy = false;  // of the older single-device layout
 
     bool differsFromFooter(const FollowUpItem& item) const {
-        return relativeText && relativeText != item.informativeFooterText;
+        return shown.daysText && shown.daysText != item.informativeFooterText;
     }
 };
 
-std::optional<std::string> textIn(const Value& userInfo, std::string_view key) {
-    const std::string* text = userInfo[key].asString();
-    return text ? std::optional(*text) : std::nullopt;
-}
-
-std::optional<std::string> relativeText(const Value& userInfo, std::int64_t daysLeft, const platform::Locale& locale) {
-    if (daysLeft <= 1) return textIn(userInfo, platform::OneDayLeftTextKey);
-    const auto format = textIn(userInfo, platform::DaysLeftFormatKey);
-    if (!format) return std::nullopt;
-    return platform::filled(*format, {locale.decimalText(static_cast<std::uint64_t>(daysLeft))});
-}
-
-void countDays(Appearance& shown, const FollowUpItem& item, Date now, Duration day, const platform::Locale& locale) {
-    if (!item.expirationDate) return;
-    shown.isExpired = *item.expirationDate <= now;
-    const double days = (*item.expirationDate - now) / day;
-    if (!std::isfinite(days)) return;
-    const Value userInfo(item.userInfo);
-    const bool roundsUp = userInfo[platform::DaysLeftRoundsUpKey].asBool().value_or(false);
-    const double whole = std::max(0.0, roundsUp ? std::ceil(days) : std::floor(days));
-    shown.daysLeft = platform::clampedInteger(whole);
-    shown.relativeText = relativeText(userInfo, *shown.daysLeft, locale);
-    if (!shown.isExpired) shown.nextChange = *item.expirationDate - std::max(0.0, roundsUp ? whole - 1 : whole) * day;
-}
-
 Appearance shownAt(Date now, const FollowUpItem& item, Duration day, const host::DeviceProfile& profile) {
-    Appearance shown;
+    Appearance look{host::shownFollowUp(item, now, day, profile)};
     if (const std::string* serialNumber = serialNumberOfItem(item)) {
-        shown.serialNumber = *serialNumber;
-        shown.deviceName = deviceName(profile, *serialNumber);
+        look.serialNumber = *serialNumber;
+        look.deviceName = deviceName(profile, *serialNumber);
     }
-    shown.hasBadge = (item.displayStyle & platform::follow_up_style::withRowBadge) != 0;
-    shown.isLegacy = item.uniqueIdentifier == followUpUniqueIdentifier(std::nullopt);
-    countDays(shown, item, now, day, profile);
-    return shown;
+    look.isLegacy = item.uniqueIdentifier == followUpUniqueIdentifier(std::nullopt);
+    return look;
 }
 
 template <class T>
@@ -97,32 +64,32 @@ Value valueOf(const std::optional<T>& value) {
     return value ? Value(*value) : Value();
 }
 
-Value documentOf(const FollowUpItem& item, const Appearance& shown) {
+Value documentOf(const FollowUpItem& item, const Appearance& look) {
     const auto expires = item.expirationDate ? codec::isoTextFromDate(*item.expirationDate) : std::nullopt;
     return Dictionary{{"item", host::followUpDocument(item)},
-                      {"derived", Dictionary{{"deviceName", valueOf(shown.deviceName)},
-                                             {"serialNumber", valueOf(shown.serialNumber)},
-                                             {"badge", shown.hasBadge},
-                                             {"expired", shown.isExpired},
+                      {"derived", Dictionary{{"deviceName", valueOf(look.deviceName)},
+                                             {"serialNumber", valueOf(look.serialNumber)},
+                                             {"badge", look.shown.hasBadge},
+                                             {"expired", look.shown.isExpired},
                                              {"expires", valueOf(expires)},
-                                             {"legacy", shown.isLegacy},
-                                             {"daysLeft", valueOf(shown.daysLeft)},
-                                             {"relativeText", valueOf(shown.relativeText)},
-                                             {"differsFromFooter", shown.differsFromFooter(item)}}}};
+                                             {"legacy", look.isLegacy},
+                                             {"daysLeft", valueOf(look.shown.daysLeft)},
+                                             {"relativeText", valueOf(look.shown.daysText)},
+                                             {"differsFromFooter", look.differsFromFooter(item)}}}};
 }
 
-std::string textOf(const FollowUpItem& item, const Appearance& shown) {
-    std::string text = printable(item.title.value_or("(no title)")) + (shown.isExpired ? "  [expired]" : "") +
-                       (shown.isLegacy ? "  [legacy]" : "") + "\n";
+std::string textOf(const FollowUpItem& item, const Appearance& look) {
+    std::string text = printable(item.title.value_or("(no title)")) + (look.shown.isExpired ? "  [expired]" : "") +
+                       (look.isLegacy ? "  [legacy]" : "") + "\n";
     auto line = [&](const std::string& field, const std::optional<std::string>& content, const char* remark = "") {
         text +=
             "  " + field + std::string(16 - field.size(), ' ') + printable(content.value_or("none")) + remark + "\n";
     };
     line("Device",
-         shown.serialNumber ? shown.deviceName.value_or("(unknown)") + ", " + *shown.serialNumber : "none is named");
+         look.serialNumber ? look.deviceName.value_or("(unknown)") + ", " + *look.serialNumber : "none is named");
     line("Text", item.informativeFooterText);
-    line("Days left text", shown.relativeText, shown.differsFromFooter(item) ? "  (differs from the text)" : "");
-    line("Badge", shown.hasBadge ? "yes" : "no");
+    line("Days left text", look.shown.daysText, look.differsFromFooter(item) ? "  (differs from the text)" : "");
+    line("Badge", look.shown.hasBadge ? "yes" : "no");
     line("Expires", item.expirationDate ? platform::describe(*item.expirationDate) : "never");
     line("Target", item.targetBundleIdentifier);
     line("Extension", item.extensionIdentifier);
@@ -141,18 +108,17 @@ struct Listing {
 Listing list(Home& home, const host::DeviceProfile& profile) {
     const auto items = home.followUps().makeController(followUpClientIdentifier())->pendingFollowUpItems();
     if (!items) return {databaseFailure(items.error(), "not-read")};
-    Duration day(home.defaults().number(platform::settings::oneDayInterval));
-    if (!(day.count() > 0)) day = std::chrono::days(1);
+    const Duration day = host::dayInterval(home.defaults());
     const Date now = host::Clock(profile).now();
 
     Listing listing;
     Array documents;
     for (const FollowUpItem& item : *items) {
-        const Appearance shown = shownAt(now, item, day, profile);
-        documents.emplace_back(documentOf(item, shown));
-        listing.outcome.text += textOf(item, shown);
-        if (shown.nextChange && *shown.nextChange < listing.nextChange.value_or(Date::max()))
-            listing.nextChange = shown.nextChange;
+        const Appearance look = shownAt(now, item, day, profile);
+        documents.emplace_back(documentOf(item, look));
+        listing.outcome.text += textOf(item, look);
+        if (const auto change = look.shown.nextTextChange; change && *change < listing.nextChange.value_or(Date::max()))
+            listing.nextChange = change;
     }
     listing.outcome.document = {{"followUps", documents}};
     if (items->empty()) listing.outcome.text = "No follow-up is pending.\n";

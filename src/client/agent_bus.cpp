@@ -1,11 +1,13 @@
 #include "vrx/client/agent_bus.h"
 
+#include <poll.h>
 #include <sys/socket.h>
 #include <sys/time.h>
 #include <sys/un.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
 #include <cstring>
 
@@ -132,6 +134,30 @@ int AgentBus::appendArguments(sd_bus_message* message, const char* signature, co
         if (r < 0) return r;
     }
     return 0;
+}
+
+void AgentBus::setOnChanged(std::function<void(std::string_view)> onChanged) {
+    onChanged_ = std::move(onChanged);
+    sd_bus_add_filter(bus_, nullptr, onMessage, this);
+}
+
+int AgentBus::onMessage(sd_bus_message* message, void* self, sd_bus_error*) {
+    const char* interface = sd_bus_message_get_interface(message);
+    if (interface && sd_bus_message_is_signal(message, interface, wire::changedMember) > 0)
+        static_cast<AgentBus*>(self)->onChanged_(interface);
+    return 0;
+}
+
+void AgentBus::listen(int wakeFile) {
+    while (true) {
+        int r = sd_bus_process(bus_, nullptr);
+        if (r > 0) continue;
+        const int events = r < 0 ? r : sd_bus_get_events(bus_);
+        if (events < 0) return;
+        std::array<pollfd, 2> files{{{socket_, static_cast<short>(events), 0}, {wakeFile, POLLIN, 0}}};
+        if (poll(files.data(), files.size(), -1) < 0 && errno != EINTR) return;
+        if (files[1].revents) return;
+    }
 }
 
 void AgentBus::interrupt() const {

@@ -4,12 +4,14 @@
 #include <systemd/sd-bus.h>
 
 #include <chrono>
+#include <functional>
 #include <string>
 #include <variant>
 
-#include "vrx/client/agent_connection.h"
+#include "vrx/client/answer.h"
 #include "vrx/platform/error.h"
 #include "vrx/platform/value.h"
+#include "vrx/protocols/agent_protocol.h"
 #include "vrx/wire/names.h"
 
 namespace vrx::client {
@@ -45,15 +47,22 @@ public:
     CallResult call(const wire::Operation& operation, const CallArguments& arguments, Deadline deadline,
                     const wire::Interface& interface = wire::agentInterface);
 
+    // Whom to tell of signals, by their interface, within call() or listen(). Once, when it is open.
+    void setOnChanged(std::function<void(std::string_view interface)> onChanged);
+    // Takes signals until the connection ends or the wake file is readable.
+    void listen(int wakeFile);
+
     // Ends the connection and the call under way.
     void interrupt() const;
 
 private:
     int authenticate(Deadline deadline);
+    static int onMessage(sd_bus_message* message, void* self, sd_bus_error*);
     int appendArguments(sd_bus_message* message, const char* signature, const CallArguments& arguments);
 
     sd_bus* bus_ = nullptr;
     int socket_ = -1;  // the bus's
+    std::function<void(std::string_view)> onChanged_;
 };
 
 }  // namespace vrx::client

@@ -7,10 +7,9 @@
 //     else if (auto warranty = (*info)->warranty())
 //         show(warranty->coverageLocalizedLabel());  // else there is no coverage record for that device
 //
-// Each operation comes in two forms. The form without a reply waits on the calling thread and returns the answer or the
-// reason why there is none. The form with a reply is VRXAgentProtocol's: it returns at once, and the reply comes later
-// on a thread of the library. An answer that is not available is null there, and just before the reply the failure
-// handler gets the reason.
+// Each operation comes in two forms. The form without a callback waits on the calling thread and returns the answer or
+// the reason why there is none. The form with one returns at once, and the callback gets the same later, on a thread of
+// the library. It can be cancelled meanwhile.
 //
 // Threads: any number of threads may use one object at the same time. Each call under way uses a connection of its own,
 // up to `connections`; only calls beyond that number wait for one another. Connections are opened when first needed and
@@ -24,76 +23,29 @@
 // 86400 seconds.
 #pragma once
 
-#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
-#include <string_view>
-#include <utility>
-#include <variant>
 
+#include "vrx/client/answer.h"
 #include "vrx/coverage/records/warranty.h"
 #include "vrx/devices/records/device.h"
 #include "vrx/devices/records/device_info.h"
-#include "vrx/protocols/agent_protocol.h"
+#include "vrx/platform/value.h"
+#include "vrx/protocols/forward.h"
 
 namespace vrx::client {
 
-// Why there is no answer.
-struct Failure {
-    enum class Kind {
-        NotReachable,  // no agent answers at the socket, or the connection ended twice
-        Refused,       // see Refusal
-        TimedOut,      // no reply within the time limit; the agent may still do what was asked
-        BadReply,      // the answer is not of the operation's type: agent and library do not fit each other
-    };
-    enum class Refusal {
-        Entitlement,  // the caller does not hold the entitlement
-        Limit,        // too many connections or requests at the same time, or a reply that is too large
-        Argument,     // an argument is too long, or is not text
-    };
-    Kind kind;
-    std::string text;                        // for people; after a refusal, the agent's own words
-    Refusal refusal = Refusal::Entitlement;  // only when the kind is Refused
-};
-
-// The agent's answer, or why there is none. The answer itself may be null. Callers may ask value() and failure() only
-// for what is there.
-template <class T>
-class Answer {
+class AgentConnection final {
 public:
-    Answer(T value) : content_(std::in_place_index<0>, std::move(value)) {}
-    Answer(Failure failure) : content_(std::in_place_index<1>, std::move(failure)) {}
-
-    explicit operator bool() const { return content_.index() == 0; }
-    const T& value() const { return std::get<0>(content_); }
-    const T& operator*() const { return value(); }
-    const T* operator->() const { return &value(); }
-    const Failure& failure() const { return std::get<1>(content_); }
-
-private:
-    std::variant<T, Failure> content_;
-};
-
-struct ConnectionOptions {
-    std::string socketPath = {};          // empty: that of wire::findAgent(), once
-    platform::Duration timeLimit{420.0};  // the limit of a call; longer than any download of the agent
-    std::size_t connections = 8;
-};
-
-class AgentConnection final : public VRXAgentProtocol {
-public:
-    // Called for each failed call that had a reply, on the thread of that reply, with the operation's name.
-    using FailureHandler = std::function<void(std::string_view operation, const Failure& failure)>;
-
-    explicit AgentConnection(ConnectionOptions options = {}, FailureHandler failureHandler = nullptr);
-    // Calls under way end as NotReachable, and no reply comes after the destructor has returned. It must not run within
-    // a reply.
-    ~AgentConnection() override;
+    explicit AgentConnection(ConnectionOptions options = {});
+    // Calls under way end as NotReachable, and no callback comes after the destructor has returned. It must not run
+    // within a callback.
+    ~AgentConnection();
     AgentConnection(const AgentConnection&) = delete;
     AgentConnection& operator=(const AgentConnection&) = delete;
 
-    // These wait on the calling thread. protocols/agent_protocol.h says what each returns.
+    // These wait on the calling thread. docs/clients.md says what each returns.
     Answer<bool> scheduleOutreachWithReply();
     Answer<platform::Value> checkIsAvailableInStore(const std::string& bundleIdentifier);
     Answer<platform::Value> appSupportAvailability(const std::string& bundleIdentifier);
@@ -106,27 +58,26 @@ public:
     Answer<DeviceInfoList> getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicy policy, bool updateFollowUps);
     Answer<bool> dismissFollowUpForSerialNumber(const std::string& serialNumber);
 
-    // These reply later.
-    void scheduleOutreachWithReply(Reply<bool> reply) override;
-    void checkIsAvailableInStore(std::string bundleIdentifier, Reply<platform::Value> reply) override;
-    void appSupportAvailability(std::string bundleIdentifier, Reply<platform::Value> reply) override;
-    void readWebURLOverride(Reply<std::optional<std::string>> reply) override;
-    void defaultDevice(Reply<std::shared_ptr<VRXDevice>> reply) override;
-    void pairedDevices(Reply<DeviceList> reply) override;
-    void getDefaultDeviceInfoUsingPolicy(VRXWarrantyLookupPolicy policy,
-                                         Reply<std::shared_ptr<VRXDeviceInfo>> reply) override;
-    void getDeviceInfoForSerialNumber(std::string serialNumber, VRXWarrantyLookupPolicy policy,
-                                      Reply<std::shared_ptr<VRXDeviceInfo>> reply) override;
-    void getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicy policy, bool updateFollowUps,
-                                      Reply<DeviceInfoList> reply) override;
-    void dismissFollowUpForSerialNumber(std::string serialNumber, Reply<bool> completion) override;
+    // These answer later.
+    Call scheduleOutreachWithReply(Callback<bool> callback);
+    Call checkIsAvailableInStore(std::string bundleIdentifier, Callback<platform::Value> callback);
+    Call appSupportAvailability(std::string bundleIdentifier, Callback<platform::Value> callback);
+    Call readWebURLOverride(Callback<std::optional<std::string>> callback);
+    Call defaultDevice(Callback<std::shared_ptr<VRXDevice>> callback);
+    Call pairedDevices(Callback<DeviceList> callback);
+    Call getDefaultDeviceInfoUsingPolicy(VRXWarrantyLookupPolicy policy,
+                                         Callback<std::shared_ptr<VRXDeviceInfo>> callback);
+    Call getDeviceInfoForSerialNumber(std::string serialNumber, VRXWarrantyLookupPolicy policy,
+                                      Callback<std::shared_ptr<VRXDeviceInfo>> callback);
+    Call getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicy policy, bool updateFollowUps,
+                                      Callback<DeviceInfoList> callback);
+    Call dismissFollowUpForSerialNumber(std::string serialNumber, Callback<bool> callback);
 
     const std::string& socketPath() const;
     platform::Duration timeLimit() const;
 
 private:
-    class Implementation;
-    std::unique_ptr<Implementation> implementation_;
+    const std::unique_ptr<Caller> caller_;
 };
 
 }  // namespace vrx::client

@@ -3,13 +3,23 @@
 
 #include <condition_variable>
 #include <list>
+#include <map>
 #include <memory>
 #include <mutex>
+#include <optional>
 #include <string>
 
 #include "vrx/client/agent_bus.h"
 
 namespace vrx::client {
+
+// One call, from its request to its answer.
+struct Request {
+    const wire::Interface& interface;
+    const wire::Operation& operation;
+    CallArguments arguments{};
+    bool isCancelled = false;  // the pool's
+};
 
 class BusPool {
 public:
@@ -18,7 +28,10 @@ public:
 
     // Returns the archived root of the operation's reply. A call whose connection ended before the reply is sent again,
     // once, on a new connection.
-    Answer<platform::Value> call(const wire::Operation& operation, const CallArguments& arguments, Deadline deadline);
+    Answer<platform::Value> call(const Request& request, Deadline deadline);
+
+    // Ends the request's call, or keeps it from beginning.
+    void cancel(Request& request);
 
     // Ends the calls under way; later ones fail.
     void close();
@@ -29,10 +42,11 @@ private:
     using Bus = std::unique_ptr<AgentBus>;
     enum class Age { Any, New };
 
-    CallResult callOnce(const wire::Operation& operation, const CallArguments& arguments, Deadline deadline, Age age);
-    std::variant<Bus, Failure> take(Deadline deadline, Age age);
-    bool beginUse(AgentBus& bus);
-    void endUse(Bus bus, bool isUseful);
+    CallResult callOnce(const Request& request, Deadline deadline, Age age);
+    std::variant<Bus, Failure> take(const Request& request, Deadline deadline, Age age);
+    std::optional<Failure> whyNot(const Request& request) const;
+    bool beginUse(const Request& request, AgentBus& bus);
+    void endUse(const Request& request, Bus bus, bool isUseful);
 
     const std::string socketPath_;
     const std::size_t connections_;
@@ -40,7 +54,7 @@ private:
     std::condition_variable isFree_;
     std::size_t taken_ = 0;
     std::list<Bus> idle_;
-    std::list<const AgentBus*> inUse_;
+    std::map<const Request*, const AgentBus*> inUse_;
     bool isClosed_ = false;
 };
 

@@ -135,7 +135,10 @@ void Host::start(const std::string& agentVersion) {
     database_.write([&](Connection& connection) { setStoredFact(connection, stored_facts::profile, layers); });
     activities_.start(agentVersion);
     if (usesSystemBus()) followServices();
-    profileNotifier_.start(mainLoop_.event(), [this] { activities_.reconsider(); });
+    profileNotifier_.start(mainLoop_.event(), [this] {
+        activities_.reconsider();
+        if (onProfileEdit_) onProfileEdit_();
+    });
 }
 
 // Until the services have answered, nobody is told that the language or the watches are others.

@@ -9,6 +9,7 @@
 //     host.mainLoop().run();
 #pragma once
 
+#include <functional>
 #include <optional>
 #include <string>
 #include <vector>
@@ -80,6 +81,10 @@ public:
     // changed while no agent ran is notified. Once.
     void start(const std::string& agentVersion);
 
+    // To be called on the main thread after each edit of the profile, and each answer of the machine's services, once
+    // what it means to the agent has been notified. Set on the main thread.
+    void setOnProfileEdit(std::function<void()> onProfileEdit) { onProfileEdit_ = std::move(onProfileEdit); }
+
     MainLoop& mainLoop() { return mainLoop_; }
     ProcessLifecycle& lifecycle() { return lifecycle_; }
     const DeviceProfile& profile() const { return profile_; }
@@ -126,6 +131,7 @@ private:
     MachineConditions conditions_;
     BackgroundActivities activities_;
     std::unique_ptr<FileWatch> homeWatch_;
+    std::function<void()> onProfileEdit_;
     Marketplace marketplace_;
     PurchaseHistory purchases_;
     InstalledApps apps_;

@@ -1,6 +1,6 @@
 // The names of the agent's service on the wire. It speaks D-Bus's protocol peer to peer over a Unix stream socket: an
 // object with the agent's interface, whose members are the operations of VRXAgentProtocol by their first keyword; and
-// one with the host's, which tells of the process that runs the agent.
+// objects of the host, for what else an application wants to know of the agent.
 #pragma once
 
 #include <array>
@@ -66,19 +66,56 @@ constexpr std::optional<OperationIndex> indexOf(const Operation& operation) {
     return std::nullopt;
 }
 
+struct Property {
+    const char* name;
+    const char* type;
+};
+
 struct Interface {
     const char* path;  // of its object
     const char* name;
     std::span<const Operation> operations;
+    // Whether it has the signal "Changed", which says that what it tells of may be other now. It is sent to connections
+    // that have called subscribeMember.
+    bool hasChangedSignal = false;
+    std::span<const Property> properties = {};
 };
+
+inline constexpr const char* changedMember = "Changed";
+inline constexpr const char* subscribeMember = "subscribe";
 
 inline constexpr Interface agentInterface{objectPath, interfaceName, operations};
 
-// Answers at once, and touches neither a record nor a follow-up.
+// Of the process that runs the agent. Touches neither a record nor a follow-up.
 inline constexpr std::array<Operation, 1> hostOperations{{{"status", "", "reply\0"}}};
 inline constexpr const Operation& statusOperation = hostOperations[0];
 inline constexpr Interface hostInterface{"/com/orvane/host", "com.orvane.AgentHost", hostOperations};
-static_assert(std::string_view(hostInterface.name).starts_with(platform::vendorPrefix));
+
+// What the settings app shows.
+inline constexpr std::array<Operation, 3> followUpsOperations{{{"pendingFollowUps", "", "reply\0"},
+                                                               {"dismissFollowUp", "s", "identifier\0reply\0"},
+                                                               {subscribeMember, "", "reply\0"}}};
+inline constexpr const Operation& pendingFollowUpsOperation = followUpsOperations[0];
+inline constexpr const Operation& dismissFollowUpOperation = followUpsOperations[1];
+inline constexpr const Operation& subscribeToFollowUps = followUpsOperations[2];
+inline constexpr Interface followUpsInterface{"/com/orvane/followups", "com.orvane.FollowUps", followUpsOperations,
+                                              true};
+
+// That a record, a device or the language is another, and what the agent goes by.
+inline constexpr std::array<Operation, 1> coverageOperations{{{subscribeMember, "", "reply\0"}}};
+inline constexpr const Operation& subscribeToCoverage = coverageOperations[0];
+// The locale; a day, in seconds; of each activity "identifier" (s), "state" (s) and, if it is scheduled, "due" (d, in
+// seconds since 1970).
+inline constexpr std::array<Property, 3> coverageProperties{
+    {{"Locale", "s"}, {"OneDayInterval", "d"}, {"Activities", "aa{sv}"}}};
+inline constexpr Interface coverageInterface{"/com/orvane/coverage", "com.orvane.Coverage", coverageOperations, true,
+                                             coverageProperties};
+
+constexpr bool isOurs(const Interface& interface) {
+    return std::string_view(interface.name).starts_with(platform::vendorPrefix);
+}
+static_assert(isOurs(agentInterface) && isOurs(hostInterface) && isOurs(followUpsInterface) &&
+              isOurs(coverageInterface));
 
 // Names of errors: the bus's own where one fits.
 inline constexpr const char* accessDenied = "org.freedesktop.DBus.Error.AccessDenied";      // not entitled

@@ -38,29 +38,53 @@ TEST_F(AgentConnectionTest, AsksEveryOperationAndWaits) {
                                                "paired", "info 2", "info SN7 77", "all 1 update", "dismiss SN1"));
 }
 
-TEST_F(AgentConnectionTest, RepliesLaterOnAThreadOfItsOwn) {
-    std::atomic<int> replies = 0;
+TEST_F(AgentConnectionTest, AnswersLaterOnAThreadOfItsOwn) {
+    std::atomic<int> answers = 0;
     {
-        AgentConnection connection({.socketPath = service->socketPath(), .connections = 3});
-        VRXAgentProtocol& remote = connection;
+        AgentConnection remote({.socketPath = service->socketPath(), .connections = 3});
         Signal done;
         auto count = [&](const auto& answer) {
-            EXPECT_TRUE(answer);
-            if (++replies == 8) done.set();
+            EXPECT_TRUE(answer) << answer.failure().text;
+            if (++answers == 8) done.set();
         };
         remote.scheduleOutreachWithReply(count);
-        remote.checkIsAvailableInStore("x", [&](Value answer) { count(answer.asDictionary()); });
-        remote.appSupportAvailability("x", [&](Value answer) { count(answer.isNull()); });
+        remote.checkIsAvailableInStore("x", count);
+        remote.appSupportAvailability("x", count);
         remote.defaultDevice(count);
-        remote.pairedDevices([&](DeviceList answer) { count(answer.size() == 2); });
+        remote.pairedDevices(count);
         remote.getDefaultDeviceInfoUsingPolicy(0, count);
         remote.getDeviceInfoForSerialNumber("SN1", 0, count);
-        remote.getAllDeviceInfosUsingPolicy(0, false, [&](DeviceInfoList answer) { count(answer.size() == 2); });
+        remote.getAllDeviceInfosUsingPolicy(0, false, count);
         done.wait();
         remote.readWebURLOverride(nullptr);
-        remote.dismissFollowUpForSerialNumber("SN1", [&](bool) { ++replies; });
+        remote.dismissFollowUpForSerialNumber("SN1", [&](auto) { ++answers; });
     }
-    EXPECT_EQ(replies, 9);
+    EXPECT_EQ(answers, 9);
+}
+
+TEST_F(AgentConnectionTest, CancelsOneCallAndNoOther) {
+    holdOutreach();
+    AgentConnection connection({.socketPath = service->socketPath(), .connections = 2});
+    Signal isCancelled, isAnswered;
+    const auto expectCancelled = [&](const client::Answer<bool>& answer) {
+        EXPECT_EQ(answer.failure().kind, Failure::Kind::Cancelled);
+        isCancelled.set();
+    };
+    const client::Call call = connection.scheduleOutreachWithReply(expectCancelled);
+    connection.scheduleOutreachWithReply([&](const client::Answer<bool>& answer) {
+        EXPECT_TRUE(answer);
+        isAnswered.set();
+    });
+    awaitHeld(2);
+    const client::Call waiting = connection.scheduleOutreachWithReply(expectCancelled);
+    call.cancel();
+    isCancelled.wait();
+    waiting.cancel();
+    isCancelled.wait();
+    answerHeld();
+    isAnswered.wait();
+    call.cancel();  // it is over
+    EXPECT_TRUE(connection.defaultDevice());
 }
 
 TEST_F(AgentConnectionTest, TellsWhyThereIsNoAnswer) {
@@ -92,22 +116,14 @@ TEST_F(AgentConnectionTest, TellsWhyThereIsNoAnswer) {
     EXPECT_EQ(failure.kind, Failure::Kind::TimedOut);
     EXPECT_THAT(failure.text, HasSubstr("timed out"));
 
-    std::string failed;
-    {
-        AgentConnection nobody({.socketPath = "/nowhere/socket"}, [&](std::string_view operation, const Failure& why) {
-            EXPECT_EQ(why.kind, Failure::Kind::NotReachable);
-            EXPECT_THAT(why.text, HasSubstr("/nowhere/socket"));
-            failed = operation;
-        });
-        Signal isDone;
-        nobody.defaultDevice([&](std::shared_ptr<VRXDevice> device) {
-            EXPECT_EQ(device, nullptr);
-            EXPECT_EQ(failed, "defaultDevice");
-            isDone.set();
-        });
-        isDone.wait();
-    }
-    EXPECT_EQ(failed, "defaultDevice");
+    AgentConnection nobody({.socketPath = "/nowhere/socket"});
+    Signal isDone;
+    nobody.pairedDevices([&](const client::Answer<DeviceList>& answer) {
+        EXPECT_EQ(answer.failure().kind, Failure::Kind::NotReachable) << "and no empty list";
+        EXPECT_THAT(answer.failure().text, HasSubstr("/nowhere/socket"));
+        isDone.set();
+    });
+    isDone.wait();
 }
 
 TEST_F(AgentConnectionTest, TellsItsUserWhatTheAgentSaidOfARefusal) {
@@ -165,7 +181,7 @@ TEST_F(AgentConnectionTest, KeepsTheAgentFromEndingWithARequestAndNotWithSilence
 
     holdOutreach();
     Signal isAnswered;
-    asking.scheduleOutreachWithReply([&](bool answer) {
+    asking.scheduleOutreachWithReply([&](const client::Answer<bool>& answer) {
         EXPECT_TRUE(answer);
         isAnswered.set();
     });
@@ -195,16 +211,16 @@ TEST_F(AgentConnectionTest, IsServedAtTheSameTimeAsOthers) {
 TEST_F(AgentConnectionTest, EndsItsCallsWhenItGoes) {
     holdOutreach();
     std::atomic<int> failures = 0;
-    std::atomic<int> replies = 0;
     {
-        AgentConnection connection({.socketPath = service->socketPath(), .connections = 1},
-                                   [&](std::string_view, const Failure&) { ++failures; });
-        connection.scheduleOutreachWithReply([&](bool isDone) { replies += isDone ? 100 : 1; });
-        connection.defaultDevice([&](std::shared_ptr<VRXDevice> device) { replies += device ? 100 : 1; });
+        AgentConnection connection({.socketPath = service->socketPath(), .connections = 1});
+        const auto count = [&](const auto& answer) {
+            failures += !answer && answer.failure().kind == Failure::Kind::NotReachable;
+        };
+        connection.scheduleOutreachWithReply(count);
+        connection.defaultDevice(count);
         awaitHeld();
     }
     EXPECT_EQ(failures, 2);
-    EXPECT_EQ(replies, 2);
     answerHeld();
 }
 

@@ -12,6 +12,7 @@
 #include "host/support.h"
 #include "support/eventually.h"
 #include "vrx/client/agent_connection.h"
+#include "vrx/host/ipc/host_requests.h"
 #include "vrx/host/ipc/service_listener.h"
 #include "vrx/host/loop/main_loop.h"
 
@@ -29,6 +30,27 @@ private:
     std::atomic<bool> isSet_ = false;
 };
 
+// What the host answers beside the agent.
+class FakeHost final : public host::HostRequests {
+public:
+    Value status() const override { return Dictionary(); }
+    Value pendingFollowUps() const override { return followUps; }
+    void dismissFollowUp(const std::string& identifier, VRXAgentProtocol&,
+                         VRXAgentProtocol::Reply<bool> reply) const override {
+        reply(identifier == "present");
+    }
+    host::Changes::Subscription subscribe(uid_t user, std::function<void(host::Changes::Kinds)> tell) override {
+        return changes.subscribe(user, std::move(tell));
+    }
+    void whenChangesAreTold(std::function<void()> call) override { call(); }
+    std::string localeIdentifier() const override { return "de_DE"; }
+    Duration oneDayInterval() const override { return Duration(60); }
+    std::vector<host::ActivityState> activities() const override { return {{"a", "scheduled", dateFromEpoch(8)}}; }
+
+    Value followUps;
+    host::Changes changes;
+};
+
 // The service of a fake agent, at a socket in a temporary folder.
 class FakeService final : public platform::ServiceListenerDelegate {
 public:
@@ -38,6 +60,8 @@ public:
         start(limits);
     }
     ~FakeService() override { stop(); }
+
+    FakeHost host;
 
     std::string socketPath() const { return folder_ / "socket"; }
     long logged(std::string_view text) const {
@@ -49,7 +73,7 @@ public:
         thread_ = std::thread([this, &isReady, limits] {
             host::MainLoop loop;
             lifecycle_.emplace(loop);
-            host::ServiceListenerFactory factory(loop.event(), bundles_, *lifecycle_, limits);
+            host::ServiceListenerFactory factory(loop.event(), bundles_, *lifecycle_, limits, &host);
             auto error = factory.open(socketPath());
             if (error) throw std::runtime_error(error->text);
             listen(factory);

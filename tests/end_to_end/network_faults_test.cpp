@@ -294,7 +294,7 @@ TEST_P(NetworkFaults, EndAsTheyShould) {
     auto reply = std::make_shared<std::promise<std::shared_ptr<VRXDeviceInfo>>>();  // which may be kept only once
     auto replied = reply->get_future();
     clients->getDefaultDeviceInfoUsingPolicy(VRXWarrantyLookupPolicyRefresh,
-                                             [reply](std::shared_ptr<VRXDeviceInfo> info) { reply->set_value(info); });
+                                             [reply](client::Answer<std::shared_ptr<VRXDeviceInfo>> info) { reply->set_value(*info); });
     EXPECT_TRUE(*clients->getDefaultDeviceInfoUsingPolicy(VRXWarrantyLookupPolicyCachedOnly));
     const bool isPending = replied.wait_for(0s) == std::future_status::timeout;
     EXPECT_TRUE(isPending || !fault.change.isLong) << "the other client had to wait";
@@ -340,7 +340,7 @@ TEST_F(Network, RequestsForOneDeviceAtTheSameTimeAreADownloadEach) {
     for (auto& reply : replies)
         clients->getDeviceInfoForSerialNumber(
             "VRXWATCH0001", VRXWarrantyLookupPolicyDefault,
-            [&reply](std::shared_ptr<VRXDeviceInfo> info) { reply.set_value(std::move(info)); });
+            [&reply](client::Answer<std::shared_ptr<VRXDeviceInfo>> info) { reply.set_value(*info); });
     for (auto& reply : replies) EXPECT_TRUE(reply.get_future().get()->warranty());
     EXPECT_EQ(server->ask("GET", "/counters")["requestsByEndpoint"]["coverage"], Value(2));
 }

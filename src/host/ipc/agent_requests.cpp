@@ -112,4 +112,32 @@ void performRequest(VRXAgentProtocol& agent, OperationIndex operation, RequestAr
     }
 }
 
+void performHostRequest(HostRequests& host, VRXAgentProtocol& agent, const wire::Operation& operation,
+                        RequestArguments arguments, PendingReply pendingReply) {
+    ArchivingReply reply(std::move(pendingReply));
+    if (&operation == &wire::statusOperation) return reply(host.status());
+    if (&operation == &wire::pendingFollowUpsOperation) return reply(host.pendingFollowUps());
+    if (&operation == &wire::dismissFollowUpOperation)
+        return host.dismissFollowUp(arguments.text, agent, std::move(reply));
+    host.whenChangesAreTold(
+        [reply = std::make_shared<ArchivingReply>(std::move(reply))] { (*reply)(true); });  // a subscription
+}
+
+int appendProperty(sd_bus_message* message, const HostRequests& host, std::string_view property) {
+    if (property == wire::coverageProperties[0].name)
+        return sd_bus_message_append(message, "s", host.localeIdentifier().c_str());
+    if (property == wire::coverageProperties[1].name)
+        return sd_bus_message_append(message, "d", host.oneDayInterval().count());
+    int r = sd_bus_message_open_container(message, 'a', "a{sv}");
+    for (const ActivityState& activity : host.activities()) {
+        if (r >= 0) r = sd_bus_message_open_container(message, 'a', "{sv}");
+        if (r >= 0) r = sd_bus_message_append(message, "{sv}", "identifier", "s", activity.identifier.c_str());
+        if (r >= 0) r = sd_bus_message_append(message, "{sv}", "state", "s", activity.state.c_str());
+        if (r >= 0 && activity.due)
+            r = sd_bus_message_append(message, "{sv}", "due", "d", platform::epochSeconds(*activity.due));
+        if (r >= 0) r = sd_bus_message_close_container(message);
+    }
+    return r < 0 ? r : sd_bus_message_close_container(message);
+}
+
 }  // namespace vrx::host

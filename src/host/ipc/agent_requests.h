@@ -1,4 +1,4 @@
-// Turns requests from the bus into calls of VRXAgentProtocol, and its replies into archives.
+// Turns requests from the bus into calls of VRXAgentProtocol and of the host, and their replies into archives.
 #pragma once
 
 #include <systemd/sd-bus.h>
@@ -7,6 +7,7 @@
 #include <string>
 #include <string_view>
 
+#include "vrx/host/ipc/host_requests.h"
 #include "vrx/host/ipc/reply_box.h"
 #include "vrx/platform/error.h"
 #include "vrx/protocols/agent_protocol.h"
@@ -29,5 +30,11 @@ platform::Result<RequestArguments> readArguments(sd_bus_message* call, std::stri
 // Calls the operation, which answers through the pending reply.
 void performRequest(VRXAgentProtocol& agent, wire::OperationIndex operation, RequestArguments arguments,
                     PendingReply reply);
+
+// The same for the host's own operations.
+void performHostRequest(HostRequests& host, VRXAgentProtocol& agent, const wire::Operation& operation,
+                        RequestArguments arguments, PendingReply reply);
+// Appends the value of one of wire::coverageProperties. Returns a negative errno when that fails.
+int appendProperty(sd_bus_message* message, const HostRequests& host, std::string_view property);
 
 }  // namespace vrx::host

@@ -21,6 +21,12 @@ namespace {
 // Replies above it leave memory behind that the allocator would keep.
 constexpr std::size_t muchBytes = 1024 * 1024;
 
+// The kind of change to which the operation subscribes; 0 for all others.
+Changes::Kinds subscriptionOf(const wire::Operation& operation) {
+    if (&operation == &wire::subscribeToFollowUps) return Changes::followUps;
+    return &operation == &wire::subscribeToCoverage ? Changes::coverage : 0;
+}
+
 }  // namespace
 
 ClientSession::ClientSession(Descriptor socket, const PeerIdentity& peer, std::shared_ptr<VRXAgentProtocol> agent,
@@ -36,27 +42,32 @@ ClientSession::ClientSession(Descriptor socket, const PeerIdentity& peer, std::s
       authenticationEnd_(std::chrono::steady_clock::now() + limits_.authentication),
       work_(lifecycle_.beginWorkUnlessEnding()),
       bus_(std::move(socket), peer.processIdentifier()) {
-    serveInterface<wire::agentInterface>(agentMethods_);
-    if (host_) serveInterface<wire::hostInterface>(hostMethods_);
+    serveInterface<wire::agentInterface>();
+    if (host_) {
+        serveInterface<wire::hostInterface>();
+        serveInterface<wire::followUpsInterface>();
+        serveInterface<wire::coverageInterface>();
+    }
     box_->open(*this);
 }
 
 ClientSession::~ClientSession() {
+    subscription_.reset();
     box_->close();
     line_.leave(waiter_);
     line_.changeUnsent(unsentBytes_, 0);
 }
 
 template <const wire::Interface& interface>
-void ClientSession::serveInterface(std::array<Method, interface.operations.size()>& methods) {
-    static const std::vector<sd_bus_vtable> table = methodTable(interface);  // the bus keeps no copy
-    for (std::size_t i = 0; i < methods.size(); ++i) methods[i] = {this, &interface.operations[i]};
-    if (bus_.bus())
-        sd_bus_add_object_vtable(bus_.bus(), nullptr, interface.path, interface.name, table.data(), methods.data());
+void ClientSession::serveInterface() {
+    static const std::vector<sd_bus_vtable> table = tableOf(interface);  // the bus keeps no copy
+    Method* const first = &methods_[methodCount_];
+    for (const wire::Operation& operation : interface.operations) methods_[methodCount_++] = {this, &operation};
+    if (bus_.bus()) sd_bus_add_object_vtable(bus_.bus(), nullptr, interface.path, interface.name, table.data(), first);
 }
 
-// One row for each operation; its offset selects the operation's place among the methods.
-std::vector<sd_bus_vtable> ClientSession::methodTable(const wire::Interface& interface) {
+// An operation's offset selects its place among the methods; a property is handed the first one.
+std::vector<sd_bus_vtable> ClientSession::tableOf(const wire::Interface& interface) {
     std::vector<sd_bus_vtable> rows{SD_BUS_VTABLE_START(0)};
     for (const wire::Operation& operation : interface.operations) {
         sd_bus_vtable row{};
@@ -70,20 +81,40 @@ std::vector<sd_bus_vtable> ClientSession::methodTable(const wire::Interface& int
         row.x.method.names = operation.argumentNames;
         rows.push_back(row);
     }
+    for (const wire::Property& property : interface.properties) {
+        sd_bus_vtable row{};
+        row.type = _SD_BUS_VTABLE_PROPERTY;
+        row.x.property.member = property.name;
+        row.x.property.signature = property.type;
+        row.x.property.get = onProperty;
+        rows.push_back(row);
+    }
+    if (interface.hasChangedSignal) {
+        sd_bus_vtable row{};
+        row.type = _SD_BUS_VTABLE_SIGNAL;
+        row.x.signal.member = wire::changedMember;
+        row.x.signal.signature = "";
+        row.x.signal.names = "";
+        rows.push_back(row);
+    }
     rows.push_back(SD_BUS_VTABLE_END);
     return rows;
 }
 
 void ClientSession::serve(SessionState& state) {
+    state_ = &state;
     while (true) {
         if (!work_) work_ = lifecycle_.beginWorkUnlessEnding();
         if (!work_) return;
         state.idleSince = 0;
         box_->sendPending();
+        announceChanges();
         if (state.isStopping || isCutOff_ || isAuthenticationOverdue()) break;
         const ServerBus::Step step = bus_.step();
         if (step == ServerBus::Step::Ended) return;
         countUnsent();
+        // What sd-bus answers by itself counts for nothing else.
+        if (bus_.unsentMessages() > 2 * limits_.requestsPerConnection) break;
         performWaiting();
         if (step == ServerBus::Step::Progress) continue;
         if (isIdle()) {
@@ -117,7 +148,7 @@ void ClientSession::perform(const wire::Operation& operation, RequestArguments a
     if (const auto index = wire::indexOf(operation))
         performRequest(*agent_, *index, std::move(arguments), std::move(reply));
     else
-        reply.send(host_->answer(operation));
+        performHostRequest(*host_, *agent_, operation, std::move(arguments), std::move(reply));
 }
 
 // The bus tells how many messages it has not sent, not how large they are. Others than replies are small.
@@ -150,13 +181,47 @@ int ClientSession::onCall(sd_bus_message* call, void* method, sd_bus_error* erro
     return session->handle(call, *operation, error);
 }
 
-// The peer may have executed another program since it was accepted: checked before each request.
+int ClientSession::onProperty(sd_bus*, const char*, const char*, const char* property, sd_bus_message* reply,
+                              void* anyMethod, sd_bus_error*) {
+    ClientSession& session = *static_cast<const Method*>(anyMethod)->session;
+    return session.isAllowed() ? appendProperty(reply, *session.host_, property) : -EACCES;
+}
+
+// The peer may have executed another program since it was accepted.
+bool ClientSession::isAllowed() {
+    if (isCutOff_) return false;
+    if (peer_.runsSameProgram()) return true;
+    log(Level::Error, "Dropping connection from %d: it runs another program now", peer_.processIdentifier());
+    isCutOff_ = true;
+    return false;
+}
+
+bool ClientSession::subscribe(Changes::Kinds kinds, SessionState& state) {
+    if (!subscription_)
+        subscription_ = host_->subscribe(peer_.user(), [news = news_, box = box_](Changes::Kinds told) {
+            news->fetch_or(told);
+            box->wake();
+        });
+    if (!subscription_) return false;
+    subscribed_ |= kinds;
+    state.isSubscribed = true;
+    return true;
+}
+
+// A client that has not taken what it was told before is told once for all changes meanwhile.
+void ClientSession::announceChanges() {
+    if (subscribed_ == 0 || bus_.unsentMessages() > 0) return;
+    const Changes::Kinds kinds = news_->exchange(0) & subscribed_;
+    if (kinds & Changes::followUps) announce(wire::followUpsInterface);
+    if (kinds & Changes::coverage) announce(wire::coverageInterface);
+}
+
+void ClientSession::announce(const wire::Interface& interface) {
+    if (sd_bus_emit_signal(bus_.bus(), interface.path, interface.name, wire::changedMember, "") < 0) isCutOff_ = true;
+}
+
 int ClientSession::handle(sd_bus_message* call, const wire::Operation& operation, sd_bus_error* error) {
-    if (!peer_.runsSameProgram()) {
-        log(Level::Error, "Dropping connection from %d: it runs another program now", peer_.processIdentifier());
-        isCutOff_ = true;
-        return 1;
-    }
+    if (!isAllowed()) return 1;
     // Unread replies count as open requests.
     const std::size_t open = openCalls_.size() + bus_.unsentMessages();
     if (open >= limits_.requestsPerConnection) {
@@ -166,6 +231,9 @@ int ClientSession::handle(sd_bus_message* call, const wire::Operation& operation
     }
     platform::Result<RequestArguments> arguments = readArguments(call, bus_.body(), bus_.byteOrder(), operation);
     if (!arguments) return sd_bus_error_set(error, wire::invalidArguments, arguments.error().text.c_str());
+    if (const Changes::Kinds kinds = subscriptionOf(operation); kinds && !subscribe(kinds, *state_))
+        return sd_bus_error_setf(error, wire::limitsExceeded, "a user may have %zu subscriptions",
+                                 Changes::mostOfOneUser);
     const RequestNumber request = ++lastRequest_;
     openCalls_.emplace(request, MessagePointer(sd_bus_message_ref(call)));
     waiting_.push_back({request, &operation, std::move(arguments).value()});

@@ -35,6 +35,7 @@ struct SessionState {
     std::atomic<bool> isGivenUp = false;   // it is to end as soon as nothing is under way
     // Since when nothing is under way, by the steady clock; 0 while something is.
     std::atomic<std::chrono::steady_clock::rep> idleSince = 0;
+    std::atomic<bool> isSubscribed = false;  // the client is told of changes
 };
 
 // What the sessions of one service share.
@@ -42,7 +43,7 @@ struct SessionSurroundings {
     const ServiceLimits& limits;
     RequestLine& line;
     ProcessLifecycle& lifecycle;
-    const HostRequests* host;  // null where the host answers nothing
+    HostRequests* host;  // null where the host answers nothing
 };
 
 class ClientSession final : public ReplySender {
@@ -62,12 +63,20 @@ private:
         ClientSession* session;
         const wire::Operation* operation;
     };
+    static constexpr std::size_t mostMethods = wire::operations.size() + wire::hostOperations.size() +
+                                               wire::followUpsOperations.size() + wire::coverageOperations.size();
     template <const wire::Interface& interface>
-    void serveInterface(std::array<Method, interface.operations.size()>& methods);
-    static std::vector<sd_bus_vtable> methodTable(const wire::Interface& interface);
+    void serveInterface();
+    static std::vector<sd_bus_vtable> tableOf(const wire::Interface& interface);
     static int onCall(sd_bus_message* call, void* method, sd_bus_error* error);
+    static int onProperty(sd_bus*, const char*, const char*, const char* property, sd_bus_message* reply,
+                          void* anyMethod, sd_bus_error*);
     int handle(sd_bus_message* call, const wire::Operation& operation, sd_bus_error* error);
     void perform(const wire::Operation& operation, RequestArguments arguments, PendingReply reply);
+    bool isAllowed();
+    bool subscribe(Changes::Kinds kinds, SessionState& state);
+    void announceChanges();
+    void announce(const wire::Interface& interface);
     void performWaiting();
     void countUnsent();
     bool isIdle() const { return openCalls_.empty() && bus_.unsentMessages() == 0; }
@@ -87,11 +96,11 @@ private:
     RequestLine& line_;
     RequestLine::Waiter waiter_;
     ProcessLifecycle& lifecycle_;
-    const HostRequests* const host_;
+    HostRequests* const host_;
     const std::chrono::steady_clock::time_point authenticationEnd_;
     platform::WorkInFlight work_;  // outlives the bus
-    std::array<Method, wire::operations.size()> agentMethods_;
-    std::array<Method, wire::hostOperations.size()> hostMethods_;
+    std::array<Method, mostMethods> methods_;
+    std::size_t methodCount_ = 0;
     ServerBus bus_;
     RequestNumber lastRequest_ = 0;
     std::unordered_map<RequestNumber, wire::MessagePointer> openCalls_;
@@ -100,6 +109,10 @@ private:
     std::size_t unsentBytes_ = 0;
     bool hasSentMuch_ = false;  // since memory was given back
     bool isCutOff_ = false;
+    Changes::Kinds subscribed_ = 0;
+    const std::shared_ptr<std::atomic<Changes::Kinds>> news_ = std::make_shared<std::atomic<Changes::Kinds>>();
+    Changes::Subscription subscription_;
+    SessionState* state_ = nullptr;  // while it serves
 };
 
 }  // namespace vrx::host

@@ -1,7 +1,5 @@
 #include "vrx/host/ipc/host_requests.h"
 
-#include "vrx/codec/core/keyed_archive.h"
-
 namespace vrx::host {
 
 using platform::Array;
@@ -27,11 +25,6 @@ std::optional<AgentStatus> agentStatus(const Value& value) {
     for (const Value& layer : *layers)
         if (const std::string* path = layer.asString()) status.profile.push_back(*path);
     return status;
-}
-
-// There is one operation.
-Value HostRequests::answer(const wire::Operation& /*operation*/) const {
-    return codec::archiveValue(valueOf(status_));
 }
 
 }  // namespace vrx::host

@@ -1,14 +1,18 @@
-// What the host answers its clients beside the agent: who runs here. Asking touches no record, follow-up or activity.
-// Any thread.
+// What the host answers its clients beside the agent. Any thread may call.
 #pragma once
 
 #include <cstdint>
+#include <functional>
+#include <memory>
 #include <optional>
 #include <string>
-#include <utility>
 #include <vector>
 
+#include "vrx/host/base/changes.h"
+#include "vrx/host/ipc/reply_box.h"
+#include "vrx/platform/date.h"
 #include "vrx/platform/value.h"
+#include "vrx/protocols/agent_protocol.h"
 #include "vrx/wire/names.h"
 
 namespace vrx::host {
@@ -27,15 +31,32 @@ platform::Value valueOf(const AgentStatus& status);
 // Null when the value is not one's. Keys that are not known are passed over.
 std::optional<AgentStatus> agentStatus(const platform::Value& value);
 
+struct ActivityState {
+    std::string identifier;
+    std::string state;                    // "scheduled", "running" or "ended"
+    std::optional<platform::Date> due{};  // while it is scheduled
+};
+
 class HostRequests {
 public:
-    explicit HostRequests(AgentStatus status) : status_(std::move(status)) {}
+    virtual ~HostRequests() = default;
 
-    // The archived root of the reply to one of wire::hostOperations.
-    platform::Value answer(const wire::Operation& operation) const;
+    virtual platform::Value status() const = 0;
 
-private:
-    const AgentStatus status_;
+    // What the settings app shows now.
+    virtual platform::Value pendingFollowUps() const = 0;
+    // Takes an item away as the user wishes; false when none is pending under the identifier.
+    virtual void dismissFollowUp(const std::string& identifier, VRXAgentProtocol& agent,
+                                 VRXAgentProtocol::Reply<bool> reply) const = 0;
+
+    // Null when the user has too many subscriptions.
+    virtual Changes::Subscription subscribe(uid_t user, std::function<void(Changes::Kinds)> tell) = 0;
+    // Calls once every change from then on is told.
+    virtual void whenChangesAreTold(std::function<void()> call) = 0;
+
+    virtual std::string localeIdentifier() const = 0;
+    virtual platform::Duration oneDayInterval() const = 0;
+    virtual std::vector<ActivityState> activities() const = 0;
 };
 
 }  // namespace vrx::host

@@ -44,6 +44,7 @@ public:
     std::optional<std::chrono::steady_clock::rep> idleSince() const;
     // Lets it end as soon as nothing is under way.
     void giveUp();
+    bool isSubscribed() const { return state_.isSubscribed; }
     bool isGivenUp() const { return state_.isGivenUp; }
     // From now on the client can send nothing more, and knows it from its write. Whether it has sent something that its
     // thread has not read; that is still answered. Only while no work is in flight and none can begin.

@@ -9,6 +9,7 @@
 #include <list>
 #include <map>
 #include <system_error>
+#include <tuple>
 
 #include "vrx/host/base/files.h"
 #include "vrx/host/base/repeated_line.h"
@@ -28,7 +29,7 @@ using platform::Result;
 class ServiceListenerFactory::Listener final : public platform::ServiceListener {
 public:
     Listener(sd_event* loop, int socket, const BundleLookup& bundles, ProcessLifecycle& lifecycle,
-             const ServiceLimits& limits, const HostRequests* host)
+             const ServiceLimits& limits, HostRequests* host)
         : loop_(loop),
           socket_(socket),
           bundles_(bundles),
@@ -140,7 +141,8 @@ private:
 
     // A user may have every seat that nobody else wants. When all are taken, the users who have more than the
     // newcomer's give one up, first of all the user with the most: the connection under which nothing has been under
-    // way for the longest time. It may read what has just come before it ends.
+    // way for the longest time, and one that is told of changes after all others. It may read what has just come before
+    // it ends.
     bool makeRoom(uid_t newcomer) {
         std::map<uid_t, std::size_t> seats;
         std::size_t taken = 0;
@@ -152,12 +154,12 @@ private:
         if (taken < limits_.connections) return true;
         if (connections_.size() >= 2 * limits_.connections) return false;  // those given up take their time
         ServiceConnection* chosen = nullptr;
-        std::pair<std::size_t, std::chrono::steady_clock::rep> best;
+        std::tuple<bool, std::size_t, std::chrono::steady_clock::rep> best;
         for (const auto& connection : connections_) {
             const auto idleSince = connection->idleSince();
             const std::size_t ofUser = seats[connection->peer().user()];
             if (connection->isGivenUp() || !idleSince || ofUser <= seats[newcomer]) continue;
-            const std::pair rank(ofUser, -*idleSince);
+            const std::tuple rank(!connection->isSubscribed(), ofUser, -*idleSince);
             if (chosen && rank <= best) continue;
             best = rank;
             chosen = connection.get();

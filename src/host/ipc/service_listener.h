@@ -29,7 +29,7 @@ public:
     // The event loop, the lookup and the lifecycle must outlive the factory, and the factory its listeners. So must
     // what the host answers, where it answers.
     ServiceListenerFactory(sd_event* loop, const BundleLookup& bundles, ProcessLifecycle& lifecycle,
-                           const ServiceLimits& limits = {}, const HostRequests* host = nullptr)
+                           const ServiceLimits& limits = {}, HostRequests* host = nullptr)
         : loop_(loop), bundles_(bundles), lifecycle_(lifecycle), limits_(limits), host_(host) {}
 
     // Takes the socket that the service manager passed, else binds one at the path. Clients can connect from now on and
@@ -50,7 +50,7 @@ private:
     const BundleLookup& bundles_;
     ProcessLifecycle& lifecycle_;
     const ServiceLimits limits_;
-    const HostRequests* const host_;
+    HostRequests* const host_;
     ListeningSocket socket_;
 };
 

@@ -5,8 +5,8 @@
 namespace vrx::host {
 
 FileWatch::FileWatch(sd_event* loop, std::vector<std::string> paths, platform::Duration pause,
-                     std::function<void()> onChange)
-    : pause_(pause), onChange_(std::move(onChange)), changes_(std::move(paths)) {
+                     std::function<void()> onChange, FolderChanges::Notice notice)
+    : pause_(pause), onChange_(std::move(onChange)), changes_(std::move(paths), notice) {
     pauseSource_ = addBootTimer(loop, onPause, this);
     if (changes_.file() >= 0) eventSource_ = addReadSource(loop, changes_.file(), onEvents, this);
 }

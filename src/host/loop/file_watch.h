@@ -16,7 +16,8 @@ class FileWatch {
 public:
     // A file need not exist, nor its folder; a path that ends in "/" is a folder with all in it. The event loop must
     // outlive the watch.
-    FileWatch(sd_event* loop, std::vector<std::string> paths, platform::Duration pause, std::function<void()> onChange);
+    FileWatch(sd_event* loop, std::vector<std::string> paths, platform::Duration pause, std::function<void()> onChange,
+              FolderChanges::Notice notice = FolderChanges::Notice::Closing);
     FileWatch(const FileWatch&) = delete;
     FileWatch& operator=(const FileWatch&) = delete;
 

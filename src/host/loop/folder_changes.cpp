@@ -38,8 +38,10 @@ bool isLink(const std::string& path) {
 
 }  // namespace
 
-FolderChanges::FolderChanges(std::vector<std::string> paths)
-    : paths_(std::move(paths)), file_(inotify_init1(IN_NONBLOCK | IN_CLOEXEC)) {
+FolderChanges::FolderChanges(std::vector<std::string> paths, Notice notice)
+    : paths_(std::move(paths)),
+      anything_(anything | (notice == Notice::Writing ? IN_MODIFY : 0u)),
+      file_(inotify_init1(IN_NONBLOCK | IN_CLOEXEC)) {
     if (file_)
         watchFolders();
     else  // the user's limit of inotify instances is reached
@@ -80,15 +82,15 @@ void FolderChanges::watchFolders() {
 void FolderChanges::addFile(const std::string& path) {
     const std::string folder = folderOf(path);
     if (isLink(folder)) add(folderOf(folder), coming);
-    watch(folder, anything);
-    if (const std::string real = resolved(path); real != path) add(folderOf(real), anything);
+    watch(folder, anything_);
+    if (const std::string real = resolved(path); real != path) add(folderOf(real), anything_);
 }
 
 void FolderChanges::addFolder(const std::string& path) {
     addFile(path + "file");
     std::error_code error;
     for (std::filesystem::directory_iterator entry(path, error), end; !error && entry != end; entry.increment(error))
-        if (isLink(entry->path())) add(folderOf(resolved(entry->path())), anything);
+        if (isLink(entry->path())) add(folderOf(resolved(entry->path())), anything_);
 }
 
 // Watches the folder, or while it is missing the nearest one above it. Returns whether it is there.
@@ -103,7 +105,7 @@ bool FolderChanges::add(const std::string& folder, std::uint32_t events) {
     const int number = inotify_add_watch(file_.number(), folder.c_str(), events | IN_ONLYDIR | IN_MASK_ADD);
     if (number < 0) return false;
     watches_.insert(number);
-    if (events == anything) fullWatches_.insert(number);
+    if (events == anything_) fullWatches_.insert(number);
     return true;
 }
 

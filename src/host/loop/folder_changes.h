@@ -3,6 +3,7 @@
 // that is missing is waited for in the nearest one above it. A question costs one system call. One thread at a time.
 #pragma once
 
+#include <cstdint>
 #include <set>
 #include <string>
 #include <vector>
@@ -13,8 +14,10 @@ namespace vrx::host {
 
 class FolderChanges {
 public:
+    // A change is noticed when the file is closed, or with each write, as of files that stay open.
+    enum class Notice : std::uint8_t { Closing, Writing };
     // A path that ends in "/" is a folder with everything in it; any other is a file.
-    explicit FolderChanges(std::vector<std::string> paths);
+    explicit FolderChanges(std::vector<std::string> paths, Notice notice = Notice::Closing);
 
     // Whether there may have been a change since the last call. True always when nothing can be watched.
     bool take();
@@ -29,6 +32,7 @@ private:
     bool add(const std::string& folder, std::uint32_t events);
 
     const std::vector<std::string> paths_;
+    const std::uint32_t anything_;  // of inotify's events
     Descriptor file_;
     std::set<int> watches_;
     std::set<int> fullWatches_;  // those among them of whose folder every change counts

@@ -1,5 +1,7 @@
 #include "vrx/host/loop/process_lifecycle.h"
 
+#include <utility>
+
 #include "vrx/platform/log.h"
 
 namespace vrx::host {
@@ -32,6 +34,17 @@ void ProcessLifecycle::setUnreadQuestion(std::function<bool()> hasUnread) {
     state_->hasUnread = std::move(hasUnread);
 }
 
+void ProcessLifecycle::callWhenIdle(std::function<void()> call) {
+    std::lock_guard lock(state_->mutex);
+    state_->idleCalls.push_back(std::move(call));
+    callIdle(*state_);
+}
+
+void ProcessLifecycle::callIdle(State& state) {
+    if (state.inFlight > 0 || !state.mainLoop) return;
+    for (auto& call : std::exchange(state.idleCalls, {})) state.mainLoop->post(std::move(call));
+}
+
 void ProcessLifecycle::setMainQueue(std::weak_ptr<platform::Queue> queue) {
     std::lock_guard lock(state_->mutex);
     state_->mainQueue = std::move(queue);
@@ -47,6 +60,7 @@ WorkInFlight ProcessLifecycle::begin(const std::shared_ptr<State>& state) {
     return {state.get(), [state](void*) {
                 std::lock_guard lock(state->mutex);
                 --state->inFlight;
+                callIdle(*state);
                 considerEnd(state);
             }};
 }

@@ -5,6 +5,7 @@
 #include <functional>
 #include <memory>
 #include <mutex>
+#include <vector>
 
 #include "vrx/host/loop/main_loop.h"
 #include "vrx/platform/process_lifecycle.h"
@@ -27,6 +28,9 @@ public:
     // begins work. It is asked on the main thread while no work is in flight and none can begin. Main thread.
     void setUnreadQuestion(std::function<bool()> hasUnread);
 
+    // Calls on the main thread as soon as no work is in flight.
+    void callWhenIdle(std::function<void()> call);
+
     // The end is decided after the tasks that this queue holds at the time: they may begin work.
     void setMainQueue(std::weak_ptr<platform::Queue> queue);
 
@@ -41,12 +45,14 @@ private:
         MainLoop* mainLoop;  // null once the lifecycle is gone
         std::weak_ptr<platform::Queue> mainQueue;
         std::function<bool()> hasUnread;
+        std::vector<std::function<void()>> idleCalls;
         int inFlight = 0;
         bool isExitWanted = false;
         bool isEnding = false;
     };
     static platform::WorkInFlight begin(const std::shared_ptr<State>& state);
     static void endIfIdle(State& state);
+    static void callIdle(State& state);
     static void considerEnd(const std::shared_ptr<State>& state);
 
     const std::shared_ptr<State> state_;
