@@ -9,8 +9,6 @@
 #include <cstdio>
 #include <cstring>
 
-#include "vrx/platform/limits.h"
-
 namespace vrx::host {
 
 using platform::Data;
@@ -74,7 +72,7 @@ MaybeError syncFolder(const std::string& folder) {
 
 }  // namespace
 
-Result<FileContent> readFile(const std::string& path) {
+Result<FileContent> readFile(const std::string& path, std::size_t limit) {
     OpenFile file(path.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY);
     if (!file) return systemError("open", path, errno);
     FileContent content;
@@ -82,7 +80,6 @@ Result<FileContent> readFile(const std::string& path) {
     if (!S_ISREG(content.status.st_mode)) return systemError("read", path, EINVAL);
 
     // The size is only a first guess: the file may grow meanwhile, and those of /proc and /sys have none.
-    constexpr std::size_t limit = platform::limits::fileBytes;
     std::size_t size = 0;
     Data& bytes = content.bytes;
     bytes.resize(std::min(static_cast<std::size_t>(content.status.st_size), limit) + 1);
