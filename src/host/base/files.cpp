@@ -9,8 +9,6 @@
 #include <cstdio>
 #include <cstring>
 
-#include "vrx/platform/limits.h"
-
 namespace vrx::host {
 
 using platform::Data;
@@ -72,22 +70,17 @@ MaybeError syncFolder(const std::string& folder) {
     return std::nullopt;
 }
 
-}  // namespace
-
-Result<FileContent> readFile(const std::string& path) {
-    OpenFile file(path.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY);
-    if (!file) return systemError("open", path, errno);
+Result<FileContent> readOpenFile(int file, const std::string& path, std::size_t limit) {
     FileContent content;
-    if (::fstat(file.number(), &content.status) != 0) return systemError("examine", path, errno);
+    if (::fstat(file, &content.status) != 0) return systemError("examine", path, errno);
     if (!S_ISREG(content.status.st_mode)) return systemError("read", path, EINVAL);
 
     // The size is only a first guess: the file may grow meanwhile, and those of /proc and /sys have none.
-    constexpr std::size_t limit = platform::limits::fileBytes;
     std::size_t size = 0;
     Data& bytes = content.bytes;
     bytes.resize(std::min(static_cast<std::size_t>(content.status.st_size), limit) + 1);
     while (true) {
-        ssize_t count = ::read(file.number(), bytes.data() + size, bytes.size() - size);
+        ssize_t count = ::read(file, bytes.data() + size, bytes.size() - size);
         if (count < 0 && errno == EINTR) continue;
         if (count < 0) return systemError("read", path, errno);
         if (count == 0) break;
@@ -97,6 +90,21 @@ Result<FileContent> readFile(const std::string& path) {
     }
     bytes.resize(size);
     return content;
+}
+
+}  // namespace
+
+Result<FileContent> readFile(const std::string& path, std::size_t limit) {
+    const OpenFile file(path.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY);
+    if (!file) return systemError("open", path, errno);
+    return readOpenFile(file.number(), path, limit);
+}
+
+Result<FileContent> readFileIn(const Descriptor& folder, const std::string& path, std::size_t limit) {
+    constexpr int flags = O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC;
+    const Descriptor file(::openat(folder.number(), path.c_str(), flags));
+    if (!file) return systemError("open", path, errno);
+    return readOpenFile(file.number(), path, limit);
 }
 
 // The temporary file has one name for each target. Writers of the same target take turns by a lock on it. One that a

@@ -6,11 +6,14 @@
 #include <sys/types.h>
 
 #include <cerrno>
+#include <cstddef>
 #include <span>
 #include <string>
 #include <string_view>
 
+#include "vrx/host/base/descriptor.h"
 #include "vrx/platform/files.h"
+#include "vrx/platform/limits.h"
 
 namespace vrx::host {
 
@@ -21,8 +24,10 @@ struct FileContent {
     std::string_view text() const { return {reinterpret_cast<const char*>(bytes.data()), bytes.size()}; }
 };
 
-// Reads a regular file of at most limits::fileBytes. Anything else is an error. Never blocks, not even on a FIFO.
-platform::Result<FileContent> readFile(const std::string& path);
+// Reads a regular file of at most that many bytes. Anything else is an error. Never blocks, not even on a FIFO.
+platform::Result<FileContent> readFile(const std::string& path, std::size_t limit = platform::limits::fileBytes);
+// The same, by a relative path that starts at the open folder; its last part must be no link.
+platform::Result<FileContent> readFileIn(const Descriptor& folder, const std::string& path, std::size_t limit);
 
 // Replaces or creates the file, with mode 0600. After success it holds the whole new content, also after a power cut;
 // after an error it holds the old one. Only when the last step fails, making the new name durable, may the new content

@@ -30,8 +30,17 @@ bool isSameFile(const std::string& one, const std::string& other) {
            oneStatus.st_dev == otherStatus.st_dev && oneStatus.st_ino == otherStatus.st_ino;
 }
 
-void logWhyNone(const std::string& executable, const platform::Error& error) {
-    if (error.code != ENOENT) log(Level::Default, "%@ has no bundle: %@", executable, error.text);
+void logWhyNone(const std::string& program, const platform::Error& error) {
+    if (error.code != ENOENT) log(Level::Default, "%@ has no bundle: %@", program, error.text);
+}
+
+std::string linkToProgram(const PeerIdentity& peer) {
+    return "/proc/" + std::to_string(peer.processIdentifier()) + "/exe";
+}
+
+// As if its bundle.toml lay beside the program.
+BundleFile fileOf(const ProfileBundle& bundle, const std::string& program) {
+    return {program, bundle.identifier, bundle.name, bundle.vendor, bundle.group, bundle.entitlements};
 }
 
 bool isGroup(gid_t number, const std::string& name) {
@@ -54,29 +63,50 @@ BundleLookup::Acceptance::~Acceptance() {
 
 std::size_t BundleLookup::executablePath(std::int32_t processIdentifier, std::span<char> buffer) const {
     const bool isUnderAcceptance = peerUnderAcceptance && peerUnderAcceptance->processIdentifier() == processIdentifier;
-    const std::string path =
-        isUnderAcceptance ? peerUnderAcceptance->executable() : executableOfProcess(processIdentifier);
+    const std::string path = isUnderAcceptance ? pathOf(*peerUnderAcceptance) : executableOfProcess(processIdentifier);
     if (path.size() > buffer.size()) return 0;
     std::copy(path.begin(), path.end(), buffer.begin());
     return path.size();
 }
 
 std::optional<Bundle> BundleLookup::bundleContaining(const std::string& executablePath) const {
+    if (peerUnderAcceptance && executablePath == pathOf(*peerUnderAcceptance)) {
+        const Result<PeerBundle> found = find(*peerUnderAcceptance);
+        if (!found) return std::nullopt;
+        return Bundle{found->file.folder, found->file.identifier};
+    }
     std::optional<BundleFile> file = bundleOf(executablePath);
     if (!file) return std::nullopt;
     return Bundle{file->folder, file->identifier};
 }
 
 Result<Value> BundleLookup::entitlement(const PeerIdentity& peer, std::string_view name) const {
-    const Result<BundleFile> file = find(peer.executable());
-    if (!file) {
-        if (isShortage(file.error().code)) return file.error();
-        logWhyNone(peer.executable(), file.error());
+    const Result<PeerBundle> found = find(peer);
+    if (!found) {
+        if (isShortage(found.error().code)) return found.error();
+        logWhyNone(describe(peer), found.error());
         return Value();
     }
-    if (file->group && !isGroup(peer.group(), *file->group)) return Value();
-    auto entry = file->entitlements.find(name);
-    return entry == file->entitlements.end() ? Value() : entry->second;
+    const BundleFile& file = found->file;
+    if (file.group && (found->isFlatpak || !isGroup(peer.group(), *file.group))) return Value();
+    auto entry = file.entitlements.find(name);
+    return entry == file.entitlements.end() ? Value() : entry->second;
+}
+
+std::string BundleLookup::describe(const PeerIdentity& peer) const {
+    const Result<std::string>& application = peer.flatpakApplication();
+    if (application) {
+        const Result<PeerBundle> found = find(peer);
+        std::string text = "the Flatpak application " + *application;
+        if (found && found->isFlatpak && found->file.group)
+            text += ", which cannot prove the group " + *found->file.group + " that its bundle requires,";
+        return text;
+    }
+    if (!peer.executable().empty()) return peer.executable();
+    std::string text = "process " + std::to_string(peer.processIdentifier()) + ", whose program cannot be told";
+    if (application.error().code != ENOENT)
+        text += ", nor whether it is of a Flatpak application: " + application.error().text;
+    return text + ",";
 }
 
 std::optional<BundleFile> BundleLookup::bundleOf(const std::string& executable) const {
@@ -84,6 +114,35 @@ std::optional<BundleFile> BundleLookup::bundleOf(const std::string& executable) 
     if (file) return std::move(file).value();
     logWhyNone(executable, file.error());
     return std::nullopt;
+}
+
+// By its program first, because that one may have a group.
+Result<BundleLookup::PeerBundle> BundleLookup::find(const PeerIdentity& peer) const {
+    Result<BundleFile> byProgram = find(peer.executable());
+    if (byProgram) return PeerBundle{std::move(byProgram).value()};
+    if (isShortage(byProgram.error().code)) return byProgram.error();
+    Result<BundleFile> byFlatpak = findFlatpak(peer);
+    if (byFlatpak) return PeerBundle{std::move(byFlatpak).value(), true};
+    const bool tellsFlatpaks = byProgram.error().code == ENOENT || isShortage(byFlatpak.error().code);
+    return tellsFlatpaks ? byFlatpak.error() : byProgram.error();
+}
+
+// Does not look at the process unless there is such a bundle.
+Result<BundleFile> BundleLookup::findFlatpak(const PeerIdentity& peer) const {
+    const std::shared_ptr<const ProfileContent> content = profile_ ? profile_() : nullptr;
+    const auto isOfFlatpak = [](const ProfileBundle& bundle) { return bundle.flatpak.has_value(); };
+    if (!content || std::ranges::none_of(content->bundles, isOfFlatpak))
+        return systemError("find", "a bundle of a Flatpak application", ENOENT);
+    const Result<std::string>& application = peer.flatpakApplication();
+    if (!application) return application.error();
+    for (const ProfileBundle& bundle : content->bundles)
+        if (bundle.flatpak == *application && bundle.source.isTrusted()) return fileOf(bundle, linkToProgram(peer));
+    return systemError("find", "a bundle of the Flatpak application " + *application, ENOENT);
+}
+
+// Of a program that cannot be told otherwise, the link if it is of use.
+std::string BundleLookup::pathOf(const PeerIdentity& peer) const {
+    return peer.executable().empty() && find(peer) ? linkToProgram(peer) : peer.executable();
 }
 
 Result<BundleFile> BundleLookup::find(const std::string& executable) const {
@@ -103,9 +162,7 @@ std::optional<BundleFile> BundleLookup::profileBundle(const std::string& executa
     if (!content) return std::nullopt;
     for (const ProfileBundle& bundle : content->bundles)
         for (const std::string& named : bundle.executables)
-            if (isSameFile(named, executable) && bundle.source.isTrusted())
-                return BundleFile{executable,    bundle.identifier, bundle.name,
-                                  bundle.vendor, bundle.group,      bundle.entitlements};
+            if (isSameFile(named, executable) && bundle.source.isTrusted()) return fileOf(bundle, executable);
     return std::nullopt;
 }
 

@@ -1,6 +1,7 @@
 // Finds a caller's bundle, and what it is entitled to. The bundle is the nearest folder above the program that holds a
-// bundle.toml. There is none if others can change the program, the file or a folder above them. For testers, the device
-// profile can make programs such as busctl bundles of their own, while it is trusted itself. Any thread may ask.
+// bundle.toml. There is none if others can change the program, the file or a folder above them. The device profile can
+// make programs such as busctl, and Flatpak applications, bundles of their own, while it is trusted itself. Any thread
+// may ask.
 #pragma once
 
 #include <functional>
@@ -22,7 +23,8 @@ public:
 
     explicit BundleLookup(Profile profile = nullptr) : profile_(std::move(profile)) {}
 
-    // For the peer under acceptance, the path as it was identified; for any other process, as /proc tells.
+    // For the peer under acceptance, the path as it was identified, or, of a Flatpak application whose program is not
+    // to be seen from here, the link to it in /proc; for any other process, as /proc tells.
     std::size_t executablePath(std::int32_t processIdentifier, std::span<char> buffer) const override;
     std::optional<platform::Bundle> bundleContaining(const std::string& executablePath) const override;
 
@@ -32,7 +34,11 @@ public:
     // The bundle of a program, whoever runs it. For tools.
     std::optional<BundleFile> bundleOf(const std::string& executable) const;
 
-    // While one is alive on a thread, executablePath() there answers for the peer from its identity.
+    // Who the peer is, for the text of a refusal: "/usr/bin/viewer", or "process 7, whose program cannot be told,".
+    std::string describe(const PeerIdentity& peer) const;
+
+    // While one is alive on a thread, executablePath() and bundleContaining() there answer for the peer from its
+    // identity.
     class Acceptance {
     public:
         explicit Acceptance(const PeerIdentity& peer);
@@ -42,9 +48,19 @@ public:
     };
 
 private:
+    struct PeerBundle {
+        BundleFile file;
+        // It is the sandbox that tells, not the program. A user can make such a sandbox around any program, around one
+        // with a group as well, so that the group proves nothing of the application.
+        bool isFlatpak = false;
+    };
+
     // An error with ENOENT when there is none.
+    platform::Result<PeerBundle> find(const PeerIdentity& peer) const;
     platform::Result<BundleFile> find(const std::string& executable) const;
+    platform::Result<BundleFile> findFlatpak(const PeerIdentity& peer) const;
     std::optional<BundleFile> profileBundle(const std::string& executable) const;
+    std::string pathOf(const PeerIdentity& peer) const;
 
     const Profile profile_;
 };

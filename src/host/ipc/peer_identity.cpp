@@ -13,7 +13,9 @@
 #include <fstream>
 #include <sstream>
 
+#include "vrx/codec/key_file.h"
 #include "vrx/host/base/files.h"
+#include "vrx/host/base/text.h"
 
 namespace vrx::host {
 
@@ -21,6 +23,7 @@ using platform::Result;
 
 namespace {
 
+constexpr std::size_t mostSandboxFileBytes = 64 * 1024;
 constexpr int peerPidfdOption = 77;  // SO_PEERPIDFD, since Linux 6.5; the headers do not have it yet
 
 bool isSameFile(const struct stat& one, const struct stat& other) {
@@ -107,6 +110,27 @@ platform::MaybeError PeerIdentity::findExecutable() {
     if (program_ && fstat(program_.number(), &programStatus_) == 0)
         executable_ = pathOfProgram(process_, programStatus_);
     return std::nullopt;
+}
+
+// What failed for want of descriptors may work the next time.
+const Result<std::string>& PeerIdentity::flatpakApplication() const {
+    if (!flatpakApplication_ || (!*flatpakApplication_ && isShortage(flatpakApplication_->error().code)))
+        flatpakApplication_.emplace(readFlatpakApplication());
+    return *flatpakApplication_;
+}
+
+// Through the process's own folder, whose root is the one that the process sees.
+Result<std::string> PeerIdentity::readFlatpakApplication() const {
+    const std::string path = "root/.flatpak-info";
+    const std::string whole = "/proc/" + std::to_string(processIdentifier()) + "/" + path;
+    const Result<FileContent> file = readFileIn(process_, path, mostSandboxFileBytes);
+    if (!file) return systemError("read", whole, file.error().code);
+    std::optional<std::string> name;
+    const bool isRead = codec::readKeyFile(file->text(), "Application", [&](auto key, auto value) {
+        if (key == "name" && !name) name = value;
+    });
+    if (isRead && name && isApplicationIdentifier(*name)) return *name;
+    return systemError("find", "an application in " + whole, EINVAL);
 }
 
 bool PeerIdentity::runsSameProgram() const {

@@ -7,6 +7,7 @@
 #include <sys/stat.h>
 #include <sys/types.h>
 
+#include <optional>
 #include <string>
 
 #include "vrx/host/base/descriptor.h"
@@ -30,18 +31,26 @@ public:
     // another file is at that path by now.
     const std::string& executable() const { return executable_; }
 
+    // The identifier of the Flatpak application in whose sandbox the peer runs, from the file that Flatpak puts at the
+    // sandbox's root. An error with ENOENT when there is none, another when the file cannot be read, as another user's,
+    // or names no application. Read when first asked for, and the same from then on. Proves no more than executable():
+    // users can give their processes any root.
+    const platform::Result<std::string>& flatpakApplication() const;
+
     // Whether the peer still lives and runs the program that it ran when it was identified.
     bool runsSameProgram() const;
 
 private:
     PeerIdentity() = default;
     platform::MaybeError findExecutable();
+    platform::Result<std::string> readFlatpakApplication() const;
 
     ucred credentials_{};
     Descriptor process_;  // /proc/PID of this very process
     Descriptor program_;  // the program's file, held so that its inode is not used again
     struct stat programStatus_ {};
     std::string executable_;
+    mutable std::optional<platform::Result<std::string>> flatpakApplication_;
 };
 
 // The path of the program that a process runs, like PeerIdentity::executable(), but not race-free.

@@ -84,9 +84,7 @@ bool ServiceConnection::hasUnread() const {
 }
 
 std::string ServiceConnection::refusal() const {
-    const std::string caller = peer_.executable().empty() ? "process " + std::to_string(peer_.processIdentifier()) +
-                                                                ", whose program cannot be told,"
-                                                          : peer_.executable();
+    const std::string caller = bundles_.describe(peer_);
     return missingEntitlement_.empty() ? caller + " is not served"
                                        : caller + " does not hold the entitlement " + missingEntitlement_;
 }

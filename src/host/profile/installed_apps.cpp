@@ -4,7 +4,6 @@
 #include <filesystem>
 #include <set>
 
-#include "vrx/host/profile/bundle_file.h"
 #include "vrx/platform/log.h"
 
 namespace vrx::host {
@@ -34,13 +33,21 @@ InstalledAppRecord InstalledApps::record(const std::string& bundleIdentifier) co
     for (const std::string& folder : content->applicationFolders) {
         for (const std::string& candidate : candidates(folder)) {
             platform::Result<BundleFile> bundle = readBundleFile(candidate);
-            if (bundle && bundle->identifier == bundleIdentifier)
-                return {.isInstalled = true, .vendorName = bundle->vendor, .localizedName = bundle->name};
+            if (bundle && bundle->identifier == bundleIdentifier) return recordOf(*bundle);
             if (!bundle && bundle.error().code != ENOENT)
                 log(platform::Level::Default, "Not taken for an installed application: %@", bundle.error().text);
         }
     }
     return {};
+}
+
+InstalledAppRecord InstalledApps::recordOf(const BundleFile& bundle) const {
+    InstalledAppRecord record{.isInstalled = true, .vendorName = bundle.vendor, .localizedName = bundle.name};
+    if (record.vendorName && record.localizedName) return record;
+    const AppTexts texts = readAppTexts(*bundle.identifier, profile_.preferredLocaleIdentifier(), sharedFolders_);
+    if (!record.vendorName) record.vendorName = texts.vendor;
+    if (!record.localizedName) record.localizedName = texts.name;
+    return record;
 }
 
 std::vector<std::string> InstalledApps::problems() const {

@@ -28,7 +28,7 @@ struct ProfileFile {
     bool isTrusted() const { return !findOpenToOthers(); }
 };
 
-// Executables that a tester has made into a bundle.
+// Programs that the profile makes into a bundle.
 struct ProfileBundle {
     std::vector<std::string> executables;  // absolute paths
     std::string identifier;
@@ -37,6 +37,7 @@ struct ProfileBundle {
     std::optional<std::string> group;   // only callers whose group this is hold the entitlements
     platform::Dictionary entitlements;  // booleans, numbers, texts and lists of texts
     ProfileFile source = {};
+    std::optional<std::string> flatpak = {};  // the identifier of a Flatpak application, whatever program of it runs
 };
 
 // The user's cloud account.

@@ -92,6 +92,13 @@ public:
         return path;
     }
 
+    std::optional<std::string> applicationIdentifier(const char* key) {
+        std::optional<std::string> identifier = string(key);
+        if (identifier && !isApplicationIdentifier(*identifier))
+            reject(key, *find(key), "the identifier of an application");
+        return identifier;
+    }
+
     std::vector<std::string> absolutePaths(const char* key) {
         std::vector<std::string> paths = strings(key);
         if (!std::ranges::all_of(paths, [](const std::string& path) { return path.starts_with('/'); }))
@@ -333,6 +340,7 @@ ProfileBundle readBundle(Table& table) {
     ProfileBundle bundle;
     bundle.source = table.source();
     bundle.executables = table.strings("executables");
+    bundle.flatpak = table.applicationIdentifier("flatpak");
     bundle.identifier = table.requiredString("identifier");
     bundle.name = table.string("name");
     bundle.vendor = table.string("vendor");

@@ -33,7 +33,26 @@ protected:
         return bundle ? bundle->identifier : std::nullopt;
     }
 
+    // A program of the bundle that connects to the listener, and stays until its input ends.
+    struct Client {
+        FILE* process;
+        Descriptor socket;
+        PeerIdentity identify() const { return PeerIdentity::ofPeer(socket.number()).value(); }
+    };
+    Client connect(const std::string& path, const std::string& before = "", const std::string& runner = "") {
+        copyProgram("/usr/bin/perl", viewer);
+        FILE* process =
+            popen((runner + viewer + " -MSocket -e '" + before +
+                   ";socket(S,AF_UNIX,SOCK_STREAM,0);connect(S,pack_sockaddr_un(\"" + path + "\"))||die;<STDIN>' >&2")
+                      .c_str(),
+                  "w");
+        pollfd incoming{listener.number(), POLLIN, 0};
+        if (poll(&incoming, 1, 60'000) != 1) throw std::runtime_error("nobody connects");
+        return {process, Descriptor(accept(listener.number(), nullptr, nullptr))};
+    }
+
     const std::string viewer = folder / "app/bin/viewer";
+    ListeningSocket listener;
 };
 
 TEST_F(BundleLookupTest, FindsTheNearestBundleFile) {
@@ -93,18 +112,9 @@ TEST_F(BundleLookupTest, TakesTestersBundlesFromATrustedProfile) {
 }
 
 TEST_F(BundleLookupTest, EntitlesThePeerByItsProgramAndGroup) {
-    // A program of the bundle that connects, and stays until its input ends.
-    copyProgram("/usr/bin/perl", viewer);
-    ListeningSocket listener;
     ASSERT_FALSE(listener.open(folder / "socket"));
-    FILE* process = popen((viewer + " -MSocket -e 'socket(S,AF_UNIX,SOCK_STREAM,0);connect(S,pack_sockaddr_un(\"" +
-                           folder / "socket\"))||die;<STDIN>' >&2")
-                              .c_str(),
-                          "w");
-    pollfd incoming{listener.number(), POLLIN, 0};
-    ASSERT_EQ(poll(&incoming, 1, 60'000), 1);
-    const Descriptor client(accept(listener.number(), nullptr, nullptr));
-    PeerIdentity peer = PeerIdentity::ofPeer(client.number()).value();
+    const Client client = connect(folder / "socket");
+    PeerIdentity peer = client.identify();
     EXPECT_EQ(peer.executable(), viewer);
     EXPECT_TRUE(peer.runsSameProgram());
 
@@ -127,9 +137,83 @@ TEST_F(BundleLookupTest, EntitlesThePeerByItsProgramAndGroup) {
     facts->bundles[0].group = getgrgid(getgid())->gr_name;
     EXPECT_EQ(entitlement("e", tester), Value(true));
 
-    pclose(process);
+    facts->bundles[0].executables.clear();
+    facts->bundles[0].flatpak = "com.example.Viewer";
+    EXPECT_TRUE(entitlement("e", tester).isNull()) << "it is in no sandbox";
+    EXPECT_EQ(tester.describe(peer), viewer);
+
+    pclose(client.process);
     EXPECT_FALSE(peer.runsSameProgram());
-    EXPECT_FALSE(PeerIdentity::ofPeer(client.number()));
+    EXPECT_FALSE(PeerIdentity::ofPeer(client.socket.number()));
+}
+
+TEST_F(BundleLookupTest, KnowsAFlatpakApplicationByWhatItsSandboxSays) {
+    const std::string runner = geteuid() == 0 ? "" : "unshare -r ";
+    if (!runner.empty() && system("unshare -r true") != 0) GTEST_SKIP() << "no user name spaces here";
+    ASSERT_FALSE(listener.open(folder / "socket"));
+    const Client client = connect("/socket", "chroot(\"" + folder.path() + "\")||die", runner);
+    std::filesystem::remove(viewer);  // a sandbox's program is not to be seen from here
+    const std::string link = "/proc/" + std::to_string(client.identify().processIdentifier()) + "/exe";
+    const std::string info = folder / ".flatpak-info";
+    const std::string mine = "[Application]\nname=com.example.Viewer\n[Instance]\nname=other\n";
+
+    auto facts = std::make_shared<ProfileContent>();
+    facts->bundles.push_back(
+        {{"/usr/bin/other"}, "com.example.other", {}, {}, {}, {{"e", false}}, {}, "com.example.O"});
+    facts->bundles.push_back({{}, "com.example.viewer", {}, {}, {}, {{"e", true}}, {}, "com.example.Viewer"});
+    const BundleLookup lookup([facts] { return facts; });
+    // Its entitlement, and the identifier of its bundle; a process is looked at afresh for each connection.
+    const auto told = [&] {
+        const PeerIdentity peer = client.identify();
+        const BundleLookup::Acceptance acceptance(peer);
+        std::array<char, 4096> buffer;
+        const std::string path(buffer.data(), lookup.executablePath(peer.processIdentifier(), buffer));
+        const auto bundle = lookup.bundleContaining(path);
+        EXPECT_EQ(path, bundle ? link : "");
+        const bool isEntitled = lookup.entitlement(peer, "e").value() == Value(true);
+        return (isEntitled ? "entitled as " : "") + (bundle ? *bundle->identifier : "nobody");
+    };
+    const std::string viewerItself = "entitled as com.example.viewer";
+    const auto described = [&] { return lookup.describe(client.identify()); };
+
+    EXPECT_EQ(told(), "nobody");
+    const std::string unknown =
+        "process " + std::to_string(client.identify().processIdentifier()) + ", whose program cannot be told,";
+    EXPECT_EQ(described(), unknown);
+    for (const std::string& other :
+         {std::string("[Runtime]\nname=com.example.Viewer\n"), std::string("name=com.example.Viewer\n"),
+          "[Application]\nname=com.example/Viewer\n" + mine, mine + "line\n", mine + std::string(65'536, '#')}) {
+        writeFile(info, other);
+        EXPECT_EQ(told(), "nobody") << other.substr(0, 100);
+        EXPECT_THAT(described(),
+                    testing::StartsWith(unknown.substr(0, unknown.size() - 1) + ", nor whether it is of a Flatpak"));
+    }
+    writeFile(info, "[Application]\nname=com.example.Else\n" + mine);
+    EXPECT_EQ(told(), "nobody") << "the first name counts";
+    EXPECT_EQ(described(), "the Flatpak application com.example.Else");
+    writeFile(info, mine);
+    EXPECT_EQ(told(), viewerItself);
+    EXPECT_EQ(described(), "the Flatpak application com.example.Viewer");
+
+    facts->bundles[1].group = getgrgid(getgid())->gr_name;
+    EXPECT_EQ(told(), "com.example.viewer") << "whatever the group";
+    EXPECT_EQ(described(), "the Flatpak application com.example.Viewer, which cannot prove the group " +
+                               *facts->bundles[1].group + " that its bundle requires,");
+    facts->bundles[1].group.reset();
+    facts->bundles[1].source.path = folder / "device.toml";
+    writeFile(folder / "device.toml", "");
+    folder.setMode("device.toml", 0666);
+    EXPECT_EQ(told(), "nobody");
+    folder.setMode("device.toml", 0644);
+    EXPECT_EQ(told(), viewerItself);
+
+    std::filesystem::rename(info, folder / "moved");
+    std::filesystem::create_symlink("moved", info);
+    EXPECT_EQ(told(), "nobody") << "a link";
+    std::filesystem::remove(info);
+    mkfifo(info.c_str(), 0644);
+    EXPECT_EQ(told(), "nobody") << "a FIFO, which nobody writes";
+    pclose(client.process);
 }
 
 TEST_F(BundleLookupTest, ListensInThePlaceOfADeadAgentOnly) {

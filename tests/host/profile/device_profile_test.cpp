@@ -58,6 +58,7 @@ mcc = "02"
 
 [[bundles]]
 executables = ["/usr/bin/busctl"]
+flatpak = "com.example.Tester"
 identifier = "com.example.tester"
 entitlements = { "com.example.flag" = true, list = ["a"] }
 )";
@@ -110,6 +111,7 @@ TEST_F(DeviceProfileTest, GivesEveryFactOfTheFile) {
     EXPECT_TRUE(facts->http.caFile == "/etc/ca.pem" && facts->http.namesApplications);
     ASSERT_EQ(facts->bundles.size(), 1u);
     EXPECT_THAT(facts->bundles[0].executables, ElementsAre("/usr/bin/busctl"));
+    EXPECT_EQ(facts->bundles[0].flatpak, "com.example.Tester");
     EXPECT_EQ(facts->bundles[0].entitlements.at("com.example.flag"), Value(true));
     EXPECT_TRUE(facts->bundles[0].source.isTrusted());
     EXPECT_THAT(log.lines(), ElementsAre());
@@ -155,6 +157,8 @@ TEST_F(DeviceProfileTest, AFileThatIsWrongIsReportedOnceWithItsLineAndTheLastGoo
         {"[watches]\nname = 'X'", ":1: watches must be a list of tables, [[watches]]; "},
         {"[activities]\nminimum_interval = -1", ":2: activities.minimum_interval must be a number of seconds; "},
         {"\n[[bundles]]\nexecutables = ['/bin/x']", ":2: bundles[0].identifier is missing; "},
+        {"[[bundles]]\nidentifier = 'x'\nflatpak = 'com/x'",
+         ":3: bundles[0].flatpak must be the identifier of an application; "},
         {"[account]\nidentifier = \"a\\nb\"", ":2: account.identifier must be without control characters; "},
         {"[account]\ncredential_helper = ['helper']",
          ":2: account.credential_helper must be a list that begins with an absolute path; "},
