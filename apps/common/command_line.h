@@ -68,6 +68,8 @@ public:
     // Reads the arguments, runs the verb, prints its outcome and returns the program's exit code.
     int run(int argc, const char* const* argv);
 
+    // Each document stands on a line of its own from now on, as with --watch.
+    void showLines() { isWatch_ = true; }
     // Prints an outcome while the verb goes on. Returns whether it could be written.
     bool show(const Outcome& outcome) const;
 

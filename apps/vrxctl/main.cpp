@@ -7,6 +7,7 @@
 #include "common/progress.h"
 #include "vrx/client/agent_connection.h"
 #include "vrx/platform/text.h"
+#include "vrxctl/watch.h"
 
 namespace vrx::apps {
 namespace {
@@ -125,26 +126,33 @@ const char* adviceFor(Failure::Refusal refusal) {
     return "Correct the argument; vrxctl --help tells what is wanted.";
 }
 
-// Shows the agent's answer, or explains why there is none.
-template <class T, class Show>
-Outcome outcomeOf(const AgentConnection& agent, const Answer<T>& answer, Show show) {
-    if (answer) return show(*answer);
-    const Failure& failure = answer.failure();
+}  // namespace
+
+Outcome outcomeOfFailure(const Failure& failure, const std::string& socket, platform::Duration limit) {
     switch (failure.kind) {
         case Failure::Kind::NotReachable:
             return failed(ExitCode::NotReachable, failure.text,
-                          "Is vrxagent running with the socket " + agent.socketPath() +
-                              "? Start it: " + unitCommand("start", agent.socketPath()) +
+                          "Is vrxagent running with the socket " + socket +
+                              "? Start it: " + unitCommand("start", socket) +
                               "; or name its socket with --socket. vrxhost doctor tells what is wrong.");
         case Failure::Kind::Refused: return failed(ExitCode::Refused, failure.text, adviceFor(failure.refusal));
         case Failure::Kind::TimedOut:
-            return failed(ExitCode::TimedOut, failure.text + ": " + secondsText(agent.timeLimit().count()),
+            return failed(ExitCode::TimedOut, failure.text + ": " + secondsText(limit.count()),
                           "The agent may still do what was asked. Try again, or give it longer with --timeout; its log "
                           "says what it does.");
         case Failure::Kind::Cancelled:
         case Failure::Kind::BadReply: break;
     }
     return failed(ExitCode::NoAnswer, failure.text, "Use a vrxctl of the agent's own release.", "bad-reply");
+}
+
+namespace {
+
+// Shows the agent's answer, or explains why there is none.
+template <class T, class Show>
+Outcome outcomeOf(const AgentConnection& agent, const Answer<T>& answer, Show show) {
+    if (answer) return show(*answer);
+    return outcomeOfFailure(answer.failure(), agent.socketPath(), agent.timeLimit());
 }
 
 Outcome device(AgentConnection& agent) {
@@ -345,6 +353,11 @@ int run(int argc, const char* const* argv) {
                        asking([&](AgentConnection& agent) { return store(agent, options.bundleIdentifier); })));
     addBundle(line.add("support", "Tells whether an application is installed, purchased or offered",
                        asking([&](AgentConnection& agent) { return support(agent, options.bundleIdentifier); })));
+    line.add("watch", "Shows a line for each change of what is shown, until it is interrupted", [&options, &line] {
+        client::ConnectionOptions found = options.connection();
+        if (found.socketPath.empty()) found.socketPath = wire::findAgent().socket.path;
+        return watchChanges(line, found);
+    });
     line.add("web-url", "Shows the web-flow URL that a tester has set", asking(webUrl));
     return line.run(argc, argv);
 }
