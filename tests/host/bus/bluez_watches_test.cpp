@@ -230,6 +230,22 @@ TEST_F(BluezWatchesTest, StayWhileAnythingIsSilent) {
     runUntilNames({"still followed", "three", "two"});
 }
 
+TEST_F(BluezWatchesTest, AreAnsweredByARefusalOrNonsense) {
+    bus.start();
+    MockBluez bluez(loop.event(), bus);
+    bluez.takeName("org.bluez");
+    for (const auto& method : {refusal("org.freedesktop.DBus.Error.AccessDenied"), answer("i", 1)}) {
+        bluez.methods["/ GetManagedObjects"] = method;
+        SystemBus own(loop.event(), bus.address());
+        BluezWatches refused(own, {keptWatch("kept", 1)}, std::chrono::system_clock::now, [&] { ++changes; });
+        own.start();
+        EXPECT_FALSE(refused.isAnswered());
+        runUntil([&] { return refused.isAnswered(); }, "the answer");
+        EXPECT_EQ(refused.watches().size(), 1u);
+    }
+    EXPECT_EQ(changes, 2);
+}
+
 TEST_F(BluezWatchesTest, StayForAPauseAfterTheDeviceHasGone) {
     start({keptWatch("kept", 1)}, platform::Duration(3600));
     MockBluez bluez(loop.event(), bus);
