@@ -37,7 +37,8 @@ protected:
     }
 
     int changes = 0;
-    AccountLanguage language{connection, 1000, "nl_NL", withoutEncoding, [this] { ++changes; }};
+    AccountLanguage language{
+        connection, 1000, "nl_NL", withoutEncoding, [this] { ++changes; }, platform::Duration(1e-6)};
 };
 
 TEST_F(AccountLanguageTest, IsFollowedAndStaysWhileNobodyTells) {
@@ -71,6 +72,11 @@ TEST_F(AccountLanguageTest, IsFollowedAndStaysWhileNobodyTells) {
     change(accounts, "s", "");
     runUntilLanguage(std::nullopt);
     EXPECT_EQ(accounts.calls, 4);
+    beAccounts(accounts, "da_DK.UTF-8");
+    accounts.invalidate(accountPath, accountObject, "UserName");
+    accounts.invalidate(accountPath, accountObject, "Language");
+    runUntilLanguage("da_DK");
+    EXPECT_EQ(accounts.calls, 6);
 }
 
 TEST_F(AccountLanguageTest, IsAbsentWhereItIsRefusedOrBrokenAndOfASystemUser) {

@@ -115,6 +115,12 @@ public:
             sd_bus_message_append(signal, "as", 0);
         });
     }
+    // Emits that a property has changed, without its value.
+    void invalidate(const std::string& path, const char* interface, const char* property) {
+        emitSignal(nullptr, path, "org.freedesktop.DBus.Properties", "PropertiesChanged", [&](sd_bus_message* signal) {
+            sd_bus_message_append(signal, "sa{sv}as", interface, 0, 1, property);
+        });
+    }
     // Emits any signal, to all where the receiver is null.
     void emitSignal(const char* receiver, const std::string& path, const char* interface, const char* member,
                     const std::function<void(sd_bus_message*)>& append) {

@@ -111,6 +111,10 @@ TEST_F(ModemCarriersTest, AreThoseOfAllSlotsAndStayOverAProbe) {
     runUntilCarriers(carriers, "slot 1: 204/04; " + both);
     manager.emit(simPath(2), simName, "OperatorIdentifier", "s", "20408");
     runUntilCarriers(held, "slot 1: 204/08; " + both);
+    haveSim(manager, 2, "s", "20416");
+    manager.invalidate(simPath(2), simName, "Imsi");
+    manager.invalidate(simPath(2), simName, "OperatorIdentifier");
+    runUntilCarriers(held, "slot 1: 204/16; " + both);
 
     haveSim(manager, 3, "s", "22801");
     again.slots = {simPath(3), simPath(0)};
