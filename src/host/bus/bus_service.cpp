@@ -67,11 +67,14 @@ void BusService::end() {
     if (!std::exchange(owner_, "").empty()) left();
 }
 
-// Answers of an owner that has gone since do not count.
+// Answers of an owner that has gone since do not count. One that has come while a question is open was started by it,
+// and is going to answer it.
 void BusService::setOwner(const std::string& owner) {
     if (owner == owner_) return;
-    forgetQuestions();
+    const bool isStartedByQuestion = owner_.empty() && !calls_.empty();
     owner_ = owner;
+    if (isStartedByQuestion) return;
+    forgetQuestions();
     owner_.empty() ? left() : askNow();
 }
 

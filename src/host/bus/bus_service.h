@@ -54,7 +54,8 @@ protected:
     // with CLOCK_MONOTONIC.
     void callAfter(EventSource& timer, platform::Duration delay, std::function<void()> then,
                    clockid_t clock = CLOCK_BOOTTIME);
-    // Null is handed over when there is no answer, or an error. Calls that are open when the service goes are dropped.
+    // Null is handed over when there is no answer, or an error. Calls that are open when the service goes are dropped;
+    // one that starts the service is open while it comes, and is not asked again.
     // The arguments are strings.
     void call(const std::string& path, const char* interface, const char* member, Handler handler,
               std::initializer_list<const char*> arguments = {});

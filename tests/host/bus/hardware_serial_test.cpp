@@ -1,5 +1,8 @@
 #include "vrx/host/bus/hardware_serial.h"
 
+#include <fcntl.h>
+#include <sys/stat.h>
+
 #include "host/bus/mock_bus.h"
 
 namespace vrx::host {
@@ -59,6 +62,31 @@ TEST_F(HardwareSerialTest, IsAskedOnceAndNeverKeepsTheServiceAlive) {
     bus.stop();
     runUntil([&] { return !connection.hasSocket() && !serial.isThere(); }, "the end of the bus");
     EXPECT_EQ(serial.value(), "F2L");
+}
+
+TEST_F(HardwareSerialTest, IsAskedOnceOfTheServiceThatTheQuestionStarts) {
+    const std::string gate = folder / "gate", started = folder / "started";
+    ASSERT_EQ(mkfifo(gate.c_str(), 0600), 0);
+    const Descriptor holdingIt(open(gate.c_str(), O_RDWR | O_CLOEXEC));  // the started program lives as long
+    writeFile(folder / (std::string(hostName) + ".service"), "[D-BUS Service]\nName=" + std::string(hostName) +
+                                                                 "\nUser=root\nExec=/bin/sh -c 'echo >> " + started +
+                                                                 "; read line < " + gate + "'\n");
+    bus.start();
+    MockService host(loop.event(), bus);
+    host.methods[hostMethod] = answer("s", "F2L");
+    serial.startAsking();
+    connection.start();
+    runUntil([&] { return std::filesystem::exists(started); }, "the question");
+    host.takeName(hostName);
+    runUntilState(State::Known);
+    for (int i = 0; i < 2; ++i) {
+        host.leaveName(hostName);
+        runUntilThere(false);
+        host.takeName(hostName);
+        runUntilThere(true);
+    }
+    EXPECT_EQ(host.calls, 1);
+    EXPECT_EQ(changes, 1);
 }
 
 TEST_F(HardwareSerialTest, IsAbsentWhereItIsRefusedOrMeansNothing) {
