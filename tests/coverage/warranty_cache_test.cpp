@@ -1,6 +1,4 @@
 // The cache of records on disk, and the move from the older single-device layout.
-#include <cerrno>
-
 #include "support/simulated_host.h"
 #include "vrx/coverage/cache_metadata.h"
 #include "vrx/coverage/records/warranty.h"
@@ -33,28 +31,6 @@ TEST_F(WarrantyCacheTest, KeepsOneFileForEachSerialNumber) {
     second->cache();
     EXPECT_TRUE(VRXWarranty::cachedWarrantyForSerialNumber(std::nullopt));
     EXPECT_EQ(host.files.paths().size(), 2u);
-}
-
-TEST_F(WarrantyCacheTest, WhatCannotBeWrittenLeavesTheEarlierFile) {
-    auto first = record({{"covered", true}});
-    first->cacheWarranty("A");
-    record({{"covered", false}, {"kelURL", nullptr}})->cacheWarranty("A");
-    EXPECT_TRUE(VRXWarranty::cachedWarrantyForSerialNumber("A")->isEqual(first.get()));
-    host.files.fail(sim::Files::Operation::Replace, ENOSPC);
-    record({{"covered", false}})->cacheWarranty("A");
-    EXPECT_TRUE(VRXWarranty::cachedWarrantyForSerialNumber("A")->isEqual(first.get()));
-    EXPECT_THAT(host.log.messages(platform::Level::Error),
-                testing::Each(testing::StartsWith("Cannot write the cached record " + pathOf("A") + ": ")));
-    EXPECT_EQ(host.log.messages(platform::Level::Error).size(), 2u);
-}
-
-TEST_F(WarrantyCacheTest, AFileCutAnywhereIsNoRecord) {
-    record({{"covered", true}, {"texts", Array{"a", "b"}}})->cacheWarranty("A");
-    std::string whole = *host.files.content(pathOf("A"));
-    for (std::size_t length = 0; length < whole.size(); ++length) {
-        host.files.put(pathOf("A"), whole.substr(0, length));
-        ASSERT_FALSE(VRXWarranty::cachedWarrantyForSerialNumber("A")) << length;
-    }
 }
 
 TEST_F(WarrantyCacheTest, MigratesTheOlderLayout) {

@@ -12,7 +12,6 @@ class AgentWorld {
 public:
     struct Record {
         std::optional<double> until{}, shownFrom{};
-        double shownBeforeEnd = 0;
         std::string excludedCarrier{};
     };
 
@@ -32,9 +31,7 @@ public:
     // What the coverage server answers for a device from now on, in the user's language.
     void setRecord(const std::string& serialNumber, const Record& record) {
         records[serialNumber] = record;
-        Dictionary toggles{{"qxOfferDisplay", true},
-                           {"qxOfferDurationDaysBeforeEndDate", record.shownBeforeEnd},
-                           {"qxOfferToggle", Array{record.excludedCarrier}}};
+        Dictionary toggles{{"qxOfferDisplay", true}, {"qxOfferToggle", Array{record.excludedCarrier}}};
         Dictionary answer{{"featureToggleParameters", toggles},
                           {"qxLocalizedOfferLabel", host.locale.identifier},
                           {"qxLocalizedOfferPluralDescFormat", "%@"},
