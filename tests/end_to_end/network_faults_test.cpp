@@ -4,10 +4,6 @@
 #include <malloc.h>
 
 #include <algorithm>
-#include <array>
-#include <cstdlib>
-#include <filesystem>
-#include <fstream>
 #include <future>
 #include <thread>
 
@@ -248,11 +244,7 @@ const Fault faults[] = {
     {"OneVersion", "", "s200", NoRecord, {.document = R"({"highVersion": null})"}},
     {"VersionsAsStrings", "", "s200 c1:200", NewRecord, {.document = R"({"versionsAsStrings": true})"}},
     {"VersionsUnreachable", "", "c1:200", NewRecord, {.serverVersionURL = refusing}},
-    {"VersionsTooManyReferences",
-     "",
-     "c1:200",
-     NewRecord,
-     {.serverVersionURL = fromFile, .file = sharing<60'000, 6'000>}},
+    {"VersionsOfManyTexts", "", "c1:200", NewRecord, {.serverVersionURL = fromFile, .file = sharing<60'000, 6'000>}},
     {"VersionsHuge", "server-version:large", "s200 c1:200", NewRecord},
     {"VersionsBomb", "server-version:bomb=1100MiB", "s200 c1:200", NewRecord},
     {"VersionsNeverAnswered", "server-version:hang", "s0 c1:200", NewRecord, {.isLong = true}},

@@ -1,6 +1,5 @@
 #include "vrx/host/http/http.h"
 
-#include <array>
 #include <csignal>
 #include <cstdio>
 #include <future>
@@ -102,24 +101,16 @@ TEST_F(HttpTest, CarriesRequestAndAnswerAndReusesTheConnection) {
     EXPECT_EQ(requests.size(), 3u);
 }
 
-TEST_F(HttpTest, BoundsTheAnswerAlsoAfterDecompressionAndItsHeadersAndItsTime) {
+TEST_F(HttpTest, BoundsTheAnswerAlsoAfterDecompression) {
     LoopbackServer server([&](const std::string& request) {
         if (request.starts_with("GET /fits")) return answer("200 OK", std::string(10'000, 'x'));
         if (request.starts_with("GET /packed"))
             return answer("200 OK", std::string(packed), "Content-Encoding: gzip\r\n");
-        if (request.starts_with("GET /headers"))
-            return answer("200 OK", "", "X: " + std::string(300'000, 'x') + "\r\n");
-        if (request.starts_with("GET /cut")) return std::string("HTTP/1.1 200 OK\r\nContent-Length: 9\r\n\r\nabc");
-        if (request.starts_with("GET /silent")) return std::string();
         return answer("200 OK", std::string(10'001, 'x'));
     });
     EXPECT_EQ(body(get(server.url("/fits"))).size(), 10'000u);
     EXPECT_EQ(error(get(server.url("/large")), 200), "the answer is too large");
     EXPECT_EQ(error(get(server.url("/packed")), 200), "the answer is too large");
-    EXPECT_NE(error(get(server.url("/headers")), 200), "(none)");
-    EXPECT_THAT(error(fetch(requestTo(server.url("/silent"), "GET", 100ms))), HasSubstr("timed out"));
-    HttpSessions impatient(workers, clock, profile, {.timeout = 100ms});
-    EXPECT_THAT(error(fetch(impatient.shared(), requestTo(server.url("/cut"))), 200), HasSubstr("timed out"));
 }
 
 TEST_F(HttpTest, FollowsFiveRedirectsOfAGetWithoutItsHeadersAndNoneOfAPost) {
