@@ -1,6 +1,5 @@
 #include "vrx/host/bus/hardware_serial.h"
 
-#include <fcntl.h>
 #include <sys/stat.h>
 
 #include "host/bus/mock_bus.h"
@@ -22,6 +21,13 @@ protected:
         runUntil([&] { return serial.isThere() == isThere; }, "the service's coming or going");
     }
 
+    // The bus starts that line of shell as the service, each time with another line in the file "started".
+    void becomeStartable(const std::string& command) const {
+        writeFile(folder / (std::string(hostName) + ".service"), "[D-BUS Service]\nName=" + std::string(hostName) +
+                                                                     "\nUser=root\nExec=/bin/sh -c 'echo >> " +
+                                                                     folder / "started" + "; " + command + "'\n");
+    }
+
     int changes = 0;
     HardwareSerial serial{connection, [this] { ++changes; }};
 };
@@ -29,9 +35,7 @@ protected:
 TEST_F(HardwareSerialTest, IsAskedOnceAndNeverKeepsTheServiceAlive) {
     EXPECT_FALSE(connection.hasSocket());
     const std::string started = folder / "started";
-    writeFile(folder / (std::string(hostName) + ".service"), "[D-BUS Service]\nName=" + std::string(hostName) +
-                                                                 "\nUser=root\nExec=/bin/sh -c 'echo >> " + started +
-                                                                 "; exit 1'\n");
+    becomeStartable("exit 1");
     bus.start();
     EXPECT_TRUE(connection.hasSocket());
     connection.start();
@@ -65,18 +69,16 @@ TEST_F(HardwareSerialTest, IsAskedOnceAndNeverKeepsTheServiceAlive) {
 }
 
 TEST_F(HardwareSerialTest, IsAskedOnceOfTheServiceThatTheQuestionStarts) {
-    const std::string gate = folder / "gate", started = folder / "started";
+    const std::string gate = folder / "gate";
     ASSERT_EQ(mkfifo(gate.c_str(), 0600), 0);
     const Descriptor holdingIt(open(gate.c_str(), O_RDWR | O_CLOEXEC));  // the started program lives as long
-    writeFile(folder / (std::string(hostName) + ".service"), "[D-BUS Service]\nName=" + std::string(hostName) +
-                                                                 "\nUser=root\nExec=/bin/sh -c 'echo >> " + started +
-                                                                 "; read line < " + gate + "'\n");
+    becomeStartable("read line < " + gate);
     bus.start();
     MockService host(loop.event(), bus);
     host.methods[hostMethod] = answer("s", "F2L");
     serial.startAsking();
     connection.start();
-    runUntil([&] { return std::filesystem::exists(started); }, "the question");
+    runUntil([&] { return std::filesystem::exists(folder / "started"); }, "the question");
     host.takeName(hostName);
     runUntilState(State::Known);
     for (int i = 0; i < 2; ++i) {
