@@ -50,29 +50,6 @@ TEST(SimDefaults, FailAndInterfereAsScripted) {
     EXPECT_EQ(failures.size(), 1u) << "the function uses the store";
 }
 
-TEST(SimListener, AsksTheDelegateAndReportsAConnectionThatServesNothing) {
-    struct : platform::ServiceListenerDelegate {
-        bool shouldAcceptNewConnection(platform::ServiceListener&, platform::ServiceConnection& connection) override {
-            if (isAccepting) connection.resume();
-            return isAccepting;
-        }
-        bool isAccepting = true;
-    } delegate;
-    Host host;
-    std::vector<std::string> failures;
-    host.failures.handler = [&](const std::string& text) { failures.push_back(text); };
-    auto listener = host.listener.makeListener("name");
-    listener->setDelegate(&delegate);
-    EXPECT_EQ(host.listener.connect(7, {}), nullptr) << "before resume()";
-    listener->resume();
-    EXPECT_THAT(failures, IsEmpty());
-    EXPECT_EQ(host.listener.connect(7, {}), nullptr);
-    EXPECT_EQ(failures.size(), 1u) << "resumed, but nothing is exported";
-    delegate.isAccepting = false;
-    EXPECT_EQ(host.listener.connect(7, {}), nullptr);
-    EXPECT_EQ(failures.size(), 1u) << "refused";
-}
-
 TEST(SimProcess, TakesItsMemoryAlongWhenItEnds) {
     std::vector<std::string> notes;
     const auto note = [&](const char* text) { return [&notes, text] { notes.push_back(text); }; };

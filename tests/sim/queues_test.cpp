@@ -105,21 +105,6 @@ TEST_F(SimQueues, ReportWorkThatNeverEndsAndATaskThatRunsTheQueuesItself) {
     EXPECT_THAT(failures, ElementsAre(HasSubstr("without end")));
 }
 
-TEST_F(SimQueues, ReuseStacksAndLetAThousandTasksWait) {
-    int done = 0;
-    for (int round = 0; round < 2; ++round) {
-        for (int i = 0; i < 1000; ++i)
-            worker.post([&] {
-                volatile char depth[4096] = {};
-                depth[0] = depth[4095];
-                event->waitFor(1s);
-                ++done;
-            });
-        host.runFor(2s);
-    }
-    EXPECT_EQ(done, 2000);
-}
-
 TEST(SimQueuesDeathTest, AnExceptionMustNotLeaveATask) {
     auto run = [] {
         Host host;

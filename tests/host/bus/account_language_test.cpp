@@ -46,13 +46,12 @@ TEST_F(AccountLanguageTest, IsFollowedAndStaysWhileNobodyTells) {
     bus.start();
     connection.start();
     runUntilLanguage("nl_NL");  // as is kept: there is no such service
-    MockService accounts(loop.event(), bus), liar(loop.event(), bus);
+    MockService accounts(loop.event(), bus);
     beAccounts(accounts, "");
     accounts.takeName(accountsName);
     runUntil([&] { return accounts.calls == 2; }, "the questions");
     change(accounts, "s", "de_DE.UTF-8");
     runUntilLanguage("de_DE");
-    liar.emitToEach(accountPath, accountObject, "Language", "s", "fr_FR");
     change(accounts, "s", "pt\nX: y");
     change(accounts, "o", "/es");
     change(accounts, "s", std::string(257, 'e').c_str());
