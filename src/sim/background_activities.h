@@ -32,7 +32,8 @@ public:
         factory_ = std::move(factory);
     }
 
-    // The state of the device.
+    // The state of the device. A network that leads no further than to a portal is none, and a user who saves power
+    // asks for deferral.
     void setNetworkAvailable(bool isNetworkAvailable);
     void setShouldDefer(bool shouldDefer);
     // What needs the network then defers.

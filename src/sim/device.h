@@ -1,4 +1,5 @@
-// Facts about the simulated device and its user. The test sets each of them.
+// Facts about the simulated device and its user. The test sets each of them; a fact that a service of the machine tells
+// late is absent until then.
 #pragma once
 
 #include <map>

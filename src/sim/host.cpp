@@ -1,5 +1,10 @@
 #include "vrx/sim/host.h"
 
+#include <algorithm>
+#include <utility>
+
+#include "vrx/platform/text.h"
+
 namespace vrx::sim {
 
 Host::Host()
@@ -30,11 +35,28 @@ Host::Host()
                 .systemLog = &log,
                 .telephonyNetworkInfo = &telephony,
                 .uuidSource = &uuids}),
-      scope_(platform) {}
+      scope_(platform) {
+    process.setStartHandler([this] { compare(); });
+}
 
 Host::~Host() {
     queues.close();
     process.kill();
+}
+
+void Host::tellChanges() {
+    if (process.isRunning()) compare();
+}
+
+void Host::compare() {
+    Told now{locale.identifier, {}};
+    for (const platform::PairedWatch& watch : watches.all)
+        if (watch.isActive()) now.watches.insert(watch.description() + platform::describe(watch.pairedDate));
+    const std::optional<Told> last = std::exchange(told_, now);
+    if (!last) return;
+    if (last->language != now.language) notifications.raise(platform::languageChangedNotification);
+    if (!std::ranges::includes(last->watches, now.watches)) notifications.raise(platform::devicePairedNotification);
+    if (!std::ranges::includes(now.watches, last->watches)) notifications.raise(platform::deviceUnpairedNotification);
 }
 
 }  // namespace vrx::sim

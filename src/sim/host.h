@@ -11,6 +11,10 @@
 // discarded.
 #pragma once
 
+#include <optional>
+#include <set>
+#include <string>
+
 #include "vrx/codec/codec.h"
 #include "vrx/platform/platform.h"
 #include "vrx/sim/account_store.h"
@@ -45,6 +49,11 @@ public:
     void runFor(platform::Duration duration) { queues.runFor(duration); }
     void runUntil(platform::Date date) { queues.runUntil(date); }
 
+    // To be called when the test has changed the language or the watches: tells the process of it by notifications, as
+    // profile and services do on a real host. What changes while no process runs, the next is told at its start; the
+    // first one is told nothing.
+    void tellChanges();
+
     Failures failures;
     Clock clock;
     SystemLog log;
@@ -76,7 +85,14 @@ public:
     platform::Platform platform;
 
 private:
+    struct Told {
+        std::string language;
+        std::set<std::string> watches;
+    };
+    void compare();
+
     platform::ScopedPlatform scope_;
+    std::optional<Told> told_;
 };
 
 }  // namespace vrx::sim

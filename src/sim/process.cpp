@@ -31,6 +31,7 @@ void Process::kill() {
 void Process::relaunch() {
     activities_.processStarted(agentVersion);
     content_ = main_();
+    startHandler_();
 }
 
 void Process::reboot(platform::Duration downTime) {

@@ -40,6 +40,9 @@ public:
     }
     void reboot(platform::Duration downTime = platform::Duration(60));
 
+    // Called at the end of each start.
+    void setStartHandler(std::function<void()> handler) { startHandler_ = std::move(handler); }
+
     bool isRunning() const { return content_ != nullptr; }
     // How often the process ended because it asked to.
     int cleanExits() const { return cleanExits_; }
@@ -56,6 +59,7 @@ private:
     BackgroundActivities& activities_;
     NotificationCenter& notifications_;
     Main main_;
+    std::function<void()> startHandler_ = [] {};
     std::shared_ptr<void> content_;
     // Each piece of work in flight holds a share of it. Each process has another one, so that what a killed process
     // held does not count for the next.

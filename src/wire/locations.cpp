@@ -63,7 +63,10 @@ std::vector<std::string> findProfile(const LocationOverrides& overrides, const S
     addFolder("/etc");
     layers.push_back(std::string(systemFolder) + "/device.d/");
     if (owner == Owner::System) return layers;
-    if (auto config = absoluteVariable(surroundings, "XDG_CONFIG_HOME")) addFolder(*config);
+    if (auto config = absoluteVariable(surroundings, "XDG_CONFIG_HOME"))
+        addFolder(*config);
+    else if (!absoluteVariable(surroundings, "STATE_DIRECTORY"))
+        addFolder(userHome(surroundings) + "/.config");
     return layers;
 }
 

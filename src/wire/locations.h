@@ -40,7 +40,8 @@ struct Surroundings {
 
 //     home     --home, else $STATE_DIRECTORY, else $XDG_STATE_HOME/vrxagent, else ~/.local/state/vrxagent
 //     profile  --device alone, else /usr/lib/vrxagent/device.d/, /etc/vrxagent/device.toml, /etc/vrxagent/device.d/,
-//              /run/vrxagent/device.d/ and, of a user, $XDG_CONFIG_HOME/vrxagent/device.toml and device.d/ beside it
+//              /run/vrxagent/device.d/ and, of a user, $XDG_CONFIG_HOME/vrxagent/device.toml and device.d/ beside it;
+//              where that is not set, the same in ~/.config, but not with $STATE_DIRECTORY: that agent is the system's
 //     socket   --socket, else in $XDG_RUNTIME_DIR, else in /run/vrxagent if that exists, else in the home
 //
 // A variable that is empty or not an absolute path counts as not set. Overrides are taken as they are.

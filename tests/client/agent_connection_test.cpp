@@ -1,8 +1,5 @@
 #include "vrx/client/agent_connection.h"
 
-#include <atomic>
-#include <barrier>
-
 #include "client/fake_service.h"
 #include "client/raw_client.h"
 
@@ -194,18 +191,6 @@ TEST_F(AgentConnectionTest, KeepsTheAgentFromEndingWithARequestAndNotWithSilence
     isAnswered.wait();
     EXPECT_TRUE(silent.defaultDevice()) << "asked again, of the next";
     EXPECT_EQ(service->ends(), 1);
-}
-
-TEST_F(AgentConnectionTest, IsServedAtTheSameTimeAsOthers) {
-    std::barrier bothInside(2);
-    agent->onDeviceInfo = [&](std::string, VRXAgentProtocol::Reply<std::shared_ptr<VRXDeviceInfo>> reply) {
-        bothInside.arrive_and_wait();
-        reply(agent->info());
-    };
-    AgentConnection connection(options());
-    std::thread other([&] { EXPECT_TRUE(connection.getDeviceInfoForSerialNumber("SN1", 0)); });
-    EXPECT_TRUE(connection.getDeviceInfoForSerialNumber("SN2", 0));
-    other.join();
 }
 
 TEST_F(AgentConnectionTest, EndsItsCallsWhenItGoes) {

@@ -110,15 +110,6 @@ TEST_F(HostileClients, WriteWhileTheAgentEnds) {
     EXPECT_FALSE(isWritten);
 }
 
-TEST_F(HostileClients, VanishWithARequestOpen) {
-    holdOutreach();
-    RawClient client = rawClient(RawClient::authentication() + RawClient::call("scheduleOutreachWithReply", 1));
-    awaitHeld();
-    client.close();
-    expectGoesOn();
-    answerHeld();
-}
-
 TEST_F(HostileClients, OpenTooManyRequests) {
     serve({.requestsPerConnection = 2});
     holdOutreach();

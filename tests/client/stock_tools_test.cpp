@@ -1,5 +1,4 @@
 // Stock D-Bus tools as clients: they share no code with the agent's own ends.
-#include <array>
 #include <cstdio>
 
 #include "client/fake_service.h"

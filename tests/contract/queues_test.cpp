@@ -5,7 +5,6 @@
 #include <algorithm>
 #include <chrono>
 #include <limits>
-#include <mutex>
 
 #include "contract/hosts.h"
 

@@ -74,7 +74,7 @@ TEST_F(MonitorsTest, AMonitorThatIsGoneDoesNothing) {
         return std::make_shared<VRXFollowUp>();
     });
     monitor->start();
-    world.setLanguage("de_DE");
+    world.host.notifications.raise(platform::languageChangedNotification);
     world.host.runFor(Duration(1));
     monitor.reset();
     EXPECT_EQ(world.host.notifications.registrationCount(), 0u);

@@ -82,23 +82,6 @@ TEST_F(AtPlace, TakesTheServerFromTheProfileUntilOneIsWritten) {
     EXPECT_EQ(place_.stop(), 0) << place_.agent().errors();
 }
 
-TEST_F(Agent, KeepsTheLastGoodProfileAndStartsWithoutOneAndWithADamagedDatabase) {
-    place_.write("device.toml", "[device]\nserial_number = ");  // before anybody asked
-    EXPECT_EQ(place_.vrxctl({"device", "--json"}).document["device"]["serialNumber"], Value("VRXPHONE0001"));
-    ASSERT_EQ(place_.stop(), 0);
-    std::filesystem::remove(place_ / "home/host.db-wal");
-    const std::string damaged(8192, 'x');
-    place_.write("home/host.db", damaged);
-    place_.start();
-    const Place::Outcome device = place_.vrxctl({"device", "--json"});
-    EXPECT_EQ(device.code, 0);
-    EXPECT_NE(device.document["device"]["serialNumber"], Value("VRXPHONE0001"));
-    EXPECT_EQ(place_.stop(), 0);
-    EXPECT_NE(place_.agent().errors().find("device.toml:2: "), std::string::npos) << place_.agent().errors();
-    const auto isKept = [&](const auto& entry) { return entry.is_regular_file() && fileText(entry.path()) == damaged; };
-    EXPECT_EQ(std::ranges::count_if(std::filesystem::directory_iterator(place_ / "home"), isKept), 1);
-}
-
 TEST_F(Agent, IsAloneInItsHomeAndAtItsSocket) {
     const auto second = [&](const std::string& home, const std::string& socket) {
         return place_.run(VRX_PROGRAMS "/vrxagent", {"--home", place_ / home, "--socket", place_ / socket});

@@ -1,6 +1,5 @@
 // What vrxctl tells of an application, and what the agent asked the store for it, whatever the store does.
 #include <algorithm>
-#include <cstdlib>
 #include <regex>
 
 #include "end_to_end/coverage_server.h"

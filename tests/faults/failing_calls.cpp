@@ -91,7 +91,7 @@ bool Call::isToFail() {
 #define FAILING_SIZE(name, parameters, arguments, error, otherError) \
     FAILING(ssize_t, name, parameters, arguments, error, otherError, -1)
 // A second name, for large files, which are all files here.
-#define ALIAS(name, other) asm(".globl " #other "; .set " #other ", " #name)
+#define ALIAS(name) ".globl " #name "64; .set " #name "64, " #name "\n"
 
 using Size = std::size_t;
 using Path = const char*;
@@ -179,19 +179,8 @@ FAILING(int, pthread_create,
 FAILING_SIZE(getrandom, (void* bytes, Size size, unsigned flags), (bytes, size, flags), ENOSYS, EAGAIN)
 FAILING_INT(getentropy, (void* bytes, Size size), (bytes, size), ENOSYS, EIO)
 
-ALIAS(open, open64);
-ALIAS(openat, openat64);
-ALIAS(fopen, fopen64);
-ALIAS(pread, pread64);
-ALIAS(pwrite, pwrite64);
-ALIAS(ftruncate, ftruncate64);
-ALIAS(fstat, fstat64);
-ALIAS(stat, stat64);
-ALIAS(lstat, lstat64);
-ALIAS(fstatat, fstatat64);
-ALIAS(fcntl, fcntl64);
-ALIAS(readdir, readdir64);
-ALIAS(mmap, mmap64);
+asm(ALIAS(open) ALIAS(openat) ALIAS(fopen) ALIAS(pread) ALIAS(pwrite) ALIAS(ftruncate) ALIAS(fstat) ALIAS(stat)
+        ALIAS(lstat) ALIAS(fstatat) ALIAS(fcntl) ALIAS(readdir) ALIAS(mmap));
 
 // The file is closed in any case.
 static Call call_close("close", EIO, EINTR);

@@ -1,5 +1,4 @@
 // The agent on the host's real queues: what races would show here, under the thread sanitizer.
-#include <atomic>
 #include <future>
 #include <latch>
 

@@ -41,6 +41,7 @@ struct Agent {
     platform::ActivityHandler handler(const std::string& name) {
         return [this, name](platform::OnceCallback<platform::BackgroundActivityResult> completion) {
             ++firings[name];
+            if (name == "due") schedule("its next", 5);
             completion(platform::BackgroundActivityResult::Finished);
         };
     }
@@ -108,7 +109,7 @@ protected:
         // Each is to run once, whatever happens.
         std::vector<std::string> scheduled = {platform::vendorIdentifier(platform::upgradeActivityRemainder),
                                               platform::vendorIdentifier(platform::bootActivityRemainder), "due",
-                                              "interrupted"};
+                                              "its next", "interrupted"};
         Firings firings;
         bool isCleared = false, isAtRest = false;
         CallFaults::fail(kind, call, isForGood);

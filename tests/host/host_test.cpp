@@ -1,6 +1,5 @@
 #include "vrx/host/host.h"
 
-#include <atomic>
 #include <future>
 #include <thread>
 

@@ -1,9 +1,7 @@
 // Callbacks that are called exactly once, and groups of work.
 #include "vrx/platform/task.h"
 
-#include <latch>
 #include <stdexcept>
-#include <thread>
 
 #include "support/values.h"
 #include "vrx/platform/completion_group.h"
@@ -109,29 +107,6 @@ TEST_F(CompletionGroupTest, NotifiesOnTheQueueOnceNothingIsUnderWay) {
     group.enter();
     group.leave();
     EXPECT_THAT(notesAfterRun(), ElementsAre()) << "notified once only";
-}
-
-TEST_F(CompletionGroupTest, CountsAcrossThreads) {
-    constexpr int count = 4;
-    int finished[count] = {};
-    for (int i = 0; i < count; ++i) group.enter();
-    int seen = 0;
-    group.notify(queue, [&] { seen = finished[0] + finished[1] + finished[2] + finished[3]; });
-    std::latch ready(count);
-    std::vector<std::thread> threads;
-    for (int i = 0; i < count; ++i)
-        threads.emplace_back([&, i] {
-            ready.arrive_and_wait();
-            for (int round = 0; round < 1000; ++round) {
-                group.enter();
-                group.leave();
-            }
-            finished[i] = 1;
-            group.leave();
-        });
-    for (std::thread& thread : threads) thread.join();
-    queue->run();
-    EXPECT_EQ(seen, count);
 }
 
 }  // namespace

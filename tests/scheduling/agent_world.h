@@ -12,7 +12,6 @@ class AgentWorld {
 public:
     struct Record {
         std::optional<double> until{}, shownFrom{};
-        double shownBeforeEnd = 0;
         std::string excludedCarrier{};
     };
 
@@ -32,9 +31,7 @@ public:
     // What the coverage server answers for a device from now on, in the user's language.
     void setRecord(const std::string& serialNumber, const Record& record) {
         records[serialNumber] = record;
-        Dictionary toggles{{"qxOfferDisplay", true},
-                           {"qxOfferDurationDaysBeforeEndDate", record.shownBeforeEnd},
-                           {"qxOfferToggle", Array{record.excludedCarrier}}};
+        Dictionary toggles{{"qxOfferDisplay", true}, {"qxOfferToggle", Array{record.excludedCarrier}}};
         Dictionary answer{{"featureToggleParameters", toggles},
                           {"qxLocalizedOfferLabel", host.locale.identifier},
                           {"qxLocalizedOfferPluralDescFormat", "%@"},
@@ -48,15 +45,15 @@ public:
     void setLanguage(const std::string& language) {
         host.locale.identifier = language;
         for (const auto& [serialNumber, record] : std::map(records)) setRecord(serialNumber, record);
-        host.notifications.raise(platform::languageChangedNotification);
+        host.tellChanges();
     }
     void pair(const std::string& serialNumber, double since) {
         host.watches.all.push_back({serialNumber, {}, serialNumber, day(since), true, false});
-        if (host.process.isRunning()) host.notifications.raise(platform::devicePairedNotification);
+        host.tellChanges();
     }
     void unpair(const std::string& serialNumber) {
         std::erase_if(host.watches.all, [&](const auto& watch) { return watch.serialNumber == serialNumber; });
-        host.notifications.raise(platform::deviceUnpairedNotification);
+        host.tellChanges();
     }
     void request(std::function<void(VRXAgentProtocol&)> call) {
         client = host.listener.connect(7, {{"com.orvane.private.vrxagent", true}});

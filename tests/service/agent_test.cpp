@@ -27,7 +27,10 @@ public:
         asked_.push_back("dismiss " + serialNumber);
     }
     bool postFollowUpWithDevicesInfo(const DeviceInfoList&) override { return false; }
-    void migrateLegacyFollowUpIfNeededWithDeviceInfo(const std::shared_ptr<VRXDeviceInfo>&) override {}
+    void migrateLegacyFollowUpIfNeededWithDeviceInfo(const std::shared_ptr<VRXDeviceInfo>&) override {
+        const Value version = platform::Platform::current().defaultsStore().get("VRXMigrationVersion");
+        asked_.push_back("migrate from " + version.description());
+    }
     std::size_t pendingFollowUpCount() override { return 0; }
 
 private:
@@ -156,6 +159,12 @@ TEST_F(AgentTest, AnswersTheSmallRequests) {
     host.device.isInternal = true;
     EXPECT_EQ(override(), "https://flow.example/");
     agent->readWebURLOverride(nullptr);
+}
+
+TEST_F(AgentTest, NotesAMigrationOnceItIsDone) {
+    for (int i = 0; i < 2; ++i) agent->performMigrationIfNeeded();
+    EXPECT_EQ(followUps, std::vector<std::string>{"migrate from (null)"}) << "an end within it begins it anew";
+    EXPECT_EQ(host.defaults.get("VRXMigrationVersion"), Value(2));
 }
 
 TEST_F(AgentTest, OnlyEntitledCallersAreServed) {

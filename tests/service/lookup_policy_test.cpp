@@ -72,20 +72,6 @@ protected:
     std::shared_ptr<VRXAgent> agent = VRXAgent::initWithWarrantyProvider(provider, nullptr);
 };
 
-class LookupPolicyTest : public LookupTest, public testing::WithParamInterface<State> {};
-
-TEST_P(LookupPolicyTest, AnswersByPolicyAndCache) {
-    const State& state = provider->state = GetParam();
-    const int downloads = state.byDefault == Downloaded ? 1 : 0;
-    expectAnswer(VRXWarrantyLookupPolicyDefault, true, state.byDefault, downloads);
-    expectAnswer(VRXWarrantyLookupPolicyDefault, false, state.withoutDownload, downloads);
-    expectAnswer(VRXWarrantyLookupPolicyRefresh, true, Downloaded, 1);
-    expectAnswer(VRXWarrantyLookupPolicyRefresh, false, Nothing, 1);
-    constexpr VRXWarrantyLookupPolicy unknown = 77;
-    for (const auto policy : {VRXWarrantyLookupPolicyCachedOnly, VRXWarrantyLookupPolicyRefresh + 1, unknown})
-        expectAnswer(policy, true, state.withoutDownload, 0);
-}
-
 const State states[] = {
     {.name = "Fresh", .byDefault = Cached, .withoutDownload = Cached},
     {.name = "FromTheFuture", .lastUpdated = storedBefore(-1e9), .byDefault = Cached, .withoutDownload = Cached},
@@ -99,8 +85,20 @@ const State states[] = {
     {.name = "OtherLocale", .locale = "de_DE"},
     {.name = "SignedOut", .isSignedIn = false},
 };
-INSTANTIATE_TEST_SUITE_P(Cache, LookupPolicyTest, testing::ValuesIn(states),
-                         [](const auto& instance) { return instance.param.name; });
+
+TEST_F(LookupTest, AnswersByPolicyAndCache) {
+    for (const State& state : states) {
+        SCOPED_TRACE(state.name);
+        provider->state = state;
+        const int downloads = state.byDefault == Downloaded ? 1 : 0;
+        expectAnswer(VRXWarrantyLookupPolicyDefault, true, state.byDefault, downloads);
+        expectAnswer(VRXWarrantyLookupPolicyDefault, false, state.withoutDownload, downloads);
+        expectAnswer(VRXWarrantyLookupPolicyRefresh, true, Downloaded, 1);
+        expectAnswer(VRXWarrantyLookupPolicyRefresh, false, Nothing, 1);
+        for (const std::uint64_t policy : {VRXWarrantyLookupPolicyCachedOnly, VRXWarrantyLookupPolicyRefresh + 1, 77UL})
+            expectAnswer(policy, true, state.withoutDownload, 0);
+    }
+}
 
 TEST_F(LookupTest, LogsWhyInOrder) {
     provider->state.lastUpdated = storedBefore(86400);

@@ -1,7 +1,9 @@
-// What start-up does, in its order, and once in the life of an installation.
+// What start-up does, in its order, and once in the life of an installation: the move from the older single-device
+// layout, and the beginning of the agent's work.
 #include "vrx/service/start_up.h"
 
 #include "support/simulated_host.h"
+#include "vrx/coverage/records/warranty.h"
 
 namespace vrx {
 namespace {
@@ -45,6 +47,33 @@ TEST(StartUp, BeginsTheAgentsWorkOnceAndTakesItUpAtEachBoot) {
     host.runFor(Duration(60));
     EXPECT_EQ(host.log.count("'%@' not complete, rescheduling"), 1) << "it has run";
     EXPECT_EQ(host.activities.firingCount(outreach), 1);
+}
+
+TEST(Migration, HappensOnceWhateverCameOfIt) {
+    constexpr std::size_t moves = 3, loses = 2, nothing = 0;  // what is asked of the follow-ups
+    for (const auto& [stored, file, asked] : {std::tuple(Value(), "", moves),
+                                              {0, "", moves},
+                                              {1, "", moves},
+                                              {-7, "", moves},
+                                              {1, "damaged", loses},
+                                              {2, "", nothing},
+                                              {5, "", nothing},
+                                              {std::int64_t{1} << 40, "", nothing}}) {
+        SCOPED_TRACE(stored.description() + file);
+        sim::Host host;
+        auto& pending = host.followUps.pending("com.orvane.Vireo");
+        pending = {{.uniqueIdentifier = "com.orvane.Vireo"}};
+        host.followUps.fail(sim::FollowUpControllers::Request::Clear);
+        VRXWarranty::initWithDictionary(Dictionary{{"qxLocalizedOfferLabel", "label"}})->cache();
+        if (asked == loses) host.files.put(VRXWarranty::_legacyWarrantyPath(), file);
+        host.defaults.set("VRXMigrationVersion", stored);
+        for (int start = 0; start < 2; ++start) StartUp();
+        EXPECT_EQ(host.followUps.asked().size(), asked);
+        EXPECT_EQ(host.defaults.get("VRXMigrationVersion"), asked == nothing ? stored : Value(2));
+        EXPECT_EQ(host.log.count("default device SerialNumber: '%{private}@'"), asked == nothing ? 0 : 1);
+        EXPECT_EQ(host.files.contains(VRXWarranty::_legacyWarrantyPath()), asked != moves);
+        EXPECT_EQ(pending.back().title.value_or(""), asked == moves ? "label" : "") << "that of the record";
+    }
 }
 
 }  // namespace

@@ -1,4 +1,5 @@
-// The simulated facilities: scripted answers and faults, and what is recorded of their use.
+// The simulated facilities: the faults that a test scripts, what is reported of wrong use, and what the end of a
+// process takes.
 #include "vrx/sim/host.h"
 
 #include <cerrno>
@@ -7,75 +8,6 @@
 
 namespace vrx::sim {
 namespace {
-
-using platform::HttpRequest;
-using platform::HttpResponse;
-
-class SimHttp : public testing::Test {
-protected:
-    void send(platform::HttpSession& session, HttpRequest request) {
-        session.send(std::move(request), [this](HttpResponse response) {
-            EXPECT_EQ(host.queues.currentLabel(), "userInitiated");
-            std::string answer = response.error ? response.error->text : std::to_string(response.status);
-            if (response.body) answer += ":" + std::string(response.body->begin(), response.body->end());
-            answers.emplace_back(answer, host.clock.elapsed());
-        });
-    }
-    void get(const std::string& url) { send(host.http.shared(), requestTo(url)); }
-    static HttpRequest requestTo(const std::string& url, std::optional<Duration> timeout = {}) {
-        return {.url = url, .headers = {}, .body = {}, .timeout = timeout};
-    }
-    std::vector<std::string> texts() const {
-        std::vector<std::string> texts;
-        for (const auto& [text, time] : answers) texts.push_back(text);
-        return texts;
-    }
-
-    Host host;
-    std::vector<std::pair<std::string, Duration>> answers;
-};
-
-TEST_F(SimHttp, AnswersAsLaidDownOnceBeforeStanding) {
-    host.http.answer("http://a/", HttpAnswer::ok("standing"));
-    host.http.answerOnce("http://a/", HttpAnswer::status(401));
-    host.http.answerOnce("http://a/", HttpAnswer::failure("reset"));
-    for (int i = 0; i < 4; ++i) {
-        get("http://a/");
-        EXPECT_EQ(answers.size(), static_cast<std::size_t>(i)) << "answers come later";
-        host.runFor(1s);
-    }
-    host.http.answer("http://a/", [](const HttpRequest& request) { return HttpAnswer::ok("to " + request.method); });
-    get("http://a/");
-    get("http://b/");
-    get("no url");
-    host.runFor(1s);
-    EXPECT_THAT(texts(), ElementsAre("401:", "reset", "200:standing", "200:standing", "200:to GET",
-                                     "connection refused", "no URL"));
-}
-
-TEST_F(SimHttp, HonoursDelaysAndTimeouts) {
-    host.http.answer("http://slow/", HttpAnswer::ok("x").after(45s));
-    host.http.answer("http://silent/", HttpAnswer::silence());
-    send(host.http.shared(), requestTo("http://slow/", 30s));
-    get("http://slow/");
-    get("http://silent/");
-    host.runFor(2min);
-    using Answer = std::pair<std::string, Duration>;
-    EXPECT_THAT(answers, ElementsAre(Answer("the request timed out", 30s), Answer("200:x", 45s),
-                                     Answer("the request timed out", 60s)));
-}
-
-TEST_F(SimHttp, RecordsWhatWasSent) {
-    host.runFor(5s);
-    HttpRequest request = requestTo("http://a/");
-    request.body = {'b'};
-    send(host.http.shared(), request);
-    get("http://b/");
-    ASSERT_EQ(host.http.sentTo("http://a/").size(), 1u);
-    EXPECT_EQ(host.http.sentTo("http://a/")[0].body(), "b");
-    EXPECT_EQ(host.http.sentTo("http://a/")[0].date, Clock::start + 5s);
-    // Unanswered at the end, which is no failure.
-}
 
 TEST(SimFiles, FailAsScriptedAndKeepTheOldContent) {
     Host host;
@@ -118,27 +50,33 @@ TEST(SimDefaults, FailAndInterfereAsScripted) {
     EXPECT_EQ(failures.size(), 1u) << "the function uses the store";
 }
 
-TEST(SimListener, AsksTheDelegateAndReportsAConnectionThatServesNothing) {
-    struct : platform::ServiceListenerDelegate {
-        bool shouldAcceptNewConnection(platform::ServiceListener&, platform::ServiceConnection& connection) override {
-            if (isAccepting) connection.resume();
-            return isAccepting;
-        }
-        bool isAccepting = true;
-    } delegate;
+TEST(SimProcess, TakesItsMemoryAlongWhenItEnds) {
+    std::vector<std::string> notes;
+    const auto note = [&](const char* text) { return [&notes, text] { notes.push_back(text); }; };
     Host host;
-    std::vector<std::string> failures;
-    host.failures.handler = [&](const std::string& text) { failures.push_back(text); };
-    auto listener = host.listener.makeListener("name");
-    listener->setDelegate(&delegate);
-    EXPECT_EQ(host.listener.connect(7, {}), nullptr) << "before resume()";
-    listener->resume();
-    EXPECT_THAT(failures, IsEmpty());
-    EXPECT_EQ(host.listener.connect(7, {}), nullptr);
-    EXPECT_EQ(failures.size(), 1u) << "resumed, but nothing is exported";
-    delegate.isAccepting = false;
-    EXPECT_EQ(host.listener.connect(7, {}), nullptr);
-    EXPECT_EQ(failures.size(), 1u) << "refused";
+    host.process.launch([&] {
+        host.notifications.registerForNotification("com.orvane.n", host.queues.mainQueue(), note("notified"));
+        return std::shared_ptr<void>(nullptr, [gone = note("gone")](void*) { gone(); });
+    });
+    host.defaults.set("stored", 1);
+    host.defaults.registerDefaults({{"registered", 1}});
+    auto& worker = host.queues.workers(platform::Priority::Background);
+    worker.post([&] {
+        std::shared_ptr<void> unwound(nullptr, [unwind = note("unwound")](void*) { unwind(); });
+        host.queues.makeEvent()->wait();
+    });
+    worker.postAfter(1s, note("never"));
+    host.notifications.raise(".n");
+    host.run();
+    host.notifications.raise(".n");  // delivered, but not yet taken
+    host.process.kill();
+    host.runFor(2s);
+    EXPECT_THAT(notes, ElementsAre("notified", "unwound", "gone"));
+    EXPECT_EQ(host.defaults.dictionaryRepresentation(), (Dictionary{{"stored", 1}}));
+    host.notifications.raise(".n");
+    host.process.relaunch();
+    host.run();
+    EXPECT_EQ(notes.back(), "notified") << "what was missed is heard of";
 }
 
 }  // namespace

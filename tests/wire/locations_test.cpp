@@ -51,9 +51,11 @@ TEST(Locations, GoFromTheCommandLineToTheBareMachine) {
                 ElementsAre("/usr/lib/vrxagent/device.d/", "/etc/vrxagent/device.toml", "/etc/vrxagent/device.d/",
                             "/run/vrxagent/device.d/", "/config/vrxagent/device.toml", "/config/vrxagent/device.d/"));
     machine.variables["XDG_CONFIG_HOME"] = "";
-    EXPECT_EQ(machine.find().profile.size(), 4u) << "of a device, not of a user";
+    EXPECT_EQ(machine.find({.home = "h"}).profile.at(4), "/home/ada/.config/vrxagent/device.toml");
+    EXPECT_EQ(machine.find().profile.at(5), "/home/ada/.config/vrxagent/device.d/");
 
     machine.variables["STATE_DIRECTORY"] = "/var/lib/vrxagent:/var/lib/other";
+    EXPECT_EQ(machine.find().profile.size(), 4u) << "of a device, not of a user";
     EXPECT_EQ(machine.find().home.path, "/var/lib/vrxagent");
     EXPECT_EQ(machine.find().home.chosenBy, "$STATE_DIRECTORY");
 

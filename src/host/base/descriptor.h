@@ -6,7 +6,9 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <chrono>
 #include <system_error>
+#include <thread>
 #include <utility>
 
 namespace vrx::host {
@@ -37,6 +39,11 @@ inline Descriptor makeEventFile() {
     Descriptor file(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK));
     if (!file) throw std::system_error(errno, std::generic_category(), "eventfd");
     return file;
+}
+
+// For a thread that goes on although its poll has failed, perhaps for good: without its wait it would spin.
+inline void pauseAfterFailedPoll() {
+    std::this_thread::sleep_for(std::chrono::milliseconds(100));
 }
 
 // A descriptor of a process, readable once it has ended. The library's own function cannot be called from C++ before

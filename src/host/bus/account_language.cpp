@@ -21,11 +21,12 @@ const std::vector<BusProperty>& accountProperties() {
 }  // namespace
 
 AccountLanguage::AccountLanguage(SystemBus& bus, std::uint32_t user, std::optional<std::string> kept,
-                                 IdentifierOf identifierOf, std::function<void()> onChange)
+                                 IdentifierOf identifierOf, std::function<void()> onChange, platform::Duration pause)
     : BusService(bus, accounts, user < firstPerson ? Activation::Never : Activation::ByQuestion),
       user_(user),
       identifierOf_(std::move(identifierOf)),
       onChange_(std::move(onChange)),
+      pause_(pause),
       isSettled_(user < firstPerson),
       identifier_(std::move(kept)) {}
 
@@ -52,20 +53,28 @@ void AccountLanguage::left() {
 
 void AccountLanguage::found(sd_bus_message* reply) {
     const char* path = nullptr;
-    if (!reply || sd_bus_message_has_signature(reply, "o") <= 0 || sd_bus_message_read_basic(reply, 'o', &path) <= 0)
+    if (!reply || sd_bus_message_has_signature(reply, "o") <= 0 || sd_bus_message_read_basic(reply, 'o', &path) <= 0) {
+        answered();
         return settle(value());
+    }
     matchInstead({changedPropertiesRule("path='" + std::string(path) + "'", accountInterface)},
-                 [this](sd_bus_message* signal) {
-                     BusValues values;
-                     if (readChangedProperties(signal, accountInterface, accountProperties(), values)) take(values);
-                 });
+                 [this](sd_bus_message* signal) { takeChange(signal); });
     call(path, propertiesInterface, "GetAll", [this](sd_bus_message* answer) { takeAll(answer); }, {accountInterface});
 }
 
 void AccountLanguage::takeAll(sd_bus_message* reply) {
+    answered();
     BusValues values;
     if (readAllProperties(reply, accountProperties(), values)) take(values);
     settle(value());
+}
+
+void AccountLanguage::takeChange(sd_bus_message* signal) {
+    BusValues values;
+    std::vector<std::string> toBeAsked;
+    if (!readChangedProperties(signal, accountInterface, accountProperties(), values, toBeAsked)) return;
+    take(values);
+    if (!toBeAsked.empty()) askAgainLater(pause_);
 }
 
 void AccountLanguage::take(const BusValues& values) {

@@ -20,9 +20,9 @@ public:
 
     // Asks for that user, and only where the user is a person: a system user (below 1000) has no language. What is kept
     // from an earlier process stays until the service has answered. Calls onChange, on the main thread, when it is
-    // settled and when the language has changed.
+    // settled and when the language has changed. Asks again after the pause when it is to.
     AccountLanguage(SystemBus& bus, std::uint32_t user, std::optional<std::string> kept, IdentifierOf identifierOf,
-                    std::function<void()> onChange);
+                    std::function<void()> onChange, platform::Duration pause = pauseBeforeQuestion);
 
     // The locale identifier; nothing where none is chosen. While the service is silent it stays. Any thread.
     std::optional<std::string> value() const;
@@ -36,12 +36,14 @@ private:
     void left() override;
     void found(sd_bus_message* reply);
     void takeAll(sd_bus_message* reply);
+    void takeChange(sd_bus_message* signal);
     void take(const BusValues& values);
     void settle(std::optional<std::string> identifier);
 
     const std::int64_t user_;
     const IdentifierOf identifierOf_;
     const std::function<void()> onChange_;
+    const platform::Duration pause_;
     mutable std::mutex mutex_;
     bool isSettled_;
     std::optional<std::string> identifier_;

@@ -1,7 +1,6 @@
 #include "vrx/host/bus/bluez_objects.h"
 
 #include <algorithm>
-#include <cstring>
 
 namespace vrx::host {
 
@@ -109,13 +108,9 @@ bool readBluezObjects(sd_bus_message* message, const IsKnownAddress& isKnown, Bl
 
 BusValues readBluezChanges(sd_bus_message* signal, const char* interface, const std::vector<BusProperty>& wanted) {
     BusValues values;
-    if (!readChangedProperties(signal, interface, wanted, values) ||
-        sd_bus_message_enter_container(signal, 'a', "s") <= 0)
-        return {};
-    const char* name = nullptr;
-    while (sd_bus_message_read_basic(signal, 's', &name) > 0)
-        if (std::ranges::any_of(wanted, [&](const BusProperty& one) { return std::strcmp(one.name, name) == 0; }))
-            values[name] = platform::Value();
+    std::vector<std::string> toBeAsked;
+    if (!readChangedProperties(signal, interface, wanted, values, toBeAsked)) return {};
+    for (const std::string& name : toBeAsked) values[name] = platform::Value();
     return values;
 }
 

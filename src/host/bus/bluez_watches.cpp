@@ -108,6 +108,10 @@ void BluezWatches::ask() {
 
 void BluezWatches::left() {
     forget();
+    noteAnswered();
+}
+
+void BluezWatches::noteAnswered() {
     {
         const std::lock_guard lock(mutex_);
         if (std::exchange(isAnswered_, true)) return;
@@ -130,7 +134,8 @@ void BluezWatches::sendQuestion() {
     call("/", "org.freedesktop.DBus.ObjectManager", "GetManagedObjects", [this](sd_bus_message* answer) {
         isAsking_ = false;
         if (std::exchange(shouldAskAgain_, false)) askLater(pauses_.betweenQuestions);
-        if (answer) takeAnswer(answer);
+        // An error, or an answer that means nothing, is one as well: nobody need wait for a better one.
+        if (!answer || !takeAnswer(answer)) noteAnswered();
     });
 }
 
@@ -147,11 +152,12 @@ void BluezWatches::askLater(Duration pause) {
     });
 }
 
-void BluezWatches::takeAnswer(sd_bus_message* answer) {
+// False when it is broken.
+bool BluezWatches::takeAnswer(sd_bus_message* answer) {
     BluezObjects objects;
     if (!readBluezObjects(
             answer, [this](const std::string& address) { return isKnown(address); }, objects))
-        return;
+        return false;
     objects_ = std::move(objects);
     // A device may have changed before it came to be followed.
     if (followDevices()) askLater(pauses_.betweenQuestions);
@@ -166,6 +172,7 @@ void BluezWatches::takeAnswer(sd_bus_message* answer) {
         if (device.isPaired == true) takePaired(path, device, watches);
     set(std::move(watches));
     readNext();
+    return true;
 }
 
 void BluezWatches::takePaired(const std::string& path, const BluezDevice& device, std::vector<KnownWatch>& watches) {

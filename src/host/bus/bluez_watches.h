@@ -32,7 +32,7 @@ public:
 
     // By their pairing date, then by their address. Any thread.
     std::vector<KnownWatch> watches() const;
-    // Whether BlueZ has told its list since the start, or is known not to be there. Any thread.
+    // Whether BlueZ has answered since the start, if only with an error, or is known not to be there. Any thread.
     bool isAnswered() const;
 
 private:
@@ -45,7 +45,8 @@ private:
     void sendQuestion();
     void askLater(platform::Duration pause);
 
-    void takeAnswer(sd_bus_message* answer);
+    bool takeAnswer(sd_bus_message* answer);
+    void noteAnswered();
     void takePaired(const std::string& path, const BluezDevice& device, std::vector<KnownWatch>& watches);
     void takeAdapter(sd_bus_message* signal);
     void takeDevice(sd_bus_message* signal);

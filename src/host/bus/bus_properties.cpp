@@ -10,7 +10,6 @@ using platform::Value;
 namespace {
 
 constexpr std::size_t textBytes = 256, mostElements = 16;
-constexpr platform::Duration pauseBetweenQuestions{1};
 
 // Reads one value of that type, or none.
 Value readBasic(sd_bus_message* message, char type) {
@@ -62,10 +61,16 @@ bool readAllProperties(sd_bus_message* reply, const std::vector<BusProperty>& wa
 }
 
 bool readChangedProperties(sd_bus_message* signal, std::string_view interface, const std::vector<BusProperty>& wanted,
-                           BusValues& values) {
+                           BusValues& values, std::vector<std::string>& toBeAsked) {
     const char* name = nullptr;
-    return sd_bus_message_has_signature(signal, "sa{sv}as") > 0 && sd_bus_message_read_basic(signal, 's', &name) > 0 &&
-           interface == name && readBusProperties(signal, wanted, values);
+    if (sd_bus_message_has_signature(signal, "sa{sv}as") <= 0 || sd_bus_message_read_basic(signal, 's', &name) <= 0 ||
+        interface != name || !readBusProperties(signal, wanted, values) ||
+        sd_bus_message_enter_container(signal, 'a', "s") <= 0)
+        return false;
+    while (sd_bus_message_read_basic(signal, 's', &name) > 0)
+        if (std::ranges::any_of(wanted, [&](const auto& one) { return std::strcmp(one.name, name) == 0; }))
+            toBeAsked.emplace_back(name);
+    return true;
 }
 
 std::string changedPropertiesRule(const std::string& place, const std::string& interface) {
@@ -91,11 +96,9 @@ void BusProperties::follow() {
 }
 
 void BusProperties::ask() {
-    isAsking_ = true;
-    pause_.reset();
     call(place_.path, propertiesInterface, "GetAll",
          [this](sd_bus_message* reply) {
-             isAsking_ = false;
+             answered();
              isSettled_ = true;
              BusValues values;
              if (readAllProperties(reply, wanted_, values)) set(std::move(values));
@@ -104,28 +107,16 @@ void BusProperties::ask() {
 }
 
 void BusProperties::left() {
-    isAsking_ = false;
     isSettled_ = true;
     set({});
 }
 
 void BusProperties::take(sd_bus_message* signal) {
     BusValues values = values_;  // only this thread changes them
-    if (!readChangedProperties(signal, place_.interface, wanted_, values)) return;
+    std::vector<std::string> toBeAsked;
+    if (!readChangedProperties(signal, place_.interface, wanted_, values, toBeAsked)) return;
     set(std::move(values));
-    if (sd_bus_message_enter_container(signal, 'a', "s") <= 0) return;
-    const char* invalidated = nullptr;
-    while (sd_bus_message_read_basic(signal, 's', &invalidated) > 0)
-        if (std::ranges::any_of(wanted_, [&](const auto& one) { return std::strcmp(one.name, invalidated) == 0; }))
-            askAgainLater();
-}
-
-// A service could make the agent ask for ever.
-void BusProperties::askAgainLater() {
-    if (isAsking_ || pause_) return;
-    callAfter(pause_, pauseBetweenQuestions, [this] {
-        if (isThere()) ask();
-    });
+    if (!toBeAsked.empty()) askAgainLater();
 }
 
 void BusProperties::set(BusValues values) {

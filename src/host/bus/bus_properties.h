@@ -26,10 +26,10 @@ using BusValues = std::map<std::string, platform::Value, std::less<>>;
 bool readBusProperties(sd_bus_message* message, const std::vector<BusProperty>& wanted, BusValues& values);
 // The same for the answer to GetAll, which is null if there is none.
 bool readAllProperties(sd_bus_message* reply, const std::vector<BusProperty>& wanted, BusValues& values);
-// The same for the signal of changes in that interface, up to the names of what is to be asked anew. Of the values so
-// far only those in the signal change; one of a wrong type is removed.
+// The same for the signal of changes in that interface. Of the values so far only those in the signal change; one of a
+// wrong type is removed. Then the names of what has changed too, but is to be asked for: of those that are wanted.
 bool readChangedProperties(sd_bus_message* signal, std::string_view interface, const std::vector<BusProperty>& wanted,
-                           BusValues& values);
+                           BusValues& values, std::vector<std::string>& toBeAsked);
 
 inline constexpr const char* propertiesInterface = "org.freedesktop.DBus.Properties";
 // The rule for that signal. The place is a rule's path or path_namespace.
@@ -70,14 +70,11 @@ private:
     void ask() override;
     void left() override;
     void take(sd_bus_message* signal);
-    void askAgainLater();
     void set(BusValues values);
 
     const Place place_;
     const std::vector<BusProperty> wanted_;
     const std::function<void()> onChange_;
-    EventSource pause_;
-    bool isAsking_ = false;
     bool isSettled_ = false;
     mutable std::mutex mutex_;
     BusValues values_;

@@ -50,7 +50,7 @@ void BusService::begin() {
     ownerCalls_.push_back({this, [this](sd_bus_message* reply) {
                                const char* owner = nullptr;
                                if (reply && sd_bus_message_read(reply, "s", &owner) > 0) return setOwner(owner);
-                               if (activation_ == Activation::ByQuestion) return ask();
+                               if (activation_ == Activation::ByQuestion) return askNow();
                                left();
                            }});
     sd_bus_slot* slot = nullptr;
@@ -62,17 +62,35 @@ void BusService::begin() {
 void BusService::end() {
     matches_.clear();
     changingMatches_.clear();
-    calls_.clear();
+    forgetQuestions();
     ownerCalls_.clear();
     if (!std::exchange(owner_, "").empty()) left();
 }
 
-// Answers of an owner that has gone since do not count.
+// Answers of an owner that has gone since do not count. One that has come while a question is open was started by it,
+// and is going to answer it.
 void BusService::setOwner(const std::string& owner) {
     if (owner == owner_) return;
-    calls_.clear();
+    const bool isStartedByQuestion = owner_.empty() && !calls_.empty();
     owner_ = owner;
-    owner_.empty() ? left() : ask();
+    if (isStartedByQuestion) return;
+    forgetQuestions();
+    owner_.empty() ? left() : askNow();
+}
+
+void BusService::askNow() {
+    isQuestionOpen_ = true;
+    ask();
+}
+
+void BusService::forgetQuestions() {
+    calls_.clear();
+    again_.reset();
+    isQuestionOpen_ = false;
+}
+
+void BusService::askAgainLater(platform::Duration pause) {
+    if (!isQuestionOpen_ && !again_) callAfter(again_, pause, [this] { askNow(); });
 }
 
 void BusService::add(const std::string& rule, std::list<Callback>& list, sd_bus_message_handler_t onMessage,

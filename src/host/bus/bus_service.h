@@ -19,6 +19,7 @@ class BusService {
 public:
     // Whether a question may start the service.
     enum class Activation { Never, ByQuestion };
+    static constexpr platform::Duration pauseBeforeQuestion{1};
 
     // The bus must outlive the service; services are made before it starts.
     BusService(SystemBus& bus, std::string name, Activation activation = Activation::Never);
@@ -33,7 +34,7 @@ public:
 protected:
     // A connection has begun: here the matches are added. Questions are asked after that.
     virtual void follow() = 0;
-    // The service may have come, or come anew.
+    // The service may have come, or come anew; or it is to be asked again.
     virtual void ask() = 0;
     // It has gone, or the bus has.
     virtual void left() = 0;
@@ -43,12 +44,18 @@ protected:
     void match(const std::string& rule, Handler handler);
     // Rules that take the place of those of the last such call, without a gap. Not to be called by such a handler.
     void matchInstead(const std::vector<std::string>& rules, const Handler& handler);
+    // For who uses askAgainLater(): the answer to ask() is there, or will not come.
+    void answered() { isQuestionOpen_ = false; }
+    // Asks again after a pause, however much is signalled: a service could make the agent ask for ever. Does nothing
+    // while the answer to ask() is to come, which holds what was signalled before it.
+    void askAgainLater(platform::Duration pause = pauseBeforeQuestion);
     // Calls once after the delay, or up to a quarter of it later, to wake the machine along with others. The timer is
     // empty again by then; resetting it before gives the call up. The time asleep counts with CLOCK_BOOTTIME, and not
     // with CLOCK_MONOTONIC.
     void callAfter(EventSource& timer, platform::Duration delay, std::function<void()> then,
                    clockid_t clock = CLOCK_BOOTTIME);
-    // Null is handed over when there is no answer, or an error. Calls that are open when the service goes are dropped.
+    // Null is handed over when there is no answer, or an error. Calls that are open when the service goes are dropped;
+    // one that starts the service is open while it comes, and is not asked again.
     // The arguments are strings.
     void call(const std::string& path, const char* interface, const char* member, Handler handler,
               std::initializer_list<const char*> arguments = {});
@@ -68,6 +75,8 @@ private:
     void begin();
     void end();
     void setOwner(const std::string& owner);
+    void askNow();
+    void forgetQuestions();
     void add(const std::string& rule, std::list<Callback>& list, sd_bus_message_handler_t onMessage, Handler handler);
     static int onOwnerChanged(sd_bus_message* message, void* self, sd_bus_error*);
     static int onSignal(sd_bus_message* message, void* callback, sd_bus_error*);
@@ -81,6 +90,8 @@ private:
     std::list<Callback> changingMatches_;
     std::list<Callback> calls_;
     std::list<Callback> ownerCalls_;
+    bool isQuestionOpen_ = false;
+    EventSource again_;
 };
 
 }  // namespace vrx::host

@@ -58,38 +58,27 @@ ModemCarriers::Carriers ModemCarriers::carriers() const {
 // SIMs its state changes too.
 void ModemCarriers::follow() {
     const std::string root = modemManagerPath;
-    match("path='" + root + "',interface='" + objectManager + "'", [this](sd_bus_message*) { askLater(); });
-    match("path_namespace='" + root + "/Modem',interface='" + modemInterface + "',member='StateChanged'",
-          [this](sd_bus_message*) { askLater(); });
-    match(changedPropertiesRule("path_namespace='" + root + "/SIM'", simInterface), [this](sd_bus_message* signal) {
-        BusValues values;
-        if (readChangedProperties(signal, simInterface, simProperties(), values))
-            takeOperator(sd_bus_message_get_path(signal), values);
-    });
+    const auto askAgain = [this](sd_bus_message*) { askAgainLater(times_.pause); };
+    match("path='" + root + "',interface='" + objectManager + "'", askAgain);
+    match("path_namespace='" + root + "/Modem',interface='" + modemInterface + "',member='StateChanged'", askAgain);
+    match(changedPropertiesRule("path_namespace='" + root + "/SIM'", simInterface),
+          [this](sd_bus_message* signal) { takeSim(signal); });
 }
 
 void ModemCarriers::ask() {
-    isAsking_ = true;
-    pause_.reset();
     call(modemManagerPath, objectManager, "GetManagedObjects", [this](sd_bus_message* reply) { take(reply); });
 }
 
 void ModemCarriers::left() {
-    isAsking_ = false;
-    pause_.reset();
     hold_.reset();
     modems_.clear();
     operators_.clear();
+    toBeAsked_.clear();
     for (auto& [service, held] : held_) held.until.reset();
 }
 
-// What is signalled while a question is open is in the answer.
-void ModemCarriers::askLater() {
-    if (!isAsking_ && !pause_) callAfter(pause_, times_.pause, [this] { ask(); });
-}
-
 void ModemCarriers::take(sd_bus_message* reply) {
-    isAsking_ = false;
+    answered();
     auto modems = readModems(reply);
     if (!modems) return;
     modems_ = std::move(*modems);
@@ -100,7 +89,8 @@ void ModemCarriers::take(sd_bus_message* reply) {
             if (sim != noSim) operators[sim] = operators_[sim];
     operators_ = std::move(operators);
     for (const auto& [sim, identifier] : operators_)
-        if (identifier.empty()) askOperator(sim);
+        if (identifier.empty() || toBeAsked_.contains(sim)) askOperator(sim);
+    toBeAsked_.clear();
     update();
 }
 
@@ -171,6 +161,17 @@ void ModemCarriers::takeOperator(const SimPath& sim, const BusValues& values) {
     if (known == operators_.end() || value == values.end() || !value->second.asString()) return;
     known->second = *value->second.asString();
     update();
+}
+
+void ModemCarriers::takeSim(sd_bus_message* signal) {
+    const SimPath sim = sd_bus_message_get_path(signal);
+    BusValues values;
+    std::vector<std::string> toBeAsked;
+    if (!readChangedProperties(signal, simInterface, simProperties(), values, toBeAsked)) return;
+    takeOperator(sim, values);
+    if (toBeAsked.empty() || !operators_.contains(sim)) return;
+    toBeAsked_.insert(sim);
+    askAgainLater(times_.pause);
 }
 
 ModemCarriers::Carriers ModemCarriers::toldCarriers() const {

@@ -7,6 +7,7 @@
 #include <map>
 #include <mutex>
 #include <optional>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -54,10 +55,10 @@ private:
     void follow() override;
     void ask() override;
     void left() override;
-    void askLater();
     void take(sd_bus_message* reply);
     void askOperator(const SimPath& sim);
     void takeOperator(const SimPath& sim, const BusValues& values);
+    void takeSim(sd_bus_message* signal);
     void notePlaces();
     Carriers toldCarriers() const;
     void update();
@@ -67,10 +68,10 @@ private:
 
     const std::function<void()> onChange_;
     const ModemTimes times_;
-    bool isAsking_ = false;
-    EventSource pause_, hold_;
+    EventSource hold_;
     std::vector<Modem> modems_;
     std::map<SimPath, std::string> operators_;  // of all SIMs that there are; empty before the answer, and while locked
+    std::set<SimPath> toBeAsked_;               // those whose operator has changed without being told
     std::vector<Place> places_;
     std::map<std::string, Held> held_;  // by cellular service
     mutable std::mutex mutex_;

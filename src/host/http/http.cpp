@@ -155,7 +155,7 @@ void HttpTransfers::run() {
         beginWaiting();
         // Wakes only for bytes, for the library's own timers, for a new request and for one that waits for too long.
         curl_waitfd woken{wakeFile_.number(), CURL_WAIT_POLLIN, 0};
-        curl().multiPoll(multi_, &woken, 1, untilFirstOverdue(), nullptr);
+        if (curl().multiPoll(multi_, &woken, 1, untilFirstOverdue(), nullptr) != CURLM_OK) pauseAfterFailedPoll();
         eventfd_t count;
         eventfd_read(wakeFile_.number(), &count);
     }

@@ -103,7 +103,7 @@ void Refusals::run() {
         const int timeout = serveAll();
         std::vector<pollfd> files{{wakeFile_.number(), POLLIN, 0}};
         for (const auto& refused : present_) files.push_back(refused->waitFor());
-        poll(files.data(), files.size(), timeout);
+        if (poll(files.data(), files.size(), timeout) < 0) pauseAfterFailedPoll();
         eventfd_t count;
         eventfd_read(wakeFile_.number(), &count);
     }

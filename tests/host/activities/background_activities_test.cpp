@@ -2,18 +2,14 @@
 #include "vrx/host/activities/background_activities.h"
 
 #include <chrono>
-#include <csignal>
-#include <filesystem>
 
 #include "host/activities/real_activities.h"
-#include "vrx/platform/queue.h"
 
 namespace vrx::host {
 namespace {
 
 using platform::BackgroundActivityResult;
 using platform::OnceCallback;
-using ::testing::IsSupersetOf;
 using ::testing::SizeIs;
 using enum BackgroundActivityResult;
 
@@ -129,55 +125,6 @@ TEST_F(StoredActivities, FireAtATestersRequestAsTheSystemWould) {
     subject.restart();
     subject.pass(1h);
     EXPECT_THAT(firings, ElementsAre("a")) << "who asked an earlier process has gone";
-}
-
-// Three activities, of which each schedules the next in its run and the last one itself, once. Each writes down that it
-// has run, in a folder that outlives the process.
-class Road {
-public:
-    explicit Road(const TemporaryFolder& folder) : subject(folder / "host.db"), folder_(folder) {
-        subject.restart();
-        subject.activities().setHandlerFactory([this](const std::string& name) { return handler(name); });
-    }
-
-    RealActivities subject;
-
-private:
-    platform::ActivityHandler handler(const std::string& name) {
-        return [this, name](OnceCallback<BackgroundActivityResult> completion) {
-            if (name.ends_with(".upgrade")) schedule("first");
-            if (name == "first") schedule("second");
-            const bool isFirstTime = !std::filesystem::exists(folder_ / name);
-            if (name == "second") isFirstTime ? schedule("second") : writeFile(folder_ / "again", "");
-            writeFile(folder_ / name, "");
-            platform::Platform::current().queues().mainQueue().postAfter(
-                1s, [completion = std::move(completion)]() mutable { completion(Finished); });
-        };
-    }
-    void schedule(const char* name) {
-        subject.activities().schedule({.identifier = name, .criteria{{.delay = 100}}}, handler(name));
-    }
-
-    const TemporaryFolder& folder_;
-};
-
-TEST(StoredActivitiesRoad, LosesNothingWhenKilledAtAnyMoment) {
-    int steps = 0;
-    for (bool wasKilled = true; wasKilled; ++steps) {
-        TemporaryFolder folder;
-        wasKilled = endOf(inChild([&] {
-                        Road road(folder);
-                        for (int i = 0; i < steps; ++i)
-                            if (!road.subject.step(24h)) _exit(0);
-                        kill(getpid(), SIGKILL);
-                    })) != 0;
-        Road road(folder);
-        road.subject.pass(24h);
-        EXPECT_THAT(folder.names(), IsSupersetOf({"com.orvane.vrxagent.upgrade", "first", "second", "again"}))
-            << "killed after " << steps;
-        EXPECT_THAT(road.subject.scheduled(), IsEmpty()) << "killed after " << steps;
-    }
-    EXPECT_GT(steps, 20);
 }
 
 }  // namespace

@@ -37,7 +37,8 @@ protected:
     }
 
     int changes = 0;
-    AccountLanguage language{connection, 1000, "nl_NL", withoutEncoding, [this] { ++changes; }};
+    AccountLanguage language{
+        connection, 1000, "nl_NL", withoutEncoding, [this] { ++changes; }, platform::Duration(1e-6)};
 };
 
 TEST_F(AccountLanguageTest, IsFollowedAndStaysWhileNobodyTells) {
@@ -45,13 +46,12 @@ TEST_F(AccountLanguageTest, IsFollowedAndStaysWhileNobodyTells) {
     bus.start();
     connection.start();
     runUntilLanguage("nl_NL");  // as is kept: there is no such service
-    MockService accounts(loop.event(), bus), liar(loop.event(), bus);
+    MockService accounts(loop.event(), bus);
     beAccounts(accounts, "");
     accounts.takeName(accountsName);
     runUntil([&] { return accounts.calls == 2; }, "the questions");
     change(accounts, "s", "de_DE.UTF-8");
     runUntilLanguage("de_DE");
-    liar.emitToEach(accountPath, accountObject, "Language", "s", "fr_FR");
     change(accounts, "s", "pt\nX: y");
     change(accounts, "o", "/es");
     change(accounts, "s", std::string(257, 'e').c_str());
@@ -71,6 +71,11 @@ TEST_F(AccountLanguageTest, IsFollowedAndStaysWhileNobodyTells) {
     change(accounts, "s", "");
     runUntilLanguage(std::nullopt);
     EXPECT_EQ(accounts.calls, 4);
+    beAccounts(accounts, "da_DK.UTF-8");
+    accounts.invalidate(accountPath, accountObject, "UserName");
+    accounts.invalidate(accountPath, accountObject, "Language");
+    runUntilLanguage("da_DK");
+    EXPECT_EQ(accounts.calls, 6);
 }
 
 TEST_F(AccountLanguageTest, IsAbsentWhereItIsRefusedOrBrokenAndOfASystemUser) {

@@ -1,7 +1,5 @@
 #include "vrx/host/bus/bluez_watches.h"
 
-#include <gmock/gmock.h>
-
 #include "host/bus/mock_bus.h"
 
 namespace vrx::host {
@@ -23,19 +21,13 @@ public:
     MockBluez(sd_event* loop, const MockBus& bus) : MockService(loop, bus) {
         methods["/ GetManagedObjects"] = [this](sd_bus_message*, sd_bus_message* reply) {
             ++questions;
-            sd_bus_message_open_container(reply, 'a', "{oa{sa{sv}}}");
-            for (const auto& [path, interfaces] : objects) {
-                sd_bus_message_open_container(reply, 'e', "oa{sa{sv}}");
-                appendObject(reply, path);
-                sd_bus_message_close_container(reply);
-            }
-            sd_bus_message_close_container(reply);
+            appendObjects(reply, objects);
             return std::nullopt;
         };
     }
 
     int questions = 0;
-    std::map<std::string, std::map<std::string, std::map<std::string, std::function<void(sd_bus_message*)>>>> objects;
+    MockObjects objects;
 
     template <class Type>
     void set(const std::string& path, const char* interface, const char* property, const char* type, Type value) {
@@ -83,7 +75,7 @@ public:
 
     void signalAdded(const std::string& path) {
         emitSignal(nullptr, "/", manager, "InterfacesAdded",
-                   [&](sd_bus_message* signal) { appendObject(signal, path); });
+                   [&](sd_bus_message* signal) { appendObject(signal, path, objects[path]); });
     }
     void remove(const std::string& path) {
         const auto object = objects.extract(path);
@@ -91,21 +83,6 @@ public:
             emitSignal(nullptr, "/", manager, "InterfacesRemoved", [&](sd_bus_message* signal) {
                 sd_bus_message_append(signal, "oas", path.c_str(), 1, interface.first.c_str());
             });
-    }
-
-private:
-    void appendObject(sd_bus_message* message, const std::string& path) {
-        sd_bus_message_append(message, "o", path.c_str());
-        sd_bus_message_open_container(message, 'a', "{sa{sv}}");
-        for (const auto& [interface, properties] : objects[path]) {
-            sd_bus_message_open_container(message, 'e', "sa{sv}");
-            sd_bus_message_append(message, "s", interface.c_str());
-            sd_bus_message_open_container(message, 'a', "{sv}");
-            for (const auto& [name, append] : properties) append(message);
-            sd_bus_message_close_container(message);
-            sd_bus_message_close_container(message);
-        }
-        sd_bus_message_close_container(message);
     }
 };
 
@@ -228,6 +205,22 @@ TEST_F(BluezWatchesTest, StayWhileAnythingIsSilent) {
     EXPECT_EQ(changes, 3) << "each has come, and none has ever gone";
     bluez.change(adapterPath + "/dev_one", device, "Alias", "s", "still followed");
     runUntilNames({"still followed", "three", "two"});
+}
+
+TEST_F(BluezWatchesTest, AreAnsweredByARefusalOrNonsense) {
+    bus.start();
+    MockBluez bluez(loop.event(), bus);
+    bluez.takeName("org.bluez");
+    for (const auto& method : {refusal("org.freedesktop.DBus.Error.AccessDenied"), answer("i", 1)}) {
+        bluez.methods["/ GetManagedObjects"] = method;
+        SystemBus own(loop.event(), bus.address());
+        BluezWatches refused(own, {keptWatch("kept", 1)}, std::chrono::system_clock::now, [&] { ++changes; });
+        own.start();
+        EXPECT_FALSE(refused.isAnswered());
+        runUntil([&] { return refused.isAnswered(); }, "the answer");
+        EXPECT_EQ(refused.watches().size(), 1u);
+    }
+    EXPECT_EQ(changes, 2);
 }
 
 TEST_F(BluezWatchesTest, StayForAPauseAfterTheDeviceHasGone) {

@@ -1,5 +1,7 @@
 #include "vrx/host/bus/hardware_serial.h"
 
+#include <sys/stat.h>
+
 #include "host/bus/mock_bus.h"
 
 namespace vrx::host {
@@ -19,6 +21,13 @@ protected:
         runUntil([&] { return serial.isThere() == isThere; }, "the service's coming or going");
     }
 
+    // The bus starts that line of shell as the service, each time with another line in the file "started".
+    void becomeStartable(const std::string& command) const {
+        writeFile(folder / (std::string(hostName) + ".service"), "[D-BUS Service]\nName=" + std::string(hostName) +
+                                                                     "\nUser=root\nExec=/bin/sh -c 'echo >> " +
+                                                                     folder / "started" + "; " + command + "'\n");
+    }
+
     int changes = 0;
     HardwareSerial serial{connection, [this] { ++changes; }};
 };
@@ -26,9 +35,7 @@ protected:
 TEST_F(HardwareSerialTest, IsAskedOnceAndNeverKeepsTheServiceAlive) {
     EXPECT_FALSE(connection.hasSocket());
     const std::string started = folder / "started";
-    writeFile(folder / (std::string(hostName) + ".service"), "[D-BUS Service]\nName=" + std::string(hostName) +
-                                                                 "\nUser=root\nExec=/bin/sh -c 'echo >> " + started +
-                                                                 "; exit 1'\n");
+    becomeStartable("exit 1");
     bus.start();
     EXPECT_TRUE(connection.hasSocket());
     connection.start();
@@ -59,6 +66,29 @@ TEST_F(HardwareSerialTest, IsAskedOnceAndNeverKeepsTheServiceAlive) {
     bus.stop();
     runUntil([&] { return !connection.hasSocket() && !serial.isThere(); }, "the end of the bus");
     EXPECT_EQ(serial.value(), "F2L");
+}
+
+TEST_F(HardwareSerialTest, IsAskedOnceOfTheServiceThatTheQuestionStarts) {
+    const std::string gate = folder / "gate";
+    ASSERT_EQ(mkfifo(gate.c_str(), 0600), 0);
+    const Descriptor holdingIt(open(gate.c_str(), O_RDWR | O_CLOEXEC));  // the started program lives as long
+    becomeStartable("read line < " + gate);
+    bus.start();
+    MockService host(loop.event(), bus);
+    host.methods[hostMethod] = answer("s", "F2L");
+    serial.startAsking();
+    connection.start();
+    runUntil([&] { return std::filesystem::exists(folder / "started"); }, "the question");
+    host.takeName(hostName);
+    runUntilState(State::Known);
+    for (int i = 0; i < 2; ++i) {
+        host.leaveName(hostName);
+        runUntilThere(false);
+        host.takeName(hostName);
+        runUntilThere(true);
+    }
+    EXPECT_EQ(host.calls, 1);
+    EXPECT_EQ(changes, 1);
 }
 
 TEST_F(HardwareSerialTest, IsAbsentWhereItIsRefusedOrMeansNothing) {

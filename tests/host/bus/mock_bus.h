@@ -62,6 +62,34 @@ private:
     pid_t process_ = -1;
 };
 
+// Objects as a service gives them to who asks for all: what appends each property, by path, interface and name.
+using MockInterfaces = std::map<std::string, std::map<std::string, std::function<void(sd_bus_message*)>>>;
+using MockObjects = std::map<std::string, MockInterfaces>;
+
+inline void appendObject(sd_bus_message* message, const std::string& path, const MockInterfaces& interfaces) {
+    sd_bus_message_append(message, "o", path.c_str());
+    sd_bus_message_open_container(message, 'a', "{sa{sv}}");
+    for (const auto& [interface, properties] : interfaces) {
+        sd_bus_message_open_container(message, 'e', "sa{sv}");
+        sd_bus_message_append(message, "s", interface.c_str());
+        sd_bus_message_open_container(message, 'a', "{sv}");
+        for (const auto& [name, append] : properties) append(message);
+        sd_bus_message_close_container(message);
+        sd_bus_message_close_container(message);
+    }
+    sd_bus_message_close_container(message);
+}
+
+inline void appendObjects(sd_bus_message* message, const MockObjects& objects) {
+    sd_bus_message_open_container(message, 'a', "{oa{sa{sv}}}");
+    for (const auto& [path, interfaces] : objects) {
+        sd_bus_message_open_container(message, 'e', "oa{sa{sv}}");
+        appendObject(message, path, interfaces);
+        sd_bus_message_close_container(message);
+    }
+    sd_bus_message_close_container(message);
+}
+
 // Answers what is asked of its objects, as one that has those names.
 class MockService {
 public:
@@ -113,6 +141,12 @@ public:
             if (property) appendProperty(signal, property, type, value...);
             sd_bus_message_close_container(signal);
             sd_bus_message_append(signal, "as", 0);
+        });
+    }
+    // Emits that a property has changed, without its value.
+    void invalidate(const std::string& path, const char* interface, const char* property) {
+        emitSignal(nullptr, path, "org.freedesktop.DBus.Properties", "PropertiesChanged", [&](sd_bus_message* signal) {
+            sd_bus_message_append(signal, "sa{sv}as", interface, 0, 1, property);
         });
     }
     // Emits any signal, to all where the receiver is null.

@@ -3,20 +3,11 @@
 #include <cmath>
 #include <csignal>
 #include <limits>
-#include <thread>
 
 #include "host/support.h"
 
 namespace vrx::host {
 namespace {
-
-constexpr auto append = [](const Value& element) {
-    return [element](const Value& list) {
-        Array longer = list.asArray() ? *list.asArray() : Array();
-        longer.push_back(element);
-        return Value(longer);
-    };
-};
 
 // The database and what is in it, as a process has them open.
 struct Opened {
@@ -61,71 +52,6 @@ TEST_F(DefaultsStoreTest, PresetsStandBetweenWhatIsWrittenAndWhatIsRegistered) {
     opened.store.remove("a");
     presets = std::make_shared<const Dictionary>(Dictionary{{"a", "another"}});
     EXPECT_EQ(opened.store.get("a"), Value("another"));
-}
-
-TEST_F(DefaultsStoreTest, UpdatesOfProcessesAndThreadsAtOnceLoseNothing) {
-    constexpr int each = 40;
-    std::vector<pid_t> children;
-    for (int process = 0; process < 2; ++process)
-        children.push_back(inChild([&] {
-            Opened opened(path());
-            for (int i = 0; i < each; ++i) opened.store.update("list", append(Value(1000 * process + i)));
-        }));
-    Opened opened(path());
-    std::vector<std::thread> threads;
-    for (int thread = 2; thread < 4; ++thread)
-        threads.emplace_back([&, thread] {
-            for (int i = 0; i < each; ++i) {
-                opened.store.update("list", append(Value(1000 * thread + i)));
-                EXPECT_TRUE(opened.store.get("list").asArray());  // own writes are seen at once
-            }
-        });
-    for (std::thread& thread : threads) thread.join();
-    for (pid_t child : children) EXPECT_EQ(endOf(child), 0);
-
-    std::set<std::int64_t> seen;
-    const Value list = opened.store.get("list");  // and those of other processes
-    ASSERT_TRUE(list.asArray());
-    for (const Value& element : *list.asArray()) seen.insert(element.asInteger().value());
-    EXPECT_EQ(seen.size(), 4u * each);
-    EXPECT_EQ(list.asArray()->size(), 4u * each);
-    EXPECT_THAT(log.lines(), ElementsAre());
-}
-
-TEST_F(DefaultsStoreTest, WhatWasWrittenSurvivesAKilledProcess) {
-    Pipe pipe;  // a byte for each step
-    const pid_t child = inChild([&] {
-        Opened opened(path());
-        for (std::int64_t i = 1;; ++i) {
-            opened.store.set("count", i);
-            opened.store.update("list", append(Value(i)));
-            if (write(pipe.writer.number(), "!", 1) != 1) return;
-        }
-    });
-    char byte = 0;
-    for (int i = 0; i < 50; ++i) ASSERT_EQ(read(pipe.reader.number(), &byte, 1), 1);
-    kill(child, SIGKILL);
-    EXPECT_EQ(endOf(child), -SIGKILL);
-    const std::size_t acknowledged = 50 + pipe.rest().size();
-
-    Opened opened(path());
-    EXPECT_GE(opened.store.integer("count"), static_cast<std::int64_t>(acknowledged));
-    EXPECT_GE(opened.store.get("list").asArray()->size(), acknowledged);
-    EXPECT_THAT(log.lines(), ElementsAre());
-}
-
-TEST_F(DefaultsStoreTest, AFailedWriteIsLoggedAndLeavesTheEarlierValue) {
-    Opened opened(path());
-    DefaultsStore& store = opened.store;
-    store.set("key", "before");
-    // A disk without room for another page.
-    ASSERT_FALSE(opened.execute("PRAGMA max_page_count = 1"));
-    store.set("key", std::string(100'000, 'x'));
-    EXPECT_THAT(log.lines(), ElementsAre(AllOf(HasSubstr("Cannot write the setting key: "), HasSubstr("full"))));
-    EXPECT_EQ(store.get("key"), Value("before"));
-    ASSERT_FALSE(opened.execute("PRAGMA max_page_count = 1000"));
-    store.set("key", std::string(100'000, 'x'));
-    EXPECT_EQ(store.string("key")->size(), 100'000u);
 }
 
 TEST_F(DefaultsStoreTest, SetsADamagedFileAsideAndBeginsAfresh) {

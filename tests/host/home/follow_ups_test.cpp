@@ -1,6 +1,4 @@
-// Follow-ups on the real host: a service that fails, processes that work at once, and processes that are killed at
-// work.
-#include <csignal>
+// Follow-ups on the real host: a service that fails, and processes that work at once.
 #include <thread>
 
 #include "host/support.h"
@@ -8,11 +6,8 @@
 #include "vrx/devices/records/device_info.h"
 #include "vrx/followup/default_follow_up_provider.h"
 #include "vrx/followup/follow_up.h"
-#include "vrx/followup/follow_up_content.h"
 #include "vrx/followup/serial_number_hashes.h"
 #include "vrx/host/host.h"
-#include "vrx/platform/sha256_hash.h"
-#include "vrx/service/agent.h"
 
 namespace vrx::host {
 namespace {
@@ -30,39 +25,11 @@ std::shared_ptr<VRXDeviceInfo> offered(const std::string& serialNumber) {
         VRXWarranty::warrantyWithDictionary(record));
 }
 
-Value stored(std::string_view key) {
-    return platform::Platform::current().defaultsStore().get(key);
-}
-
-// The platform's service, in a process that is killed behind a post.
-class KilledProvider final : public VRXFollowUpProvider {
-public:
-    bool postFollowUpItem(const FollowUpItem& item, MaybeError* error) override {
-        return service_.postFollowUpItem(item, error) && raise(SIGKILL) == 0;
-    }
-    bool clearPendingFollowUpItemsWithUniqueIdentifiers(const std::vector<std::string>&, MaybeError*) override {
-        return false;
-    }
-    std::vector<FollowUpItem> pendingFollowUpItems(MaybeError* error) override {
-        return service_.pendingFollowUpItems(error);
-    }
-
-private:
-    VRXDefaultFolllowUpProvider service_;
-};
-
 class FollowUps : public ::testing::Test {
 protected:
     void openHost() {
         host.emplace(HostLocations{folder / "home", {folder / "device.toml"}}, platform::Level::Error);
         ASSERT_FALSE(host->open(HomeUse::Tool));
-    }
-    // Does the work in a process with a host of its own.
-    pid_t inChildWithHost(const std::function<void()>& work) {
-        return inChild([&] {
-            openHost();
-            work();
-        });
     }
     std::vector<std::string> pending() {
         std::vector<std::string> identifiers;
@@ -102,12 +69,6 @@ TEST_F(FollowUps, AreNotChangedByARequestThatFails) {
         expectFailure(code);
     }
     EXPECT_TRUE(controller->clearPendingFollowUpItems({"a"}));
-    // Another database in this one's place is the one that counts.
-    EXPECT_FALSE(Database(folder / "new.db").open());
-    std::filesystem::rename(folder / "new.db", folder / "host.db");
-    EXPECT_THAT(*controller->pendingFollowUpItems(), IsEmpty());
-    EXPECT_FALSE(controller->postFollowUpItem(a));
-    EXPECT_THAT(*controller->pendingFollowUpItems(), ElementsAre(a));
 }
 
 TEST_F(FollowUps, AreNotHiddenByOneThatCannotBeRead) {
@@ -136,7 +97,10 @@ TEST_F(FollowUps, OfProcessesAndThreadsAtOnceAreAllThereAndSoAreTheirHashes) {
             VRXFollowUp().dismissFollowUpForSerialNumber(name + std::to_string(i));
         }
     };
-    const pid_t child = inChildWithHost([&] { work("child"); });
+    const pid_t child = inChild([&] {
+        openHost();
+        work("child");
+    });
     openHost();
     std::thread other(work, "other");
     work("parent");
@@ -144,43 +108,10 @@ TEST_F(FollowUps, OfProcessesAndThreadsAtOnceAreAllThereAndSoAreTheirHashes) {
     EXPECT_EQ(endOf(child), 0);
     for (auto [key, count] :
          {std::pair(postedSerialNumberHashesKey, 4 * each), {dismissedSerialNumberHashesKey, 3 * each}}) {
-        EXPECT_THAT(*stored(key).asArray(), SizeIs(count));
+        EXPECT_THAT(*platform::Platform::current().defaultsStore().get(key).asArray(), SizeIs(count));
         EXPECT_THAT(serialNumberHashes(key), SizeIs(count));
     }
     EXPECT_THAT(pending(), SizeIs(each));
-}
-
-TEST_F(FollowUps, AreThereOnceWhenTheProcessWasKilledBehindThePost) {
-    const auto post = [](const std::shared_ptr<VRXFollowUpProvider>& by) {
-        VRXFollowUp(by).postFollowUpWithDeviceInfo(offered("PHONE"));
-    };
-    EXPECT_EQ(endOf(inChildWithHost([&] { post(std::make_shared<KilledProvider>()); })), -SIGKILL);
-    openHost();
-    EXPECT_THAT(pending(), SizeIs(1));
-    EXPECT_TRUE(stored(postedSerialNumberHashesKey).isNull());
-    post(provider);
-    EXPECT_THAT(pending(), ElementsAre(followUpUniqueIdentifier("PHONE")));
-    EXPECT_EQ(stored(postedSerialNumberHashesKey), Value(Array{platform::sha256Hash("PHONE")}));
-}
-
-TEST_F(FollowUps, AreBothThereWhenTheProcessWasKilledWithinTheMigration) {
-    writeFile(folder / "device.toml", "[device]\nserial_number = 'PHONE'\n");
-    const auto migrate = [](const std::shared_ptr<VRXFollowUpProvider>& by) {
-        AgentCollaborators collaborators;
-        collaborators.makeFollowUp = [=] { return std::make_shared<VRXFollowUp>(by); };
-        VRXAgent::initWithCallingProcessBundleID("id", collaborators)->performMigrationIfNeeded();
-    };
-    const pid_t child = inChildWithHost([&] {
-        provider->postFollowUpItem({.uniqueIdentifier = followUpClientIdentifier()}, nullptr);
-        offered("")->warranty()->cache();
-        migrate(std::make_shared<KilledProvider>());
-    });
-    EXPECT_EQ(endOf(child), -SIGKILL);
-    openHost();
-    EXPECT_TRUE(stored("VRXMigrationVersion").isNull());
-    migrate(provider);
-    EXPECT_THAT(pending(), ElementsAre(followUpClientIdentifier(), followUpUniqueIdentifier("PHONE")));
-    EXPECT_EQ(stored("VRXMigrationVersion"), Value(2));
 }
 
 }  // namespace

@@ -21,20 +21,11 @@ protected:
 TEST_F(ProfileLayersTest, LaterFilesWinKeyByKey) {
     EXPECT_EQ(name(), "");
     writeFile(image + "50-b.toml", R"(
-[device]
-name = "image"
-product_type = "Slate"
-[account]
-identifier = "ada"
-authentication = false
-headers = { X-A = "image", X-B = "image" }
-[features.Vireo]
-One = true
-Two = true
-[[watches]]
-serial_number = "W1"
-[[bundles]]
-identifier = "image"
+device = { name = "image", product_type = "Slate" }
+account = { identifier = "ada", authentication = false, headers = { X-A = "image", X-B = "image" } }
+features.Vireo = { One = true, Two = true }
+watches = [{ serial_number = "W1" }]
+bundles = [{ identifier = "image" }]
 )");
     EXPECT_EQ(name(), "image");
     writeFile(image + "60-a.toml", "device.product_type = 'Slab'");

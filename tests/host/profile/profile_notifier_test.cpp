@@ -92,16 +92,6 @@ TEST_F(ProfileNotifierTest, TellsWhatEachEditHasChanged) {
     EXPECT_THAT(raisedUntil("language"), ElementsAre("language"));
 }
 
-TEST_F(ProfileNotifierTest, TellsTheNextProcessWhatChangedMeanwhile) {
-    start(language("de") + watch("A"));
-    start(language("de") + watch("B"));
-    EXPECT_THAT(raisedUntil("unpaired"), ElementsAre("paired", "unpaired"));
-
-    start("[[watches]");  // what nobody understands says nothing of watches
-    writeFile(path, language("fr") + watch("B"));
-    EXPECT_THAT(raisedUntil("language"), ElementsAre("language"));
-}
-
 TEST_F(ProfileNotifierTest, SeesWhatAppearsInAFolderThatIsMadeLater) {
     start("");
     notifier.reset();
