@@ -11,6 +11,7 @@
 #include <string>
 
 #include "client/fake_agent.h"
+#include "client/fake_host.h"
 #include "client/raw_client.h"
 #include "require.h"
 #include "vrx/codec/core/keyed_archive.h"
@@ -122,8 +123,9 @@ void fuzzRequests(const std::string& bytes) {
     static host::MainLoop mainLoop;
     host::ProcessLifecycle lifecycle(mainLoop);
     host::RequestLine line(limits);
+    test::FakeHost fakeHost;
     host::ClientSession session(std::move(agentEnd), *peer, std::make_shared<Agent>(),
-                                std::make_shared<host::ReplyBox>(), limits, line, lifecycle);
+                                std::make_shared<host::ReplyBox>(), {limits, line, lifecycle, &fakeHost});
     const std::string sent = test::RawClient::authentication() + bytes;
     [[maybe_unused]] ssize_t size = write(ends[1], sent.data(), sent.size());
     shutdown(ends[1], SHUT_WR);
@@ -151,12 +153,16 @@ std::string bodyOf(const wire::Operation& operation, const host::RequestArgument
     return body;
 }
 
-void fuzzArguments(const wire::Operation& operation, const std::string& body) {
+void fuzzArguments(std::size_t choice, const std::string& body) {
+    constexpr std::array interfaces{&wire::agentInterface, &wire::hostInterface, &wire::followUpsInterface,
+                                    &wire::coverageInterface};
+    const wire::Interface& interface = *interfaces[choice % interfaces.size()];
+    const wire::Operation& operation = interface.operations[choice / interfaces.size() % interface.operations.size()];
     openPair().readBody(operation.signature, body, [&](sd_bus_message* message) {
         const auto arguments = host::readArguments(message, body, std::endian::little, operation);
         require(!arguments || bodyOf(operation, *arguments) == body);
     });
-    fuzzRequests(test::RawClient::call(operation.member, 1, operation.signature, body));
+    fuzzRequests(test::RawClient::call(operation.member, 1, operation.signature, body, interface));
 }
 
 }  // namespace
@@ -168,7 +174,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
         case 0: fuzzReply(bytes); break;
         case 1: fuzzRequests(bytes); break;
         default:
-            if (size > 1) fuzzArguments(wire::operations[data[1] % wire::operations.size()], bytes.substr(1));
+            if (size > 1) fuzzArguments(data[1], bytes.substr(1));
     }
     return 0;
 }

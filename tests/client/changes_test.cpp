@@ -75,11 +75,8 @@ TEST_F(ChangesTest, AreNoWorkAndTakeASeatOnlyWhileNobodyElseNeedsIt) {
 // One that does not read loses signals, and costs no memory.
 TEST_F(ChangesTest, AreJoinedForASlowSubscriber) {
     RawClient slow(service->socketPath());
-    slow.write(RawClient::authentication() + RawClient::message('\x01', 1,
-                                                                {{1, 'o', wire::followUpsInterface.path},
-                                                                 {2, 's', wire::followUpsInterface.name},
-                                                                 {3, 's', wire::subscribeMember}},
-                                                                ""));
+    slow.write(RawClient::authentication() +
+               RawClient::call(wire::subscribeMember, 1, "", "", wire::followUpsInterface));
     ASSERT_TRUE(slow.readUntil("root"));
     constexpr std::size_t notes = 100'000;
     for (std::size_t i = 0; i < notes; ++i) service->host.changes.note(host::Changes::followUps);

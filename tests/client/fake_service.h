@@ -9,10 +9,10 @@
 #include <thread>
 
 #include "client/fake_agent.h"
+#include "client/fake_host.h"
 #include "host/support.h"
 #include "support/eventually.h"
 #include "vrx/client/agent_connection.h"
-#include "vrx/host/ipc/host_requests.h"
 #include "vrx/host/ipc/service_listener.h"
 #include "vrx/host/loop/main_loop.h"
 
@@ -28,27 +28,6 @@ public:
 
 private:
     std::atomic<bool> isSet_ = false;
-};
-
-// What the host answers beside the agent.
-class FakeHost final : public host::HostRequests {
-public:
-    Value status() const override { return Dictionary(); }
-    Value pendingFollowUps() const override { return followUps; }
-    void dismissFollowUp(const std::string& identifier, VRXAgentProtocol&,
-                         VRXAgentProtocol::Reply<bool> reply) const override {
-        reply(identifier == "present");
-    }
-    host::Changes::Subscription subscribe(uid_t user, std::function<void(host::Changes::Kinds)> tell) override {
-        return changes.subscribe(user, std::move(tell));
-    }
-    void whenChangesAreTold(std::function<void()> call) override { call(); }
-    std::string localeIdentifier() const override { return "de_DE"; }
-    Duration oneDayInterval() const override { return Duration(60); }
-    std::vector<host::ActivityState> activities() const override { return {{"a", "scheduled", dateFromEpoch(8)}}; }
-
-    Value followUps;
-    host::Changes changes;
 };
 
 // The service of a fake agent, at a socket in a temporary folder.

@@ -10,6 +10,7 @@
 
 #include "support/sockets.h"
 #include "vrx/host/base/descriptor.h"
+#include "vrx/wire/names.h"
 
 namespace vrx::test {
 
@@ -86,9 +87,8 @@ public:
         return call(member, serial, argument ? "s" : "", body);
     }
     static std::string call(const std::string& member, std::uint32_t serial, const std::string& signature,
-                            const std::string& body) {
-        std::vector<Field> fields{
-            {1, 'o', "/com/orvane/vrxagent"}, {2, 's', "com.orvane.VRXAgentProtocol"}, {3, 's', member}};
+                            const std::string& body, const wire::Interface& interface = wire::agentInterface) {
+        std::vector<Field> fields{{1, 'o', interface.path}, {2, 's', interface.name}, {3, 's', member}};
         if (!signature.empty()) fields.push_back({8, 'g', signature});
         return message('\x01', serial, fields, body);
     }
