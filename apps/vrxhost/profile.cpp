@@ -1,5 +1,8 @@
 // vrxhost profile: every key of the device profile, with its value in force and where that comes from.
+#include <filesystem>
+
 #include "vrxhost/agent_view.h"
+#include "vrxhost/home.h"
 #include "vrxhost/profile_facts.h"
 #include "vrxhost/verbs.h"
 
@@ -45,8 +48,14 @@ void addProfileVerb(CommandLine& line, const wire::LocationOverrides& places) {
     auto device = std::make_shared<std::optional<std::string>>();
     CLI::App* verb =
         line.add("profile", "Shows every key of the device profile, and where its value comes from", [&places, device] {
-            AgentView view(absolutePath(wire::findLocations(places).home.path), *device);
-            return showProfile(view);
+            const std::string home = absolutePath(wire::findLocations(places).home.path);
+            AgentView view(home, *device);
+            const platform::MaybeError problem = view.open();  // the database has what services have told
+            Outcome outcome = showProfile(view);
+            std::error_code unknown;
+            const bool isThere = std::filesystem::exists(Home::databasePath(home), unknown);
+            if (problem && (isThere || unknown)) outcome.warnings.push_back(problem->text);
+            return outcome;
         });
     addProfileOption(verb, *device);
 }

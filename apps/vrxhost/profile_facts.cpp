@@ -11,7 +11,33 @@ using host::ProfileKey;
 
 namespace {
 
+using platform::Array;
+using platform::Dictionary;
+
 constexpr const char* watchesFlag = "features.Vireo.Meridian_3_0";
+
+platform::Value textOrNull(const std::optional<std::string>& text) {
+    return text ? platform::Value(*text) : platform::Value();
+}
+
+// As files would say it.
+ProfileFact toldWatches(const host::DeviceProfile& profile) {
+    Array watches;
+    for (const platform::PairedWatch& watch : profile.watches())
+        watches.push_back(Dictionary{{"name", textOrNull(watch.name)},
+                                     {"model_name", textOrNull(watch.localizedModelName)},
+                                     {"serial_number", textOrNull(watch.serialNumber)}});
+    return watches.empty() ? ProfileFact{nullptr, "not set"} : ProfileFact{watches, "BlueZ"};
+}
+
+ProfileFact toldCarriers(const host::DeviceProfile& profile) {
+    Array carriers;
+    for (const auto& [service, carrier] : profile.carriers())
+        carriers.push_back(Dictionary{{"service", service},
+                                      {"mcc", textOrNull(carrier.mobileCountryCode)},
+                                      {"mnc", textOrNull(carrier.mobileNetworkCode)}});
+    return carriers.empty() ? ProfileFact{nullptr, "not set"} : ProfileFact{carriers, "ModemManager"};
+}
 
 // What holds where no file gives the key.
 ProfileFact fallback(const std::string& key, const host::DeviceProfile& profile) {
@@ -23,6 +49,8 @@ ProfileFact fallback(const std::string& key, const host::DeviceProfile& profile)
     if (key == "device.product_type") return fact(machine.productType());
     if (key == "device.product_version") return fact(machine.productVersion());
     if (key == "locale.language") return fact(profile.machineLocaleIdentifier());
+    if (key == "watches") return toldWatches(profile);
+    if (key == "carriers") return toldCarriers(profile);
     if (key == "locale.time_zone") return {nullptr, "the machine's time zone"};
     if (key == "network.available") return {nullptr, "the machine's services, else its routes"};
     if (key == "activities.should_defer") return {nullptr, "the machine's services and power supply"};

@@ -8,6 +8,8 @@
 #include "end_to_end/programs.h"
 #include "support/eventually.h"
 #include "vrx/codec/json.h"
+#include "vrx/host/home/kept_facts.h"
+#include "vrx/host/profile/bare_machine.h"
 
 namespace vrx::end_to_end {
 namespace {
@@ -243,6 +245,28 @@ TEST_F(ProfileVerb, TellsWhereEachValueIsFrom) {
     // Without an agent it is what one would read.
     EXPECT_EQ(place_.run(place_ / "app/vrxhost", {"--home", place_ / "none", "profile", "--json"}).code, 0);
     EXPECT_FALSE(std::filesystem::exists(place_ / "none"));
+}
+
+TEST_F(ProfileVerb, NamesTheServiceThatHasToldAValue) {
+    std::filesystem::create_directory(place_ / "home");
+    const host::LogRecorder log;
+    std::optional<host::Database> database(place_ / "home/host.db");
+    ASSERT_FALSE(database->open());
+    database->write([](host::Connection& connection) {
+        host::keepFacts(connection, host::BareMachine().identifier(),
+                        {.language = "de_DE",
+                         .carriers = {{"slot 1", {"262", "01"}}},
+                         .watches = {{.address = "AA", .name = "Ada's", .serialNumber = "W1"}}});
+    });
+    EXPECT_EQ(key("locale.language")["source"], Value("AccountsService"));
+    EXPECT_EQ(key("carriers")["source"], Value("ModemManager"));
+    EXPECT_EQ(key("carriers")["value"], Value(Array{Dictionary{{"service", "slot 1"}, {"mcc", "262"}, {"mnc", "01"}}}));
+    EXPECT_EQ(key("watches")["source"], Value("BlueZ"));
+    EXPECT_EQ((*key("watches")["value"].asArray())[0]["serial_number"], Value("W1"));
+    database.reset();
+    place_.write("home/host.db", "no database");
+    EXPECT_EQ(key("carriers")["source"], Value("not set"));
+    EXPECT_NE(place_.vrxhost({"profile"}).errors, "");
 }
 
 TEST_F(ProfileVerb, WarnsOfANamedFileThatIsNotThere) {
