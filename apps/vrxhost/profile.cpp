@@ -1,6 +1,10 @@
 // vrxhost profile: every key of the device profile, with its value in force and where that comes from.
+#include <filesystem>
+
 #include "vrxhost/agent_view.h"
+#include "vrxhost/home.h"
 #include "vrxhost/profile_facts.h"
+#include "vrxhost/running_agent.h"
 #include "vrxhost/verbs.h"
 
 namespace vrx::apps {
@@ -47,9 +51,17 @@ void addProfileVerb(CommandLine& line, const wire::LocationOverrides& places) {
     CLI::App* verb =
         line.add("profile", "Shows every key of the device profile, and where its value comes from", [&places, device] {
             const wire::Locations found = wire::findAgent(places);
-            AgentView view(absolutePath(found.home.path), *device, found.profile);
-            view.open();  // for what the machine's services told the agent
-            return showProfile(view);
+            const std::string home = absolutePath(found.home.path);
+            AgentView view(home, *device, found.profile);
+            const platform::MaybeError problem = view.open();  // the database has what services have told
+            Outcome outcome = showProfile(view);
+            std::error_code unknown;
+            const bool isThere = std::filesystem::exists(Home::databasePath(home), unknown);
+            if (const auto others = whoElseMayLook(home))
+                outcome.warnings.push_back("what services have told only " + *others + " may see");
+            else if (problem && (isThere || unknown))
+                outcome.warnings.push_back(problem->text);
+            return outcome;
         });
     addProfileOption(verb, *device);
 }

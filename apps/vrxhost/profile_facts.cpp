@@ -11,20 +11,32 @@ using host::ProfileKey;
 
 namespace {
 
+using platform::Array;
+using platform::Dictionary;
+
 constexpr const char* watchesFlag = "features.Vireo.Meridian_3_0";
 
-platform::Array namesOf(const std::vector<host::KnownWatch>& watches) {
-    platform::Array names;
-    for (const host::KnownWatch& watch : watches) names.emplace_back(watch.name);
-    return names;
+platform::Value textOrNull(const std::optional<std::string>& text) {
+    return text ? platform::Value(*text) : platform::Value();
 }
 
-// Such as "262-01": of the country and the network.
-platform::Array codesOf(const std::map<std::string, platform::Carrier>& carriers) {
-    platform::Array codes;
-    for (const auto& [service, carrier] : carriers)
-        codes.emplace_back(carrier.mobileCountryCode.value_or("") + "-" + carrier.mobileNetworkCode.value_or(""));
-    return codes;
+// As files would say it.
+ProfileFact toldWatches(const host::DeviceProfile& profile) {
+    Array watches;
+    for (const platform::PairedWatch& watch : profile.watches())
+        watches.push_back(Dictionary{{"name", textOrNull(watch.name)},
+                                     {"model_name", textOrNull(watch.localizedModelName)},
+                                     {"serial_number", textOrNull(watch.serialNumber)}});
+    return watches.empty() ? ProfileFact{nullptr, "not set"} : ProfileFact{watches, "BlueZ"};
+}
+
+ProfileFact toldCarriers(const host::DeviceProfile& profile) {
+    Array carriers;
+    for (const auto& [service, carrier] : profile.carriers())
+        carriers.push_back(Dictionary{{"service", service},
+                                      {"mcc", textOrNull(carrier.mobileCountryCode)},
+                                      {"mnc", textOrNull(carrier.mobileNetworkCode)}});
+    return carriers.empty() ? ProfileFact{nullptr, "not set"} : ProfileFact{carriers, "ModemManager"};
 }
 
 // What holds where no file gives the key.
@@ -37,11 +49,9 @@ ProfileFact fallback(const std::string& key, const host::DeviceProfile& profile,
     if (key == "device.product_type") return fact(machine.productType());
     if (key == "device.product_version") return fact(machine.productVersion());
     if (key == "locale.language") return fact(profile.machineLocaleIdentifier());
+    if (key == "watches") return toldWatches(profile);
+    if (key == "carriers") return toldCarriers(profile);
     if (key == "locale.time_zone") return {nullptr, "the machine's time zone"};
-    if (const auto& watches = profile.told()->watches; key == "watches" && !watches.empty())
-        return {namesOf(watches), "BlueZ"};
-    if (const auto& carriers = profile.told()->carriers; key == "carriers" && !carriers.empty())
-        return {codesOf(carriers), "ModemManager"};
     if (key == "network.available") return {situation.isNetworkAvailable, situation.networkJudge};
     if (key == "activities.should_defer") return {situation.shouldDefer, situation.deferralJudge};
     constexpr const char* byDefault = "the agent's default";

@@ -263,22 +263,31 @@ TEST_F(ProfileVerb, TellsWhereEachValueIsFrom) {
     EXPECT_FALSE(std::filesystem::exists(place_ / "none"));
 }
 
-TEST_F(ProfileVerb, TellsWhatServicesToldTheAgent) {
-    const host::LogRecorder log;
+TEST_F(ProfileVerb, NamesTheServiceThatHasToldAValue) {
     std::filesystem::create_directory(place_ / "home");
-    host::Database database(place_ / "home/host.db");
-    ASSERT_FALSE(database.open());
-    ASSERT_FALSE(database.write([](host::Connection& connection) {
-        host::keepFacts(connection, host::BareMachine().identifier(),
-                        {.carriers = {{"m", {"262", "01"}}},
-                         .watches = {{.address = "a", .name = "Lap"}, {.address = "b", .serialNumber = "W1"}}});
-    }));
-    EXPECT_EQ(key("carriers")["value"], Value(Array{"262-01"}));
+    const host::LogRecorder log;
+    std::optional<host::Database> database(place_ / "home/host.db");
+    ASSERT_FALSE(database->open());
+    database->write([](host::Connection& connection) {
+        host::keepFacts(
+            connection, host::BareMachine().identifier(),
+            {.language = "de_DE",
+             .carriers = {{"slot 1", {"262", "01"}}},
+             .watches = {{.address = "AA", .name = "Ada's", .serialNumber = "W1"}, {.address = "BB", .name = "Lap"}}});
+    });
+    EXPECT_EQ(key("locale.language")["source"], Value("AccountsService"));
+    EXPECT_EQ(key("carriers")["source"], Value("ModemManager"));
+    EXPECT_EQ(key("carriers")["value"], Value(Array{Dictionary{{"service", "slot 1"}, {"mcc", "262"}, {"mnc", "01"}}}));
     EXPECT_EQ(key("watches")["source"], Value("BlueZ"));
+    EXPECT_EQ((*key("watches")["value"].asArray())[0]["serial_number"], Value("W1"));
     const std::string checks = place_.vrxhost({"doctor", "--timeout", "0.1"}).output;
     EXPECT_NE(checks.find("never told a serial number, and so not reported: Lap\n"), std::string::npos) << checks;
     // Whether there is a network depends on the machine; that somebody says so does not.
     EXPECT_NE(key("network.available")["value"], Value());
+    database.reset();
+    place_.write("home/host.db", "no database");
+    EXPECT_EQ(key("carriers")["source"], Value("not set"));
+    EXPECT_NE(place_.vrxhost({"profile"}).errors, "");
 }
 
 TEST_F(ProfileVerb, WarnsOfANamedFileThatIsNotThere) {

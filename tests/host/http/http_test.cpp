@@ -149,6 +149,24 @@ TEST_F(HttpTest, SpeaksPlainHttpWithThisMachineOnlyAndReadsFilesOfBoundedSize) {
     EXPECT_EQ(error(get("file://" + folder / "large")), "the file is too large");
 }
 
+TEST_F(HttpTest, ReachesOtherMachinesByTheProxyOfTheEnvironment) {
+    LoopbackServer proxy([&](const std::string& request) {
+        requests.push_back(request.substr(0, request.find("\r\n")));
+        return answer("502 Bad Gateway", "");
+    });
+    const std::string url = "https://0.0.0.0:1/";  // no other machine, but as good as one
+    for (const char* name : {"HTTPS_PROXY", "no_proxy", "NO_PROXY"}) unsetenv(name);  // whatever this machine has
+    for (const char* name : {"https_proxy", "ALL_PROXY"}) {
+        setenv(name, proxy.url().c_str(), 1);
+        EXPECT_THAT(error(get(url)), HasSubstr("502")) << name;
+        setenv("no_proxy", "0.0.0.0", 1);
+        EXPECT_THAT(error(get(url)), HasSubstr("connect to 0.0.0.0 port 1")) << name;
+        unsetenv("no_proxy");
+        unsetenv(name);
+    }
+    EXPECT_EQ(requests, std::vector<std::string>(2, "CONNECT 0.0.0.0:1 HTTP/1.1"));
+}
+
 TEST_F(HttpTest, KeepsAnswersAsTheirHeadersAllow) {
     constexpr const char* ifNoneMatch = "If-None-Match: \"a\"";
     constexpr const char* ifModifiedSince = "If-Modified-Since: Sun, 06 Nov 1994 08:00:00 GMT";
