@@ -57,8 +57,8 @@ private:
         }
     }
 
-    // Returns when the connection has ended, or a failure when it could not be made. One that was made begins the pauses
-    // anew; that it ended is told only if there is no other, because the agent may just start anew.
+    // Returns when the connection has ended, or a failure when it could not be made. One that was made begins the
+    // pauses anew; that it ended is told only if there is no other, because the agent may just start anew.
     std::optional<Failure> listen(std::chrono::seconds& pause) {
         AgentBus bus;
         const Deadline deadline = std::chrono::steady_clock::now() +

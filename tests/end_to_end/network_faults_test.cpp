@@ -281,8 +281,9 @@ TEST_P(NetworkFaults, EndAsTheyShould) {
 
     auto reply = std::make_shared<std::promise<std::shared_ptr<VRXDeviceInfo>>>();  // which may be kept only once
     auto replied = reply->get_future();
-    clients->getDefaultDeviceInfoUsingPolicy(VRXWarrantyLookupPolicyRefresh,
-                                             [reply](client::Answer<std::shared_ptr<VRXDeviceInfo>> info) { reply->set_value(*info); });
+    clients->getDefaultDeviceInfoUsingPolicy(
+        VRXWarrantyLookupPolicyRefresh,
+        [reply](client::Answer<std::shared_ptr<VRXDeviceInfo>> info) { reply->set_value(*info); });
     EXPECT_TRUE(*clients->getDefaultDeviceInfoUsingPolicy(VRXWarrantyLookupPolicyCachedOnly));
     const bool isPending = replied.wait_for(0s) == std::future_status::timeout;
     EXPECT_TRUE(isPending || !fault.change.isLong) << "the other client had to wait";

@@ -28,7 +28,7 @@ std::optional<OpenToOthers> findOpenToOthers(const std::string& path, Links link
 // The same for a single file or folder, by its status.
 std::optional<OpenToOthers> findOpenToOthers(const std::string& path, const struct stat& status);
 
-// Judges from now on as that user's agent would; without a call, as this process's user. Before there are other threads.
+// Judges from now on as that user's agent would; without a call, as this process's user. Before other threads.
 void judgeAsAgentOf(uid_t user);
 
 }  // namespace vrx::host
