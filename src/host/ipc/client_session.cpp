@@ -212,6 +212,7 @@ bool ClientSession::subscribe(Changes::Kinds kinds, SessionState& state) {
 void ClientSession::announceChanges() {
     if (subscribed_ == 0 || bus_.unsentMessages() > 0) return;
     const Changes::Kinds kinds = news_->exchange(0) & subscribed_;
+    if (kinds == 0 || !isAllowed()) return;
     if (kinds & Changes::followUps) announce(wire::followUpsInterface);
     if (kinds & Changes::coverage) announce(wire::coverageInterface);
 }
