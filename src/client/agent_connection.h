@@ -31,12 +31,13 @@
 #include "vrx/coverage/records/warranty.h"
 #include "vrx/devices/records/device.h"
 #include "vrx/devices/records/device_info.h"
+#include "vrx/platform/api.h"
 #include "vrx/platform/value.h"
 #include "vrx/protocols/forward.h"
 
 namespace vrx::client {
 
-class AgentConnection final {
+class VRX_CLIENT_API AgentConnection final {
 public:
     explicit AgentConnection(ConnectionOptions options = {});
     // Calls under way end as NotReachable, and no callback comes after the destructor has returned. It must not run

@@ -14,6 +14,7 @@
 #include <optional>
 
 #include "vrx/client/answer.h"
+#include "vrx/platform/api.h"
 
 namespace vrx::client {
 
@@ -25,7 +26,7 @@ struct Change {
     std::optional<Failure> failure{};
 };
 
-class Changes final {
+class VRX_CLIENT_API Changes final {
 public:
     // Called on a thread of the library, one change after the other.
     using Handler = std::function<void(const Change& change)>;

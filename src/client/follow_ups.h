@@ -14,6 +14,7 @@
 #include <vector>
 
 #include "vrx/client/answer.h"
+#include "vrx/platform/api.h"
 #include "vrx/platform/date.h"
 #include "vrx/platform/value.h"
 
@@ -44,7 +45,7 @@ struct FollowUp {
     bool operator==(const FollowUp&) const = default;
 };
 
-class FollowUps final {
+class VRX_CLIENT_API FollowUps final {
 public:
     explicit FollowUps(ConnectionOptions options = {});
     ~FollowUps();

@@ -4,6 +4,8 @@
 #include <chrono>
 #include <optional>
 
+#include "vrx/platform/api.h"
+
 namespace vrx::platform {
 
 using Duration = std::chrono::duration<double>;
@@ -25,6 +27,6 @@ struct CalendarTime {
     int hour, minute, second;
 };
 // Null outside the years 1 to 9999; such dates are valid all the same.
-std::optional<CalendarTime> calendarTime(Date date);
+VRX_CLIENT_API std::optional<CalendarTime> calendarTime(Date date);
 
 }  // namespace vrx::platform

@@ -8,21 +8,10 @@
 #include <memory>
 #include <string_view>
 
+#include "vrx/platform/archivable.h"
 #include "vrx/platform/value.h"
 
 namespace vrx::platform {
-
-class KeyedEncoder;
-
-// What can be archived. A class T that can also be decoded has
-//     static constexpr std::string_view archiveClassName;
-//     static std::shared_ptr<T> initWithCoder(KeyedDecoder&);   // null when the archive does not make one
-class Archivable {
-public:
-    virtual ~Archivable() = default;
-    virtual std::string_view className() const = 0;
-    virtual void encodeWithCoder(KeyedEncoder& coder) const = 0;
-};
 
 class KeyedEncoder {
 public:

@@ -14,6 +14,7 @@
 #include <variant>
 #include <vector>
 
+#include "vrx/platform/api.h"
 #include "vrx/platform/date.h"
 
 namespace vrx::platform {
@@ -24,7 +25,7 @@ using Data = std::vector<std::uint8_t>;
 using Array = std::vector<Value>;
 using Dictionary = std::map<std::string, Value, std::less<>>;
 
-class Value {
+class VRX_CLIENT_API Value {
 public:
     enum class Type : std::uint8_t { Null, Bool, Integer, Double, Date, String, Data, Array, Dictionary };
 

@@ -9,6 +9,7 @@
 
 #include "vrx/platform/clock.h"
 #include "vrx/platform/defaults_store.h"
+#include "vrx/platform/keyed_archiver.h"
 #include "vrx/platform/locale.h"
 #include "vrx/platform/log.h"
 #include "vrx/platform/number_text.h"

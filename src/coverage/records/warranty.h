@@ -11,13 +11,14 @@
 #include <string>
 #include <utility>
 
+#include "vrx/platform/api.h"
+#include "vrx/platform/archivable.h"
 #include "vrx/platform/date.h"
-#include "vrx/platform/keyed_archiver.h"
 #include "vrx/platform/value.h"
 
 namespace vrx {
 
-class VRXWarranty final : public platform::Archivable {
+class VRX_CLIENT_API VRXWarranty final : public platform::Archivable {
     using Date = platform::Date;
     using Duration = platform::Duration;
     using Value = platform::Value;

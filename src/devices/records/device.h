@@ -7,8 +7,9 @@
 #include <optional>
 #include <string>
 
+#include "vrx/platform/api.h"
+#include "vrx/platform/archivable.h"
 #include "vrx/platform/date.h"
-#include "vrx/platform/keyed_archiver.h"
 #include "vrx/platform/property.h"
 
 namespace vrx {
@@ -18,7 +19,7 @@ inline constexpr VRXDeviceType VRXDeviceTypeDefault = 0;  // this device
 inline constexpr VRXDeviceType VRXDeviceTypeWatch = 1;    // a paired watch
 inline constexpr VRXDeviceType VRXDeviceTypeOther = 2;    // one that the inventory does not know
 
-class VRXDevice final : public platform::Archivable {
+class VRX_CLIENT_API VRXDevice final : public platform::Archivable {
 public:
     static constexpr std::string_view archiveClassName = "VRXDevice";
 

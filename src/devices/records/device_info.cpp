@@ -1,5 +1,6 @@
 #include "vrx/devices/records/device_info.h"
 
+#include "vrx/platform/keyed_archiver.h"
 #include "vrx/platform/text.h"
 
 namespace vrx {

@@ -7,11 +7,12 @@
 
 #include "vrx/coverage/records/warranty.h"
 #include "vrx/devices/records/device.h"
+#include "vrx/platform/api.h"
 #include "vrx/platform/property.h"
 
 namespace vrx {
 
-class VRXDeviceInfo final : public platform::Archivable {
+class VRX_CLIENT_API VRXDeviceInfo final : public platform::Archivable {
 public:
     static constexpr std::string_view archiveClassName = "VRXDeviceInfo";
 
