@@ -6,6 +6,8 @@
 #include <csignal>
 
 #include "end_to_end/programs.h"
+#include "support/eventually.h"
+#include "vrx/codec/json.h"
 
 namespace vrx::end_to_end {
 namespace {
@@ -71,6 +73,12 @@ TEST_F(ChangesOfAnAgent, AreToldWhenWhatIsShownIsAnother) {
     EXPECT_EQ(watch.next(), "follow-ups");
     EXPECT_EQ(watch.next(), "coverage");
     EXPECT_EQ(watch.end(), 0);
+    // As a document, too.
+    Process documents(place_.path(), place_ / "app/vrxctl", {"--socket", place_ / "socket", "watch", "--json"});
+    eventually([&] { return documents.output().ends_with('\n'); }, "the first document");
+    documents.signal(SIGTERM);
+    EXPECT_EQ(documents.wait(), 0);
+    EXPECT_EQ(codec::parseJson(documents.output()).value()["coverage"], Value(true));
 }
 
 TEST_F(ChangesOfAnAgent, OfAPairingAreToldAfterTheAgentsOwnRefresh) {

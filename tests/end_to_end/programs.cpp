@@ -40,6 +40,8 @@ Process::Process(const std::string& folder, const std::string& program, const Ar
     else
         posix_spawn_file_actions_addopen(&actions, 1, (files_ + ".out").c_str(), O_WRONLY | O_CREAT, 0600);
     posix_spawn_file_actions_addopen(&actions, 2, (files_ + ".err").c_str(), O_WRONLY | O_CREAT, 0600);
+    words_ = {program};
+    words_.insert(words_.end(), arguments.begin(), arguments.end());
     Arguments words{program};
     Arguments variables = environment;
     if (handed.listeningSocket >= 0) {
@@ -70,8 +72,20 @@ void Process::signal(int number) const {
 }
 
 int Process::wait() {
-    if (!result_) result_ = host::endOf(pid_);
+    if (result_) return *result_;
+    result_ = host::endOf(pid_);
+    keepDocuments();
     return *result_;
+}
+
+// For scripts/check-documents.
+void Process::keepDocuments() const {
+    const char* folder = std::getenv("VRX_DOCUMENTS");
+    const bool isJson = std::ranges::find(words_, platform::Value("--json")) != words_.end();
+    if (!folder || !isJson || *result_ < 0) return;
+    const std::string name = std::to_string(getpid()) + "-" + std::to_string(pid_);
+    host::writeFile(std::string(folder) + "/" + name,
+                    codec::printedJson(words_, codec::JsonLayout::OneLine) + "\n" + output());
 }
 
 NoticeSocket::NoticeSocket(const std::string& path)

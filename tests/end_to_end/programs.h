@@ -41,7 +41,10 @@ public:
     std::string errors() const { return fileText(files_ + ".err"); }
 
 private:
+    void keepDocuments() const;
+
     std::string files_;
+    platform::Array words_;
     int pid_ = 0;
     host::Descriptor pidFile_;
     std::optional<int> result_;
