@@ -86,7 +86,7 @@ GtkWidget* textLabel(const std::string& text, std::initializer_list<const char*>
 }
 
 GtkWidget* footerLabel(const Footer& footer) {
-    GtkWidget* label = textLabel("", {"dim-label", "caption"});
+    GtkWidget* label = textLabel("", {"caption"});
     std::string link = escaped(footer.label);
     if (!footer.address.empty()) link = "<a href=\"" + escaped(footer.address) + "\">" + link + "</a>";
     gtk_label_set_markup(GTK_LABEL(label), (escaped(footer.before) + link + escaped(footer.after)).c_str());

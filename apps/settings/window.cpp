@@ -333,7 +333,7 @@ void Window::Content::showLayout() {
     const std::string title = offer    ? (offer->title.empty() ? tr("Offer") : offer->title)
                               : device ? nameOf(*device)
                                        : tr("Coverage");
-    adw_window_title_set_title(ADW_WINDOW_TITLE(detailTitle_), escaped(title).c_str());
+    adw_window_title_set_title(ADW_WINDOW_TITLE(detailTitle_), shown(title).c_str());
     gtk_widget_set_visible(backButton_, isFolded() || offer);
     const bool isStatus = g_str_equal(gtk_stack_get_visible_child_name(root_), "status");
     const bool isDetail =
