@@ -112,6 +112,14 @@ GtkWidget* iconButton(const char* icon, const char* name, const char* action) {
     return button;
 }
 
+void showChild(GtkStack* stack, GtkWidget* child) {
+    gtk_widget_set_visible(child, TRUE);
+    gtk_stack_set_visible_child(stack, child);
+    for (GtkWidget* other = gtk_widget_get_first_child(GTK_WIDGET(stack)); other;
+         other = gtk_widget_get_next_sibling(other))
+        gtk_widget_set_visible(other, other == child);
+}
+
 void GroupsPage::show(const std::vector<AdwPreferencesGroup*>& groups) {
     GtkRoot* root = gtk_widget_get_root(widget());
     GtkWidget* focus = root ? gtk_root_get_focus(root) : nullptr;

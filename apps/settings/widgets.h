@@ -39,6 +39,9 @@ GtkWidget* textButton(const std::string& text, const char* styleClass, std::func
 // A button with a picture, and its name for who does not see that.
 GtkWidget* iconButton(const char* icon, const char* name, const char* action);
 
+// Shows one child of a stack, and hides the others from who hears the window read out as well.
+void showChild(GtkStack* stack, GtkWidget* child);
+
 // A page of preferences whose groups can be exchanged, so that it keeps where it was scrolled to.
 class GroupsPage {
 public:

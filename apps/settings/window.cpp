@@ -93,7 +93,9 @@ private:
     GtkWidget* const window_;
     AdwToastOverlay* const toasts_ = ADW_TOAST_OVERLAY(adw_toast_overlay_new());
     GtkStack* const root_ = GTK_STACK(gtk_stack_new());
+    GtkWidget *const waitingPage_ = column({}), *const statusPage_ = column({}), *const contentPage_ = column({});
     GtkWidget* const status_ = statusPage();
+    std::string statusTitle_;
     AdwLeaflet* const leaflet_ = ADW_LEAFLET(adw_leaflet_new());
     GtkWidget* const notice_ = textLabel("", {"notice"});
 
@@ -129,7 +131,6 @@ Window::Content::Content(GtkApplication* application)
       list_([this](const std::string& serialNumber) { open(serialNumber); }) {
     useStyles();
     gtk_window_set_default_size(window(), 860, 640);
-    gtk_widget_set_size_request(window_, 300, 200);
     gtk_window_set_icon_name(window(), "com.orvane.Coverage");
     addAction("refresh", &Content::refresh);
     addAction("back", &Content::back);
@@ -167,7 +168,7 @@ void Window::Content::buildList() {
     gtk_widget_set_vexpand(scrolled, TRUE);
     gtk_box_append(GTK_BOX(listSide_), listHeader_);
     gtk_box_append(GTK_BOX(listSide_), scrolled);
-    gtk_widget_set_size_request(listSide_, 280, -1);
+    gtk_widget_set_size_request(listSide_, 320, -1);
 }
 
 void Window::Content::buildDetail() {
@@ -177,9 +178,8 @@ void Window::Content::buildDetail() {
     GtkWidget* again = textButton(tr("Refresh"), "pill", [this] { refresh(); });
     gtk_widget_set_halign(again, GTK_ALIGN_CENTER);
     adw_status_page_set_child(ADW_STATUS_PAGE(deviceStatus_), again);
-    gtk_stack_add_named(details_, devicePage_.widget(), "device");
-    gtk_stack_add_named(details_, offerPage_.widget(), "offer");
-    gtk_stack_add_named(details_, deviceStatus_, "status");
+    for (GtkWidget* page : {devicePage_.widget(), offerPage_.widget(), deviceStatus_})
+        gtk_stack_add_child(details_, page);
     gtk_widget_set_vexpand(GTK_WIDGET(details_), TRUE);
     gtk_box_append(GTK_BOX(detailSide_), detailHeader_);
     gtk_box_append(GTK_BOX(detailSide_), GTK_WIDGET(details_));
@@ -201,9 +201,13 @@ void Window::Content::buildRoot() {
     gtk_spinner_start(GTK_SPINNER(waiting));
     gtk_widget_set_vexpand(waiting, TRUE);
     gtk_accessible_update_property(GTK_ACCESSIBLE(waiting), GTK_ACCESSIBLE_PROPERTY_LABEL, tr("Loading"), -1);
-    gtk_stack_add_named(root_, column({adw_header_bar_new(), waiting}), "waiting");
-    gtk_stack_add_named(root_, column({adw_header_bar_new(), status_}), "status");
-    gtk_stack_add_named(root_, column({GTK_WIDGET(leaflet_), notice_}), "content");
+    const auto append = [](GtkWidget* page, std::initializer_list<GtkWidget*> parts) {
+        for (GtkWidget* part : parts) gtk_box_append(GTK_BOX(page), part);
+    };
+    append(waitingPage_, {adw_header_bar_new(), waiting});
+    append(statusPage_, {adw_header_bar_new(), status_});
+    append(contentPage_, {GTK_WIDGET(leaflet_), notice_});
+    for (GtkWidget* page : {waitingPage_, statusPage_, contentPage_}) gtk_stack_add_child(root_, page);
     adw_toast_overlay_set_child(toasts_, GTK_WIDGET(root_));
     adw_application_window_set_content(ADW_APPLICATION_WINDOW(window_), GTK_WIDGET(toasts_));
 }
@@ -252,17 +256,19 @@ void Window::Content::showRoot() {
     const bool hasRecord =
         std::ranges::any_of(situation_.devices, [](const Device& device) { return device.record.has_value(); });
     const bool isEmpty = situation_.devices.empty() && situation_.offers.empty();
-    const char* name = "content";
+    GtkWidget* page = contentPage_;
     if (!wasTold_) {
-        name = "waiting";
+        page = waitingPage_;
     } else if (isEmpty || (!situation_.isSignedIn && !hasRecord && situation_.offers.empty())) {
-        name = "status";
-        setStatus(status_, situation_.failure && isEmpty
-                               ? statusOfFailure(*situation_.failure, source_ ? source_->socketPath() : "")
-                           : situation_.isSignedIn ? statusWithoutRecord()
-                                                   : statusWithoutAccount());
+        page = statusPage_;
+        const Status status = situation_.failure && isEmpty
+                                  ? statusOfFailure(*situation_.failure, source_ ? source_->socketPath() : "")
+                              : situation_.isSignedIn ? statusWithoutRecord()
+                                                      : statusWithoutAccount();
+        statusTitle_ = status.title;
+        setStatus(status_, status);
     }
-    gtk_stack_set_visible_child_name(root_, name);
+    showChild(root_, page);
     gtk_widget_set_visible(notice_, situation_.failure.has_value());
     if (situation_.failure) {
         const Status status = statusOfFailure(*situation_.failure, source_ ? source_->socketPath() : "");
@@ -293,7 +299,7 @@ void Window::Content::showDetail() {
     if (const Device* device = deviceWith(situation_, opened_)) drawDevice(*device);
     if (offer) drawOffer(*offer);
     const bool isBare = drawnDevice_ && !drawnDevice_->record && drawnOffers_.empty();
-    gtk_stack_set_visible_child_name(details_, offer ? "offer" : isBare ? "status" : "device");
+    showChild(details_, offer ? offerPage_.widget() : isBare ? deviceStatus_ : devicePage_.widget());
     list_.select(opened_);
     showLayout();
 }
@@ -335,12 +341,11 @@ void Window::Content::showLayout() {
                                        : tr("Coverage");
     adw_window_title_set_title(ADW_WINDOW_TITLE(detailTitle_), shown(title).c_str());
     gtk_widget_set_visible(backButton_, isFolded() || offer);
-    const bool isStatus = g_str_equal(gtk_stack_get_visible_child_name(root_), "status");
-    const bool isDetail =
-        g_str_equal(gtk_stack_get_visible_child_name(root_), "content") && !(isFolded() && isListVisible());
-    gtk_window_set_title(window(), isStatus   ? adw_status_page_get_title(ADW_STATUS_PAGE(status_))
-                                   : isDetail ? shown(title).c_str()
-                                              : tr("Coverage"));
+    const GtkWidget* page = gtk_stack_get_visible_child(root_);
+    const bool isDetail = page == contentPage_ && !(isFolded() && isListVisible());
+    gtk_window_set_title(window(), page == statusPage_ ? statusTitle_.c_str()
+                                   : isDetail          ? shown(title).c_str()
+                                                       : tr("Coverage"));
 }
 
 void Window::Content::showProgress(bool isRefreshing) {

@@ -97,7 +97,7 @@ class Place:
 
     def start_agent(self):
         self.agent = self.start(self.folder / "app/vrxagent")
-        wait("the agent's socket", lambda: "name" in self.tool("vrxctl", "device", "--json"))
+        wait("the agent", lambda: "deviceType" in self.tool("vrxctl", "device", "--json"))
 
     def stop_agent(self):
         assert self.stop(self.agent) == 0
@@ -135,7 +135,7 @@ class Place:
 
     def serve(self, serial, **fields):
         """The device's record at the server."""
-        record = json.loads((SOURCE / f"examples/records/{serial}.json").read_text())
+        record = json.loads((SOURCE / f"examples/records/{serial if serial in (PHONE, WATCH) else 'default'}.json").read_text())
         record.update(fields)
         new = self.folder / "new.json"
         new.write_text(json.dumps(record))
