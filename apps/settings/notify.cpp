@@ -136,6 +136,19 @@ private:
     std::optional<client::Changes> changes_;
 };
 
+// The bus sends what waits, and closes, at the end of the loop: this comes before.
+void takeBackAtEnd(sd_event* event, Notifier& notifier) {
+    sd_event_source* source = nullptr;
+    const auto end = [](sd_event_source*, void* notifier) {
+        static_cast<Notifier*>(notifier)->takeBack();
+        return 0;
+    };
+    sd_event_add_exit(event, &source, end, &notifier);
+    sd_event_source_set_priority(source, SD_EVENT_PRIORITY_IMPORTANT);
+    sd_event_source_set_floating(source, 1);
+    sd_event_source_unref(source);
+}
+
 int run() {
     useTranslations();
     Loop loop;  // blocks the signals before there is another thread
@@ -148,9 +161,9 @@ int run() {
     sd_bus_set_exit_on_disconnect(bus.get(), 1);
     sd_bus_attach_event(bus.get(), loop.event(), SD_EVENT_PRIORITY_NORMAL);
     Notifier notifier(bus.get(), Remembered(Remembered::usualFile()));
-    const std::unique_ptr<Watch> watch = std::make_unique<Watch>(loop, notifier);
+    takeBackAtEnd(loop.event(), notifier);
+    const Watch watch(loop, notifier);
     const int code = sd_event_loop(loop.event());
-    notifier.takeBack();
     return code < 0 ? 1 : code;
 }
 
