@@ -37,6 +37,12 @@ GtkWidget* column(std::initializer_list<GtkWidget*> parts) {
     return box;
 }
 
+GtkWidget* titledHeader() {
+    GtkWidget* header = adw_header_bar_new();
+    adw_header_bar_set_title_widget(ADW_HEADER_BAR(header), adw_window_title_new(tr("Coverage"), ""));
+    return header;
+}
+
 GtkWidget* statusPage() {
     GtkWidget* page = adw_status_page_new();
     gtk_widget_set_vexpand(page, TRUE);
@@ -100,7 +106,7 @@ private:
     GtkWidget* const notice_ = textLabel("", {"notice"});
 
     GtkWidget* const listSide_ = column({});
-    GtkWidget* const listHeader_ = adw_header_bar_new();
+    GtkWidget* const listHeader_ = titledHeader();
     GtkWidget* const refreshButton_ = iconButton("view-refresh-symbolic", tr("Refresh"), "win.refresh");
     GtkWidget* const spinner_ = gtk_spinner_new();
     GtkBox* const others_ = GTK_BOX(gtk_box_new(GTK_ORIENTATION_VERTICAL, 12));
@@ -155,7 +161,6 @@ void Window::Content::addAction(const char* name, void (Content::*act)()) {
 void Window::Content::buildList() {
     adw_header_bar_pack_start(ADW_HEADER_BAR(listHeader_), refreshButton_);
     adw_header_bar_pack_start(ADW_HEADER_BAR(listHeader_), spinner_);
-    adw_header_bar_set_title_widget(ADW_HEADER_BAR(listHeader_), adw_window_title_new(tr("Coverage"), ""));
     gtk_accessible_update_property(GTK_ACCESSIBLE(spinner_), GTK_ACCESSIBLE_PROPERTY_LABEL, tr("Refreshing"), -1);
     gtk_widget_set_visible(spinner_, FALSE);
 
@@ -204,8 +209,8 @@ void Window::Content::buildRoot() {
     const auto append = [](GtkWidget* page, std::initializer_list<GtkWidget*> parts) {
         for (GtkWidget* part : parts) gtk_box_append(GTK_BOX(page), part);
     };
-    append(waitingPage_, {adw_header_bar_new(), waiting});
-    append(statusPage_, {adw_header_bar_new(), status_});
+    append(waitingPage_, {titledHeader(), waiting});
+    append(statusPage_, {titledHeader(), status_});
     append(contentPage_, {GTK_WIDGET(leaflet_), notice_});
     for (GtkWidget* page : {waitingPage_, statusPage_, contentPage_}) gtk_stack_add_child(root_, page);
     adw_toast_overlay_set_child(toasts_, GTK_WIDGET(root_));

@@ -55,6 +55,12 @@ class Screen:
                 return False
         wait(f"the button {name!r}", pressed)
 
+    def show(self, serial):
+        """By the action of the application."""
+        subprocess.run(["gdbus", "call", "--session", "--dest", APPLICATION, "--object-path", "/com/orvane/Coverage",
+                        "--method", "org.gtk.Actions.Activate", "show", f"[<'{serial}'>]", "{}"], check=True,
+                       capture_output=True)
+
     def fill(self):
         """Puts the window, for which there is no window manager, where the display is, and gives it the keys."""
         run = lambda *arguments: subprocess.run(["xdotool", *arguments], env=self.environment, text=True, check=False,
