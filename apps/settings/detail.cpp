@@ -100,10 +100,11 @@ AdwPreferencesGroup* offerGroup(const Offer& offer, const OfferHandlers& handler
     gtk_box_append(card, textLabel(offer.title.empty() ? tr("Offer") : offer.title, {"heading"}));
     if (!offer.text.empty()) gtk_box_append(card, textLabel(offer.text));
     for (const OfferAction& action : offer.actions)
-        gtk_box_append(card, textButton(action.label, "suggested-action", [offer, action, handlers, card] {
-                           if (action.address.empty()) return handlers.showDetails(offer);
-                           openInBrowser(GTK_WIDGET(card), action.address);
-                       }));
+        gtk_box_append(card, textButton(action.label.empty() ? tr("Show") : action.label, "suggested-action",
+                                        [offer, action, handlers, card] {
+                                            if (action.address.empty()) return handlers.showDetails(offer);
+                                            openInBrowser(GTK_WIDGET(card), action.address);
+                                        }));
     gtk_box_append(card, dismissButton(offer, handlers));
     return shown;
 }

@@ -29,9 +29,10 @@ void showActivated(GSimpleAction*, GVariant* serialNumber, gpointer data) {
     presentedWindow(*static_cast<Application*>(data)).showDevice(g_variant_get_string(serialNumber, nullptr));
 }
 
-void windowRemoved(GtkApplication*, GtkWindow*, gpointer data) {
+// A dialog is a window of the application as well.
+void windowRemoved(GtkApplication*, GtkWindow* window, gpointer data) {
     auto& self = *static_cast<Application*>(data);
-    if (!gtk_application_get_windows(GTK_APPLICATION(self.application))) self.window.reset();
+    if (self.window && self.window->window() == window) self.window.reset();
 }
 
 void addAccelerators(GtkApplication* application) {

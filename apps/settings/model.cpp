@@ -125,7 +125,7 @@ Offer offerOf(const FollowUp& followUp) {
                 .hasBadge = followUp.hasBadge};
     for (const client::FollowUpAction& action : followUp.actions) {
         OfferAction shown{action.label.value_or(""), browserAddress(action.url.value_or(""))};
-        if (!shown.label.empty() && (!action.url || !shown.address.empty())) offer.actions.push_back(std::move(shown));
+        if (!action.url || !shown.address.empty()) offer.actions.push_back(std::move(shown));
     }
     return offer;
 }

@@ -60,8 +60,9 @@ struct Device {
     bool operator==(const Device&) const = default;
 };
 
+// Without an address, it opens the offer's details. One whose address no browser is to open is left out.
 struct OfferAction {
-    std::string label{}, address{};  // without an address, it opens the offer's details
+    std::string label{}, address{};
     bool operator==(const OfferAction&) const = default;
 };
 

@@ -79,12 +79,13 @@ void Notifier::listen(const char* sender, const char* path, const char* interfac
 void Notifier::show(const std::vector<FollowUp>& followUps) {
     wanted_.clear();
     for (const FollowUp& followUp : followUps) {
-        if (!wantsNotification(followUp) || remembered_.contains(followUp.identifier, *followUp.title)) continue;
+        if (!wantsNotification(followUp)) continue;
+        const std::string title = busText(*followUp.title);
+        if (remembered_.contains(followUp.identifier, title)) continue;
         std::string action = tr("Show");
         if (!followUp.actions.empty()) action = followUp.actions.front().label.value_or(action);
-        wanted_.emplace(followUp.identifier,
-                        Wanted{busText(*followUp.title), bodyText(followUp.deviceName.value_or("")), busText(action),
-                               busText(followUp.serialNumber.value_or(""))});
+        wanted_.emplace(followUp.identifier, Wanted{title, bodyText(followUp.deviceName.value_or("")), busText(action),
+                                                    busText(followUp.serialNumber.value_or(""))});
     }
     bringInStep();
 }

@@ -57,7 +57,8 @@ bool isComplete(const DeviceInfoList& infos) {
 
 class Source::Rounds : public std::enable_shared_from_this<Rounds> {
 public:
-    Rounds(Post post, Page page) : post_(std::move(post)), page_(std::move(page)) {}
+    Rounds(Post post, Page page, Situation known)
+        : post_(std::move(post)), page_(std::move(page)), situation_(std::move(known)) {}
 
     // What the changes call needs a weak pointer to this.
     void begin() {
@@ -153,7 +154,8 @@ private:
     std::optional<client::Changes> changes_;
 };
 
-Source::Source(Post post, Page page) : rounds_(std::make_shared<Rounds>(std::move(post), std::move(page))) {
+Source::Source(Post post, Page page, Situation known)
+    : rounds_(std::make_shared<Rounds>(std::move(post), std::move(page), std::move(known))) {
     rounds_->begin();
 }
 

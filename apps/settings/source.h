@@ -25,7 +25,8 @@ public:
         std::function<void(bool isDismissed)> dismissed;
     };
 
-    Source(Post post, Page page);
+    // What is known stays as long as questions fail.
+    Source(Post post, Page page, Situation known);
     ~Source();
     Source(const Source&) = delete;
     Source& operator=(const Source&) = delete;

@@ -222,18 +222,20 @@ void Window::Content::ask() {
     source_.reset();
     showProgress(false);
     source_ = std::make_unique<Source>(
-        onMainLoop, Source::Page{
-                        .show = [this](const Situation& situation) { show(situation); },
-                        .progress = [this](bool isRefreshing) { showProgress(isRefreshing); },
-                        .refreshed =
-                            [this](bool isComplete) {
-                                if (!isComplete) toast(tr("Not everything could be refreshed"));
-                            },
-                        .dismissed =
-                            [this](bool isDismissed) {
-                                toast(isDismissed ? tr("Offer dismissed") : tr("The offer could not be dismissed"));
-                            },
-                    });
+        onMainLoop,
+        Source::Page{
+            .show = [this](const Situation& situation) { show(situation); },
+            .progress = [this](bool isRefreshing) { showProgress(isRefreshing); },
+            .refreshed =
+                [this](bool isComplete) {
+                    if (!isComplete) toast(tr("Not everything could be refreshed"));
+                },
+            .dismissed =
+                [this](bool isDismissed) {
+                    toast(isDismissed ? tr("Offer dismissed") : tr("The offer could not be dismissed"));
+                },
+        },
+        situation_);
 }
 
 void Window::Content::stopAsking() {
@@ -242,12 +244,7 @@ void Window::Content::stopAsking() {
 }
 
 void Window::Content::show(const Situation& situation) {
-    const Situation before = std::exchange(situation_, situation);
-    // A new source knows nothing yet; what was shown stays while it fails.
-    if (situation_.failure && situation_.devices.empty() && situation_.offers.empty()) {
-        situation_.devices = before.devices;
-        situation_.offers = before.offers;
-    }
+    situation_ = situation;
     wasTold_ = true;
     list_.show(situation_);
     showOthers();
@@ -449,12 +446,16 @@ void Window::Content::confirmDismissal(const Offer& offer) {
 
 Window::Window(GtkApplication* application) : content_(std::make_shared<Content>(application)) {
     content_->ask();
-    // Widgets, which call the content, may outlive this.
+    // The widgets, which call the content, may outlive this.
     onSignal(content_->window(), "destroy", [content = content_] { content->stopAsking(); });
 }
 
 Window::~Window() {
     content_->stopAsking();
+}
+
+GtkWindow* Window::window() const {
+    return content_->window();
 }
 
 void Window::present() {

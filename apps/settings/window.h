@@ -18,6 +18,7 @@ public:
     Window(const Window&) = delete;
     Window& operator=(const Window&) = delete;
 
+    GtkWindow* window() const;
     void present();
     // Opens the device's detail, once it is known.
     void showDevice(const std::string& serialNumber);

@@ -47,6 +47,8 @@ class PageTest(unittest.TestCase):
         screen.press("Dismiss")
         screen.see_gone("Add QX Coverage")
         self.assertFalse(self.has_offer())
+        screen.press("Close")
+        self.assertEqual(self.page.wait(60), 0)
 
     def test_what_changes_is_shown_and_what_was_known_stays(self):
         place = self.place
