@@ -18,6 +18,10 @@ install(FILES debian/copyright ${changelog} DESTINATION share/doc/libvrxagent-cl
 set(CPACK_GENERATOR DEB)
 set(CPACK_DEB_COMPONENT_INSTALL ON)
 set(CPACK_COMPONENTS_ALL agent library dev server)
+if(VRX_SETTINGS)
+    install(FILES debian/copyright ${changelog} DESTINATION share/doc/vrxagent-settings COMPONENT settings)
+    list(APPEND CPACK_COMPONENTS_ALL settings)
+endif()
 set(CPACK_COMPONENTS_GROUPING IGNORE)
 set(CPACK_PACKAGING_INSTALL_PREFIX /usr)
 set(CPACK_STRIP_FILES ON)
@@ -85,5 +89,15 @@ set(CPACK_DEBIAN_SERVER_PACKAGE_SOURCE vrxagent)
 set(CPACK_COMPONENT_SERVER_DESCRIPTION "coverage server for the development of vrxagent
 Serves coverage records on loopback, judges the requests that vrxagent makes
 for them, shows them, and misbehaves as it is told to.")
+
+set(CPACK_DEBIAN_SETTINGS_PACKAGE_NAME vrxagent-settings)
+set(CPACK_DEBIAN_SETTINGS_PACKAGE_SECTION gnome)
+set(CPACK_DEBIAN_SETTINGS_PACKAGE_SOURCE vrxagent)
+set(CPACK_DEBIAN_SETTINGS_PACKAGE_DEPENDS "vrxagent (= ${CMAKE_PROJECT_VERSION}), adwaita-icon-theme")
+set(CPACK_COMPONENT_SETTINGS_DESCRIPTION "page that shows the hardware coverage of a device
+Shows the coverage of this device and of the watches paired with it, and the
+offers to extend it, as vrxagent knows them.
+.
+Contains a notifier of such offers, too, which a user may enable.")
 
 include(CPack)

@@ -6,6 +6,7 @@
 #include "vrx/host/activities/machine_conditions.h"
 #include "vrx/host/home/follow_up_document.h"
 #include "vrx/host/home/shown_follow_up.h"
+#include "vrx/platform/account_store.h"
 #include "vrx/platform/clock.h"
 #include "vrx/platform/log.h"
 
@@ -64,6 +65,13 @@ HostService::HostService(Host& host, AgentStatus status, AgentNames names)
 HostService::~HostService() {
     host_.setOnProfileEdit(nullptr);
     changes_->setOnDemand(nullptr);
+}
+
+// Besides, whether somebody is signed in: without an account there is no record, which a client could not explain.
+Value HostService::status() const {
+    Dictionary document = *valueOf(status_).asDictionary();
+    document.emplace("account", Platform::current().accountStore().primaryCloudAccount().has_value());
+    return document;
 }
 
 // Shows what the settings app would: an item that has expired is not shown, though it may still be pending.

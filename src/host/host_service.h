@@ -29,7 +29,7 @@ public:
     HostService(Host& host, AgentStatus status, AgentNames names);
     ~HostService() override;
 
-    platform::Value status() const override { return valueOf(status_); }
+    platform::Value status() const override;
     platform::Value pendingFollowUps() const override;
     void dismissFollowUp(const std::string& identifier, VRXAgentProtocol& agent,
                          VRXAgentProtocol::Reply<bool> reply) const override;
