@@ -7,6 +7,7 @@ from gi.repository import GLib
 from place import wait
 
 APPLICATION = "com.orvane.Coverage"
+BUTTONS = ("push button", "button")  # the name of the role on Debian 12, and on Debian 13
 
 
 class Screen:
@@ -48,7 +49,7 @@ class Screen:
         """A button. A dialog's says its name twice, and comes first."""
         def pressed():
             buttons = [(text != name, node) for kind, text, node in self.all()
-                       if kind == "push button" and text in (name, f"{name} {name}")]
+                       if kind in BUTTONS and text in (name, f"{name} {name}")]
             try:
                 return buttons and max(buttons, key=lambda button: button[0])[1].queryAction().doAction(0)
             except GLib.GError:
