@@ -1,4 +1,5 @@
-// A coverage server, CDN and store for development and tests, on loopback only.
+// A coverage server, CDN and store for development and tests, on loopback only; or, as its first word says, a check of
+// another server.
 #include <pthread.h>
 #include <signal.h>
 
@@ -12,6 +13,7 @@
 #include "coverage_server/control_service.h"
 #include "coverage_server/coverage_service.h"
 #include "coverage_server/http_server.h"
+#include "server_check/check.h"
 
 using namespace vrx::coverage_server;
 
@@ -70,7 +72,7 @@ std::string footer() {
         "\nOn stdout: a line \"control on URL\", with --tls a line \"certificate FILE\", and last, when requests are "
         "served,\n"
         "\"listening on URL\". SIGUSR1 prints the counters on stderr; SIGTERM and SIGINT end the server.\n"
-        "Exit codes: 0 ended by a signal, 1 could not start, 2 usage.";
+        "Exit codes: 0 ended by a signal, 1 could not start, 2 usage. Those of check are vrxctl's: see check --help.";
     return text;
 }
 
@@ -81,6 +83,9 @@ std::optional<int> parse(int argc, char** argv, Options& options) {
     app.footer(footer());
     app.set_version_flag("--version", VRX_VERSION);
     vrx::apps::addManualOption(app);
+    vrx::server_check::CheckOptions checked;  // by the verb's own parser, below; here for help and manual
+    CLI::App* check = app.add_subcommand("check", vrx::server_check::checkHelp);
+    vrx::server_check::addCheckOptions(*check, checked);
     const CLI::Range ports(0, 65535);
     ServerVersionSettings& serverVersion = options.service.serverVersion;
     bool noEtag = false, noLastModified = false, noConditional = false;
@@ -161,6 +166,10 @@ std::optional<int> parse(int argc, char** argv, Options& options) {
         std::fprintf(stderr, "--fault: %s\n", error.what());
         return exitUsage;
     }
+    if (check->parsed()) {
+        std::fprintf(stderr, "check must be the first word\n");
+        return exitUsage;
+    }
     serverVersion.etag = !noEtag;
     serverVersion.lastModified = !noLastModified;
     serverVersion.conditional = !noConditional;
@@ -206,6 +215,7 @@ void run(const Options& options) {
 }  // namespace
 
 int main(int argc, char** argv) {
+    if (argc > 1 && std::string_view(argv[1]) == "check") return vrx::server_check::runCheck(argc, argv);
     Options options;
     if (std::optional<int> code = parse(argc, argv, options)) return *code;
     try {

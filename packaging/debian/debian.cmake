@@ -86,9 +86,11 @@ and pkg-config about them. An example is among the documents of vrxagent.")
 set(CPACK_DEBIAN_SERVER_PACKAGE_NAME vrx-coverage-server)
 set(CPACK_DEBIAN_SERVER_PACKAGE_SECTION devel)
 set(CPACK_DEBIAN_SERVER_PACKAGE_SOURCE vrxagent)
+set(CPACK_DEBIAN_SERVER_PACKAGE_DEPENDS "libcurl4, libexpat1, libicu${icu_version}")  # opened when they are needed
 set(CPACK_COMPONENT_SERVER_DESCRIPTION "coverage server for the development of vrxagent
 Serves coverage records on loopback, judges the requests that vrxagent makes
-for them, shows them, and misbehaves as it is told to.")
+for them, shows them, and misbehaves as it is told to. Checks what other
+servers answer, too, as vrxagent would read it.")
 
 set(CPACK_DEBIAN_SETTINGS_PACKAGE_NAME vrxagent-settings)
 set(CPACK_DEBIAN_SETTINGS_PACKAGE_SECTION gnome)

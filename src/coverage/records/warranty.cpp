@@ -7,6 +7,7 @@
 #include <limits>
 #include <variant>
 
+#include "vrx/coverage/records/coverage_keys.h"
 #include "vrx/platform/clock.h"
 #include "vrx/platform/defaults_store.h"
 #include "vrx/platform/keyed_archiver.h"
@@ -187,6 +188,16 @@ void read(const Value& value, Value& field) {
 }
 
 }  // namespace
+
+std::vector<CoverageKey> coverageKeys() {
+    static constexpr std::string_view objects[] = {"", "featureToggleParameters", "coverage", "coverage.benefitsCard"};
+    using Kind = CoverageKey::Kind;
+    static constexpr Kind kinds[] = {Kind::Flag, Kind::Date, Kind::Days, Kind::AsSent};  // in the order of Row::field
+    std::vector<CoverageKey> keys;
+    for (const Row& row : rows)
+        keys.push_back({objects[static_cast<std::size_t>(row.object)], row.key, kinds[row.field.index()]});
+    return keys;
+}
 
 std::shared_ptr<VRXWarranty> VRXWarranty::warrantyWithDictionary(const Value& dictionary) {
     return warrantyWithDictionary(dictionary, std::nullopt);

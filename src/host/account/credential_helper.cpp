@@ -26,6 +26,8 @@
 #include "vrx/host/account/credentials.h"
 #include "vrx/host/base/descriptor.h"
 #include "vrx/host/base/files.h"
+#include "vrx/platform/limits.h"
+#include "vrx/platform/log.h"
 
 namespace vrx::host {
 
@@ -39,6 +41,10 @@ namespace {
 using SteadyClock = std::chrono::steady_clock;
 
 constexpr std::size_t answerBytes = 64 * 1024;
+// Of a helper's standard error: what is kept, which is as much as a log line shows, and what the log shows of it.
+constexpr std::size_t saidBytes = platform::limits::logArgumentBytes;
+constexpr std::size_t shownLines = 3;
+constexpr std::size_t shownBytesOfLine = 200;
 
 std::string questionText(const CredentialQuestion& question) {
     std::string text = "account=" + question.account + "\n";
@@ -53,6 +59,17 @@ Descriptor inputFile(const std::string& text) {
         return Descriptor();
     return file;
 }
+
+struct HelperPipe {
+    bool open() {
+        int ends[2];
+        if (pipe2(ends, O_CLOEXEC) != 0) return false;
+        reader = Descriptor(ends[0]);
+        writer = Descriptor(ends[1]);
+        return true;
+    }
+    Descriptor reader, writer;
+};
 
 Error cannotStart(const std::string& program, int number) {
     return credentialError(CredentialFailure::NotStarted,
@@ -109,7 +126,7 @@ public:
     Helper(const Helper&) = delete;
     Helper& operator=(const Helper&) = delete;
 
-    MaybeError start(const std::vector<std::string>& command, int input, int output);
+    MaybeError start(const std::vector<std::string>& command, int input, int output, int errors);
     int process() const { return process_.number(); }
     // Kills what is left of the group. Returns the helper's own status as waitpid gives it, -1 when it is unknown.
     int end();
@@ -128,12 +145,12 @@ private:
 
 // Gives the helper default signal handling, since the agent's threads have signals blocked, and none of the agent's
 // other descriptors.
-MaybeError Helper::start(const std::vector<std::string>& command, int input, int output) {
+MaybeError Helper::start(const std::vector<std::string>& command, int input, int output, int errors) {
     posix_spawn_file_actions_t files;
     posix_spawn_file_actions_init(&files);
     posix_spawn_file_actions_adddup2(&files, input, STDIN_FILENO);
     posix_spawn_file_actions_adddup2(&files, output, STDOUT_FILENO);
-    posix_spawn_file_actions_addopen(&files, STDERR_FILENO, "/dev/null", O_WRONLY, 0);
+    posix_spawn_file_actions_adddup2(&files, errors, STDERR_FILENO);
     posix_spawn_file_actions_addclosefrom_np(&files, STDERR_FILENO + 1);
 
     posix_spawnattr_t attributes;
@@ -200,6 +217,7 @@ public:
         }
         return false;
     }
+    int file() const { return file_; }
     bool isTooLong() const { return size_ > answerBytes; }
     std::string_view text() const { return bytes_.text().substr(0, size_); }
 
@@ -209,10 +227,80 @@ private:
     std::size_t size_ = 0;
 };
 
+using Lines = std::vector<std::string_view>;
+
+// The lines that are not empty, without their ends.
+Lines linesOf(std::string_view text) {
+    Lines lines;
+    while (!text.empty()) {
+        std::string_view line = text.substr(0, text.find('\n'));
+        text.remove_prefix(std::min(line.size() + 1, text.size()));
+        if (line.ends_with('\r')) line.remove_suffix(1);
+        if (!line.empty()) lines.push_back(line);
+    }
+    return lines;
+}
+
+// What the helper says on its standard error. All of it is read, so that the helper never waits; the beginning is kept.
+class Said {
+public:
+    explicit Said(int file) : file_(file) { fcntl(file, F_SETFL, O_NONBLOCK); }
+
+    // Reads as much as a pipe holds, but no more: a helper that never stops would keep its deadline from being seen.
+    // Returns false once nothing more can come.
+    bool read() {
+        constexpr std::size_t pipeBytes = 64 * 1024;
+        for (std::size_t taken = 0; taken < pipeBytes;) {
+            const ssize_t count = ::read(file_, bytes_.bytes().data() + size_, bytes_.bytes().size() - size_);
+            if (count < 0 && errno == EINTR) continue;
+            if (count <= 0) return count < 0 && errno == EAGAIN;
+            const auto size = static_cast<std::size_t>(count), kept = std::min(size, saidBytes - size_);
+            size_ += kept;
+            leftOut_ += size - kept;
+            taken += size;
+        }
+        return true;
+    }
+    int file() const { return file_; }
+    void writeToLog(std::string_view answer) const;
+
+private:
+    const int file_;
+    Secret bytes_{platform::Data(saidBytes + 4096)};  // the end takes what is not kept
+    std::size_t size_ = 0;
+    std::size_t leftOut_ = 0;
+};
+
+// A line that holds what the answer gives for a token, or a part of it, is replaced. The last line of those that are
+// kept, which may end within the token, is dropped when more came.
+void Said::writeToLog(std::string_view answer) const {
+    std::string_view text = bytes_.text().substr(0, size_);
+    if (leftOut_ > 0) text = text.substr(0, text.rfind('\n') + 1);
+    const std::size_t leftOut = leftOut_ + size_ - text.size();
+    Lines lines = linesOf(text);
+    if (lines.empty() && leftOut == 0) return;
+    for (const std::string_view given : linesOf(answer))
+        if (given.starts_with("token=") && given.size() > 6)
+            for (std::string_view& line : lines)
+                if (line.find(given.substr(6)) != line.npos) line = "(a line that holds the token)";
+
+    std::string shown, all;
+    for (std::size_t i = 0; i < lines.size(); ++i) {
+        const char* end = i == 0 ? "" : "\n";
+        all.append(end).append(lines[i]);
+        const platform::BriefDescriptions brief(shownBytesOfLine);
+        if (i < shownLines) shown.append(end).append(platform::describe(lines[i]));
+    }
+    log(platform::Level::Default, "The credential helper said, %lu of %lu lines: %{private}@",
+        std::min(lines.size(), shownLines), lines.size(), shown);
+    log(platform::Level::Debug, "The credential helper said, %lu bytes left out: %@", leftOut, all);
+}
+
 // Reads until the helper has ended, not until its output is closed, which its children may keep open.
-MaybeError listen(const Helper& helper, int output, Answer& answer, Duration limit, int stopFile) {
+MaybeError listen(const Helper& helper, Answer& answer, Said& said, Duration limit, int stopFile) {
     const SteadyClock::time_point deadline = SteadyClock::now() + std::chrono::ceil<SteadyClock::duration>(limit);
-    std::array<pollfd, 3> files{{{helper.process(), POLLIN, 0}, {stopFile, POLLIN, 0}, {output, POLLIN, 0}}};
+    std::array<pollfd, 4> files{
+        {{helper.process(), POLLIN, 0}, {stopFile, POLLIN, 0}, {answer.file(), POLLIN, 0}, {said.file(), POLLIN, 0}}};
     while (true) {
         const auto left = std::chrono::ceil<std::chrono::milliseconds>(deadline - SteadyClock::now()).count();
         const int ready = left > 0 ? poll(files.data(), files.size(), static_cast<int>(left)) : 0;
@@ -224,6 +312,7 @@ MaybeError listen(const Helper& helper, int output, Answer& answer, Duration lim
         if (files[1].revents) return credentialError(CredentialFailure::Ended, "the agent is ending");
         // Before its end is noticed, what it printed is read.
         if (!answer.read()) files[2].fd = -1;
+        if (!said.read()) files[3].fd = -1;
         if (answer.isTooLong())
             return credentialError(CredentialFailure::Answer, "the credential helper printed too much");
         if (files[0].revents) return std::nullopt;
@@ -247,21 +336,25 @@ Error credentialError(CredentialFailure failure, std::string text) {
     return Error{platform::error_domain::credential, static_cast<int>(failure), std::move(text)};
 }
 
-// Closes its own copy of the pipe's writing end, so that the output ends when the helper and its children do.
+// Closes its own copies of the pipes' writing ends, so that the output ends when the helper and its children do.
 Result<Secret> askCredentialHelper(const std::vector<std::string>& command, const CredentialQuestion& question,
                                    Duration limit, int stopFile) {
     const Descriptor input = inputFile(questionText(question));
-    int ends[2];
-    if (!input || pipe2(ends, O_CLOEXEC) != 0) return cannotStart(command[0], errno);
-    const Descriptor output(ends[0]);
-    Descriptor itsOutput(ends[1]);
+    if (!input) return cannotStart(command[0], errno);
+    HelperPipe output, errors;
+    if (!output.open() || !errors.open()) return cannotStart(command[0], errno);
     Helper helper;
-    if (MaybeError error = helper.start(command, input.number(), itsOutput.number())) return *error;
-    itsOutput = Descriptor();
+    if (MaybeError error = helper.start(command, input.number(), output.writer.number(), errors.writer.number()))
+        return *error;
+    output.writer = Descriptor();
+    errors.writer = Descriptor();
 
-    Answer answer(output.number());
-    if (MaybeError error = listen(helper, output.number(), answer, limit, stopFile)) return *error;
-    if (MaybeError error = statusError(helper.end())) return *error;
+    Answer answer(output.reader.number());
+    Said said(errors.reader.number());
+    MaybeError error = listen(helper, answer, said, limit, stopFile);
+    if (!error) error = statusError(helper.end());
+    said.writeToLog(answer.text());
+    if (error) return *error;
     Result<std::string_view> token = tokenIn(answer.text());
     if (!token) return token.error();
     return Secret(platform::Data(token->begin(), token->end()));

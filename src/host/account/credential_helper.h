@@ -6,8 +6,9 @@
 //     service=IDENTIFIER
 //     avoid_ui=1                (0 when it may ask the user)
 //
-// It answers with such lines: token=TOKEN, and others, which are ignored. It must end with status 0. Its standard error
-// is dropped, because it may hold what no log should.
+// It answers with such lines: token=TOKEN, and others, which are ignored. It must end with status 0. What it says on
+// its standard error goes to the log: the beginning as a private value and, at the debug level, up to 16 KiB readably;
+// but no line that holds the token that it gave.
 #pragma once
 
 #include <optional>

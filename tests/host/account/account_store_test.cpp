@@ -88,6 +88,70 @@ TEST_F(AccountStoreTest, ABadHelperFailsWithAReasonAndChangesNoToken) {
     }
 }
 
+// The log as its author would see it: with every level, and with what is private.
+class RevealingLog final : public platform::SystemLog {
+public:
+    bool isOn(platform::Level level) const override { return level >= lowest; }
+    void write(const platform::LogEntry& entry) override {
+        lines.push_back(entry.message(true));
+        redacted += entry.level == platform::Level::Debug ? "" : entry.message();
+    }
+    std::vector<std::string> takeLines() { return std::exchange(lines, {}); }
+
+    platform::Level lowest = platform::Level::Default;
+    std::vector<std::string> lines;
+    std::string redacted;
+};
+
+TEST_F(AccountStoreTest, LogsWhatTheHelperSaysButNotItsToken) {
+    RevealingLog said;
+    codec::Digest digest;
+    platform::Platform platform({.digest = &digest, .systemLog = &said});
+    const platform::ScopedPlatform current(platform);
+    const std::string hidden = "(a line that holds the token)", longLine(199, 'x');
+    const struct {
+        std::string script;
+        std::string inShort;  // empty: nothing is logged
+        std::string inFull;
+    } helpers[] = {
+        {"echo token=T", "", ""},
+        {"echo one >&2; echo token=SECRET", "1 of 1 lines: one", "0 bytes left out: one"},
+        {"printf '\n1\r\n\n2\n3\n4' >&2; exit 3", "3 of 4 lines: 1\n2\n3", "0 bytes left out: 1\n2\n3\n4"},
+        {"echo +SECRET-1 >&2; echo token=SECRET; exit 3", "1 of 1 lines: " + hidden, "0 bytes left out: " + hidden},
+        {"echo token=SECRET; echo token=OTHER; printf 'a\nSECRET\n OTHER\nb' >&2",
+         "3 of 4 lines: a\n" + hidden + "\n" + hidden, "0 bytes left out: a\n" + hidden + "\n" + hidden + "\nb"},
+        {"printf 'token=SE CRET\r\n'; echo xSE CRETx >&2", "1 of 1 lines: " + hidden, "0 bytes left out: " + hidden},
+        {"echo " + longLine + "é >&2; exit 3", "1 of 1 lines: " + longLine + "... (2 more bytes)",
+         "0 bytes left out: " + longLine + "é"},
+        // What is kept ends within the token.
+        {"yes '' | head -c 16379 >&2; printf 'x\nSECRET\n' >&2; echo token=SECRET", "1 of 1 lines: x",
+         "7 bytes left out: x"},
+        {"yes SECRET | head -c 200000 >&2; echo token=SECRET; kill -9 $$",
+         "3 of 2340 lines: " + hidden + "\n" + hidden + "\n" + hidden, ""},
+    };
+    for (const auto& [script, inShort, inFull] : helpers) {
+        SCOPED_TRACE(script);
+        setHelper(script);
+        for (const platform::Level lowest : {platform::Level::Default, platform::Level::Debug}) {
+            said.lowest = lowest;
+            renew();
+            const std::vector<std::string> lines = said.takeLines();
+            ASSERT_EQ(lines.size(), inShort.empty() ? 0u : lowest == platform::Level::Debug ? 2u : 1u);
+            if (inShort.empty()) continue;
+            EXPECT_EQ(lines.front(), "The credential helper said, " + inShort);
+            if (lowest == platform::Level::Debug && !inFull.empty()) {
+                EXPECT_EQ(lines.back(), "The credential helper said, " + inFull);
+            }
+            for (const std::string& line : lines) EXPECT_THAT(line, Not(AnyOf(HasSubstr("SECR"), HasSubstr("CRET"))));
+        }
+    }
+    EXPECT_THAT(said.redacted, AllOf(HasSubstr("1 of 1 lines: <private>"), Not(HasSubstr("one"))));
+    // One that never stops saying something is ended like any other.
+    AccountStore impatient{profile, folder.path(), std::chrono::milliseconds(100)};
+    setHelper("yes >&2");
+    EXPECT_THAT(begin(impatient).get().error->text, HasSubstr("took too long"));
+}
+
 TEST_F(AccountStoreTest, RunsOnlyAHelperThatATrustedProfileNames) {
     setHelper("echo token=new");
     folder.setMode("device.toml", 0666);
