@@ -136,10 +136,9 @@ private:
 
         void send(HttpRequest request, platform::OnceCallback<HttpResponse> completion) override {
             platform::HttpSession& session = owned_ ? *owned_ : notes_.sessions_.shared();
-            const HttpRequest asked = request;
             session.send(std::move(request),
-                         [&notes = notes_, asked, completion = std::move(completion)](HttpResponse response) mutable {
-                             notes.note({std::move(asked), response, notes.clock_.now()});
+                         [&notes = notes_, completion = std::move(completion)](HttpResponse response) mutable {
+                             notes.note({response, notes.clock_.now()});
                              completion(std::move(response));
                          });
         }

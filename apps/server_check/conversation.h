@@ -15,7 +15,6 @@
 namespace vrx::server_check {
 
 struct Exchange {
-    platform::HttpRequest request;
     platform::HttpResponse response;
     platform::Date arrived{};
 };

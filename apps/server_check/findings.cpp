@@ -226,10 +226,14 @@ void judgeOffer(const std::shared_ptr<VRXWarranty>& record, std::vector<Finding>
         findings.push_back(good("offer", "shown from " + from + " until " + end));
 }
 
-Finding transportFailure(const std::string& name, const std::string& url, const platform::HttpResponse& response) {
+bool isTimeOut(const platform::HttpResponse& response) {
     constexpr int timedOut = 28;  // libcurl's code
+    return response.error->code == timedOut;
+}
+
+Finding transportFailure(const std::string& name, const std::string& url, const platform::HttpResponse& response) {
     return problem(name, url + ": " + response.error->text, "Is the address right, and the server there?",
-                   response.error->code == timedOut ? ExitCode::TimedOut : ExitCode::NotReachable);
+                   isTimeOut(response) ? ExitCode::TimedOut : ExitCode::NotReachable);
 }
 
 // Whether the answer of the version document is kept, which spares a request for each record.
@@ -252,10 +256,11 @@ void judgeVersions(const CheckOptions& options, const Conversation& conversation
         return findings.push_back(
             problem(name, url + " did not answer in time", "Is the address right?", ExitCode::TimedOut));
     const std::vector<Exchange>& exchanges = conversation.versionExchanges;
+    const bool isFile = url.starts_with("file:");
     const std::string anyway = " The agent then goes by what it knew before, at first by its own versions.";
     if (!exchanges.empty() && exchanges.back().response.error)
         findings.push_back(transportFailure(name, url, exchanges.back().response));
-    else if (!exchanges.empty() && exchanges.back().response.status != 200)
+    else if (!isFile && !exchanges.empty() && exchanges.back().response.status != 200)
         findings.push_back(problem(name, url + " answers with " + std::to_string(exchanges.back().response.status),
                                    "Serve the document with status 200." + anyway));
     else if (!conversation.versionErrors.empty())
@@ -274,7 +279,8 @@ void judgeVersions(const CheckOptions& options, const Conversation& conversation
         for (const auto& [key, value] : *entries)
             if (key != settings::lowServerVersion && key != settings::highServerVersion) unknown.push_back(key);
     if (!unknown.empty()) findings.push_back(note("other versions", "not read: " + joined(unknown)));
-    if (!exchanges.empty() && !exchanges.back().response.error) findings.push_back(cachingOf(exchanges.back()));
+    if (!isFile && !exchanges.empty() && !exchanges.back().response.error)
+        findings.push_back(cachingOf(exchanges.back()));
 }
 
 // What kept the answer from being a record; nothing when it is one.
@@ -298,7 +304,7 @@ std::optional<Finding> failureOf(const CheckOptions& options, const Conversation
     if (last.error && last.status == 0) return transportFailure(name, options.url, last);
     if (last.error)
         return problem(name, "broke off: " + last.error->text, "The answer must be whole, and 4 MiB at most.",
-                       last.error->code == 28 ? ExitCode::TimedOut : ExitCode::NoAnswer);
+                       isTimeOut(last) ? ExitCode::TimedOut : ExitCode::NoAnswer);
     if (last.status == 401)
         return problem(name, "the token was refused " + std::to_string(exchanges.size()) + " times",
                        "Name a valid one by --token.", ExitCode::Refused);

@@ -126,7 +126,11 @@ TEST_F(AtPlace, ChecksWithTheDevicesProfileAndFromFiles) {
 
     place_.write("account.toml", "");
     EXPECT_THAT(place_.run(program, asked).errors, HasSubstr("not asked"));
-    EXPECT_EQ(place_.run(program, {"check", "file://" + place_ / "coverage/Warranty.plist"}).code, 0);
+    const Place::Outcome files =
+        place_.run(program, {"check", "file://" + place_ / "coverage/Warranty.plist", "--server-version",
+                             "file://" + place_ / "coverage/ServerVersion.plist"});
+    EXPECT_EQ(files.code, 0) << files.errors;
+    EXPECT_THAT(files.output, HasSubstr("shared with the agent"));
     EXPECT_EQ(place_.run(program, {"check", "file://" + place_ / "none.plist"}).code, 1);
     const Place::Outcome plain = place_.run(program, {"check", "http://coverage.invalid/"});
     EXPECT_EQ(plain.code, 3);

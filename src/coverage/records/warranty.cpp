@@ -194,6 +194,7 @@ std::vector<CoverageKey> coverageKeys() {
     using Kind = CoverageKey::Kind;
     static constexpr Kind kinds[] = {Kind::Flag, Kind::Date, Kind::Days, Kind::AsSent};  // in the order of Row::field
     std::vector<CoverageKey> keys;
+    keys.reserve(rows.size());
     for (const Row& row : rows)
         keys.push_back({objects[static_cast<std::size_t>(row.object)], row.key, kinds[row.field.index()]});
     return keys;

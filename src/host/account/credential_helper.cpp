@@ -26,6 +26,7 @@
 #include "vrx/host/account/credentials.h"
 #include "vrx/host/base/descriptor.h"
 #include "vrx/host/base/files.h"
+#include "vrx/host/base/text.h"
 #include "vrx/platform/limits.h"
 #include "vrx/platform/log.h"
 
@@ -279,10 +280,12 @@ void Said::writeToLog(std::string_view answer) const {
     const std::size_t leftOut = leftOut_ + size_ - text.size();
     Lines lines = linesOf(text);
     if (lines.empty() && leftOut == 0) return;
-    for (const std::string_view given : linesOf(answer))
-        if (given.starts_with("token=") && given.size() > 6)
-            for (std::string_view& line : lines)
-                if (line.find(given.substr(6)) != line.npos) line = "(a line that holds the token)";
+    for (const std::string_view given : linesOf(answer)) {
+        const std::string_view token = given.starts_with("token=") ? trimmed(given.substr(6)) : "";
+        if (token.empty()) continue;
+        for (std::string_view& line : lines)
+            if (line.find(token) != line.npos) line = "(a line that holds the token)";
+    }
 
     std::string shown, all;
     for (std::size_t i = 0; i < lines.size(); ++i) {

@@ -120,7 +120,7 @@ TEST_F(AccountStoreTest, LogsWhatTheHelperSaysButNotItsToken) {
         {"echo +SECRET-1 >&2; echo token=SECRET; exit 3", "1 of 1 lines: " + hidden, "0 bytes left out: " + hidden},
         {"echo token=SECRET; echo token=OTHER; printf 'a\nSECRET\n OTHER\nb' >&2",
          "3 of 4 lines: a\n" + hidden + "\n" + hidden, "0 bytes left out: a\n" + hidden + "\n" + hidden + "\nb"},
-        {"printf 'token=SE CRET\r\n'; echo xSE CRETx >&2", "1 of 1 lines: " + hidden, "0 bytes left out: " + hidden},
+        {"printf 'token= SE CRET\r\n'; echo xSE CRETx >&2", "1 of 1 lines: " + hidden, "0 bytes left out: " + hidden},
         {"echo " + longLine + "é >&2; exit 3", "1 of 1 lines: " + longLine + "... (2 more bytes)",
          "0 bytes left out: " + longLine + "é"},
         // What is kept ends within the token.
