@@ -8,6 +8,7 @@
 namespace vrx::apps {
 
 void addDefaultsVerbs(CommandLine& line, const wire::LocationOverrides& places);
+void addUndismissVerb(CommandLine& line, const wire::LocationOverrides& places);
 void addCacheVerb(CommandLine& line, const wire::LocationOverrides& places);
 void addFollowUpVerbs(CommandLine& line, const wire::LocationOverrides& places);
 void addActivitiesVerb(CommandLine& line, const wire::LocationOverrides& places);

@@ -28,6 +28,7 @@ const std::vector<Verb> vrxctlVerbs{{"device", "device"},
                                     {"info X --policy cached", "device", 1},
                                     {"all --update-follow-ups", "devices"},
                                     {"dismiss VRXWATCH0001", "serialNumber"},
+                                    {"dismiss X --force", "serialNumber"},
                                     {"outreach", "scheduled"},
                                     {"store com.example", "availability", 1},
                                     {"support com.example", "availability", 1},
@@ -41,6 +42,7 @@ const std::vector<Verb> vrxhostVerbs{{"why VRXWATCH0001", "rule", 0, 0},
                                      {"followups --watch", "followUps"},
                                      {"followups post item.json", "replaced"},
                                      {"followups clear a", "cleared"},
+                                     {"undismiss VRXWATCH0001", "undismissed", 0, 0},
                                      {"cache X", "path", 1, 1},
                                      {"defaults list", "defaults", 0, 0},
                                      {"defaults read OneDayInterval", "value", 0, 0},
@@ -130,6 +132,9 @@ TEST_F(CommandLine, Answers) {
                 .push_back({command(vrxhost_, verb.words), verb.up, {}, verb.member});
     for (const Verb& verb : vrxctlVerbs) asking.push_back({command(vrxctl_, verb.words), verb.up, {}, verb.member});
     asking.push_back({command(vrxctl_, "info " + std::string(1025, 'x')), 4, {"1024", "Correct the argument"}});
+    asking.push_back(
+        {command(vrxctl_, "info X --policy cached"), 1, {"knows no device with the serial number X", "vrxctl all"}});
+    asking.push_back({command(vrxctl_, "dismiss Y"), 4, {"knows no device with the serial number Y", "--force"}});
     for (const auto& cases : {fire, asking, looking}) expect(cases);
 
     // What the table leaves open.
@@ -138,7 +143,10 @@ TEST_F(CommandLine, Answers) {
     EXPECT_EQ(value(vrxctl_, "support com.example")["availability"], Value(Dictionary{{"AppBundleID", "com.example"}}));
     EXPECT_EQ(value(vrxctl_, "paired")["devices"].asArray()->size(), 2u);
     EXPECT_EQ(value(vrxctl_, "all")["devices"].asArray()->size(), 3u);
-    EXPECT_EQ(value(vrxhost_, "defaults read FollowupDismissedSerialNumberHashes")["value"].asArray()->size(), 2u);
+    EXPECT_EQ(value(vrxhost_, "defaults read FollowupDismissedSerialNumberHashes")["value"].asArray()->size(), 2u)
+        << "X, twice";
+    for (const bool wasDismissed : {true, false})
+        EXPECT_EQ(value(vrxhost_, "undismiss X")["undismissed"], Value(wasDismissed));
     const Value info = value(vrxctl_, "info VRXWATCH0001 --policy cached --timeout 60");
     EXPECT_EQ(info["coverage"]["coverageLocalizedLabel"], Value("QX Coverage for Watch"));
     EXPECT_EQ(info["derived"]["coverageEndDate"], Value("2031-03-14T00:00:00Z"));
@@ -172,11 +180,21 @@ TEST_F(CommandLine, Answers) {
     }
     EXPECT_EQ(value(vrxhost_, "defaults read SerialNumber")["value"], Value(5)) << "written all the same";
 
+    // Days are the agent's, and this device comes first.
+    EXPECT_EQ(value(vrxhost_, "defaults write OneDayInterval 1e12")["ok"], Value(true));
+    const Value all = value(vrxctl_, "all --policy cached");
+    EXPECT_EQ(all["devices"].asArray()->front()["device"]["deviceTypeString"], Value("Default"));
+    EXPECT_EQ(all["devices"].asArray()->back()["derived"]["daysEligible"], Value(1));
+
     // Text of a record cannot steer the terminal.
     place_.write("coverage/Warranty.VRXPHONE0001.plist",
                  "<plist version='1.0'><dict><key>coverageLocalizedLabel</key>"
                  "<string>one\ntwo&#x7f;&#x9b;2J&#x202e;</string></dict></plist>");
     const std::string shown = place_.vrxctl({"info", "--policy", "refresh"}).output;
+    // A refresh that leaves a device without a record has failed.
+    expect({{command(vrxctl_, "all --policy refresh"), 0}});
+    place_.write("coverage/Warranty.VRXWATCH0002.plist", "nonsense");
+    expect({{command(vrxctl_, "all --policy refresh"), 1, {"no coverage record", "Watch Mini"}}});
     EXPECT_NE(shown.find("one\\u{a}two\\u{7f}\\u{9b}2J\\u{202e}\n"), std::string::npos) << shown;
 }
 
@@ -312,6 +330,10 @@ TEST_F(CommandLine, TellsWhatIsWrongWithItsArguments) {
           "info --policy -1", "info --policy 18446744073709551616", "all --timeout 0", "all --timeout nan",
           "all --timeout 1s", "all --bogus", "dismiss", "store", "support a b"})
         cases.push_back({command(vrxctl_, words), 2, {"vrxctl --help"}});
+    for (const char* verb : {"info", "dismiss", "store"}) {
+        cases.push_back({command(vrxctl_, verb), 2, {"it is empty"}});
+        cases.back().command.emplace_back();
+    }
     for (const char* words :
          {"defaults", "defaults read", "defaults write K", "defaults write K text", "defaults write K null",
           "defaults write K {\"a\":null}", "defaults write K 1 --int 2", "defaults write K --date today",
