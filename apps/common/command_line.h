@@ -14,6 +14,7 @@
 #include <string_view>
 #include <vector>
 
+#include "common/manual.h"
 #include "vrx/platform/value.h"
 
 namespace vrx::apps {
@@ -60,6 +61,8 @@ public:
 
     // For options of every verb, which may stand before and after the verb.
     CLI::App& app() { return app_; }
+    // For the manual page and the completions.
+    ManualNotes& notes() { return notes_; }
     // Adds a verb, or one below the group. The returned app takes the options of this verb alone. A verb with verbs
     // below it runs when none of them is named.
     CLI::App* add(const std::string& name, const std::string& help, Verb verb, CLI::App* group = nullptr);
@@ -78,6 +81,7 @@ private:
     int report(const Outcome& outcome) const;
 
     CLI::App app_;
+    ManualNotes notes_;
     const std::string program_;
     bool isJson_ = false;
     bool isWatch_ = false;

@@ -384,6 +384,19 @@ const CLI::Validator& notEmpty() {
     return validator;
 }
 
+// For completions: nobody waits long for them.
+std::vector<std::string> serialNumbers(client::ConnectionOptions options) {
+    options.timeLimit = platform::Duration(2);
+    AgentConnection agent(options);
+    DeviceList devices;
+    if (const auto device = agent.defaultDevice()) devices.push_back(*device);
+    if (const auto watches = agent.pairedDevices()) devices.insert(devices.end(), watches->begin(), watches->end());
+    std::vector<std::string> numbers;
+    for (const auto& device : devices)
+        if (device && device->serialNumber()) numbers.push_back(*device->serialNumber());
+    return numbers;
+}
+
 // Options are read while parsing and used by the verb that runs afterwards.
 int run(int argc, const char* const* argv) {
     CommandLine line("vrxctl", "Asks the coverage agent about this device and its paired watches.");
@@ -433,6 +446,11 @@ int run(int argc, const char* const* argv) {
         if (found.socketPath.empty()) found.socketPath = wire::findAgent().socket.path;
         return watchChanges(line, found);
     });
+    line.notes().examples = {{"vrxctl all", "Lists all devices with their coverage"},
+                             {"vrxctl info --policy refresh", "Downloads this device's record, and shows it"},
+                             {"vrxctl all --json | jq '.devices[].derived.daysEligible'", "For programs"}};
+    line.notes().seeAlso = {"vrxhost(1)", "vrxagent(1)"};
+    line.notes().words["SERIAL"] = [&options] { return serialNumbers(options.connection()); };
     line.add("web-url", "Shows the web-flow URL that a tester has set", asking(webUrl));
     return line.run(argc, argv);
 }

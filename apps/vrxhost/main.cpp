@@ -16,5 +16,6 @@ int main(int argc, char** argv) {
     addWhyVerb(line, places);
     addProfileVerb(line, places);
     addDoctorVerb(line, places);
+    addNotes(line, places);
     return line.run(argc, argv);
 }

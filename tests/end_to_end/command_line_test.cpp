@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <csignal>
+#include <map>
 #include <sstream>
 
 #include "end_to_end/programs.h"
@@ -329,7 +330,7 @@ TEST_F(CommandLine, TellsWhatIsWrongWithItsArguments) {
          {"", "nothing", "device extra", "device --policy cached", "info A B", "info --policy fresh",
           "info --policy -1", "info --policy 18446744073709551616", "all --timeout 0", "all --timeout nan",
           "all --timeout 1s", "all --bogus", "dismiss", "store", "support a b"})
-        cases.push_back({command(vrxctl_, words), 2, {"vrxctl --help"}});
+        cases.push_back({command(vrxctl_, words), 2, {"See vrxctl", " --help."}});
     for (const char* verb : {"info", "dismiss", "store"}) {
         cases.push_back({command(vrxctl_, verb), 2, {"it is empty"}});
         cases.back().command.emplace_back();
@@ -339,9 +340,42 @@ TEST_F(CommandLine, TellsWhatIsWrongWithItsArguments) {
           "defaults write K {\"a\":null}", "defaults write K 1 --int 2", "defaults write K --date today",
           "defaults list --device x", "followups clear", "followups post x --watch", "followups --device x clear y",
           "cache", "why", "fire", "fire a --timeout -1", "activities x", "doctor --timeout 0"})
-        cases.push_back({command(vrxhost_, words), 2, {"vrxhost --help"}});
+        cases.push_back({command(vrxhost_, words), 2, {"See vrxhost", " --help."}});
+    for (const auto& [words, problem] : std::map<std::string, Texts>{
+             {"defaults wite K", {"there is no verb wite; did you mean write?", "vrxhost defaults --help"}},
+             {"activites", {"there is no verb activites; did you mean activities?", "vrxhost --help"}},
+             {"folow", {"did you mean followups?"}},
+             {"xyzzy", {"there is no verb xyzzy\n"}},
+             {"followups post x --devise=y", {"there is no option --devise; did you mean --device?"}},
+             {"fire a --jsn", {"there is no option --jsn; did you mean --json?", "vrxhost fire --help"}},
+             {"why a b", {"why takes no further argument: b"}},
+             {"defaults", {"a verb is needed: list, read, write, delete"}}})
+        cases.push_back({command(vrxhost_, words), 2, problem});
     for (const char* words : {"--help", "info --help", "--version"}) cases.push_back({command(vrxctl_, words), 0});
     expect(cases);
+    // The programs without verbs say it in the same way.
+    const std::string programs = VRX_PROGRAMS "/";
+    for (const auto& [program, argument, problem] :
+         {std::tuple("vrxagent", "--log-level=x", "--log-level: 'x' is neither debug, default nor error"),
+          {"vrxagent", "--hoem=x", "there is no option --hoem; did you mean --home?"},
+          {"vrx-coverage-server", "--porrt=1", "there is no option --porrt; did you mean --port?"}}) {
+        const Place::Outcome outcome = place_.run(programs + program, {argument});
+        EXPECT_EQ(outcome.code, 2);
+        EXPECT_EQ(outcome.errors, std::string(program) + ": " + problem + "\nSee " + program + " --help.\n");
+        EXPECT_TRUE(place_.run(programs + program, {"--version"}).output.starts_with(std::string(program) + " "));
+    }
+    // A verb's help and completion list what it takes, and completions offer no word that a shell would run.
+    const std::string help = place_.vrxctl({"info", "--help"}).output;
+    for (const char* option : {"--policy", "--socket", "--json"}) EXPECT_NE(help.find(option), help.npos) << option;
+    start();
+    std::string profile = fileText(place_ / "device.toml");
+    profile.replace(profile.find("VRXWATCH0002"), 12, "$(reboot)");
+    place_.write("device.toml", profile);
+    for (const Arguments& program : {vrxctl_, vrxhost_}) {
+        Arguments words = program;
+        words.insert(words.end(), {"--candidates", "SERIAL"});
+        EXPECT_EQ(place_.runAll({words}).front().output, "VRXPHONE0001\nVRXWATCH0001\n");
+    }
 }
 
 }  // namespace
