@@ -47,11 +47,6 @@ std::string escaped(const char* format, unsigned number) {
     return {text.data(), static_cast<std::size_t>(size)};
 }
 
-std::size_t characters(std::string_view text) {
-    return static_cast<std::size_t>(
-        std::count_if(text.begin(), text.end(), [](char byte) { return (byte & 0xc0) != 0x80; }));
-}
-
 ManualNotes::Lines exitCodes() {
     return {{"0", "Done; also nothing to do, an empty list"},
             {"1", "No answer: no coverage record, nothing stored, a file or a database that cannot be read or written"},
@@ -132,37 +127,17 @@ std::string secondsText(double seconds) {
     return Value(seconds).description() + " s";
 }
 
-// Cells are made printable before they are measured, since escapes are longer.
-std::string table(const std::vector<std::vector<std::string>>& rows) {
-    std::vector<std::size_t> widths;
-    std::vector<std::vector<std::string>> cells;
-    for (const auto& row : rows) {
-        widths.resize(std::max(widths.size(), row.size()));
-        std::vector<std::string>& line = cells.emplace_back();
-        for (std::size_t column = 0; column < row.size(); ++column) {
-            line.push_back(printable(row[column]));
-            widths[column] = std::max(widths[column], characters(line.back()));
-        }
-    }
-    std::string result;
-    for (const auto& line : cells) {
-        for (std::size_t column = 0; column < line.size(); ++column) {
-            result += line[column];
-            if (column + 1 < line.size()) result.append(widths[column] - characters(line[column]) + 2, ' ');
-        }
-        result.erase(result.find_last_not_of(' ') + 1);
-        result += '\n';
-    }
-    return result;
-}
-
 CommandLine::CommandLine(const std::string& program, const std::string& purpose)
     : app_(purpose, program), program_(program) {
     app_.require_subcommand(1);
     app_.set_version_flag("--version", program + " " VRX_VERSION);
     app_.add_flag("--json", isJson_, "Print one JSON document instead of text")->disable_flag_override();
+    app_.add_flag("--wide", presentation().isWide, "Shorten nothing to the terminal's width")->disable_flag_override();
+    app_.add_flag("--utc", presentation().isUtc, "Show times in UTC, not in local time")->disable_flag_override();
     app_.formatter(std::make_shared<VerbFormatter>());
     notes_ = {.exitCodes = exitCodes(), .files = agentFiles(), .environment = agentEnvironment()};
+    notes_.environment.emplace_back("NO_COLOR", "No colours, unless it is empty; there are none where output is piped");
+    notes_.environment.emplace_back("TZ", "The time zone of what is shown, where it is not the machine's");
 }
 
 CLI::App* CommandLine::add(const std::string& name, const std::string& help, Verb verb, CLI::App* group) {
@@ -179,6 +154,7 @@ CLI::App* CommandLine::addGroup(const std::string& name, const std::string& help
 
 int CommandLine::run(int argc, const char* const* argv) {
     addManualOption(app_, notes_);
+    lookAtTerminal();
     // Read beforehand, because a mistake may end parsing before it comes to the flags.
     isJson_ = hasFlag(argc, argv, "--json");
     isWatch_ = hasFlag(argc, argv, "--watch");

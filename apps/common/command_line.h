@@ -15,6 +15,7 @@
 #include <vector>
 
 #include "common/manual.h"
+#include "common/presentation.h"
 #include "vrx/platform/value.h"
 
 namespace vrx::apps {
@@ -49,9 +50,6 @@ std::string absolutePath(const std::string& path);
 void addTimeout(CLI::App& app, double& seconds, const std::string& help);
 
 std::string secondsText(double seconds);
-
-// Left-aligned columns, a line for each row. The first row is the heading. Cells are made printable.
-std::string table(const std::vector<std::vector<std::string>>& rows);
 
 class CommandLine {
 public:

@@ -28,7 +28,7 @@ Value valueOf(const std::optional<T>& value) {
 }
 
 std::string textOf(const std::optional<Date>& date) {
-    return date ? platform::describe(*date) : "unknown";
+    return date ? dateText(*date) : "unknown";
 }
 
 // For programs.
@@ -74,6 +74,16 @@ std::string coverageText(const VRXWarranty& record) {
     return record.coverageEndDate() ? "covered until " + textOf(record.coverageEndDate()) : "covered";
 }
 
+// In a table, in few words.
+std::string coverageCell(const VRXWarranty& record) {
+    const auto end = record.coverageEndDate();
+    return !record.covered() ? "not covered" : end ? "until " + dayText(*end) : "covered";
+}
+
+std::string offerCell(const VRXWarranty& record) {
+    return record.qxOfferEligible() ? "days left: " + std::to_string(record.daysEligible()) : "none";
+}
+
 std::string offerText(const VRXWarranty& record) {
     if (!record.qxOfferEligible()) return "none";
     return "until " + textOf(record.qxOfferEligibleUntil()) + ", days left: " + std::to_string(record.daysEligible());
@@ -88,6 +98,10 @@ std::string entryText(const Value& entry) {
     return text;
 }
 
+std::string timeLeft(Date date) {
+    return timeLeftText(date, std::chrono::system_clock::now());
+}
+
 std::string textOf(const VRXWarranty& record) {
     std::string text;
     auto line = [&](const std::string& name, const std::string& content) {
@@ -96,7 +110,8 @@ std::string textOf(const VRXWarranty& record) {
     auto sent = [&](const std::string& name, const Value& value) {
         if (!value.isNull()) line(name, printableValue(value));
     };
-    line("Coverage", coverageText(record));
+    const auto end = record.coverageEndDate();
+    line("Coverage", coverageText(record) + (record.covered() && end ? ", " + timeLeft(*end) : ""));
     sent("Label", record.coverageLocalizedLabel());
     sent("Description", record.coverageLocalizedDesc());
     sent("Expiration", record.coverageLocalizedExpirationLabel());
@@ -258,8 +273,8 @@ Outcome all(AgentConnection& agent, VRXWarrantyLookupPolicy policy, bool updateF
             documents.emplace_back(documentOf(*info));
             std::vector<std::string>& row = rows.emplace_back(rowOf(info->device().get()));
             const auto record = info->warranty();
-            row.back() = record ? coverageText(*record) : "no record";
-            row.push_back(record ? offerText(*record) : "");
+            row.back() = record ? coverageCell(*record) : "no record";
+            row.push_back(record ? offerCell(*record) : "");
             if (!record) without += (without.empty() ? "" : ", ") + row.front();
         }
         Outcome outcome{.document = {{"devices", documents}}, .text = infos.empty() ? "No device.\n" : table(rows)};
@@ -433,9 +448,7 @@ int run(int argc, const char* const* argv) {
         ->disable_flag_override();
     line.add("outreach", "Has the agent look for offers now", asking(outreach));
     auto addBundle = [&options](CLI::App* verb) {
-        verb->add_option("BUNDLE", options.bundleIdentifier, "The application's bundle identifier")
-            ->required()
-            ->check(notEmpty());
+        verb->add_option("BUNDLE", options.bundleIdentifier, "The application's bundle identifier")->required();
     };
     addBundle(line.add("store", "Tells whether the Marketplace offers an application",
                        asking([&](AgentConnection& agent) { return store(agent, options.bundleIdentifier); })));

@@ -199,6 +199,40 @@ TEST_F(CommandLine, Answers) {
     EXPECT_NE(shown.find("one\\u{a}two\\u{7f}\\u{9b}2J\\u{202e}\n"), std::string::npos) << shown;
 }
 
+TEST_F(CommandLine, FitsTheTerminal) {
+    start();
+    std::string profile = fileText(place_ / "device.toml");
+    profile.replace(profile.find("Maya's Phone"), 12, "\u5e97\u306e\u96fb\u8a71\u306e\u9577\u3044\u540d\u524d");
+    place_.write("device.toml", profile);
+    ASSERT_EQ(place_.vrxctl({"all", "--policy", "refresh"}).code, 0);
+    // Local time, and nothing shortened where output is piped.
+    const std::string vrxctl = place_ / "app/vrxctl";
+    EXPECT_NE(place_.run("/bin/sh", {"-c", "TZ=UTC-9 " + vrxctl + " info VRXWATCH0001"})
+                  .output.find("covered until 2031-03-14 09:00, in "),
+              std::string::npos);
+    EXPECT_NE(place_.vrxctl({"--utc", "info", "VRXWATCH0001"}).output.find("until 2031-03-14 00:00 UTC, in "),
+              std::string::npos);
+    const std::string piped = place_.vrxctl({"all"}).output;
+    for (const char* words : {"\u540d\u524d  VRXPHONE0001", "until 2031-03-14", "VRXWATCH0002"})
+        EXPECT_NE(piped.find(words), piped.npos) << piped;
+    EXPECT_EQ(piped.find_first_of("\x1b"), piped.npos);
+    // Of a name the beginning stays, of an identifier the end.
+    for (const auto& [words, shown, isWhole, isColoured] :
+         {std::tuple("TERM=xterm", "\n\u5e97\u306e\u96fb", false, true),
+          {"NO_COLOR=1 TERM=xterm", "HONE0001  Default  until 2", false, false},
+          {"TERM=dumb", "NAME", false, false},
+          {"TERM=xterm NO_COLOR= WIDE=--wide", "\u540d\u524d  VRXPHONE0001", true, true}}) {
+        const std::string output =
+            place_
+                .run("/usr/bin/script",
+                     {"-qec", std::string("stty cols 50; export ") + words + "; " + vrxctl + " all $WIDE", "/dev/null"})
+                .output;
+        EXPECT_NE(output.find(shown), output.npos) << output;
+        EXPECT_EQ(output.find("\u2026") == output.npos, isWhole) << output;
+        EXPECT_EQ(output.find("\x1b[1mNAME") != output.npos, isColoured) << output;
+    }
+}
+
 // The agent does nothing else meanwhile that would download the record.
 TEST_F(CommandLine, TakesADamagedCacheFileForAbsentUntilTheNextDownload) {
     start();
@@ -331,7 +365,7 @@ TEST_F(CommandLine, TellsWhatIsWrongWithItsArguments) {
           "info --policy -1", "info --policy 18446744073709551616", "all --timeout 0", "all --timeout nan",
           "all --timeout 1s", "all --bogus", "dismiss", "store", "support a b"})
         cases.push_back({command(vrxctl_, words), 2, {"See vrxctl", " --help."}});
-    for (const char* verb : {"info", "dismiss", "store"}) {
+    for (const char* verb : {"info", "dismiss"}) {
         cases.push_back({command(vrxctl_, verb), 2, {"it is empty"}});
         cases.back().command.emplace_back();
     }
