@@ -8,7 +8,7 @@
 #include <cstring>
 #include <filesystem>
 
-#include "common/manual.h"
+#include "common/mistakes.h"
 #include "vrx/codec/core/unicode.h"
 #include "vrx/codec/json.h"
 
@@ -47,10 +47,32 @@ std::string escaped(const char* format, unsigned number) {
     return {text.data(), static_cast<std::size_t>(size)};
 }
 
-std::size_t characters(std::string_view text) {
-    return static_cast<std::size_t>(
-        std::count_if(text.begin(), text.end(), [](char byte) { return (byte & 0xc0) != 0x80; }));
+ManualNotes::Lines exitCodes() {
+    return {{"0", "Done; also nothing to do, an empty list"},
+            {"1", "No answer: no coverage record, nothing stored, a file or a database that cannot be read or written"},
+            {"2", "Usage"},
+            {"3", "Not reachable: no agent at the socket, no database in the home"},
+            {"4", "Refused: not entitled, too much at a time, or an argument that is not admitted"},
+            {"5", "Timed out, or another process holds the database"}};
 }
+
+// A verb's help lists what it takes besides: the options of every verb.
+class VerbFormatter final : public CLI::Formatter {
+    std::string make_subcommands(const CLI::App* app, CLI::AppFormatMode mode) const override {
+        const std::string text = CLI::Formatter::make_subcommands(app, mode);
+        const CLI::App* program = app;
+        while (program->get_parent()) program = program->get_parent();
+        if (program == app || app->get_name().empty() || mode != CLI::AppFormatMode::Normal) return text;
+        return make_group("Options of every verb", false, program->get_options([&](const CLI::Option* option) {
+                   return !option->get_group().empty() && option->nonpositional() && option != program->get_help_ptr();
+               })) +
+               text;
+    }
+    std::string make_footer(const CLI::App* app) const override {
+        if (app->get_parent()) return "";
+        return "\nExit codes: 0 done, 1 no answer, 2 usage, 3 not reachable, 4 refused, 5 timed out.\n";
+    }
+};
 
 bool hasFlag(int argc, const char* const* argv, const std::string& flag) {
     return std::any_of(argv + 1, argv + argc,
@@ -105,37 +127,17 @@ std::string secondsText(double seconds) {
     return Value(seconds).description() + " s";
 }
 
-// Cells are made printable before they are measured, since escapes are longer.
-std::string table(const std::vector<std::vector<std::string>>& rows) {
-    std::vector<std::size_t> widths;
-    std::vector<std::vector<std::string>> cells;
-    for (const auto& row : rows) {
-        widths.resize(std::max(widths.size(), row.size()));
-        std::vector<std::string>& line = cells.emplace_back();
-        for (std::size_t column = 0; column < row.size(); ++column) {
-            line.push_back(printable(row[column]));
-            widths[column] = std::max(widths[column], characters(line.back()));
-        }
-    }
-    std::string result;
-    for (const auto& line : cells) {
-        for (std::size_t column = 0; column < line.size(); ++column) {
-            result += line[column];
-            if (column + 1 < line.size()) result.append(widths[column] - characters(line[column]) + 2, ' ');
-        }
-        result.erase(result.find_last_not_of(' ') + 1);
-        result += '\n';
-    }
-    return result;
-}
-
 CommandLine::CommandLine(const std::string& program, const std::string& purpose)
     : app_(purpose, program), program_(program) {
     app_.require_subcommand(1);
     app_.set_version_flag("--version", program + " " VRX_VERSION);
     app_.add_flag("--json", isJson_, "Print one JSON document instead of text")->disable_flag_override();
-    addManualOption(app_);
-    app_.footer("Exit codes: 0 done, 1 no answer, 2 usage, 3 not reachable, 4 refused, 5 timed out.");
+    app_.add_flag("--wide", presentation().isWide, "Shorten nothing to the terminal's width")->disable_flag_override();
+    app_.add_flag("--utc", presentation().isUtc, "Show times in UTC, not in local time")->disable_flag_override();
+    app_.formatter(std::make_shared<VerbFormatter>());
+    notes_ = {.exitCodes = exitCodes(), .files = agentFiles(), .environment = agentEnvironment()};
+    notes_.environment.emplace_back("NO_COLOR", "No colours, unless it is empty; there are none where output is piped");
+    notes_.environment.emplace_back("TZ", "The time zone of what is shown, where it is not the machine's");
 }
 
 CLI::App* CommandLine::add(const std::string& name, const std::string& help, Verb verb, CLI::App* group) {
@@ -151,6 +153,8 @@ CLI::App* CommandLine::addGroup(const std::string& name, const std::string& help
 }
 
 int CommandLine::run(int argc, const char* const* argv) {
+    addManualOption(app_, notes_);
+    lookAtTerminal();
     // Read beforehand, because a mistake may end parsing before it comes to the flags.
     isJson_ = hasFlag(argc, argv, "--json");
     isWatch_ = hasFlag(argc, argv, "--watch");
@@ -169,7 +173,8 @@ Outcome CommandLine::read(int argc, const char* const* argv) {
     } catch (const CLI::Success&) {  // the option has printed its result
         return {.isShown = true};
     } catch (const CLI::ParseError& error) {
-        return failed(ExitCode::Usage, error.what(), "See " + program_ + " --help.");
+        Mistake mistake = explainMistake(app_, error);
+        return failed(ExitCode::Usage, std::move(mistake.problem), std::move(mistake.advice));
     } catch (const std::exception& error) {
         return failed(ExitCode::NoAnswer, error.what(),
                       "Try again; what stays so is a fault of " + program_ + ", or of the machine.", "failed");

@@ -14,6 +14,8 @@
 #include <string_view>
 #include <vector>
 
+#include "common/manual.h"
+#include "common/presentation.h"
 #include "vrx/platform/value.h"
 
 namespace vrx::apps {
@@ -49,9 +51,6 @@ void addTimeout(CLI::App& app, double& seconds, const std::string& help);
 
 std::string secondsText(double seconds);
 
-// Left-aligned columns, a line for each row. The first row is the heading. Cells are made printable.
-std::string table(const std::vector<std::vector<std::string>>& rows);
-
 class CommandLine {
 public:
     using Verb = std::function<Outcome()>;
@@ -60,6 +59,8 @@ public:
 
     // For options of every verb, which may stand before and after the verb.
     CLI::App& app() { return app_; }
+    // For the manual page and the completions.
+    ManualNotes& notes() { return notes_; }
     // Adds a verb, or one below the group. The returned app takes the options of this verb alone. A verb with verbs
     // below it runs when none of them is named.
     CLI::App* add(const std::string& name, const std::string& help, Verb verb, CLI::App* group = nullptr);
@@ -78,6 +79,7 @@ private:
     int report(const Outcome& outcome) const;
 
     CLI::App app_;
+    ManualNotes notes_;
     const std::string program_;
     bool isJson_ = false;
     bool isWatch_ = false;

@@ -1,8 +1,8 @@
 #include "common/manual.h"
 
+#include <algorithm>
+#include <cctype>
 #include <cstdio>
-#include <map>
-#include <vector>
 
 namespace vrx::apps {
 
@@ -81,7 +81,13 @@ std::string synopsis(const CLI::App& app) {
     return text;
 }
 
-std::string manPage(const CLI::App& app) {
+std::string manSection(const char* heading, const ManualNotes::Lines& lines) {
+    std::string text = lines.empty() ? "" : ".SH " + std::string(heading) + "\n";
+    for (const auto& [word, meaning] : lines) text += ".TP\n\\fB" + roff(word) + "\\fR\n" + roff(meaning) + "\n";
+    return text;
+}
+
+std::string manPage(const CLI::App& app, const ManualNotes& notes) {
     const std::string& name = app.get_name();
     const bool hasVerbs = !verbsOf(app).empty();
     std::string text = ".TH " + replaced(name, {{'-', "\\-"}}) + " 1 \"\" \"vrxagent " VRX_VERSION "\"\n";
@@ -95,7 +101,11 @@ std::string manPage(const CLI::App& app) {
                 manOptions(verb);
     });
     if (!app.get_footer().empty()) text += ".SH NOTES\n.nf\n" + roff(app.get_footer()) + "\n.fi\n";
-    return text;
+    text += manSection("EXIT STATUS", notes.exitCodes) + manSection("FILES", notes.files) +
+            manSection("ENVIRONMENT", notes.environment) + manSection("EXAMPLES", notes.examples);
+    std::string pages;
+    for (const std::string& page : notes.seeAlso) pages += (pages.empty() ? "" : ", ") + roff(page);
+    return pages.empty() ? text : text + ".SH SEE ALSO\n" + pages + "\n";
 }
 
 // Completions.
@@ -114,6 +124,37 @@ std::vector<Candidate> candidatesOf(const CLI::App& app) {
     return candidates;
 }
 
+// With the options of the verbs above it, which may stand anywhere.
+std::vector<Candidate> allCandidatesOf(const CLI::App& app) {
+    std::vector<Candidate> candidates = candidatesOf(app);
+    for (const CLI::App* above = app.get_parent(); above; above = above->get_parent())
+        for (const Candidate& candidate : candidatesOf(*above))
+            if (candidate.word.starts_with("--")) candidates.push_back(candidate);
+    return candidates;
+}
+
+// The command that prints the words for the verb's argument; empty where there are none.
+std::string wordsCommand(const CLI::App& app, const CLI::App& verb, const ManualNotes& notes) {
+    for (const CLI::Option* option : optionsOf(verb))
+        if (option->get_positional() && option->get_lnames().empty() && notes.words.contains(option->get_name(true)))
+            return app.get_name() + " --candidates " + option->get_name(true) + " 2>/dev/null";
+    return "";
+}
+
+// Shells expand what they are offered, and serial numbers come from elsewhere.
+bool isPlainWord(const std::string& word) {
+    return !word.empty() && !word.starts_with('-') && std::ranges::all_of(word, [](unsigned char c) {
+        return c < 0x80 && (std::isalnum(c) || c == '.' || c == '_' || c == '-');
+    });
+}
+
+void printCandidates(const ManualNotes& notes, const std::string& argument) {
+    const auto words = notes.words.find(argument);
+    if (words == notes.words.end()) return;
+    for (const std::string& word : words->second())
+        if (isPlainWord(word)) std::printf("%s\n", word.c_str());
+}
+
 // In bash and zsh the verbs before the cursor select the candidates.
 std::string verbPattern(const std::string& path) {
     return "\"" + path + "\"";
@@ -127,7 +168,7 @@ std::string verbCases(const CLI::App& app) {
     return text + "        esac\n";
 }
 
-std::string bashCompletion(const CLI::App& app) {
+std::string bashCompletion(const CLI::App& app, const ManualNotes& notes) {
     const std::string function = "_" + replaced(app.get_name(), {{'-', "_"}});
     std::string text = function +
                        "() {\n    local verb=\"\" word candidates=\"\"\n"
@@ -135,7 +176,9 @@ std::string bashCompletion(const CLI::App& app) {
                        verbCases(app) + "    done\n    case \"$verb\" in\n";
     forEach(app, "", [&](const CLI::App& verb, const std::string& path) {
         std::string words;
-        for (const Candidate& candidate : candidatesOf(verb)) words += (words.empty() ? "" : " ") + candidate.word;
+        for (const Candidate& candidate : allCandidatesOf(verb)) words += (words.empty() ? "" : " ") + candidate.word;
+        const std::string command = wordsCommand(app, verb, notes);
+        if (!command.empty()) words += " $(" + command + ")";
         text += "        " + verbPattern(path) + ") candidates=\"" + words + "\" ;;\n";
     });
     return text +
@@ -147,21 +190,23 @@ std::string shellQuoted(const std::string& text) {
     return "'" + replaced(text, {{'\'', "'\\''"}}) + "'";
 }
 
-std::string zshCompletion(const CLI::App& app) {
+std::string zshCompletion(const CLI::App& app, const ManualNotes& notes) {
     std::string text = "#compdef " + app.get_name() +
                        "\nlocal verb=\"\" word\nlocal -a candidates\n"
                        "for word in ${words[2,CURRENT-1]}; do\n" +
                        verbCases(app) + "done\ncase \"$verb\" in\n";
     forEach(app, "", [&](const CLI::App& verb, const std::string& path) {
         text += "    " + verbPattern(path) + ") candidates=(";
-        for (const Candidate& candidate : candidatesOf(verb))
+        for (const Candidate& candidate : allCandidatesOf(verb))
             text += "\n        " + shellQuoted(candidate.word + ":" + candidate.help);
+        const std::string command = wordsCommand(app, verb, notes);
+        if (!command.empty()) text += "\n        ${(f)\"$(" + command + ")\"}";
         text += ") ;;\n";
     });
     return text + "esac\n_describe -o " + app.get_name() + " candidates || _files\n";
 }
 
-std::string fishCompletion(const CLI::App& app) {
+std::string fishCompletion(const CLI::App& app, const ManualNotes& notes) {
     std::string text;
     forEach(app, "", [&](const CLI::App& verb, const std::string& path) {
         std::string condition = "__fish_use_subcommand";
@@ -181,32 +226,57 @@ std::string fishCompletion(const CLI::App& app) {
             text += isOption ? " -l " + candidate.word.substr(2) : " -f -a " + candidate.word;
             text += " -d " + shellQuoted(candidate.help) + "\n";
         }
+        const std::string command = wordsCommand(app, verb, notes);
+        if (!command.empty())
+            text += "complete -c " + app.get_name() + " -n " + shellQuoted(condition) + " -f -a '(" + command + ")'\n";
     });
     return text;
 }
 
 }  // namespace
 
-std::string manual(const CLI::App& app, ManualForm form) {
+ManualNotes::Lines agentFiles() {
+    return {{"~/.local/state/vrxagent/host.db", "Settings, follow-ups and activities of a user's agent"},
+            {"/var/lib/vrxagent/host.db", "Those of the system's agent"},
+            {"/etc/vrxagent/device.toml, /etc/vrxagent/device.d/, ~/.config/vrxagent/device.toml",
+             "The device profile, whose files are joined key by key"},
+            {"$XDG_RUNTIME_DIR/com.orvane.vrxagent, /run/vrxagent/com.orvane.vrxagent",
+             "The sockets of a user's agent and of the system's"}};
+}
+
+ManualNotes::Lines agentEnvironment() {
+    return {{"VRXAGENT_SOCKET", "The socket of the agent to ask, where --socket names none"},
+            {"STATE_DIRECTORY, XDG_STATE_HOME", "Where the agent's home is, where --home names none"},
+            {"XDG_RUNTIME_DIR", "Where the socket of a user's agent is"},
+            {"XDG_CONFIG_HOME", "Where a user's device profile is"}};
+}
+
+std::string manual(const CLI::App& app, const ManualNotes& notes, ManualForm form) {
     switch (form) {
-        case ManualForm::Man: return manPage(app);
-        case ManualForm::Bash: return bashCompletion(app);
-        case ManualForm::Zsh: return zshCompletion(app);
-        case ManualForm::Fish: return fishCompletion(app);
+        case ManualForm::Man: return manPage(app, notes);
+        case ManualForm::Bash: return bashCompletion(app, notes);
+        case ManualForm::Zsh: return zshCompletion(app, notes);
+        case ManualForm::Fish: return fishCompletion(app, notes);
     }
     return "";
 }
 
-void addManualOption(CLI::App& app) {
+void addManualOption(CLI::App& app, const ManualNotes& notes) {
     static const std::map<std::string, ManualForm> forms{
         {"man", ManualForm::Man}, {"bash", ManualForm::Bash}, {"zsh", ManualForm::Zsh}, {"fish", ManualForm::Fish}};
     app.add_option_function<ManualForm>("--manual",
-                                        [&app](const ManualForm& form) {
-                                            std::fputs(manual(app, form).c_str(), stdout);
+                                        [&](const ManualForm& form) {
+                                            std::fputs(manual(app, notes, form).c_str(), stdout);
                                             throw CLI::Success();
                                         })
         ->transform(CLI::CheckedTransformer(forms))
         ->trigger_on_parse()
+        ->group("");
+    app.add_option_function<std::string>("--candidates",
+                                         [&](const std::string& argument) {
+                                             printCandidates(notes, argument);
+                                             throw CLI::Success();
+                                         })
         ->group("");
 }
 

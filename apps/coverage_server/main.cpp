@@ -9,6 +9,7 @@
 #include <optional>
 
 #include "common/manual.h"
+#include "common/mistakes.h"
 #include "coverage_server/certificate.h"
 #include "coverage_server/control_service.h"
 #include "coverage_server/coverage_service.h"
@@ -20,7 +21,6 @@ using namespace vrx::coverage_server;
 namespace {
 
 constexpr int exitFailed = 1;
-constexpr int exitUsage = 2;
 
 struct Options {
     int port = 0;
@@ -81,8 +81,15 @@ std::optional<int> parse(int argc, char** argv, Options& options) {
     CLI::App app("A coverage server, CDN and store for development and tests. Listens on 127.0.0.1 only.",
                  "vrx-coverage-server");
     app.footer(footer());
-    app.set_version_flag("--version", VRX_VERSION);
-    vrx::apps::addManualOption(app);
+    app.set_version_flag("--version", "vrx-coverage-server " VRX_VERSION);
+    static const vrx::apps::ManualNotes notes{
+        .exitCodes = {{"0", "Ended by a signal"}, {"1", "Could not start"}, {"2", "Usage"}},
+        .examples = {{"vrx-coverage-server --port 8080 --control-port 8081 --records examples/records",
+                      "Serves the records of a folder"},
+                     {"curl --data-binary coverage:status=401,count=1 http://127.0.0.1:8081/faults",
+                      "Has it refuse the next request's token"}},
+        .seeAlso = {"vrxagent(1)", "vrxctl(1)", "vrxhost(1)"}};
+    vrx::apps::addManualOption(app, notes);
     vrx::server_check::CheckOptions checked;  // by the verb's own parser, below; here for help and manual
     CLI::App* check = app.add_subcommand("check", vrx::server_check::checkHelp);
     vrx::server_check::addCheckOptions(*check, checked);
@@ -161,10 +168,9 @@ std::optional<int> parse(int argc, char** argv, Options& options) {
         app.parse(argc, argv);
         for (const std::string& fault : faults) options.faults.push_back(parseFault(std::string_view(fault)));
     } catch (const CLI::ParseError& error) {
-        return app.exit(error) == 0 ? 0 : exitUsage;
+        return vrx::apps::endOfParsing(app, error);
     } catch (const std::invalid_argument& error) {
-        std::fprintf(stderr, "--fault: %s\n", error.what());
-        return exitUsage;
+        return vrx::apps::endOfParsing(app, CLI::ValidationError("--fault", error.what()));
     }
     if (check->parsed()) {
         std::fprintf(stderr, "check must be the first word\n");

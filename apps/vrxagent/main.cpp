@@ -14,6 +14,7 @@
 
 #include "common/command_line.h"
 #include "common/manual.h"
+#include "common/mistakes.h"
 #include "vrx/coverage/records/warranty.h"
 #include "vrx/followup/follow_up_content.h"
 #include "vrx/host/host.h"
@@ -110,15 +111,31 @@ int main(int argc, char** argv) {
     app.add_option("--home", places.home, "Where settings and cached records are kept")->type_name("PATH");
     app.add_option("--device", places.profile, "The device profile")->type_name("PATH");
     app.add_option("--socket", places.socket, "The socket at which clients connect")->type_name("PATH");
-    app.add_option("--log-level", logLevel, "The lowest level that is logged: debug, default or error")
-        ->type_name("LEVEL")
-        ->transform(CLI::CheckedTransformer(levels).description(""));
+    const auto readLevel = [&](const std::string& name) {
+        const auto level = levels.find(name);
+        if (level == levels.end())
+            throw CLI::ValidationError("--log-level", "'" + name + "' is neither debug, default nor error");
+        logLevel = level->second;
+    };
+    app.add_option_function<std::string>("--log-level", readLevel,
+                                         "The lowest level that is logged: debug, default or error")
+        ->type_name("LEVEL");
     app.set_version_flag("--version", "vrxagent " VRX_VERSION);
-    vrx::apps::addManualOption(app);
+    const vrx::apps::ManualNotes notes{
+        .exitCodes = {{"0", "Ended cleanly"}, {"1", "Could not start or go on"}, {"2", "Usage"}},
+        .files = vrx::apps::agentFiles(),
+        .environment = {{"STATE_DIRECTORY, XDG_STATE_HOME", "Where its home is, where --home names none"},
+                        {"XDG_RUNTIME_DIR", "Where its socket is, where --socket names none"},
+                        {"XDG_CONFIG_HOME", "Where a user's device profile is"}},
+        .examples = {{"systemctl --user enable --now vrxagent.socket",
+                      "Starts an agent for its user when it is needed"},
+                     {"vrxagent --log-level debug", "Runs one in a terminal, which tells all that it does"}},
+        .seeAlso = {"vrxctl(1)", "vrxhost(1)"}};
+    vrx::apps::addManualOption(app, notes);
     try {
         app.parse(argc, argv);
     } catch (const CLI::ParseError& error) {
-        return app.exit(error) == 0 ? 0 : 2;
+        return vrx::apps::endOfParsing(app, error);
     }
     try {
         std::optional<HandOver> handOver;

@@ -1,6 +1,8 @@
 // vrxctl: asks the agent, one verb for each of its operations.
+#include <algorithm>
 #include <charconv>
 #include <map>
+#include <tuple>
 
 #include "common/agent_place.h"
 #include "common/command_line.h"
@@ -26,7 +28,7 @@ Value valueOf(const std::optional<T>& value) {
 }
 
 std::string textOf(const std::optional<Date>& date) {
-    return date ? platform::describe(*date) : "unknown";
+    return date ? dateText(*date) : "unknown";
 }
 
 // For programs.
@@ -72,6 +74,16 @@ std::string coverageText(const VRXWarranty& record) {
     return record.coverageEndDate() ? "covered until " + textOf(record.coverageEndDate()) : "covered";
 }
 
+// In a table, in few words.
+std::string coverageCell(const VRXWarranty& record) {
+    const auto end = record.coverageEndDate();
+    return !record.covered() ? "not covered" : end ? "until " + dayText(*end) : "covered";
+}
+
+std::string offerCell(const VRXWarranty& record) {
+    return record.qxOfferEligible() ? "days left: " + std::to_string(record.daysEligible()) : "none";
+}
+
 std::string offerText(const VRXWarranty& record) {
     if (!record.qxOfferEligible()) return "none";
     return "until " + textOf(record.qxOfferEligibleUntil()) + ", days left: " + std::to_string(record.daysEligible());
@@ -86,6 +98,10 @@ std::string entryText(const Value& entry) {
     return text;
 }
 
+std::string timeLeft(Date date) {
+    return timeLeftText(date, std::chrono::system_clock::now());
+}
+
 std::string textOf(const VRXWarranty& record) {
     std::string text;
     auto line = [&](const std::string& name, const std::string& content) {
@@ -94,7 +110,8 @@ std::string textOf(const VRXWarranty& record) {
     auto sent = [&](const std::string& name, const Value& value) {
         if (!value.isNull()) line(name, printableValue(value));
     };
-    line("Coverage", coverageText(record));
+    const auto end = record.coverageEndDate();
+    line("Coverage", coverageText(record) + (record.covered() && end ? ", " + timeLeft(*end) : ""));
     sent("Label", record.coverageLocalizedLabel());
     sent("Description", record.coverageLocalizedDesc());
     sent("Expiration", record.coverageLocalizedExpirationLabel());
@@ -148,6 +165,42 @@ Outcome outcomeOfFailure(const Failure& failure, const std::string& socket, plat
 
 namespace {
 
+// What records derive is to be what the agent's follow-up says. Of an older agent, which does not tell, the shell's
+// locale and the usual day serve.
+void deriveAsAgent(AgentConnection& agent) {
+    if (const auto surroundings = agent.surroundings()) AgentConnection::deriveAs(*surroundings);
+}
+
+// This device first, then the watches by name.
+auto placeOf(const VRXDevice* device) {
+    return std::tuple(!device || device->deviceType() != VRXDeviceTypeDefault, device ? device->name() : std::nullopt,
+                      device ? device->serialNumber() : std::nullopt);
+}
+
+DeviceInfoList inOrder(DeviceInfoList infos) {
+    std::erase(infos, nullptr);
+    std::ranges::stable_sort(infos, {}, [](const auto& info) { return placeOf(info->device().get()); });
+    return infos;
+}
+
+// Whether it is this device's or a paired watch's. To ask for that changes nothing. Without an answer, nothing is
+// known.
+Answer<bool> knows(AgentConnection& agent, const std::string& serialNumber) {
+    const auto device = agent.defaultDevice();
+    if (!device) return device.failure();
+    if (*device && (*device)->serialNumber() == serialNumber) return true;
+    const auto watches = agent.pairedDevices();
+    if (!watches) return watches.failure();
+    return std::ranges::any_of(*watches,
+                               [&](const auto& watch) { return watch && watch->serialNumber() == serialNumber; });
+}
+
+constexpr const char* unknownDevice = "unknown-device";
+
+std::string unknownText(const std::string& serialNumber) {
+    return "the agent knows no device with the serial number " + serialNumber;
+}
+
 // Shows the agent's answer, or explains why there is none.
 template <class T, class Show>
 Outcome outcomeOf(const AgentConnection& agent, const Answer<T>& answer, Show show) {
@@ -167,7 +220,9 @@ Outcome paired(AgentConnection& agent) {
     return outcomeOf(agent, agent.pairedDevices(), [](const DeviceList& devices) {
         Array documents;
         std::vector<std::vector<std::string>> rows{deviceHeading};
-        for (const auto& device : devices) {
+        DeviceList sorted = devices;
+        std::ranges::stable_sort(sorted, {}, [](const auto& device) { return placeOf(device.get()); });
+        for (const auto& device : sorted) {
             documents.push_back(documentOf(device.get()));
             rows.push_back(rowOf(device.get()));
         }
@@ -182,12 +237,21 @@ Outcome info(AgentConnection& agent, const std::optional<std::string>& serialNum
                                      : agent.getDefaultDeviceInfoUsingPolicy(policy);
     return outcomeOf(agent, answer, [&](const std::shared_ptr<VRXDeviceInfo>& info) {
         if (!info) return failed(ExitCode::NoAnswer, "the agent gives nothing for this device", seeLog);
+        deriveAsAgent(agent);
         Outcome outcome{.document = documentOf(*info), .text = table({deviceHeading, rowOf(info->device().get())})};
+        const bool isUnknown = serialNumber && info->device() && info->device()->deviceType() == VRXDeviceTypeOther;
         if (const auto record = info->warranty()) {
             outcome.text += textOf(*record);
+            if (isUnknown) outcome.warnings = {unknownText(*serialNumber) + "; the record may be another's"};
             return outcome;
         }
         outcome.code = ExitCode::NoAnswer;
+        if (isUnknown) {
+            outcome.problem = unknownText(*serialNumber) + ", and there is no coverage record for it";
+            outcome.advice = "vrxctl all lists the devices that it knows.";
+            outcome.kind = unknownDevice;
+            return outcome;
+        }
         outcome.problem = "there is no coverage record for this device";
         outcome.advice = policy == VRXWarrantyLookupPolicyRefresh
                              ? "It could not be downloaded; the agent's log says why."
@@ -197,20 +261,28 @@ Outcome info(AgentConnection& agent, const std::optional<std::string>& serialNum
     });
 }
 
+// Only a refresh promises a record of every device.
 Outcome all(AgentConnection& agent, VRXWarrantyLookupPolicy policy, bool updateFollowUps) {
     const auto answer = agent.getAllDeviceInfosUsingPolicy(policy, updateFollowUps);
-    return outcomeOf(agent, answer, [](const DeviceInfoList& infos) {
+    return outcomeOf(agent, answer, [&](const DeviceInfoList& infos) {
+        deriveAsAgent(agent);
         Array documents;
         std::vector<std::vector<std::string>> rows{{"NAME", "SERIAL NUMBER", "TYPE", "COVERAGE", "OFFER"}};
-        for (const auto& info : infos) {
-            if (!info) continue;
+        std::string without;
+        for (const auto& info : inOrder(infos)) {
             documents.emplace_back(documentOf(*info));
             std::vector<std::string>& row = rows.emplace_back(rowOf(info->device().get()));
             const auto record = info->warranty();
-            row.back() = record ? coverageText(*record) : "no record";
-            row.push_back(record ? offerText(*record) : "");
+            row.back() = record ? coverageCell(*record) : "no record";
+            row.push_back(record ? offerCell(*record) : "");
+            if (!record) without += (without.empty() ? "" : ", ") + row.front();
         }
-        return Outcome{.document = {{"devices", documents}}, .text = infos.empty() ? "No device.\n" : table(rows)};
+        Outcome outcome{.document = {{"devices", documents}}, .text = infos.empty() ? "No device.\n" : table(rows)};
+        if (policy != VRXWarrantyLookupPolicyRefresh || without.empty()) return outcome;
+        outcome.code = ExitCode::NoAnswer;
+        outcome.problem = "no coverage record could be downloaded for " + without;
+        outcome.advice = seeLog;
+        return outcome;
     });
 }
 
@@ -225,8 +297,17 @@ Outcome outreach(AgentConnection& agent) {
     });
 }
 
-// The agent always answers true, whatever came of it.
-Outcome dismiss(AgentConnection& agent, const std::string& serialNumber) {
+// The agent always answers true, whatever came of it, and remembers any serial number: also one with a slip in it.
+Outcome dismiss(AgentConnection& agent, const std::string& serialNumber, bool isForced) {
+    if (!isForced) {
+        const Answer<bool> known = knows(agent, serialNumber);
+        if (!known) return outcomeOfFailure(known.failure(), agent.socketPath(), agent.timeLimit());
+        if (!*known)
+            return failed(ExitCode::Refused, unknownText(serialNumber),
+                          "vrxctl all lists those that it knows. To dismiss this one's follow-up all the same, give "
+                          "--force.",
+                          unknownDevice);
+    }
     return outcomeOf(agent, agent.dismissFollowUpForSerialNumber(serialNumber), [&](bool isDone) {
         if (!isDone) return failed(ExitCode::NoAnswer, "the agent did not dismiss the follow-up", seeLog);
         return Outcome{.document = {{"serialNumber", serialNumber}}};
@@ -283,6 +364,7 @@ struct Options {
     std::optional<std::string> serialNumber;
     std::string bundleIdentifier;
     bool updateFollowUps = false;
+    bool isForced = false;
 
     client::ConnectionOptions connection() const {
         client::ConnectionOptions options;
@@ -311,14 +393,30 @@ void addPolicy(CLI::App* verb, Options& options) {
         ->type_name("POLICY");
 }
 
+const CLI::Validator& notEmpty() {
+    static const CLI::Validator validator([](const std::string& text) { return text.empty() ? "it is empty" : ""; },
+                                          "");
+    return validator;
+}
+
+// For completions: nobody waits long for them.
+std::vector<std::string> serialNumbers(client::ConnectionOptions options) {
+    options.timeLimit = platform::Duration(2);
+    AgentConnection agent(options);
+    DeviceList devices;
+    if (const auto device = agent.defaultDevice()) devices.push_back(*device);
+    if (const auto watches = agent.pairedDevices()) devices.insert(devices.end(), watches->begin(), watches->end());
+    std::vector<std::string> numbers;
+    for (const auto& device : devices)
+        if (device && device->serialNumber()) numbers.push_back(*device->serialNumber());
+    return numbers;
+}
+
 // Options are read while parsing and used by the verb that runs afterwards.
 int run(int argc, const char* const* argv) {
     CommandLine line("vrxctl", "Asks the coverage agent about this device and its paired watches.");
     Options options;
-    line.app()
-        .add_option("--socket", options.socket, "The agent's socket")
-        ->type_name("PATH")
-        ->check([](const std::string& path) { return path.empty() ? "a path is needed" : ""; }, "");
+    line.app().add_option("--socket", options.socket, "The agent's socket")->type_name("PATH")->check(notEmpty());
     addTimeout(line.app(), options.timeout, "How long to wait for an answer");
 
     auto asking = [&options](auto verb) {
@@ -333,7 +431,8 @@ int run(int argc, const char* const* argv) {
     CLI::App* infoVerb =
         line.add("info", "Shows a device and its coverage record",
                  asking([&](AgentConnection& agent) { return info(agent, options.serialNumber, options.policy); }));
-    infoVerb->add_option("SERIAL", options.serialNumber, "Serial number; of this device when left out");
+    infoVerb->add_option("SERIAL", options.serialNumber, "Serial number; of this device when left out")
+        ->check(notEmpty());
     addPolicy(infoVerb, options);
     CLI::App* allVerb =
         line.add("all", "Lists all devices with their coverage",
@@ -341,10 +440,12 @@ int run(int argc, const char* const* argv) {
     allVerb->add_flag("--update-follow-ups", options.updateFollowUps, "Bring the shown follow-ups up to date as well")
         ->disable_flag_override();
     addPolicy(allVerb, options);
-    line.add("dismiss", "Dismisses the follow-up of a device for good",
-             asking([&](AgentConnection& agent) { return dismiss(agent, *options.serialNumber); }))
-        ->add_option("SERIAL", options.serialNumber, "Serial number")
-        ->required();
+    CLI::App* dismissVerb = line.add(
+        "dismiss", "Dismisses the follow-up of a device for good; vrxhost undismiss takes it back",
+        asking([&](AgentConnection& agent) { return dismiss(agent, *options.serialNumber, options.isForced); }));
+    dismissVerb->add_option("SERIAL", options.serialNumber, "Serial number")->required()->check(notEmpty());
+    dismissVerb->add_flag("--force", options.isForced, "Also of a device that the agent does not know")
+        ->disable_flag_override();
     line.add("outreach", "Has the agent look for offers now", asking(outreach));
     auto addBundle = [&options](CLI::App* verb) {
         verb->add_option("BUNDLE", options.bundleIdentifier, "The application's bundle identifier")->required();
@@ -358,6 +459,11 @@ int run(int argc, const char* const* argv) {
         if (found.socketPath.empty()) found.socketPath = wire::findAgent().socket.path;
         return watchChanges(line, found);
     });
+    line.notes().examples = {{"vrxctl all", "Lists all devices with their coverage"},
+                             {"vrxctl info --policy refresh", "Downloads this device's record, and shows it"},
+                             {"vrxctl all --json | jq '.devices[].derived.daysEligible'", "For programs"}};
+    line.notes().seeAlso = {"vrxhost(1)", "vrxagent(1)"};
+    line.notes().words["SERIAL"] = [&options] { return serialNumbers(options.connection()); };
     line.add("web-url", "Shows the web-flow URL that a tester has set", asking(webUrl));
     return line.run(argc, argv);
 }

@@ -31,7 +31,7 @@ Value valueOf(const std::optional<Date>& date) {
 }
 
 std::string textOf(const std::optional<Date>& date) {
-    return date ? platform::describe(*date) : "";
+    return date ? dateText(*date) : "";
 }
 
 Value documentOf(const AgentActivity& activity, bool isAgentRunning) {
@@ -62,7 +62,7 @@ std::string dueText(const AgentActivity& activity, bool isAgentRunning) {
     if (!activity.scheduled) return "not scheduled";
     const auto& run = activity.lastRun;
     const bool isRunning = isAgentRunning && run && !run->outcome && run->generation == activity.scheduled->generation;
-    return isRunning ? "running" : textOf(activity.due);
+    return isRunning ? "running" : activity.due ? dateAndTimeLeft(*activity.due) : "";
 }
 
 std::vector<std::string> rowOf(const AgentActivity& activity, bool isAgentRunning) {

@@ -393,7 +393,7 @@ Outcome report(const std::vector<Check>& checks) {
         rows.push_back({check.name, nameOf(check.health), check.finding});
     }
     outcome.document = {{"checks", documents}, {"next", next}};
-    outcome.text = table(rows) + "Next: " + printable(next) + "\n";
+    outcome.text = table(rows, Fit::BreakLast) + coloured("Next: ", Colour::Bold) + printable(next) + "\n";
     return outcome;
 }
 

@@ -64,7 +64,7 @@ Outcome fire(Home& home, const Options& options) {
                          {"targetDate", target ? platform::Value(*target) : platform::Value()},
                          {"early", isEarly}},
             .text = "Fired " + printable(identifier) +
-                    (isEarly ? ", which does nothing before " + platform::describe(*target) : "") + ".\n"};
+                    (isEarly ? ", which does nothing before " + dateAndTimeLeft(*target) : "") + ".\n"};
 }
 
 }  // namespace

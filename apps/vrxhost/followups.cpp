@@ -90,7 +90,7 @@ std::string textOf(const FollowUpItem& item, const Appearance& look) {
     line("Text", item.informativeFooterText);
     line("Days left text", look.shown.daysText, look.differsFromFooter(item) ? "  (differs from the text)" : "");
     line("Badge", look.shown.hasBadge ? "yes" : "no");
-    line("Expires", item.expirationDate ? platform::describe(*item.expirationDate) : "never");
+    line("Expires", item.expirationDate ? dateText(*item.expirationDate) : "never");
     line("Target", item.targetBundleIdentifier);
     line("Extension", item.extensionIdentifier);
     for (const platform::FollowUpAction& action : item.actions)
@@ -134,7 +134,7 @@ Outcome watch(const CommandLine& line, Home& home, const host::DeviceProfile& pr
         if (listing.outcome.code != ExitCode::Done) return listing.outcome;
         if (listing.outcome.document != last.document) {
             last = listing.outcome;
-            last.text.insert(0, "== " + platform::describe(host::Clock(profile).now()) + "\n");
+            last.text.insert(0, "== " + dateText(host::Clock(profile).now()) + "\n");
             last.isShown = line.show(last);
             if (!last.isShown) return last;
         }

@@ -8,6 +8,7 @@ int main(int argc, char** argv) {
     vrx::wire::LocationOverrides places;
     line.app().add_option("--home", places.home, "The agent's home")->type_name("PATH");
     addDefaultsVerbs(line, places);
+    addUndismissVerb(line, places);
     addCacheVerb(line, places);
     addFollowUpVerbs(line, places);
     addActivitiesVerb(line, places);
@@ -15,5 +16,6 @@ int main(int argc, char** argv) {
     addWhyVerb(line, places);
     addProfileVerb(line, places);
     addDoctorVerb(line, places);
+    addNotes(line, places);
     return line.run(argc, argv);
 }

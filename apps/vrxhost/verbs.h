@@ -8,6 +8,7 @@
 namespace vrx::apps {
 
 void addDefaultsVerbs(CommandLine& line, const wire::LocationOverrides& places);
+void addUndismissVerb(CommandLine& line, const wire::LocationOverrides& places);
 void addCacheVerb(CommandLine& line, const wire::LocationOverrides& places);
 void addFollowUpVerbs(CommandLine& line, const wire::LocationOverrides& places);
 void addActivitiesVerb(CommandLine& line, const wire::LocationOverrides& places);
@@ -15,5 +16,8 @@ void addFireVerb(CommandLine& line, const wire::LocationOverrides& places);
 void addWhyVerb(CommandLine& line, const wire::LocationOverrides& places);
 void addProfileVerb(CommandLine& line, const wire::LocationOverrides& places);
 void addDoctorVerb(CommandLine& line, const wire::LocationOverrides& places);
+
+// For the manual page and the completions.
+void addNotes(CommandLine& line, const wire::LocationOverrides& places);
 
 }  // namespace vrx::apps

@@ -38,7 +38,7 @@ endif()
 
 # What applications may include: the classes that they call, and what those are made of.
 foreach(header
-    client/agent_connection.h client/answer.h client/changes.h client/follow_ups.h
+    client/agent_connection.h client/answer.h client/changes.h client/follow_ups.h client/surroundings.h
     coverage/records/warranty.h devices/records/device.h devices/records/device_info.h
     platform/api.h platform/archivable.h platform/date.h platform/property.h platform/value.h
     protocols/forward.h)

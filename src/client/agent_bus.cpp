@@ -11,6 +11,7 @@
 #include <cerrno>
 #include <cstring>
 
+#include "vrx/client/property_reader.h"
 #include "vrx/wire/encoding.h"
 #include "vrx/wire/message.h"
 
@@ -114,7 +115,8 @@ CallResult AgentBus::call(const wire::Operation& operation, const CallArguments&
     r = sd_bus_call(bus_, message, microsecondsUntil(deadline), &error.error, &message);
     if (r < 0) return failed(r, error);
     const MessagePointer reply(message);
-    platform::Result<platform::Value> root = wire::readReply(message);
+    platform::Result<platform::Value> root =
+        &operation == &wire::getAllProperties ? readProperties(message) : wire::readReply(message);
     if (!root) return Failure{Failure::Kind::BadReply, root.error().text};
     return std::move(root).value();
 }

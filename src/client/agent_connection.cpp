@@ -1,11 +1,44 @@
 #include "vrx/client/agent_connection.h"
 
+#include <cmath>
+
 #include "vrx/client/caller.h"
+#include "vrx/client/local_platform.h"
 
 namespace vrx::client {
 
 using platform::Value;
 using wire::OperationIndex;
+
+namespace {
+
+// D-Bus's operation wants the name of the interface whose properties they are.
+constexpr CallArguments ofCoverage{.text = wire::coverageInterface.name};
+
+std::vector<Activity> activitiesFrom(const Value& list) {
+    std::vector<Activity> activities;
+    if (!list.asArray()) return activities;
+    for (const Value& entry : *list.asArray()) {
+        const std::string *identifier = entry["identifier"].asString(), *state = entry["state"].asString();
+        if (!identifier || !state) continue;
+        Activity& activity = activities.emplace_back(Activity{*identifier, *state});
+        if (const auto due = entry["due"].asNumber()) activity.due = platform::dateFromEpoch(*due);
+    }
+    return activities;
+}
+
+}  // namespace
+
+template <>
+struct Decoder<Surroundings> {
+    static Answer<Surroundings> decode(const Value& properties) {
+        const std::string* locale = properties[wire::coverageProperties[0].name].asString();
+        const auto day = properties[wire::coverageProperties[1].name].asNumber();
+        if (!locale || !day || !std::isfinite(*day)) return badReply("the agent does not tell what it goes by");
+        return Surroundings{*locale, platform::Duration(*day),
+                            activitiesFrom(properties[wire::coverageProperties[2].name])};
+    }
+};
 
 AgentConnection::AgentConnection(ConnectionOptions options) : caller_(std::make_unique<Caller>(std::move(options))) {}
 
@@ -71,6 +104,14 @@ Answer<bool> AgentConnection::dismissFollowUpForSerialNumber(const std::string& 
                                {.text = serialNumber});
 }
 
+Answer<Surroundings> AgentConnection::surroundings() {
+    return caller_->call<Surroundings>(wire::coveragePropertiesInterface, wire::getAllProperties, ofCoverage);
+}
+
+Answer<Value> AgentConnection::status() {
+    return caller_->call<Value>(wire::hostInterface, wire::statusOperation);
+}
+
 Call AgentConnection::scheduleOutreachWithReply(Callback<bool> callback) {
     return caller_->callLater(wire::agentInterface, wire::operation(OperationIndex::ScheduleOutreach),
                               std::move(callback));
@@ -122,6 +163,19 @@ Call AgentConnection::getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicy polic
 Call AgentConnection::dismissFollowUpForSerialNumber(std::string serialNumber, Callback<bool> callback) {
     return caller_->callLater(wire::agentInterface, wire::operation(OperationIndex::DismissFollowUpForSerialNumber),
                               std::move(callback), std::move(serialNumber));
+}
+
+Call AgentConnection::surroundings(Callback<Surroundings> callback) {
+    return caller_->callLater(wire::coveragePropertiesInterface, wire::getAllProperties, std::move(callback),
+                              std::string(ofCoverage.text));
+}
+
+Call AgentConnection::status(Callback<Value> callback) {
+    return caller_->callLater(wire::hostInterface, wire::statusOperation, std::move(callback));
+}
+
+void AgentConnection::deriveAs(const Surroundings& surroundings) {
+    setLocalSurroundings(surroundings.locale, surroundings.oneDayInterval);
 }
 
 }  // namespace vrx::client

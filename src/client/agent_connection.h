@@ -20,7 +20,7 @@
 //
 // Texts and day counts of a VRXWarranty are derived when they are read. When the program has set no platform::Platform,
 // the first object installs a small one: the system's clock, the locale of the process's environment, and a day of
-// 86400 seconds.
+// 86400 seconds. deriveAs() gives it the agent's own.
 #pragma once
 
 #include <memory>
@@ -28,6 +28,7 @@
 #include <string>
 
 #include "vrx/client/answer.h"
+#include "vrx/client/surroundings.h"
 #include "vrx/coverage/records/warranty.h"
 #include "vrx/devices/records/device.h"
 #include "vrx/devices/records/device_info.h"
@@ -59,6 +60,11 @@ public:
     Answer<DeviceInfoList> getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicy policy, bool updateFollowUps);
     Answer<bool> dismissFollowUpForSerialNumber(const std::string& serialNumber);
 
+    // Changes nothing, and never waits for a server. BadReply from an agent that does not tell.
+    Answer<Surroundings> surroundings();
+    // Of the agent's process: docs/formats.md has the keys. Changes nothing either.
+    Answer<platform::Value> status();
+
     // These answer later.
     Call scheduleOutreachWithReply(Callback<bool> callback);
     Call checkIsAvailableInStore(std::string bundleIdentifier, Callback<platform::Value> callback);
@@ -73,6 +79,12 @@ public:
     Call getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicy policy, bool updateFollowUps,
                                       Callback<DeviceInfoList> callback);
     Call dismissFollowUpForSerialNumber(std::string serialNumber, Callback<bool> callback);
+    Call surroundings(Callback<Surroundings> callback);
+    Call status(Callback<platform::Value> callback);
+
+    // Texts and day counts of all records are derived with the agent's locale and day from now on, as its follow-ups
+    // are. No effect in a program that has set a platform of its own. Any thread.
+    static void deriveAs(const Surroundings& surroundings);
 
     const std::string& socketPath() const;
     platform::Duration timeLimit() const;

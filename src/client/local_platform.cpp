@@ -4,6 +4,7 @@
 #include <cstdlib>
 #include <ctime>
 #include <mutex>
+#include <optional>
 #include <string>
 
 #include "vrx/codec/core/number_format.h"
@@ -17,6 +18,7 @@
 namespace vrx::client {
 
 using platform::Dictionary;
+using platform::Duration;
 using platform::Platform;
 using platform::Value;
 
@@ -32,8 +34,24 @@ class SystemClock final : public platform::Clock {
     }
 };
 
-class EnvironmentLocale final : public platform::Locale {
+// What setLocalSurroundings() has set. Never destroyed, as the platform.
+struct SetSurroundings {
+    std::mutex mutex;
+    std::optional<std::string> locale;
+    Duration day{86400};
+};
+
+SetSurroundings& setSurroundings() {
+    static SetSurroundings& surroundings = *new SetSurroundings;
+    return surroundings;
+}
+
+class LocalLocale final : public platform::Locale {
     std::string preferredLocaleIdentifier() const override {
+        {
+            std::lock_guard lock(setSurroundings().mutex);
+            if (setSurroundings().locale) return *setSurroundings().locale;
+        }
         for (const char* variable : {"LC_ALL", "LC_MESSAGES", "LANG"}) {
             const char* value = std::getenv(variable);
             if (!value || *value == '\0') continue;
@@ -48,15 +66,16 @@ class EnvironmentLocale final : public platform::Locale {
     }
 };
 
-// The registered defaults that records read. Nothing is stored.
-class FixedDefaults final : public platform::DefaultsStore {
-    Value get(std::string_view key) const override { return values_[key]; }
+// The one setting that records read. Nothing is stored.
+class LocalDefaults final : public platform::DefaultsStore {
+    Value get(std::string_view key) const override { return Value(dictionaryRepresentation())[key]; }
     void set(std::string_view, Value) override {}
     void update(std::string_view, const std::function<Value(const Value&)>&) override {}
     void registerDefaults(const Dictionary&) override {}
-    Dictionary dictionaryRepresentation() const override { return *values_.asDictionary(); }
-
-    const Value values_ = Dictionary{{std::string(platform::settings::oneDayInterval), 86400.0}};
+    Dictionary dictionaryRepresentation() const override {
+        std::lock_guard lock(setSurroundings().mutex);
+        return {{std::string(platform::settings::oneDayInterval), setSurroundings().day.count()}};
+    }
 };
 
 class NoLog final : public platform::SystemLog {
@@ -66,8 +85,8 @@ class NoLog final : public platform::SystemLog {
 
 struct LocalPlatform {
     SystemClock clock;
-    EnvironmentLocale locale;
-    FixedDefaults defaults;
+    LocalLocale locale;
+    LocalDefaults defaults;
     NoLog log;
     Platform platform{{.clock = &clock, .defaultsStore = &defaults, .locale = &locale, .systemLog = &log}};
 };
@@ -81,6 +100,12 @@ void installPlatformIfNone() {
     // Never destroyed: records may still be read while the process ends.
     static LocalPlatform& local = *new LocalPlatform;
     Platform::setCurrent(&local.platform);
+}
+
+void setLocalSurroundings(const std::string& locale, platform::Duration day) {
+    std::lock_guard lock(setSurroundings().mutex);
+    setSurroundings().locale = locale;
+    setSurroundings().day = day;
 }
 
 }  // namespace vrx::client

@@ -111,6 +111,12 @@ inline constexpr std::array<Property, 3> coverageProperties{
 inline constexpr Interface coverageInterface{"/com/orvane/coverage", "com.orvane.Coverage", coverageOperations, true,
                                              coverageProperties};
 
+// D-Bus's own interface of the same object, by which all of them are asked for at once.
+inline constexpr std::array<Operation, 1> propertiesOperations{{{"GetAll", "s", "interface\0properties\0"}}};
+inline constexpr const Operation& getAllProperties = propertiesOperations[0];
+inline constexpr Interface coveragePropertiesInterface{coverageInterface.path, "org.freedesktop.DBus.Properties",
+                                                       propertiesOperations};
+
 constexpr bool isOurs(const Interface& interface) {
     return std::string_view(interface.name).starts_with(platform::vendorPrefix);
 }

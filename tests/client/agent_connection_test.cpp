@@ -31,6 +31,9 @@ TEST_F(AgentConnectionTest, AsksEveryOperationAndWaits) {
     EXPECT_TRUE(info->warranty()->covered());
     EXPECT_EQ(connection.getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicyCachedOnly, true)->size(), 2u);
     EXPECT_TRUE(*connection.dismissFollowUpForSerialNumber("SN1"));
+    EXPECT_THAT(connection.surroundings()->activities,
+                ElementsAre(client::Activity{"a", "scheduled", platform::dateFromEpoch(8)}));
+    EXPECT_EQ(*connection.status(), Value(Dictionary()));
     EXPECT_THAT(agent->requests(), ElementsAre("outreach", "store com.example", "support com.example", "url", "device",
                                                "paired", "info 2", "info SN7 77", "all 1 update", "dismiss SN1"));
 }
@@ -213,13 +216,18 @@ TEST_F(AgentConnectionTest, EndsItsCallsWhenItGoes) {
 TEST_F(AgentConnectionTest, GivesRecordsTheirDerivedTextsWithoutAPlatform) {
     platform::Platform* before = platform::Platform::hasCurrent() ? &platform::Platform::current() : nullptr;
     platform::Platform::setCurrent(nullptr);
-    AgentConnection connection({.socketPath = "/nowhere"});
+    AgentConnection connection(options());
     const double inThreeDays =
         std::chrono::duration<double>(std::chrono::system_clock::now().time_since_epoch()).count() + 2.5 * 86400;
     auto record = VRXWarranty::initWithDictionary(
         Dictionary{{"qxOfferEligibleUntil", inThreeDays}, {"qxLocalizedOfferPluralDescFormat", "%@ days"}});
     EXPECT_EQ(record->daysEligible(), 3u);
     EXPECT_EQ(record->qxLocalizedOfferDesc(), Value("3 days"));
+    // And by the agent's day and locale, once they are known.
+    AgentConnection::deriveAs(*connection.surroundings());
+    EXPECT_EQ(record->daysEligible(), 3600u);
+    EXPECT_EQ(record->qxLocalizedOfferDesc(), Value("3.600 days"));
+    AgentConnection::deriveAs({.locale = "en_US"});
     platform::Platform::setCurrent(before);
 }
 

@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <csignal>
+#include <map>
 #include <sstream>
 
 #include "end_to_end/programs.h"
@@ -28,6 +29,7 @@ const std::vector<Verb> vrxctlVerbs{{"device", "device"},
                                     {"info X --policy cached", "device", 1},
                                     {"all --update-follow-ups", "devices"},
                                     {"dismiss VRXWATCH0001", "serialNumber"},
+                                    {"dismiss X --force", "serialNumber"},
                                     {"outreach", "scheduled"},
                                     {"store com.example", "availability", 1},
                                     {"support com.example", "availability", 1},
@@ -41,6 +43,7 @@ const std::vector<Verb> vrxhostVerbs{{"why VRXWATCH0001", "rule", 0, 0},
                                      {"followups --watch", "followUps"},
                                      {"followups post item.json", "replaced"},
                                      {"followups clear a", "cleared"},
+                                     {"undismiss VRXWATCH0001", "undismissed", 0, 0},
                                      {"cache X", "path", 1, 1},
                                      {"defaults list", "defaults", 0, 0},
                                      {"defaults read OneDayInterval", "value", 0, 0},
@@ -130,6 +133,9 @@ TEST_F(CommandLine, Answers) {
                 .push_back({command(vrxhost_, verb.words), verb.up, {}, verb.member});
     for (const Verb& verb : vrxctlVerbs) asking.push_back({command(vrxctl_, verb.words), verb.up, {}, verb.member});
     asking.push_back({command(vrxctl_, "info " + std::string(1025, 'x')), 4, {"1024", "Correct the argument"}});
+    asking.push_back(
+        {command(vrxctl_, "info X --policy cached"), 1, {"knows no device with the serial number X", "vrxctl all"}});
+    asking.push_back({command(vrxctl_, "dismiss Y"), 4, {"knows no device with the serial number Y", "--force"}});
     for (const auto& cases : {fire, asking, looking}) expect(cases);
 
     // What the table leaves open.
@@ -138,7 +144,10 @@ TEST_F(CommandLine, Answers) {
     EXPECT_EQ(value(vrxctl_, "support com.example")["availability"], Value(Dictionary{{"AppBundleID", "com.example"}}));
     EXPECT_EQ(value(vrxctl_, "paired")["devices"].asArray()->size(), 2u);
     EXPECT_EQ(value(vrxctl_, "all")["devices"].asArray()->size(), 3u);
-    EXPECT_EQ(value(vrxhost_, "defaults read FollowupDismissedSerialNumberHashes")["value"].asArray()->size(), 2u);
+    EXPECT_EQ(value(vrxhost_, "defaults read FollowupDismissedSerialNumberHashes")["value"].asArray()->size(), 2u)
+        << "X, twice";
+    for (const bool wasDismissed : {true, false})
+        EXPECT_EQ(value(vrxhost_, "undismiss X")["undismissed"], Value(wasDismissed));
     const Value info = value(vrxctl_, "info VRXWATCH0001 --policy cached --timeout 60");
     EXPECT_EQ(info["coverage"]["coverageLocalizedLabel"], Value("QX Coverage for Watch"));
     EXPECT_EQ(info["derived"]["coverageEndDate"], Value("2031-03-14T00:00:00Z"));
@@ -172,12 +181,56 @@ TEST_F(CommandLine, Answers) {
     }
     EXPECT_EQ(value(vrxhost_, "defaults read SerialNumber")["value"], Value(5)) << "written all the same";
 
+    // Days are the agent's, and this device comes first.
+    EXPECT_EQ(value(vrxhost_, "defaults write OneDayInterval 1e12")["ok"], Value(true));
+    const Value all = value(vrxctl_, "all --policy cached");
+    EXPECT_EQ(all["devices"].asArray()->front()["device"]["deviceTypeString"], Value("Default"));
+    EXPECT_EQ(all["devices"].asArray()->back()["derived"]["daysEligible"], Value(1));
+
     // Text of a record cannot steer the terminal.
     place_.write("coverage/Warranty.VRXPHONE0001.plist",
                  "<plist version='1.0'><dict><key>coverageLocalizedLabel</key>"
                  "<string>one\ntwo&#x7f;&#x9b;2J&#x202e;</string></dict></plist>");
     const std::string shown = place_.vrxctl({"info", "--policy", "refresh"}).output;
+    // A refresh that leaves a device without a record has failed.
+    expect({{command(vrxctl_, "all --policy refresh"), 0}});
+    place_.write("coverage/Warranty.VRXWATCH0002.plist", "nonsense");
+    expect({{command(vrxctl_, "all --policy refresh"), 1, {"no coverage record", "Watch Mini"}}});
     EXPECT_NE(shown.find("one\\u{a}two\\u{7f}\\u{9b}2J\\u{202e}\n"), std::string::npos) << shown;
+}
+
+TEST_F(CommandLine, FitsTheTerminal) {
+    start();
+    std::string profile = fileText(place_ / "device.toml");
+    profile.replace(profile.find("Maya's Phone"), 12, "\u5e97\u306e\u96fb\u8a71\u306e\u9577\u3044\u540d\u524d");
+    place_.write("device.toml", profile);
+    ASSERT_EQ(place_.vrxctl({"all", "--policy", "refresh"}).code, 0);
+    // Local time, and nothing shortened where output is piped.
+    const std::string vrxctl = place_ / "app/vrxctl";
+    EXPECT_NE(place_.run("/bin/sh", {"-c", "TZ=UTC-9 " + vrxctl + " info VRXWATCH0001"})
+                  .output.find("covered until 2031-03-14 09:00, in "),
+              std::string::npos);
+    EXPECT_NE(place_.vrxctl({"--utc", "info", "VRXWATCH0001"}).output.find("until 2031-03-14 00:00 UTC, in "),
+              std::string::npos);
+    const std::string piped = place_.vrxctl({"all"}).output;
+    for (const char* words : {"\u540d\u524d  VRXPHONE0001", "until 2031-03-14", "VRXWATCH0002"})
+        EXPECT_NE(piped.find(words), piped.npos) << piped;
+    EXPECT_EQ(piped.find_first_of("\x1b"), piped.npos);
+    // Of a name the beginning stays, of an identifier the end.
+    for (const auto& [words, shown, isWhole, isColoured] :
+         {std::tuple("TERM=xterm", "\n\u5e97\u306e\u96fb", false, true),
+          {"NO_COLOR=1 TERM=xterm", "HONE0001  Default  until 2", false, false},
+          {"TERM=dumb", "NAME", false, false},
+          {"TERM=xterm NO_COLOR= WIDE=--wide", "\u540d\u524d  VRXPHONE0001", true, true}}) {
+        const std::string output =
+            place_
+                .run("/usr/bin/script",
+                     {"-qec", std::string("stty cols 50; export ") + words + "; " + vrxctl + " all $WIDE", "/dev/null"})
+                .output;
+        EXPECT_NE(output.find(shown), output.npos) << output;
+        EXPECT_EQ(output.find("\u2026") == output.npos, isWhole) << output;
+        EXPECT_EQ(output.find("\x1b[1mNAME") != output.npos, isColoured) << output;
+    }
 }
 
 // The agent does nothing else meanwhile that would download the record.
@@ -311,15 +364,52 @@ TEST_F(CommandLine, TellsWhatIsWrongWithItsArguments) {
          {"", "nothing", "device extra", "device --policy cached", "info A B", "info --policy fresh",
           "info --policy -1", "info --policy 18446744073709551616", "all --timeout 0", "all --timeout nan",
           "all --timeout 1s", "all --bogus", "dismiss", "store", "support a b"})
-        cases.push_back({command(vrxctl_, words), 2, {"vrxctl --help"}});
+        cases.push_back({command(vrxctl_, words), 2, {"See vrxctl", " --help."}});
+    for (const char* verb : {"info", "dismiss"}) {
+        cases.push_back({command(vrxctl_, verb), 2, {"it is empty"}});
+        cases.back().command.emplace_back();
+    }
     for (const char* words :
          {"defaults", "defaults read", "defaults write K", "defaults write K text", "defaults write K null",
           "defaults write K {\"a\":null}", "defaults write K 1 --int 2", "defaults write K --date today",
           "defaults list --device x", "followups clear", "followups post x --watch", "followups --device x clear y",
           "cache", "why", "fire", "fire a --timeout -1", "activities x", "doctor --timeout 0"})
-        cases.push_back({command(vrxhost_, words), 2, {"vrxhost --help"}});
+        cases.push_back({command(vrxhost_, words), 2, {"See vrxhost", " --help."}});
+    for (const auto& [words, problem] : std::map<std::string, Texts>{
+             {"defaults wite K", {"there is no verb wite; did you mean write?", "vrxhost defaults --help"}},
+             {"activites", {"there is no verb activites; did you mean activities?", "vrxhost --help"}},
+             {"folow", {"did you mean followups?"}},
+             {"xyzzy", {"there is no verb xyzzy\n"}},
+             {"followups post x --devise=y", {"there is no option --devise; did you mean --device?"}},
+             {"fire a --jsn", {"there is no option --jsn; did you mean --json?", "vrxhost fire --help"}},
+             {"why a b", {"why takes no further argument: b"}},
+             {"defaults", {"a verb is needed: list, read, write, delete"}}})
+        cases.push_back({command(vrxhost_, words), 2, problem});
     for (const char* words : {"--help", "info --help", "--version"}) cases.push_back({command(vrxctl_, words), 0});
     expect(cases);
+    // The programs without verbs say it in the same way.
+    const std::string programs = VRX_PROGRAMS "/";
+    for (const auto& [program, argument, problem] :
+         {std::tuple("vrxagent", "--log-level=x", "--log-level: 'x' is neither debug, default nor error"),
+          {"vrxagent", "--hoem=x", "there is no option --hoem; did you mean --home?"},
+          {"vrx-coverage-server", "--porrt=1", "there is no option --porrt; did you mean --port?"}}) {
+        const Place::Outcome outcome = place_.run(programs + program, {argument});
+        EXPECT_EQ(outcome.code, 2);
+        EXPECT_EQ(outcome.errors, std::string(program) + ": " + problem + "\nSee " + program + " --help.\n");
+        EXPECT_TRUE(place_.run(programs + program, {"--version"}).output.starts_with(std::string(program) + " "));
+    }
+    // A verb's help and completion list what it takes, and completions offer no word that a shell would run.
+    const std::string help = place_.vrxctl({"info", "--help"}).output;
+    for (const char* option : {"--policy", "--socket", "--json"}) EXPECT_NE(help.find(option), help.npos) << option;
+    start();
+    std::string profile = fileText(place_ / "device.toml");
+    profile.replace(profile.find("VRXWATCH0002"), 12, "$(reboot)");
+    place_.write("device.toml", profile);
+    for (const Arguments& program : {vrxctl_, vrxhost_}) {
+        Arguments words = program;
+        words.insert(words.end(), {"--candidates", "SERIAL"});
+        EXPECT_EQ(place_.runAll({words}).front().output, "VRXPHONE0001\nVRXWATCH0001\n");
+    }
 }
 
 }  // namespace

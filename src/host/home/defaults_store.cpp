@@ -98,11 +98,14 @@ MaybeError DefaultsStore::write(std::string_view key, const Value& value) {
 }
 
 void DefaultsStore::update(std::string_view key, const std::function<Value(const Value&)>& change) {
-    logFailure(database_.write([&](Connection& connection) {
+    logFailure(rewrite(key, change), "write", key);
+}
+
+MaybeError DefaultsStore::rewrite(std::string_view key, const std::function<Value(const Value&)>& change) {
+    return database_.write([&](Connection& connection) {
         Value present = load(connection, key);
         store(connection, key, change(present.isNull() ? unwritten(key) : present));
-    }),
-               "write", key);
+    });
 }
 
 void DefaultsStore::registerDefaults(const Dictionary& values) {

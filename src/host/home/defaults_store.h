@@ -31,6 +31,9 @@ public:
 
     // Like set(), but returns a failure instead of logging it.
     platform::MaybeError write(std::string_view key, const platform::Value& value);
+    // So, like update().
+    platform::MaybeError rewrite(std::string_view key,
+                                 const std::function<platform::Value(const platform::Value&)>& change);
 
 private:
     platform::Value unwritten(std::string_view key) const;
