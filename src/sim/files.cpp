@@ -26,7 +26,7 @@ Error fileError(const char* what, const std::string& path, int number) {
 
 }  // namespace
 
-Files::Files() {
+Files::Files(const Interference& interference) : interference_(interference) {
     addDirectories(homeDirectory());
 }
 
@@ -49,6 +49,7 @@ MaybeError Files::replace(const std::string& path, const Data& content) {
         return fileError("rename", path, EIO);
     }
     files_[path] = content;
+    if (interference_.strikes(Defect::FileTorn)) files_[path].resize(content.size() / 2);
     written_.push_back(path);
     return std::nullopt;
 }
@@ -90,6 +91,7 @@ void Files::fail(Operation operation, int error, int count) {
 }
 
 MaybeError Files::scriptedFault(Operation operation, const std::string& path) const {
+    interference_.call();
     constexpr const char* names[] = {"read", "replace", "create", "remove"};
     std::deque<int>& faults = faults_[operation];
     if (faults.empty()) return std::nullopt;

@@ -10,12 +10,13 @@
 #include <vector>
 
 #include "vrx/platform/files.h"
+#include "vrx/sim/interference.h"
 
 namespace vrx::sim {
 
 class Files final : public platform::Files {
 public:
-    Files();
+    explicit Files(const Interference& interference);
 
     std::string homeDirectory() const override { return "/home/user"; }
     platform::Result<platform::Data> read(const std::string& path) const override;
@@ -31,6 +32,7 @@ public:
     std::vector<std::string> paths() const;
     // The files that were replaced, in order.
     const std::vector<std::string>& written() const { return written_; }
+    void forgetWritten() { written_.clear(); }
 
     enum class Operation { Read, Replace, CreateDirectories, Remove };
     // The next calls of the operation fail with an errno, such as ENOSPC, and change nothing.
@@ -43,6 +45,7 @@ private:
     platform::MaybeError scriptedFault(Operation operation, const std::string& path) const;
     void addDirectories(const std::string& path);
 
+    const Interference& interference_;
     std::map<std::string, platform::Data> files_;
     std::set<std::string> directories_;
     std::vector<std::string> written_;
