@@ -47,7 +47,7 @@ private:
     void begin() {
         atBeginning_ = true;
         add("language", {random_.oneOf(languages)});
-        add("zone", {std::to_string(random_.between(-12, 14) * hour)});
+        addZone();
         for (const char* serialNumber : serialNumbers)
             if (random_.chance(85)) addRecord(serialNumber);
         for (const char* watch : watches)
@@ -97,6 +97,7 @@ private:
         const std::int64_t later = random_.below(8 * hour);
         life_.events.push_back({end + later, "no-record", {serialNumber}});
     }
+    void addZone() { add("zone", {std::to_string(random_.between(-12, 14) * hour)}); }
     void addCarrier() { add("carrier", {random_.chance(70) ? random_.oneOf(carriers) : "none"}); }
 
     void record() {
@@ -117,7 +118,10 @@ private:
         const std::int64_t later = aWhile();
         add("pair", {watch, number(-400, 0)}, later);
     }
-    void language() { add("language", {random_.oneOf(languages)}); }
+    void language() {
+        add("language", {random_.oneOf(languages)});
+        if (random_.chance(30)) addZone();
+    }
     void account() {
         add("account", {"out"});
         add("account", {"in"}, aWhile());
@@ -146,7 +150,12 @@ private:
         }
         if (random_.chance(10)) add("disconnect", {connection}, random_.below(60));
     }
-    void dismissal() { add("dismiss", {serialNumber()}); }
+    void dismissal() {
+        add("dismiss", {serialNumber()});
+        if (random_.chance(90)) return;
+        const std::int64_t later = aWhile();
+        add("take-back", {}, later);
+    }
     void testKeys() {
         add("internal", {"on"});
         switch (random_.below(6)) {

@@ -72,6 +72,12 @@ std::string fixed(double number, int digits) {
     return text.data();
 }
 
+std::string hashText(std::uint64_t hash) {
+    std::array<char, 17> text;
+    std::snprintf(text.data(), text.size(), "%016llx", static_cast<unsigned long long>(hash));
+    return text.data();
+}
+
 // How far an exploration is: counted, and told at a terminal.
 class Progress {
 public:
@@ -101,7 +107,7 @@ private:
     steady_clock::time_point last_ = begun_;
 };
 
-Outcome broken(Outcome outcome, const std::string& what) {
+Outcome asBroken(Outcome outcome, const std::string& what) {
     outcome.code = ExitCode::NoAnswer;
     outcome.problem = what;
     outcome.kind = "rule-broken";
@@ -112,12 +118,15 @@ Outcome explore(const Options& options) {
     if (options.seeds.empty() && options.seconds <= 0)
         return failed(ExitCode::Usage, "neither --seeds nor --for says how many", "See vrxsim explore --help.");
     Progress progress;
-    Array findings;
-    std::string text;
+    std::map<std::uint64_t, simulation::Violation> broken;
     simulation::explore(explorationOf(options), [&](std::uint64_t seed, const simulation::Play& play) {
         progress.add(play.days);
-        if (!play.violation) return true;
-        const simulation::Violation& violation = *play.violation;
+        if (play.violation) broken.emplace(seed, *play.violation);
+        return broken.size() < mostFindings;
+    });
+    Array findings;
+    std::string text;
+    for (const auto& [seed, violation] : broken) {
         findings.push_back(Dictionary{{"seed", seed},
                                       {"day", violation.day},
                                       {"rule", violation.rule},
@@ -125,16 +134,15 @@ Outcome explore(const Options& options) {
                                       {"replay", replayOf(seed, options)}});
         text += "seed " + std::to_string(seed) + ", day " + fixed(violation.day, 2) + ", " + violation.rule + ": " +
                 printable(violation.detail) + "\n    " + replayOf(seed, options) + "\n";
-        return findings.size() < mostFindings;
-    });
-    const bool isFine = findings.empty();
+    }
+    const bool isFine = broken.empty();
     Outcome outcome{.document = {{"lives", static_cast<std::int64_t>(progress.lives)},
                                  {"years", progress.years},
                                  {"yearsPerMinute", progress.perMinute()},
                                  {"findings", std::move(findings)}}};
     outcome.text = text + std::to_string(progress.lives) + " lives, " + fixed(progress.years, 0) + " years, " +
                    fixed(progress.perMinute(), 0) + " years a minute\n";
-    return isFine ? outcome : broken(std::move(outcome), "lives broke a rule");
+    return isFine ? outcome : asBroken(std::move(outcome), "lives broke a rule");
 }
 
 platform::Result<simulation::Life> lifeIn(const std::string& file) {
@@ -151,17 +159,14 @@ Outcome replay(const Options& options) {
     if (options.isTraced)
         how.show = [](std::string_view line) { std::fprintf(stderr, "%s\n", printable(line).c_str()); };
     const simulation::Play play = simulation::play(*life, how);
-    Outcome outcome{.document = {{"days", play.days}, {"trace", fixed(0, 0)}}};
-    std::array<char, 17> trace;
-    std::snprintf(trace.data(), trace.size(), "%016llx", static_cast<unsigned long long>(play.trace));
-    outcome.document["trace"] = trace.data();
-    outcome.text = fixed(play.days, 2) + " days, trace " + trace.data() + "\n";
+    Outcome outcome{.document = {{"days", play.days}, {"trace", hashText(play.trace)}},
+                    .text = fixed(play.days, 2) + " days, trace " + hashText(play.trace) + "\n"};
     if (!play.violation) return outcome;
     const simulation::Violation& violation = *play.violation;
     outcome.document["rule"] = violation.rule;
     outcome.document["detail"] = violation.detail;
-    return broken(std::move(outcome),
-                  "day " + fixed(violation.day, 2) + ", " + violation.rule + ": " + violation.detail);
+    return asBroken(std::move(outcome),
+                    "day " + fixed(violation.day, 2) + ", " + violation.rule + ": " + violation.detail);
 }
 
 Outcome shrink(const Options& options) {
@@ -190,6 +195,7 @@ Outcome plant(const Options& options) {
         if (options.defect != "all" && options.defect != named.name) continue;
         simulation::Exploration exploration = explorationOf(options);
         exploration.planted = named.defect;
+        exploration.jobs = 1;  // so that it is the first seed of all
         exploration.last = std::min(exploration.last, mostSeedsOfDefect);
         std::optional<std::pair<std::uint64_t, simulation::Violation>> first;
         simulation::explore(exploration, [&](std::uint64_t seed, const simulation::Play& play) {
@@ -219,10 +225,8 @@ Outcome trace(const Options& options) {
     });
     Outcome outcome;
     for (const auto& [seed, play] : plays) {
-        std::array<char, 17> hash;
-        std::snprintf(hash.data(), hash.size(), "%016llx", static_cast<unsigned long long>(play.trace));
-        outcome.text += std::to_string(seed) + " " + hash.data() + "\n";
-        outcome.document[std::to_string(seed)] = hash.data();
+        outcome.text += std::to_string(seed) + " " + hashText(play.trace) + "\n";
+        outcome.document[std::to_string(seed)] = hashText(play.trace);
     }
     return outcome;
 }
@@ -239,6 +243,10 @@ void addLevel(CLI::App& app, Options& options) {
         ->capture_default_str();
 }
 
+void addJobs(CLI::App& app, Options& options) {
+    app.add_option("--jobs", options.jobs, "How many processes play")->check(CLI::Range(1, 256));
+}
+
 CLI::Option* addSeeds(CLI::App& app, Options& options) {
     const auto check = [](const std::string& text) {
         const bool isRange = !text.empty() && std::isdigit(static_cast<unsigned char>(text[0])) != 0 &&
@@ -246,7 +254,6 @@ CLI::Option* addSeeds(CLI::App& app, Options& options) {
                              text.find_first_not_of("0123456789-") == std::string::npos;
         return isRange ? "" : "'" + text + "' is no range of seeds such as 1-1000";
     };
-    app.add_option("--jobs", options.jobs, "How many processes play")->check(CLI::Range(1, 256));
     return app.add_option("--seeds", options.seeds, "Which lives")->type_name("FIRST-LAST")->check(check, "");
 }
 
@@ -261,6 +268,7 @@ void addVerbs(CommandLine& line, Options& options) {
     CLI::App* verb =
         line.add("explore", "Plays many lives, and tells which break a rule", [&] { return explore(options); });
     addSeeds(*verb, options);
+    addJobs(*verb, options);
     verb->add_option("--for", options.seconds, "How long, in seconds")
         ->type_name("SECONDS")
         ->check(CLI::PositiveNumber);
@@ -283,6 +291,7 @@ void addVerbs(CommandLine& line, Options& options) {
     addLevel(*verb, options);
     verb = line.add("trace", "Prints a hash of all that happens in each life", [&] { return trace(options); });
     addSeeds(*verb, options)->required();
+    addJobs(*verb, options);
     addLevel(*verb, options);
 }
 
