@@ -141,7 +141,9 @@ private:
         worker_.emplace([this](const Worker::Write& write) {
             for (std::uint64_t seed = next_; seed <= exploration_.last; seed += step()) {
                 if (exploration_.end && std::chrono::steady_clock::now() >= *exploration_.end) break;
-                write(play(lifeFromSeed(seed, exploration_.level), {.planted = exploration_.planted}));
+                Life life = lifeFromSeed(seed, exploration_.level);
+                life.days = std::min(life.days, exploration_.mostDays);
+                write(play(life, {.planted = exploration_.planted}));
             }
         });
     }

@@ -19,6 +19,7 @@ struct Exploration {
     Trouble level = Trouble::Rough;
     sim::Defect planted = sim::Defect::None;
     int jobs = 1;
+    std::int64_t mostDays = 4000;                                // of each life
     std::optional<std::chrono::steady_clock::time_point> end{};  // after which no life is begun
 };
 

@@ -55,6 +55,7 @@ private:
         if (random_.chance(10)) add("old-layout", {number(5, 200)});
         if (random_.chance(10)) addCarrier();
         if (random_.chance(5)) add("versions", {"1", "2"});
+        if (life_.level == Trouble::Wild && random_.chance(20)) add("kill-before-call", {number(1, 60), "0"});
         atBeginning_ = false;
     }
 

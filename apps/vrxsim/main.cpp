@@ -31,6 +31,7 @@ constexpr double daysOfYear = 365.25;
 struct Options {
     std::string seeds;
     double seconds = 0;
+    std::int64_t mostDays = 4000;
     int jobs = static_cast<int>(std::max(1u, std::thread::hardware_concurrency()));
     std::string level = "rough";
     std::string defect;
@@ -48,7 +49,8 @@ sim::Defect defectOf(const Options& options) {
 }
 
 simulation::Exploration explorationOf(const Options& options) {
-    simulation::Exploration exploration{.level = levelOf(options), .planted = defectOf(options), .jobs = options.jobs};
+    simulation::Exploration exploration{
+        .level = levelOf(options), .planted = defectOf(options), .jobs = options.jobs, .mostDays = options.mostDays};
     exploration.last = UINT64_MAX / 2;
     if (!options.seeds.empty()) {
         const std::size_t dash = options.seeds.find('-');
@@ -172,15 +174,22 @@ Outcome replay(const Options& options) {
 Outcome shrink(const Options& options) {
     simulation::Life life = simulation::lifeFromSeed(options.seed, levelOf(options));
     const simulation::Play play = simulation::playApart(life, defectOf(options));
-    if (!play.violation) return {.document = {{"broken", false}}, .text = "This life breaks no rule.\n"};
-    life = simulation::shrunk(std::move(life), [&](const simulation::Life& smaller) {
-        const simulation::Play played = simulation::playApart(smaller, defectOf(options));
-        return played.violation ? played.violation->rule : std::string();
-    });
-    const simulation::Play last = simulation::playApart(life, defectOf(options));
-    life.notes = {last.violation->rule + ": " + last.violation->detail};
+    if (play.violation) {
+        life = simulation::shrunk(std::move(life), [&](const simulation::Life& smaller) {
+            const simulation::Play played = simulation::playApart(smaller, defectOf(options));
+            return played.violation ? played.violation->rule : std::string();
+        });
+        const simulation::Play last = simulation::playApart(life, defectOf(options));
+        life.notes = {last.violation->rule + ": " + last.violation->detail};
+    }
     const std::string file = options.file.empty() ? "seed-" + std::to_string(options.seed) + ".life" : options.file;
-    std::ofstream(file) << simulation::textOf(life);
+    std::ofstream output(file);
+    output << simulation::textOf(life);
+    if (!output.flush())
+        return failed(ExitCode::NoAnswer, "cannot write " + file, "Name another file with --output.", "not-written");
+    if (!play.violation)
+        return {.document = {{"broken", false}, {"file", file}},
+                .text = "This life breaks no rule; it is in " + file + " as it was.\n"};
     const std::string text = simulation::textOf(life) + "In " + file + "; vrxsim replay " + file +
                              (options.defect.empty() ? "" : " --defect " + options.defect) + "\n";
     return {.document = {{"broken", true}, {"file", file}, {"life", simulation::textOf(life)}}, .text = text};
@@ -291,6 +300,7 @@ void addVerbs(CommandLine& line, Options& options) {
     addLevel(*verb, options);
     verb = line.add("trace", "Prints a hash of all that happens in each life", [&] { return trace(options); });
     addSeeds(*verb, options)->required();
+    verb->add_option("--days", options.mostDays, "How many days of each life")->check(CLI::Range(1, 4000));
     addJobs(*verb, options);
     addLevel(*verb, options);
 }
