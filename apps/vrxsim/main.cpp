@@ -2,6 +2,8 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
+#include <charconv>
 #include <chrono>
 #include <cstdio>
 #include <fstream>
@@ -9,6 +11,7 @@
 #include <map>
 #include <memory>
 #include <thread>
+#include <tuple>
 
 #include "common/command_line.h"
 #include "vrxsim/apart.h"
@@ -25,6 +28,7 @@ using std::chrono::steady_clock;
 namespace {
 
 constexpr std::size_t mostFindings = 10;
+constexpr std::uint64_t mostSeed = UINT64_MAX / 2;
 constexpr std::uint64_t mostSeedsOfDefect = 10'000;
 constexpr double daysOfYear = 365.25;
 
@@ -48,15 +52,26 @@ sim::Defect defectOf(const Options& options) {
     return simulation::defectFrom(options.defect).value_or(sim::Defect::None);
 }
 
+// A seed, or the first and the last of a range. Null for anything else.
+std::optional<std::pair<std::uint64_t, std::uint64_t>> seedsFrom(std::string_view text) {
+    const char* const end = text.data() + text.size();
+    std::uint64_t first = 0;
+    const auto [rest, error] = std::from_chars(text.data(), end, first);
+    std::uint64_t last = first;
+    if (error != std::errc()) return std::nullopt;
+    if (rest != end) {
+        if (*rest != '-') return std::nullopt;
+        const auto [behind, lastError] = std::from_chars(rest + 1, end, last);
+        if (lastError != std::errc() || behind != end) return std::nullopt;
+    }
+    return first <= last && last <= mostSeed ? std::optional(std::pair(first, last)) : std::nullopt;
+}
+
 simulation::Exploration explorationOf(const Options& options) {
     simulation::Exploration exploration{
         .level = levelOf(options), .planted = defectOf(options), .jobs = options.jobs, .mostDays = options.mostDays};
-    exploration.last = UINT64_MAX / 2;
-    if (!options.seeds.empty()) {
-        const std::size_t dash = options.seeds.find('-');
-        exploration.first = std::stoull(options.seeds);
-        exploration.last = dash == std::string::npos ? exploration.first : std::stoull(options.seeds.substr(dash + 1));
-    }
+    exploration.last = mostSeed;
+    if (const auto seeds = seedsFrom(options.seeds)) std::tie(exploration.first, exploration.last) = *seeds;
     if (options.seconds > 0)
         exploration.end = steady_clock::now() + std::chrono::duration_cast<steady_clock::duration>(
                                                     std::chrono::duration<double>(options.seconds));
@@ -258,10 +273,7 @@ void addJobs(CLI::App& app, Options& options) {
 
 CLI::Option* addSeeds(CLI::App& app, Options& options) {
     const auto check = [](const std::string& text) {
-        const bool isRange = !text.empty() && std::isdigit(static_cast<unsigned char>(text[0])) != 0 &&
-                             std::isdigit(static_cast<unsigned char>(text.back())) != 0 && text.size() < 30 &&
-                             text.find_first_not_of("0123456789-") == std::string::npos;
-        return isRange ? "" : "'" + text + "' is no range of seeds such as 1-1000";
+        return seedsFrom(text) ? "" : "'" + text + "' is no range of seeds such as 1-1000";
     };
     return app.add_option("--seeds", options.seeds, "Which lives")->type_name("FIRST-LAST")->check(check, "");
 }
@@ -278,9 +290,10 @@ void addVerbs(CommandLine& line, Options& options) {
         line.add("explore", "Plays many lives, and tells which break a rule", [&] { return explore(options); });
     addSeeds(*verb, options);
     addJobs(*verb, options);
-    verb->add_option("--for", options.seconds, "How long, in seconds")
-        ->type_name("SECONDS")
-        ->check(CLI::PositiveNumber);
+    verb->add_option("--for", options.seconds, "How long, such as 60s or 5min")
+        ->type_name("TIME")
+        ->transform(CLI::AsNumberWithUnit(std::map<std::string, double>{{"s", 1}, {"min", 60}},
+                                          CLI::AsNumberWithUnit::UNIT_OPTIONAL));
     addLevel(*verb, options);
     addDefect(*verb, options);
     verb = line.add("replay", "Plays the life in a file", [&] { return replay(options); });

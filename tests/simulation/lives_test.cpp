@@ -115,7 +115,7 @@ TEST(Shrinker, LeavesWhatIsNeededAlone) {
         const Play played = play(life, {.planted = sim::Defect::ItemDoubled});
         return played.violation ? played.violation->rule : std::string();
     };
-    const Life life = shortLife(1, Trouble::Wild, 40);
+    const Life life = shortLife(1, Trouble::Rough, 40);
     const Life smaller = shrunk(life, brokenRule);
     EXPECT_EQ(brokenRule(smaller), "one-item");
     EXPECT_LE(smaller.beginning.size() + smaller.events.size(), 3u) << textOf(smaller);
