@@ -1,6 +1,7 @@
 #include "vrxsim/invariants.h"
 
 #include <algorithm>
+#include <utility>
 
 #include "vrx/platform/sha256_hash.h"
 #include "vrx/platform/vendor.h"
@@ -52,6 +53,7 @@ void Invariants::check() {
     noteTrouble();
     checkItems();
     checkShownItems();
+    checkToldItems();
     checkDismissals();
     checkFiles();
     checkTargetDates();
@@ -63,6 +65,8 @@ void Invariants::check() {
 void Invariants::noteTrouble() {
     const double now = world_.elapsed();
     calmSince_ = world_.isTroubled() || wasFailing_ ? now : std::max(calmSince_, world_.machineChangedAt);
+    const bool areFilesFailing = world_.host.files.isFailing();
+    if (std::exchange(wereFilesFailing_, areFilesFailing) || areFilesFailing) filesCalmSince_ = now;
     if (wasFailing_) mayDatesBeStray_ = true;
     if (world_.hasFailed) mayDatesBeOff_ = true;
     int& admitted = admitted_[static_cast<std::int64_t>(now / secondsOfDay)];
@@ -91,7 +95,7 @@ void Invariants::checkItems() {
     }
 }
 
-// The follow-up service shows what it acknowledged, and the items follow what is told to the agent.
+// The follow-up service shows what it acknowledged.
 void Invariants::checkShownItems() {
     for (const std::string& asked : world_.host.followUps.asked()) {
         const std::vector<std::string> request = words(asked);
@@ -107,7 +111,10 @@ void Invariants::checkShownItems() {
         present == shown_ || wasFailing_ || world_.isFailing() || (world_.hadOldLayout && world_.elapsed() < 1);
     shown_ = present;
     if (!isAsAcknowledged) report("acknowledged", "the items differ from those that were posted and not cleared");
+}
 
+// The items follow what the agent is told of: unpairings, and changes of the language.
+void Invariants::checkToldItems() {
     for (const FollowUpItem& item : world_.items()) {
         const std::string* serialNumber = serialNumberOf(item);
         const auto unpaired = serialNumber ? world_.unpairedAt.find(*serialNumber) : world_.unpairedAt.end();
@@ -116,7 +123,7 @@ void Invariants::checkShownItems() {
             report("told", "the item of " + *serialNumber + " outlasts its unpairing");
         const double changed = world_.languageChangedAt;
         if (changed > 0 && world_.elapsed() - changed > secondsOfHour && isCalmSince(changed) &&
-            world_.isServerFineSince(changed) && item.title &&
+            filesCalmSince_ <= changed && world_.isServerFineSince(changed) && item.title &&
             *item.title != World::title(world_.host.locale.identifier))
             report("told", "the item '" + *item.title + "' outlasts a change of the language");
     }

@@ -30,6 +30,7 @@ private:
     void noteTrouble();
     void checkItems();
     void checkShownItems();
+    void checkToldItems();
     void checkDismissals();
     void checkFiles();
     void checkTargetDates();
@@ -47,6 +48,8 @@ private:
     Clients& clients_;
     Verdict& verdict_;
     double calmSince_ = 0;
+    double filesCalmSince_ = 0;
+    bool wereFilesFailing_ = false;
     bool mayDatesBeStray_ = false;  // a task was cut short, a write failed, or the clock was set since the last check
     bool mayDatesBeOff_ = false;    // the same, ever
     double lastClockSet_ = -1;

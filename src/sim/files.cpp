@@ -1,5 +1,6 @@
 #include "vrx/sim/files.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <cstring>
 
@@ -88,6 +89,10 @@ std::vector<std::string> Files::paths() const {
 
 void Files::fail(Operation operation, int error, int count) {
     faults_[operation].insert(faults_[operation].end(), static_cast<std::size_t>(count), error);
+}
+
+bool Files::isFailing() const {
+    return crashesNextReplace_ || std::ranges::any_of(faults_, [](const auto& entry) { return !entry.second.empty(); });
 }
 
 MaybeError Files::scriptedFault(Operation operation, const std::string& path) const {

@@ -37,6 +37,7 @@ public:
     enum class Operation { Read, Replace, CreateDirectories, Remove };
     // The next calls of the operation fail with an errno, such as ENOSPC, and change nothing.
     void fail(Operation operation, int error, int count = 1);
+    bool isFailing() const;
     // The next replace() gets as far as a power cut before its last step: the old file is still there, and beside it
     // the new content. A real process would have ended there; here the call returns an error.
     void crashNextReplace() { crashesNextReplace_ = true; }
