@@ -11,12 +11,14 @@
 
 #include "vrx/platform/account_store.h"
 #include "vrx/platform/queue.h"
+#include "vrx/sim/interference.h"
 
 namespace vrx::sim {
 
 class AccountStore final : public platform::AccountStore {
 public:
-    explicit AccountStore(platform::Queues& queues) : renewals_(queues.makeSerialQueue("renewal")) {}
+    AccountStore(platform::Queues& queues, const Interference& interference)
+        : renewals_(queues.makeSerialQueue("renewal")), interference_(interference) {}
 
     std::optional<platform::CloudAccount> primaryCloudAccount() const override { return primary; }
     std::optional<platform::AuthenticationAccount> authenticationAccount(const platform::CloudAccount&) const override {
@@ -29,6 +31,7 @@ public:
     }
     void renewCredentials(const platform::AuthenticationAccount&, platform::RenewalOptions options,
                           platform::OnceCallback<platform::RenewalResult> completion) override {
+        interference_.call();
         asked.push_back(options);
         renewals_->postAfter(
             renewalDelay, [this, services = std::move(options.services), completion = std::move(completion)]() mutable {
@@ -57,6 +60,7 @@ public:
 
 private:
     std::shared_ptr<platform::Queue> renewals_;  // completions come on a thread of their own
+    const Interference& interference_;
 };
 
 class AccountSession final : public platform::AccountSession {

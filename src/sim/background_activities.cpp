@@ -1,6 +1,7 @@
 #include "vrx/sim/background_activities.h"
 
 #include <algorithm>
+#include <iterator>
 #include <utility>
 
 #include "vrx/platform/task.h"
@@ -25,6 +26,7 @@ platform::Moment BackgroundActivities::now() const {
 }
 
 void BackgroundActivities::schedule(const platform::ActivityRegistration& registration, ActivityHandler handler) {
+    interference_.call();
     Attachment& attachment = attachments_[registration.identifier];
     attachment.handler.swap(handler);  // the old handler is released at the end
     if (!registration.isPreregistered) {
@@ -41,7 +43,14 @@ void BackgroundActivities::schedule(const platform::ActivityRegistration& regist
 
 void BackgroundActivities::addRow(const std::string& identifier, const ActivityCriteria& criteria,
                                   platform::DueTime due) {
+    plantDefect(due);
     rows_[identifier] = {criteria, std::move(due), ++lastGeneration_};
+}
+
+void BackgroundActivities::plantDefect(platform::DueTime& due) const {
+    constexpr Duration day{86400};
+    if (due.wait > day && interference_.strikes(Defect::FiringEarly)) due = platform::dueAfter(due.wait / 2, now());
+    if (interference_.strikes(Defect::FiringLate)) due = platform::dueAfter(due.wait + day, now());
 }
 
 void BackgroundActivities::setNetworkAvailable(bool isNetworkAvailable) {
@@ -84,9 +93,17 @@ void BackgroundActivities::processEnded() {
         row.isInterrupted = attachment != attachments_.end() && attachment->second.runningGeneration == row.generation;
     }
     attachments_.clear();
+    looks_.clear();
 }
 
 void BackgroundActivities::booted() {
+    for (auto row = rows_.begin(); row != rows_.end();) {
+        Row& stored = row->second;
+        if (interference_.strikes(Defect::ClockNotCarried))
+            stored.due =
+                platform::dueAfter(stored.due.wait, {std::to_string(boot_ + 1), clock_.elapsed(), clock_.now()});
+        row = interference_.strikes(Defect::RowForgotten) ? rows_.erase(row) : std::next(row);
+    }
     ++boot_;
     isBootActivityOwed_ = true;
 }
@@ -115,7 +132,15 @@ void BackgroundActivities::considerAll() {
 }
 
 void BackgroundActivities::considerLater(const std::string& identifier, Duration delay) {
-    lane_->postAfter(delay, [this, identifier] { consider(identifier); });
+    // An earlier look that is to come asks again itself.
+    std::set<Duration>& looks = looks_[identifier];
+    const Duration when = clock_.elapsed() + delay;
+    if (!looks.empty() && *looks.begin() <= when && delay > atOnce) return;
+    if (!looks.insert(when).second) return;
+    lane_->postAfter(delay, [this, identifier, when] {
+        looks_[identifier].erase(when);
+        consider(identifier);
+    });
 }
 
 // Whether the boot activity is under way.
@@ -148,10 +173,15 @@ void BackgroundActivities::fire(const std::string& identifier, int generation) {
     Attachment& attachment = attachments_[identifier];
     if (!attachment.handler && factory_) attachment.handler = factory_(identifier);
     if (!attachment.handler) return;  // waits until a process attaches a handler
+    if (interference_.strikes(Defect::FiringLost)) {
+        rows_.erase(identifier);
+        return;
+    }
     attachment.runningGeneration = generation;
     attachment.doesRunNeedNetwork = rows_.at(identifier).criteria.requiresNetwork;
     firings_.push_back({identifier, clock_.now()});
     ActivityHandler handler = attachment.handler;  // another handler may take its place during the run
+    if (interference_.strikes(Defect::HandlerTwice)) handler([](BackgroundActivityResult) {});
     handler([this, identifier](BackgroundActivityResult result) { takeResult(identifier, result); });
 }
 
@@ -164,6 +194,8 @@ void BackgroundActivities::takeResult(const std::string& identifier, BackgroundA
     Row& row = entry->second;
     if (row.generation != ranGeneration)  // registered during the run
         row.due = platform::noSoonerThan(row.due, isByOwnRun ? platform::minimumInterval : atOnce, now());
+    else if (interference_.planted == Defect::FiringAgain)
+        row.due = platform::dueAfter(platform::firingMargin, now());
     else if (result == BackgroundActivityResult::Finished)
         rows_.erase(entry);
     else

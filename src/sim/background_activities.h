@@ -12,19 +12,22 @@
 #include <map>
 #include <memory>
 #include <optional>
+#include <set>
 #include <string>
 #include <vector>
 
 #include "vrx/platform/activity_timing.h"
 #include "vrx/platform/background_activity_scheduler.h"
 #include "vrx/sim/clock.h"
+#include "vrx/sim/interference.h"
 #include "vrx/sim/queues.h"
 
 namespace vrx::sim {
 
 class BackgroundActivities final : public platform::BackgroundActivities {
 public:
-    BackgroundActivities(const Clock& clock, Queues& queues) : clock_(clock), queues_(queues) {}
+    BackgroundActivities(const Clock& clock, Queues& queues, const Interference& interference)
+        : clock_(clock), queues_(queues), interference_(interference) {}
 
     void schedule(const platform::ActivityRegistration& registration, platform::ActivityHandler handler) override;
     bool shouldDefer(std::string_view identifier) const override;
@@ -58,6 +61,7 @@ public:
     };
     // All firings, in order.
     const std::vector<Firing>& firings() const { return firings_; }
+    void forgetFirings() { firings_.clear(); }
     int firingCount(std::string_view identifier) const;
 
 private:
@@ -85,10 +89,12 @@ private:
     void considerLater(const std::string& identifier, platform::Duration delay);
     void consider(const std::string& identifier);
     void fire(const std::string& identifier, int generation);
+    void plantDefect(platform::DueTime& due) const;
     void takeResult(const std::string& identifier, platform::BackgroundActivityResult result);
 
     const Clock& clock_;
     Queues& queues_;
+    const Interference& interference_;
     const std::shared_ptr<platform::Queue> lane_ = queues_.makeSerialQueue("activities");
     std::map<std::string, Row, std::less<>> rows_;
     int lastGeneration_ = 0;
@@ -98,6 +104,7 @@ private:
 
     std::map<std::string, Attachment, std::less<>> attachments_;
     std::function<platform::ActivityHandler(const std::string& identifier)> factory_;
+    std::map<std::string, std::set<platform::Duration>> looks_;  // when activities will be considered
     bool isNetworkAvailable_ = true;
     bool shouldDefer_ = false;
     bool isNetworkMetered_ = false;

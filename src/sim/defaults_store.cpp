@@ -15,13 +15,16 @@ using platform::Value;
 
 Value DefaultsStore::get(std::string_view key) const {
     checkOutsideUpdate();
-    for (const Dictionary* layer : {&stored_, &registered_})
+    betweenCalls_.call();
+    const bool isStale = before_ && betweenCalls_.strikes(Defect::SettingStale);
+    for (const Dictionary* layer : {isStale ? &*before_ : &stored_, &registered_})
         if (auto entry = layer->find(key); entry != layer->end()) return entry->second;
     return {};
 }
 
 void DefaultsStore::set(std::string_view key, Value value) {
     checkOutsideUpdate();
+    betweenCalls_.call();
     writes_.emplace_back(key);
     if (MaybeError error = writeError(value))
         platform::log(platform::Level::Error, "Cannot write the setting %@: %@", key, *error);
@@ -40,6 +43,9 @@ MaybeError DefaultsStore::writeError(const Value& value) {
 }
 
 void DefaultsStore::write(std::string_view key, Value value) {
+    if (betweenCalls_.strikes(Defect::SettingLost)) return;
+    const Defect planted = betweenCalls_.planted;
+    if (planted == Defect::SettingStale || planted == Defect::SettingForgotten) before_ = stored_;
     if (!value.isNull())
         stored_.insert_or_assign(std::string(key), std::move(value));
     else if (auto entry = stored_.find(key); entry != stored_.end())
@@ -60,6 +66,11 @@ void DefaultsStore::update(std::string_view key, const std::function<Value(const
         value = changed();
     }
     set(key, std::move(value));
+}
+
+void DefaultsStore::forgetRegistered() {
+    registered_.clear();
+    if (before_ && betweenCalls_.strikes(Defect::SettingForgotten)) stored_ = *before_;
 }
 
 void DefaultsStore::registerDefaults(const Dictionary& values) {

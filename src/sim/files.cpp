@@ -1,5 +1,6 @@
 #include "vrx/sim/files.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <cstring>
 
@@ -26,7 +27,7 @@ Error fileError(const char* what, const std::string& path, int number) {
 
 }  // namespace
 
-Files::Files() {
+Files::Files(const Interference& interference) : interference_(interference) {
     addDirectories(homeDirectory());
 }
 
@@ -49,6 +50,7 @@ MaybeError Files::replace(const std::string& path, const Data& content) {
         return fileError("rename", path, EIO);
     }
     files_[path] = content;
+    if (interference_.strikes(Defect::FileTorn)) files_[path].resize(content.size() / 2);
     written_.push_back(path);
     return std::nullopt;
 }
@@ -89,7 +91,12 @@ void Files::fail(Operation operation, int error, int count) {
     faults_[operation].insert(faults_[operation].end(), static_cast<std::size_t>(count), error);
 }
 
+bool Files::isFailing() const {
+    return crashesNextReplace_ || std::ranges::any_of(faults_, [](const auto& entry) { return !entry.second.empty(); });
+}
+
 MaybeError Files::scriptedFault(Operation operation, const std::string& path) const {
+    interference_.call();
     constexpr const char* names[] = {"read", "replace", "create", "remove"};
     std::deque<int>& faults = faults_[operation];
     if (faults.empty()) return std::nullopt;

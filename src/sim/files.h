@@ -10,12 +10,13 @@
 #include <vector>
 
 #include "vrx/platform/files.h"
+#include "vrx/sim/interference.h"
 
 namespace vrx::sim {
 
 class Files final : public platform::Files {
 public:
-    Files();
+    explicit Files(const Interference& interference);
 
     std::string homeDirectory() const override { return "/home/user"; }
     platform::Result<platform::Data> read(const std::string& path) const override;
@@ -31,10 +32,12 @@ public:
     std::vector<std::string> paths() const;
     // The files that were replaced, in order.
     const std::vector<std::string>& written() const { return written_; }
+    void forgetWritten() { written_.clear(); }
 
     enum class Operation { Read, Replace, CreateDirectories, Remove };
     // The next calls of the operation fail with an errno, such as ENOSPC, and change nothing.
     void fail(Operation operation, int error, int count = 1);
+    bool isFailing() const;
     // The next replace() gets as far as a power cut before its last step: the old file is still there, and beside it
     // the new content. A real process would have ended there; here the call returns an error.
     void crashNextReplace() { crashesNextReplace_ = true; }
@@ -43,6 +46,7 @@ private:
     platform::MaybeError scriptedFault(Operation operation, const std::string& path) const;
     void addDirectories(const std::string& path);
 
+    const Interference& interference_;
     std::map<std::string, platform::Data> files_;
     std::set<std::string> directories_;
     std::vector<std::string> written_;

@@ -21,8 +21,9 @@ public:
         if (MaybeError error = service_.begin(Request::Post, "post " + item.uniqueIdentifier)) return error;
         auto stored = codec::serializePropertyList(item.userInfo, platform::PropertyListFormat::Binary);
         if (!stored) return stored.error();
+        if (service_.interference_.strikes(Defect::PostLost)) return std::nullopt;
         auto present = std::ranges::find(pending(), item.uniqueIdentifier, &FollowUpItem::uniqueIdentifier);
-        if (present == pending().end())
+        if (present == pending().end() || service_.interference_.strikes(Defect::ItemDoubled))
             pending().push_back(item);
         else
             *present = item;
@@ -32,6 +33,7 @@ public:
         std::string request = "clear";
         for (const std::string& identifier : uniqueIdentifiers) request += " " + identifier;
         if (MaybeError error = service_.begin(Request::Clear, std::move(request))) return error;
+        if (service_.interference_.strikes(Defect::ClearLost)) return std::nullopt;
         std::erase_if(pending(), [&](const FollowUpItem& item) {
             return std::ranges::find(uniqueIdentifiers, item.uniqueIdentifier) != uniqueIdentifiers.end();
         });
@@ -54,6 +56,7 @@ std::unique_ptr<platform::FollowUpController> FollowUpControllers::makeControlle
 }
 
 MaybeError FollowUpControllers::begin(Request request, std::string text) {
+    interference_.call();
     asked_.push_back(std::move(text));
     int& failures = failures_[request];
     if (failures == 0) return std::nullopt;

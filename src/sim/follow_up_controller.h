@@ -9,12 +9,15 @@
 
 #include "vrx/platform/follow_up_controller.h"
 #include "vrx/platform/vendor.h"
+#include "vrx/sim/interference.h"
 
 namespace vrx::sim {
 
 class FollowUpControllers final : public platform::FollowUpControllers {
 public:
     enum class Request { Post, Clear, List };
+
+    explicit FollowUpControllers(const Interference& interference) : interference_(interference) {}
 
     std::unique_ptr<platform::FollowUpController> makeController(std::string clientIdentifier) override;
     std::string settingsAppBundleIdentifier() const override { return settingsApp; }
@@ -27,6 +30,10 @@ public:
     }
     // The next requests of the kind fail, so many of them, and change nothing; the error's text says "failed to post".
     void fail(Request request, int count = 1) { failures_[request] = count; }
+    bool isFailing(Request request) const {
+        const auto failure = failures_.find(request);
+        return failure != failures_.end() && failure->second > 0;
+    }
     // Every request of every client, failed ones included: "list", "post IDENTIFIER", "clear IDENTIFIER IDENTIFIER".
     const std::vector<std::string>& asked() const { return asked_; }
     void forgetAsked() { asked_.clear(); }
@@ -37,6 +44,7 @@ private:
     // Records the request and returns the failure that is scripted for it.
     platform::MaybeError begin(Request request, std::string text);
 
+    const Interference& interference_;
     std::map<std::string, std::vector<platform::FollowUpItem>> pending_;
     std::map<Request, int> failures_;
     std::vector<std::string> asked_;

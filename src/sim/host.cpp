@@ -44,6 +44,18 @@ Host::~Host() {
     process.kill();
 }
 
+void Host::forgetRecords() {
+    log.clear();
+    defaults.forgetWrites();
+    files.forgetWritten();
+    followUps.forgetAsked();
+    http.forgetSent();
+    activities.forgetFirings();
+    accounts.asked.clear();
+    store.asked.clear();
+    purchaseHistory.asked.clear();
+}
+
 void Host::tellChanges() {
     if (process.isRunning()) compare();
 }

@@ -27,6 +27,7 @@
 #include "vrx/sim/files.h"
 #include "vrx/sim/follow_up_controller.h"
 #include "vrx/sim/http.h"
+#include "vrx/sim/interference.h"
 #include "vrx/sim/locale.h"
 #include "vrx/sim/notification_center.h"
 #include "vrx/sim/process.h"
@@ -54,12 +55,16 @@ public:
     // first one is told nothing.
     void tellChanges();
 
+    // Forgets what was recorded of the past, for simulations that last: log, requests, firings, writes.
+    void forgetRecords();
+
     Failures failures;
+    Interference interference;
     Clock clock;
     SystemLog log;
-    DefaultsStore defaults{failures};
-    Files files;
-    FollowUpControllers followUps;
+    DefaultsStore defaults{failures, interference};
+    Files files{interference};
+    FollowUpControllers followUps{interference};
     DeviceProperties device;
     FeatureFlags flags;
     PairedDeviceRegistry watches;
@@ -67,16 +72,16 @@ public:
     Locale locale;
     BundleLookup bundles;
     Queues queues{clock, failures};
-    AccountStore accounts{queues};
+    AccountStore accounts{queues, interference};
     AccountSession accountSession;
-    HttpSessions http{clock, queues, files};
-    ServiceListenerFactory listener{queues, failures};
+    HttpSessions http{clock, queues, files, interference};
+    ServiceListenerFactory listener{queues, failures, interference};
     Store store{queues};
     PurchaseHistory purchaseHistory{queues};
     InstalledApps installedApps;
     LocalizedStrings localizedStrings;
-    BackgroundActivities activities{clock, queues};
-    NotificationCenter notifications;
+    BackgroundActivities activities{clock, queues, interference};
+    NotificationCenter notifications{interference};
     codec::Json json;
     codec::PropertyList propertyList;
     codec::Digest digest;

@@ -55,8 +55,12 @@ private:
     const bool isShared_;
 };
 
-HttpSessions::HttpSessions(const Clock& clock, Queues& queues, const Files& files)
-    : clock_(clock), queues_(queues), files_(files), shared_(std::make_shared<Session>(*this, true)) {}
+HttpSessions::HttpSessions(const Clock& clock, Queues& queues, const Files& files, const Interference& interference)
+    : clock_(clock),
+      queues_(queues),
+      files_(files),
+      interference_(interference),
+      shared_(std::make_shared<Session>(*this, true)) {}
 
 std::shared_ptr<platform::HttpSession> HttpSessions::makeUncached() {
     return std::make_shared<Session>(*this, false);
@@ -74,9 +78,11 @@ std::vector<SentRequest> HttpSessions::sentTo(std::string_view url) const {
 }
 
 void HttpSessions::send(bool isShared, HttpRequest request, platform::OnceCallback<HttpResponse> completion) {
+    interference_.call();
     HttpAnswer answer = answerTo(request);
     Duration limit = request.timeout.value_or(defaultTimeout);
     if (answer.delay >= limit) answer = transportError(timedOut, "the request timed out").after(limit);
+    if (interference_.strikes(Defect::AnswerLost)) answer = HttpAnswer::silence();
     sent_.push_back({std::move(request), isShared, clock_.now()});
     queues_.workers(platform::Priority::UserInitiated)
         .postAfter(answer.delay, [response = std::move(answer.response), completion = std::move(completion)]() mutable {

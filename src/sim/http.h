@@ -14,6 +14,7 @@
 #include "vrx/platform/http_request.h"
 #include "vrx/sim/clock.h"
 #include "vrx/sim/files.h"
+#include "vrx/sim/interference.h"
 #include "vrx/sim/queues.h"
 
 namespace vrx::sim {
@@ -47,7 +48,7 @@ class HttpSessions final : public platform::HttpSessions {
 public:
     static constexpr platform::Duration defaultTimeout{60};
 
-    HttpSessions(const Clock& clock, Queues& queues, const Files& files);
+    HttpSessions(const Clock& clock, Queues& queues, const Files& files, const Interference& interference);
 
     platform::HttpSession& shared() override { return *shared_; }
     std::shared_ptr<platform::HttpSession> makeUncached() override;
@@ -61,6 +62,7 @@ public:
 
     // All requests, file URLs included, in the order in which they were sent.
     const std::vector<SentRequest>& sent() const { return sent_; }
+    void forgetSent() { sent_.clear(); }
     std::vector<SentRequest> sentTo(std::string_view url) const;
 
 private:
@@ -73,6 +75,7 @@ private:
     const Clock& clock_;
     Queues& queues_;
     const Files& files_;
+    const Interference& interference_;
     std::shared_ptr<platform::HttpSession> shared_;
     std::map<std::string, Server> standing_;
     std::map<std::string, std::deque<HttpAnswer>> once_;

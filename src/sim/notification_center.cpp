@@ -18,6 +18,7 @@ std::int32_t NotificationCenter::registerForNotification(std::string name, platf
 
 void NotificationCenter::raise(std::string_view nameRemainder) {
     const std::string name = platform::vendorIdentifier(nameRemainder);
+    if (interference_.strikes(Defect::NotificationLost)) return;
     bool isHeard = false;
     for (const auto& [token, registration] : registrations_) {
         if (registration->name != name) continue;

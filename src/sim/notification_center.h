@@ -8,11 +8,14 @@
 #include <string>
 
 #include "vrx/platform/notification_center.h"
+#include "vrx/sim/interference.h"
 
 namespace vrx::sim {
 
 class NotificationCenter final : public platform::NotificationCenter {
 public:
+    explicit NotificationCenter(const Interference& interference) : interference_(interference) {}
+
     std::int32_t registerForNotification(std::string name, platform::Queue& queue,
                                          std::function<void()> handler) override;
     void cancel(std::int32_t token) override { registrations_.erase(token); }
@@ -31,6 +34,7 @@ private:
 
     static void deliver(const std::shared_ptr<Registration>& registration);
 
+    const Interference& interference_;
     std::map<std::int32_t, std::shared_ptr<Registration>> registrations_;
     std::int32_t lastToken_ = 0;
     std::set<std::string> missed_;

@@ -119,12 +119,13 @@ Queues::Key Queues::add(Duration delay, Work work) {
 
 void Queues::runWork(Duration until) {
     if (!isInBody("ran the queues")) return;
+    isStopped_ = false;
     do {
-        while (runNext(clock_.elapsed())) {
+        while (!isStopped_ && runNext(clock_.elapsed())) {
         }
-        if (idleHandler_) idleHandler_();
-    } while (runNext(until));
-    clock_.advanceTo(until);
+        if (!isStopped_ && idleHandler_) idleHandler_();
+    } while (!isStopped_ && runNext(until));
+    if (!isStopped_) clock_.advanceTo(until);
 }
 
 bool Queues::runNext(Duration until) {

@@ -36,6 +36,7 @@ public:
     std::shared_ptr<platform::Event> makeEvent() override;
 
     // For the test's body. These run the work that is due now, within a duration, or by a date; then it is that late.
+    // stop() makes them return when the task under way has ended or waits, however early it is.
     void run() { runWork(clock_.elapsed()); }
     void runFor(platform::Duration duration) { runWork(clock_.elapsed() + duration); }
     void runUntil(platform::Date date) { runWork(clock_.elapsedAt(date)); }
@@ -47,6 +48,8 @@ public:
     // The label of the queue whose task is running: "main", "background", "userInitiated" or a serial queue's own;
     // empty in the test's body.
     std::string currentLabel() const;
+    bool isInTask() const { return current_ != nullptr; }
+    void stop() { isStopped_ = true; }
     // Tasks that have not begun, delayed ones included.
     std::size_t pendingCount() const;
     // Tasks that wait for an event.
@@ -100,6 +103,7 @@ private:
     Strand* current_ = nullptr;
     int workAtThisTime_ = 0;
     bool isClosed_ = false;
+    bool isStopped_ = false;
     bool areWaitingTasksLetGo_ = false;
     std::function<void()> idleHandler_;
 

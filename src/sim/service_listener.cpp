@@ -10,6 +10,7 @@ platform::Value ServiceConnection::valueForEntitlement(std::string_view name) co
 }
 
 void ServiceConnection::request(platform::UniqueFunction<void(VRXAgentProtocol&)> call) {
+    if (interference_.strikes(Defect::ReplyDropped)) return;
     queue_->post([object = object_, call = std::move(call)] { call(*object); });
 }
 
@@ -43,7 +44,7 @@ std::shared_ptr<ServiceConnection> ServiceListenerFactory::connect(std::int32_t 
     if (!listener_) return nullptr;
     auto connection = std::make_shared<ServiceConnection>(
         processIdentifier, std::move(entitlements),
-        queues_.makeSerialQueue("connection of " + std::to_string(processIdentifier)));
+        queues_.makeSerialQueue("connection of " + std::to_string(processIdentifier)), interference_);
     bool isAccepted = listener_->delegate->shouldAcceptNewConnection(*listener_, *connection);
     if (isAccepted && !connection->isServing())
         failures_.report("a connection was accepted that exports nothing or was not resumed");

@@ -12,6 +12,7 @@
 #include "vrx/platform/service_listener.h"
 #include "vrx/protocols/agent_protocol.h"
 #include "vrx/sim/failures.h"
+#include "vrx/sim/interference.h"
 
 namespace vrx::sim {
 
@@ -19,8 +20,11 @@ namespace vrx::sim {
 class ServiceConnection final : public platform::ServiceConnection {
 public:
     ServiceConnection(std::int32_t processIdentifier, platform::Dictionary entitlements,
-                      std::shared_ptr<platform::Queue> queue)
-        : processIdentifier_(processIdentifier), entitlements_(std::move(entitlements)), queue_(std::move(queue)) {}
+                      std::shared_ptr<platform::Queue> queue, const Interference& interference)
+        : processIdentifier_(processIdentifier),
+          entitlements_(std::move(entitlements)),
+          queue_(std::move(queue)),
+          interference_(interference) {}
 
     std::int32_t processIdentifier() const override { return processIdentifier_; }
     platform::Value valueForEntitlement(std::string_view name) const override;
@@ -40,6 +44,7 @@ private:
     const std::int32_t processIdentifier_;
     const platform::Dictionary entitlements_;
     const std::shared_ptr<platform::Queue> queue_;
+    const Interference& interference_;
     std::string interface_;
     std::shared_ptr<VRXAgentProtocol> object_;
     bool isResumed_ = false;
@@ -47,7 +52,8 @@ private:
 
 class ServiceListenerFactory final : public platform::ServiceListenerFactory {
 public:
-    ServiceListenerFactory(platform::Queues& queues, const Failures& failures) : queues_(queues), failures_(failures) {}
+    ServiceListenerFactory(platform::Queues& queues, const Failures& failures, const Interference& interference)
+        : queues_(queues), failures_(failures), interference_(interference) {}
 
     std::unique_ptr<platform::ServiceListener> makeListener(std::string serviceName) override;
 
@@ -62,6 +68,7 @@ private:
 
     platform::Queues& queues_;
     const Failures& failures_;
+    const Interference& interference_;
     Listener* listener_ = nullptr;  // the one that takes connections
 };
 
