@@ -172,10 +172,8 @@ std::optional<int> parse(int argc, char** argv, Options& options) {
     } catch (const std::invalid_argument& error) {
         return vrx::apps::endOfParsing(app, CLI::ValidationError("--fault", error.what()));
     }
-    if (check->parsed()) {
-        std::fprintf(stderr, "check must be the first word\n");
-        return exitUsage;
-    }
+    if (check->parsed())
+        return vrx::apps::endOfParsing(app, CLI::ValidationError("check", "it must be the first word"));
     serverVersion.etag = !noEtag;
     serverVersion.lastModified = !noLastModified;
     serverVersion.conditional = !noConditional;
