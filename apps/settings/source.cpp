@@ -12,7 +12,6 @@
 namespace vrx::settings {
 
 using client::Answer;
-using client::Failure;
 using platform::Value;
 
 namespace {
