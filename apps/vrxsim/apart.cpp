@@ -165,10 +165,12 @@ Play playApart(const Life& life, sim::Defect planted) {
 
 void explore(const Exploration& exploration, const std::function<bool(std::uint64_t seed, const Play& play)>& take) {
     std::vector<std::unique_ptr<Share>> shares;
+    shares.reserve(static_cast<std::size_t>(exploration.jobs));
     for (int i = 0; i < exploration.jobs; ++i)
         shares.push_back(std::make_unique<Share>(exploration, exploration.first + static_cast<std::uint64_t>(i)));
     while (!shares.empty()) {
         std::vector<pollfd> outputs;
+        outputs.reserve(shares.size());
         for (const auto& share : shares) outputs.push_back({share->output(), POLLIN, 0});
         poll(outputs.data(), outputs.size(), -1);
         for (std::size_t i = 0; i < outputs.size(); ++i)

@@ -112,7 +112,7 @@ private:
         const std::string watch = random_.oneOf(watches);
         const bool isPairing = random_.chance(60);
         if (isPairing)
-            add("pair", {watch, wordFor(static_cast<double>(second_ / hour) / 24)});
+            add("pair", {watch, wordFor(static_cast<double>(second_ - second_ % hour) / secondsOfDay)});
         else
             add("unpair", {watch});
         if (isPairing || random_.chance(50)) return;

@@ -129,8 +129,9 @@ bool takeLine(Life& life, const std::string& line) {
     if (!day || *day < 0) return false;
     if (isDated) words.erase(words.begin(), words.begin() + 2);
     std::optional<Event> event = eventFrom(std::move(words), *day);
-    if (event) (isDated ? life.events : life.beginning).push_back(*std::move(event));
-    return event.has_value();
+    if (!event) return false;
+    (isDated ? life.events : life.beginning).push_back(*std::move(event));
+    return true;
 }
 
 }  // namespace

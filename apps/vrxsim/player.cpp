@@ -27,7 +27,10 @@ public:
     Player(const Life& life, const PlayOptions& options) : life_(life) {
         trace_.show = options.show;
         world_.host.interference.planted = options.planted;
-        world_.host.failures.handler = [this](const std::string& text) { verdict_.report(day(), "simulation", text); };
+        world_.host.failures.handler = [this](const std::string& text) {
+            verdict_.report(day(), "simulation", text);
+            world_.host.queues.stop();  // it may have no end
+        };
     }
 
     Play run() {

@@ -101,7 +101,7 @@ TEST(Defects, AreAllFound) {
 TEST(Exploration, PlaysEachLifeAsItWouldAlone) {
     const auto traces = [](int jobs) {
         std::map<std::uint64_t, std::uint64_t> result;
-        explore({.first = 3, .last = 6, .jobs = jobs},
+        explore({.first = 3, .last = 6, .jobs = jobs, .mostDays = 15},
                 [&](std::uint64_t seed, const Play& play) { return result.emplace(seed, play.trace).second; });
         return result;
     };
@@ -115,7 +115,7 @@ TEST(Shrinker, LeavesWhatIsNeededAlone) {
         const Play played = play(life, {.planted = sim::Defect::ItemDoubled});
         return played.violation ? played.violation->rule : std::string();
     };
-    const Life life = shortLife(1, Trouble::Rough, 40);
+    const Life life = shortLife(1, Trouble::Rough, 20);
     const Life smaller = shrunk(life, brokenRule);
     EXPECT_EQ(brokenRule(smaller), "one-item");
     EXPECT_LE(smaller.beginning.size() + smaller.events.size(), 3u) << textOf(smaller);
