@@ -23,7 +23,8 @@ struct Verb {
     int hung = 5;
 };
 
-const std::vector<Verb> vrxctlVerbs{{"device", "device"},
+const std::vector<Verb> vrxctlVerbs{{"status", "devices"},
+                                    {"device", "device"},
                                     {"paired", "devices"},
                                     {"info", "coverage"},
                                     {"info X --policy cached", "device", 1},
@@ -183,7 +184,11 @@ TEST_F(CommandLine, Answers) {
 
     // Days are the agent's, and this device comes first.
     EXPECT_EQ(value(vrxhost_, "defaults write OneDayInterval 1e12")["ok"], Value(true));
-    const Value all = value(vrxctl_, "all --policy cached");
+    const Value all = value(vrxctl_, "all --policy cached"), status = value(vrxctl_, "status");
+    EXPECT_EQ(status["devices"], all["devices"]);
+    EXPECT_EQ(status["agent"]["account"], Value(true));
+    EXPECT_EQ(status["problems"], Value(Array{}));
+    EXPECT_EQ(status["followUps"].asArray()->front()["identifier"], Value("b")) << "posted above";
     EXPECT_EQ(all["devices"].asArray()->front()["device"]["deviceTypeString"], Value("Default"));
     EXPECT_EQ(all["devices"].asArray()->back()["derived"]["daysEligible"], Value(1));
 
