@@ -182,6 +182,17 @@ TEST_F(CommandLine, Answers) {
     }
     EXPECT_EQ(value(vrxhost_, "defaults read SerialNumber")["value"], Value(5)) << "written all the same";
 
+    // A report is one file, once, and tells of nobody.
+    Arguments report = command(vrxhost_, "report");
+    report.push_back(place_ / "report");
+    EXPECT_EQ(place_.runAll({report}).front().code, 0);
+    EXPECT_EQ(place_.runAll({report}).front().code, 1) << "it is there already";
+    const std::string reported = fileText(place_ / "report");
+    for (const char* part : {"== doctor\n", "== activities\n", "vrxagent.outreach", "== profile\n", "== log"})
+        EXPECT_NE(reported.find(part), reported.npos) << part;
+    for (const char* secret : {"VRXPHONE", "VRXWATCH", "Maya's", "maya@", "2f3a7c1e"})
+        EXPECT_EQ(reported.find(secret), reported.npos) << secret;
+
     // Days are the agent's, and this device comes first.
     EXPECT_EQ(value(vrxhost_, "defaults write OneDayInterval 1e12")["ok"], Value(true));
     const Value all = value(vrxctl_, "all --policy cached"), status = value(vrxctl_, "status");
