@@ -161,6 +161,11 @@ int CommandLine::run(int argc, const char* const* argv) {
     return report(read(argc, argv));
 }
 
+Outcome CommandLine::outcomeOf(const char* verb) {
+    const std::array<const char*, 2> words{program_.c_str(), verb};
+    return read(static_cast<int>(words.size()), words.data());
+}
+
 // Turns every way in which parsing or the verb can end into an outcome.
 Outcome CommandLine::read(int argc, const char* const* argv) {
     try {

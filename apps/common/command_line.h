@@ -69,6 +69,9 @@ public:
     // Reads the arguments, runs the verb, prints its outcome and returns the program's exit code.
     int run(int argc, const char* const* argv);
 
+    // The outcome of one verb without options, which is not shown: for a verb that is made of others.
+    Outcome outcomeOf(const char* verb);
+
     // Each document stands on a line of its own from now on, as with --watch.
     void showLines() { isWatch_ = true; }
     // Prints an outcome while the verb goes on. Returns whether it could be written.

@@ -2,13 +2,14 @@
 #include <algorithm>
 #include <charconv>
 #include <map>
-#include <tuple>
 
 #include "common/agent_place.h"
 #include "common/command_line.h"
 #include "common/progress.h"
 #include "vrx/client/agent_connection.h"
 #include "vrx/platform/text.h"
+#include "vrxctl/shown.h"
+#include "vrxctl/status.h"
 #include "vrxctl/watch.h"
 
 namespace vrx::apps {
@@ -18,115 +19,7 @@ using client::AgentConnection;
 using client::Answer;
 using client::Failure;
 using platform::Array;
-using platform::Date;
-using platform::Dictionary;
 using platform::Value;
-
-template <class T>
-Value valueOf(const std::optional<T>& value) {
-    return value ? Value(*value) : Value();
-}
-
-std::string textOf(const std::optional<Date>& date) {
-    return date ? dateText(*date) : "unknown";
-}
-
-// For programs.
-
-Value documentOf(const VRXDevice* device) {
-    if (!device) return nullptr;
-    return Dictionary{{"name", valueOf(device->name())},
-                      {"serialNumber", valueOf(device->serialNumber())},
-                      {"activationDate", valueOf(device->activationDate())},
-                      {"deviceType", device->deviceType()},
-                      {"deviceTypeString", device->deviceTypeString()}};
-}
-
-Value derivedFrom(const VRXWarranty& record) {
-    return Dictionary{{"daysEligible", record.daysEligible()},
-                      {"qxLocalizedOfferDesc", record.qxLocalizedOfferDesc()},
-                      {"qxLocalizedOfferDetailsEligibility", record.qxLocalizedOfferDetailsEligibility()},
-                      {"coverageEndDate", valueOf(record.coverageEndDate())},
-                      {"qxOfferDisplayDate", valueOf(record.qxOfferDisplayDate())},
-                      {"qxOfferEligibleUntil", valueOf(record.qxOfferEligibleUntil())},
-                      {"qxOfferFollowupDisplayDate", valueOf(record.qxOfferFollowupDisplayDate())}};
-}
-
-Dictionary documentOf(const VRXDeviceInfo& info) {
-    const auto record = info.warranty();
-    return {{"device", documentOf(info.device().get())},
-            {"coverage", record ? record->dictionaryRepresentation() : Value()},
-            {"derived", record ? derivedFrom(*record) : Value()}};
-}
-
-// For people.
-
-std::vector<std::string> rowOf(const VRXDevice* device) {
-    if (!device) return {"(unknown)", "", "", ""};
-    return {device->name().value_or("(no name)"), device->serialNumber().value_or("(no serial number)"),
-            device->deviceTypeString(), textOf(device->activationDate())};
-}
-
-const std::vector<std::string> deviceHeading{"NAME", "SERIAL NUMBER", "TYPE", "ACTIVATED"};
-
-std::string coverageText(const VRXWarranty& record) {
-    if (!record.covered()) return "not covered";
-    return record.coverageEndDate() ? "covered until " + textOf(record.coverageEndDate()) : "covered";
-}
-
-// In a table, in few words.
-std::string coverageCell(const VRXWarranty& record) {
-    const auto end = record.coverageEndDate();
-    return !record.covered() ? "not covered" : end ? "until " + dayText(*end) : "covered";
-}
-
-std::string offerCell(const VRXWarranty& record) {
-    return record.qxOfferEligible() ? "days left: " + std::to_string(record.daysEligible()) : "none";
-}
-
-std::string offerText(const VRXWarranty& record) {
-    if (!record.qxOfferEligible()) return "none";
-    return "until " + textOf(record.qxOfferEligibleUntil()) + ", days left: " + std::to_string(record.daysEligible());
-}
-
-// An entry of a list, whose form the server chooses. Of a dictionary the values, such as "Repairs: at no cost".
-std::string entryText(const Value& entry) {
-    const Dictionary* parts = entry.asDictionary();
-    if (!parts) return printableValue(entry);
-    std::string text;
-    for (const auto& [key, part] : *parts) text += (text.empty() ? "" : ": ") + printableValue(part);
-    return text;
-}
-
-std::string timeLeft(Date date) {
-    return timeLeftText(date, std::chrono::system_clock::now());
-}
-
-std::string textOf(const VRXWarranty& record) {
-    std::string text;
-    auto line = [&](const std::string& name, const std::string& content) {
-        text += "  " + name + std::string(name.size() < 14 ? 14 - name.size() : 1, ' ') + content + "\n";
-    };
-    auto sent = [&](const std::string& name, const Value& value) {
-        if (!value.isNull()) line(name, printableValue(value));
-    };
-    const auto end = record.coverageEndDate();
-    line("Coverage", coverageText(record) + (record.covered() && end ? ", " + timeLeft(*end) : ""));
-    sent("Label", record.coverageLocalizedLabel());
-    sent("Description", record.coverageLocalizedDesc());
-    sent("Expiration", record.coverageLocalizedExpirationLabel());
-    if (const Array* details = record.coverageDetailsArray().asArray())
-        for (const Value& detail : *details) line("Detail", entryText(detail));
-    if (const Array* benefits = record.benefitDetailsArray().asArray())
-        for (const Value& benefit : *benefits) line("Benefit", entryText(benefit));
-    line("Offer", offerText(record));
-    if (record.qxOfferEligible()) {
-        sent("Offer label", record.qxLocalizedOfferLabel());
-        sent("Offer text", record.qxLocalizedOfferDesc());
-        sent("Offer period", record.qxLocalizedOfferDetailsEligibility());
-    }
-    return text;
-}
 
 // The verbs.
 
@@ -165,24 +58,6 @@ Outcome outcomeOfFailure(const Failure& failure, const std::string& socket, plat
 
 namespace {
 
-// What records derive is to be what the agent's follow-up says. Of an older agent, which does not tell, the shell's
-// locale and the usual day serve.
-void deriveAsAgent(AgentConnection& agent) {
-    if (const auto surroundings = agent.surroundings()) AgentConnection::deriveAs(*surroundings);
-}
-
-// This device first, then the watches by name.
-auto placeOf(const VRXDevice* device) {
-    return std::tuple(!device || device->deviceType() != VRXDeviceTypeDefault, device ? device->name() : std::nullopt,
-                      device ? device->serialNumber() : std::nullopt);
-}
-
-DeviceInfoList inOrder(DeviceInfoList infos) {
-    std::erase(infos, nullptr);
-    std::ranges::stable_sort(infos, {}, [](const auto& info) { return placeOf(info->device().get()); });
-    return infos;
-}
-
 // Whether it is this device's or a paired watch's. To ask for that changes nothing. Without an answer, nothing is
 // known.
 Answer<bool> knows(AgentConnection& agent, const std::string& serialNumber) {
@@ -220,9 +95,7 @@ Outcome paired(AgentConnection& agent) {
     return outcomeOf(agent, agent.pairedDevices(), [](const DeviceList& devices) {
         Array documents;
         std::vector<std::vector<std::string>> rows{deviceHeading};
-        DeviceList sorted = devices;
-        std::ranges::stable_sort(sorted, {}, [](const auto& device) { return placeOf(device.get()); });
-        for (const auto& device : sorted) {
+        for (const auto& device : inOrder(devices)) {
             documents.push_back(documentOf(device.get()));
             rows.push_back(rowOf(device.get()));
         }
@@ -267,15 +140,12 @@ Outcome all(AgentConnection& agent, VRXWarrantyLookupPolicy policy, bool updateF
     return outcomeOf(agent, answer, [&](const DeviceInfoList& infos) {
         deriveAsAgent(agent);
         Array documents;
-        std::vector<std::vector<std::string>> rows{{"NAME", "SERIAL NUMBER", "TYPE", "COVERAGE", "OFFER"}};
+        std::vector<std::vector<std::string>> rows{coverageHeading};
         std::string without;
         for (const auto& info : inOrder(infos)) {
             documents.emplace_back(documentOf(*info));
-            std::vector<std::string>& row = rows.emplace_back(rowOf(info->device().get()));
-            const auto record = info->warranty();
-            row.back() = record ? coverageCell(*record) : "no record";
-            row.push_back(record ? offerCell(*record) : "");
-            if (!record) without += (without.empty() ? "" : ", ") + row.front();
+            rows.push_back(coverageRow(*info));
+            if (!info->warranty()) without += (without.empty() ? "" : ", ") + rows.back().front();
         }
         Outcome outcome{.document = {{"devices", documents}}, .text = infos.empty() ? "No device.\n" : table(rows)};
         if (policy != VRXWarrantyLookupPolicyRefresh || without.empty()) return outcome;
@@ -365,11 +235,18 @@ struct Options {
     std::string bundleIdentifier;
     bool updateFollowUps = false;
     bool isForced = false;
+    bool isWatch = false;
 
     client::ConnectionOptions connection() const {
         client::ConnectionOptions options;
         options.socketPath = socket;
         options.timeLimit = platform::Duration(timeout);
+        return options;
+    }
+    // With the socket's path in any case.
+    client::ConnectionOptions found() const {
+        client::ConnectionOptions options = connection();
+        if (options.socketPath.empty()) options.socketPath = wire::findAgent().socket.path;
         return options;
     }
 };
@@ -426,6 +303,14 @@ int run(int argc, const char* const* argv) {
             return verb(agent);
         };
     };
+    line.add("status", "Shows on one page how the agent and the devices are; changes nothing",
+             [&options, &line] {
+                 if (options.isWatch) return watchStatus(line, options.found());
+                 const Progress progress("waiting for the agent…");
+                 return status(options.found());
+             })
+        ->add_flag("--watch", options.isWatch, "Show it again after each change, until it is interrupted")
+        ->disable_flag_override();
     line.add("device", "Shows this device", asking(device));
     line.add("paired", "Lists the paired watches", asking(paired));
     CLI::App* infoVerb =
@@ -454,12 +339,10 @@ int run(int argc, const char* const* argv) {
                        asking([&](AgentConnection& agent) { return store(agent, options.bundleIdentifier); })));
     addBundle(line.add("support", "Tells whether an application is installed, purchased or offered",
                        asking([&](AgentConnection& agent) { return support(agent, options.bundleIdentifier); })));
-    line.add("watch", "Shows a line for each change of what is shown, until it is interrupted", [&options, &line] {
-        client::ConnectionOptions found = options.connection();
-        if (found.socketPath.empty()) found.socketPath = wire::findAgent().socket.path;
-        return watchChanges(line, found);
-    });
-    line.notes().examples = {{"vrxctl all", "Lists all devices with their coverage"},
+    line.add("watch", "Shows a line for each change of what is shown, until it is interrupted",
+             [&options, &line] { return watchChanges(line, options.found()); });
+    line.notes().examples = {{"vrxctl status --watch", "Shows how everything is, and follows its changes"},
+                             {"vrxctl all", "Lists all devices with their coverage"},
                              {"vrxctl info --policy refresh", "Downloads this device's record, and shows it"},
                              {"vrxctl all --json | jq '.devices[].derived.daysEligible'", "For programs"}};
     line.notes().seeAlso = {"vrxhost(1)", "vrxagent(1)"};

@@ -4,17 +4,13 @@
 
 #include <csignal>
 
-#include "vrx/client/changes.h"
-#include "vrx/wire/locations.h"
-
 namespace vrx::apps {
 
 using client::Change;
 
 namespace {
 
-Outcome outcomeOf(const Change& change, const client::ConnectionOptions& options) {
-    if (change.failure) return outcomeOfFailure(*change.failure, options.socketPath, options.timeLimit);
+Outcome outcomeOfChange(const Change& change) {
     std::string text;
     if (change.followUps) text += "follow-ups\n";
     if (change.coverage) text += "coverage\n";
@@ -24,7 +20,8 @@ Outcome outcomeOf(const Change& change, const client::ConnectionOptions& options
 }  // namespace
 
 // The changes come on a thread of the library, which shows them; this one waits for the end.
-Outcome watchChanges(CommandLine& line, const client::ConnectionOptions& options) {
+Outcome showChanges(CommandLine& line, const client::ConnectionOptions& options,
+                    std::function<Outcome(const Change&)> outcomeOf) {
     sigset_t ends;
     sigemptyset(&ends);
     for (const int number : {SIGINT, SIGTERM}) sigaddset(&ends, number);
@@ -32,7 +29,9 @@ Outcome watchChanges(CommandLine& line, const client::ConnectionOptions& options
     line.showLines();
     const client::Changes changes(
         [&](const Change& change) {
-            const Outcome outcome = outcomeOf(change, options);
+            const Outcome outcome = change.failure
+                                        ? outcomeOfFailure(*change.failure, options.socketPath, options.timeLimit)
+                                        : outcomeOf(change);
             if (!outcome.problem.empty())
                 std::fprintf(stderr, "vrxctl: %s\n%s\n", printable(outcome.problem).c_str(),
                              printable(outcome.advice).c_str());
@@ -42,6 +41,10 @@ Outcome watchChanges(CommandLine& line, const client::ConnectionOptions& options
     int number = 0;
     sigwait(&ends, &number);
     return {.isShown = true};
+}
+
+Outcome watchChanges(CommandLine& line, const client::ConnectionOptions& options) {
+    return showChanges(line, options, outcomeOfChange);
 }
 
 }  // namespace vrx::apps

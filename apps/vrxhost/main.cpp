@@ -16,6 +16,7 @@ int main(int argc, char** argv) {
     addWhyVerb(line, places);
     addProfileVerb(line, places);
     addDoctorVerb(line, places);
+    addReportVerb(line, places);
     addNotes(line, places);
     return line.run(argc, argv);
 }

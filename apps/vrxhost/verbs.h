@@ -17,6 +17,7 @@ void addWhyVerb(CommandLine& line, const wire::LocationOverrides& places);
 void addProfileVerb(CommandLine& line, const wire::LocationOverrides& places);
 void addDoctorVerb(CommandLine& line, const wire::LocationOverrides& places);
 
+void addReportVerb(CommandLine& line, const wire::LocationOverrides& places);
 // For the manual page and the completions.
 void addNotes(CommandLine& line, const wire::LocationOverrides& places);
 

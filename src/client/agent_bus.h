@@ -43,7 +43,8 @@ public:
     // queue. Only calls after this one may be interrupted.
     platform::MaybeError open(const std::string& socketPath, Deadline deadline);
 
-    // Returns the archived root of the operation's reply, or the properties that it asks for. After any other result the connection is useless.
+    // Returns the archived root of the operation's reply, or the properties that it asks for. After any other result
+    // the connection is useless.
     CallResult call(const wire::Operation& operation, const CallArguments& arguments, Deadline deadline,
                     const wire::Interface& interface = wire::agentInterface);
 

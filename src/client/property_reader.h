@@ -1,4 +1,5 @@
-// Reads the properties of one of the agent's objects: the reply to D-Bus's own "GetAll". A message belongs to one thread.
+// Reads the properties of one of the agent's objects: the reply to D-Bus's own "GetAll". A message belongs to one
+// thread.
 #pragma once
 
 #include <systemd/sd-bus.h>

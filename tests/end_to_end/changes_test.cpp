@@ -73,12 +73,16 @@ TEST_F(ChangesOfAnAgent, AreToldWhenWhatIsShownIsAnother) {
     EXPECT_EQ(watch.next(), "follow-ups");
     EXPECT_EQ(watch.next(), "coverage");
     EXPECT_EQ(watch.end(), 0);
-    // As a document, too.
-    Process documents(place_.path(), place_ / "app/vrxctl", {"--socket", place_ / "socket", "watch", "--json"});
-    eventually([&] { return documents.output().ends_with('\n'); }, "the first document");
-    documents.signal(SIGTERM);
-    EXPECT_EQ(documents.wait(), 0);
-    EXPECT_EQ(codec::parseJson(documents.output()).value()["coverage"], Value(true));
+    // As a document, too, and with what has changed.
+    for (const auto& [words, key] : {std::pair(Arguments{"watch"}, "coverage"), {{"status", "--watch"}, "ok"}}) {
+        Arguments arguments{"--socket", place_ / "socket", "--json"};
+        arguments.insert(arguments.end(), words.begin(), words.end());
+        Process documents(place_.path(), place_ / "app/vrxctl", arguments);
+        eventually([&] { return documents.output().ends_with('\n'); }, "the first document");
+        documents.signal(SIGTERM);
+        EXPECT_EQ(documents.wait(), 0);
+        EXPECT_EQ(codec::parseJson(documents.output()).value()[key], Value(true));
+    }
 }
 
 TEST_F(ChangesOfAnAgent, OfAPairingAreToldAfterTheAgentsOwnRefresh) {

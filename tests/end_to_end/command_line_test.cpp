@@ -23,7 +23,8 @@ struct Verb {
     int hung = 5;
 };
 
-const std::vector<Verb> vrxctlVerbs{{"device", "device"},
+const std::vector<Verb> vrxctlVerbs{{"status", "devices"},
+                                    {"device", "device"},
                                     {"paired", "devices"},
                                     {"info", "coverage"},
                                     {"info X --policy cached", "device", 1},
@@ -181,9 +182,24 @@ TEST_F(CommandLine, Answers) {
     }
     EXPECT_EQ(value(vrxhost_, "defaults read SerialNumber")["value"], Value(5)) << "written all the same";
 
+    // A report is one file, once, and tells of nobody.
+    Arguments report = command(vrxhost_, "report");
+    report.push_back(place_ / "report");
+    EXPECT_EQ(place_.runAll({report}).front().code, 0);
+    EXPECT_EQ(place_.runAll({report}).front().code, 1) << "it is there already";
+    const std::string reported = fileText(place_ / "report");
+    for (const char* part : {"== doctor\n", "== activities\n", "vrxagent.outreach", "== profile\n", "== log"})
+        EXPECT_NE(reported.find(part), reported.npos) << part;
+    for (const char* secret : {"VRXPHONE", "VRXWATCH", "Maya's", "maya@", "2f3a7c1e"})
+        EXPECT_EQ(reported.find(secret), reported.npos) << secret;
+
     // Days are the agent's, and this device comes first.
     EXPECT_EQ(value(vrxhost_, "defaults write OneDayInterval 1e12")["ok"], Value(true));
-    const Value all = value(vrxctl_, "all --policy cached");
+    const Value all = value(vrxctl_, "all --policy cached"), status = value(vrxctl_, "status");
+    EXPECT_EQ(status["devices"], all["devices"]);
+    EXPECT_EQ(status["agent"]["account"], Value(true));
+    EXPECT_EQ(status["problems"], Value(Array{}));
+    EXPECT_EQ(status["followUps"].asArray()->front()["identifier"], Value("b")) << "posted above";
     EXPECT_EQ(all["devices"].asArray()->front()["device"]["deviceTypeString"], Value("Default"));
     EXPECT_EQ(all["devices"].asArray()->back()["derived"]["daysEligible"], Value(1));
 
