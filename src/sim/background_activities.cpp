@@ -17,6 +17,8 @@ using platform::Duration;
 namespace {
 
 constexpr Duration atOnce{0.0};
+// A delay that rounding leaves could be so small that virtual time would never pass.
+constexpr Duration timerResolution{1e-6};
 
 }  // namespace
 
@@ -166,7 +168,7 @@ void BackgroundActivities::consider(const std::string& identifier) {
     if (decision.isFired)
         fire(identifier, row->second.generation);
     else if (decision.askAgainIn)
-        considerLater(identifier, *decision.askAgainIn);
+        considerLater(identifier, std::max(*decision.askAgainIn, timerResolution));
 }
 
 void BackgroundActivities::fire(const std::string& identifier, int generation) {
