@@ -59,7 +59,7 @@ ManualNotes::Lines exitCodes() {
 // A verb's help lists what it takes besides: the options of every verb.
 class VerbFormatter final : public CLI::Formatter {
     std::string make_subcommands(const CLI::App* app, CLI::AppFormatMode mode) const override {
-        const std::string text = CLI::Formatter::make_subcommands(app, mode);
+        std::string text = CLI::Formatter::make_subcommands(app, mode);
         const CLI::App* program = app;
         while (program->get_parent()) program = program->get_parent();
         if (program == app || app->get_name().empty() || mode != CLI::AppFormatMode::Normal) return text;
