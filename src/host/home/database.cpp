@@ -149,8 +149,27 @@ std::string readOnlyUri(const std::string& path) {
 
 const Database::Schema Database::currentSchema = steps;
 
+namespace {
+
+// Who may only look can meet the shared index while a writer replaces its header, and then takes it for one that has to
+// be recovered. One that really has to stays so.
+template <class Call>
+int resultOfLook(Call call) {
+    constexpr int mostLooks = 50;
+    int result = call();
+    for (int look = 1; result == SQLITE_READONLY_RECOVERY && look < mostLooks; ++look) {
+        std::this_thread::sleep_for(std::chrono::milliseconds(1));
+        result = call();
+    }
+    return result;
+}
+
+}  // namespace
+
 Statement::Statement(sqlite3* connection, const char* sql) : connection_(connection) {
-    check(sqlite3_prepare_v3(connection, sql, -1, SQLITE_PREPARE_PERSISTENT, &statement_, nullptr), connection);
+    check(resultOfLook(
+              [&] { return sqlite3_prepare_v3(connection, sql, -1, SQLITE_PREPARE_PERSISTENT, &statement_, nullptr); }),
+          connection);
 }
 
 Statement& Statement::bind(int parameter, std::string_view text) {
@@ -183,7 +202,7 @@ Statement& Statement::bind(int parameter, std::nullptr_t) {
 }
 
 bool Statement::step() {
-    const int result = sqlite3_step(statement_);
+    const int result = resultOfLook([this] { return sqlite3_step(statement_); });
     if (result == SQLITE_ROW) return true;
     if (result != SQLITE_DONE) check(result, connection_);
     return false;
@@ -246,7 +265,7 @@ void Connection::keepLogAtClose(bool keep) {
 }
 
 void Connection::execute(const char* sql) {
-    check(sqlite3_exec(connection_, sql, nullptr, nullptr, nullptr), connection_);
+    check(resultOfLook([&] { return sqlite3_exec(connection_, sql, nullptr, nullptr, nullptr); }), connection_);
 }
 
 Statement& Connection::statement(const char* sql) {

@@ -142,6 +142,10 @@ TEST_F(DefaultsStoreTest, LookingIsDoneBesideProcessesThatOpenAndClose) {
         others.push_back(inChild([&] {
             while (true) Opened(path()).store.set("other", "changed");
         }));
+    others.push_back(inChild([&] {
+        Opened opened(path());
+        for (int count = 0;; ++count) opened.store.set("other", count);
+    }));
     for (int look = 0; look < (isSanitized ? 100 : 300) && !HasFailure(); ++look) {
         Database database = Database::readOnly(path());
         const MaybeError error = database.open();
