@@ -15,16 +15,6 @@ using platform::Dictionary;
 
 namespace {
 
-const char* nameOf(Health health) {
-    switch (health) {
-        case Health::Good: return "good";
-        case Health::Note: return "note";
-        case Health::Problem: return "problem";
-        case Health::Skipped: return "skipped";
-    }
-    return "";
-}
-
 // For people, who have the server's answer itself for the rest.
 std::string shortText(const platform::Value& value) {
     const Array* list = value.asArray();

@@ -5,11 +5,12 @@
 #include <vector>
 
 #include "common/command_line.h"
+#include "common/health.h"
 #include "server_check/conversation.h"
 
 namespace vrx::server_check {
 
-enum class Health { Skipped, Good, Note, Problem };
+using apps::Health;
 
 // A note is worth a look; a problem is something that the agent cannot use.
 struct Finding {

@@ -5,7 +5,6 @@
 #include <utility>
 
 #include "vrx/client/agent_connection.h"
-#include "vrx/client/caller.h"
 #include "vrx/client/changes.h"
 #include "vrx/devices/records/device_info.h"
 
@@ -70,7 +69,6 @@ public:
         changes_.reset();
         agent_.reset();
         followUps_.reset();
-        host_.reset();
     }
 
     // At most one round is under way; what changes meanwhile takes another.
@@ -87,8 +85,7 @@ public:
         agent_->getAllDeviceInfosUsingPolicy(VRXWarrantyLookupPolicyCachedOnly, false,
                                              round->place(&Round::infos, round));
         followUps_->pending(round->place(&Round::followUps, round));
-        host_->callLater(wire::hostInterface, wire::statusOperation,
-                         client::Callback<Value>(round->place(&Round::status, round)));
+        agent_->status(round->place(&Round::status, round));
     }
 
     void refresh() {
@@ -149,7 +146,6 @@ private:
     bool isLooking_ = false, isAnotherDue_ = false, isRefreshing_ = false;
     std::optional<client::AgentConnection> agent_{std::in_place};
     std::optional<client::FollowUps> followUps_{std::in_place};
-    std::optional<client::Caller> host_{std::in_place, client::ConnectionOptions{}};
     std::optional<client::Changes> changes_;
 };
 

@@ -9,6 +9,7 @@
 #include <filesystem>
 
 #include "common/agent_place.h"
+#include "common/health.h"
 #include "vrx/host/ipc/bundle_lookup.h"
 #include "vrx/host/profile/installed_apps.h"
 #include "vrx/platform/defaults_store.h"
@@ -34,18 +35,6 @@ using platform::Result;
 using platform::Value;
 
 namespace {
-
-enum class Health : std::uint8_t { Skipped, Good, Note, Problem };
-
-const char* nameOf(Health health) {
-    switch (health) {
-        case Health::Good: return "good";
-        case Health::Note: return "note";
-        case Health::Problem: return "problem";
-        case Health::Skipped: return "skipped";
-    }
-    return "";
-}
 
 struct Check {
     std::string name;

@@ -30,13 +30,6 @@ using platform::Value;
 
 namespace {
 
-std::optional<std::string> deviceName(const host::DeviceProfile& profile, const std::string& serialNumber) {
-    if (profile.string("SerialNumber") == serialNumber) return profile.string("UserAssignedDeviceName");
-    for (const platform::PairedWatch& watch : profile.watches())
-        if (watch.serialNumber == serialNumber) return watch.displayName();
-    return std::nullopt;
-}
-
 // How an item looks at one moment.
 struct Appearance {
     host::ShownFollowUp shown{};
@@ -53,7 +46,7 @@ Appearance shownAt(Date now, const FollowUpItem& item, Duration day, const host:
     Appearance look{host::shownFollowUp(item, now, day, profile)};
     if (const std::string* serialNumber = serialNumberOfItem(item)) {
         look.serialNumber = *serialNumber;
-        look.deviceName = deviceName(profile, *serialNumber);
+        look.deviceName = profile.deviceName(*serialNumber);
     }
     look.isLegacy = item.uniqueIdentifier == followUpUniqueIdentifier(std::nullopt);
     return look;

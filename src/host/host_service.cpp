@@ -83,14 +83,15 @@ Value HostService::pendingFollowUps() const {
         return nullptr;
     }
     const platform::Date now = platform.clock().now();
+    const platform::Duration day = oneDayInterval();
     Array documents;
     for (const FollowUpItem& item : *pending) {
-        const ShownFollowUp shown = shownFollowUp(item, now, oneDayInterval(), platform.locale());
+        const ShownFollowUp shown = shownFollowUp(item, now, day, platform.locale());
         if (shown.isExpired) continue;
         Dictionary document = documentOf(item, shown);
         if (const std::string* serialNumber = names_.serialNumberOf(item)) {
             document.emplace("serialNumber", *serialNumber);
-            addIfAny(document, "deviceName", nameOf(*serialNumber));
+            addIfAny(document, "deviceName", host_.profile().deviceName(*serialNumber));
         }
         documents.emplace_back(std::move(document));
     }
@@ -184,13 +185,6 @@ std::string HostService::devicesText() const {
     const auto account = Platform::current().accountStore().primaryCloudAccount();
     add(account ? account->identifier : "");
     return text;
-}
-
-std::optional<std::string> HostService::nameOf(const std::string& serialNumber) const {
-    if (host_.profile().string("SerialNumber") == serialNumber) return host_.profile().string("UserAssignedDeviceName");
-    for (const platform::PairedWatch& watch : host_.profile().watches())
-        if (watch.serialNumber == serialNumber) return watch.displayName();
-    return std::nullopt;
 }
 
 }  // namespace vrx::host

@@ -45,7 +45,6 @@ private:
     void follow(bool isAnybodySubscribed);
     void profileMayHaveChanged();
     std::string devicesText() const;
-    std::optional<std::string> nameOf(const std::string& serialNumber) const;
 
     Host& host_;
     const AgentStatus status_;

@@ -81,6 +81,13 @@ std::map<std::string, platform::Carrier> DeviceProfile::carriers() const {
     return content->hasCarriers ? content->carriers : told()->carriers;
 }
 
+std::optional<std::string> DeviceProfile::deviceName(const std::string& serialNumber) const {
+    if (string("SerialNumber") == serialNumber) return string("UserAssignedDeviceName");
+    for (const PairedWatch& watch : watches())
+        if (watch.serialNumber == serialNumber) return watch.displayName();
+    return std::nullopt;
+}
+
 std::shared_ptr<const ToldFacts> DeviceProfile::told() const {
     const std::lock_guard lock(mutex_);
     return told_;

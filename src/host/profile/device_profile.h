@@ -42,6 +42,8 @@ public:
     // A single file that was named and is not there.
     std::optional<std::string> missingFile() const;
     const BareMachine& machine() const { return machine_; }
+    // Of this device or a watch, by its serial number; null when it is neither's, or has none.
+    std::optional<std::string> deviceName(const std::string& serialNumber) const;
     // What the machine's services have told.
     std::shared_ptr<const ToldFacts> told() const;
     void tell(ToldFacts facts);
