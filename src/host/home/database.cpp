@@ -12,6 +12,7 @@
 
 #include "vrx/host/base/descriptor.h"
 #include "vrx/host/base/files.h"
+#include "vrx/host/base/request_scope.h"
 #include "vrx/platform/log.h"
 
 namespace vrx::host {
@@ -386,6 +387,7 @@ std::shared_ptr<Database::Opening> Database::opening(MaybeError& error) {
         return nullptr;
     }
     if (opening_) {
+        if (!RequestScope::isFirstLook(this)) return opening_;
         const auto present = FileIdentity::of(path_);
         if (!present || *present == opening_->file) return opening_;
     }
