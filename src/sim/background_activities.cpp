@@ -182,6 +182,7 @@ void BackgroundActivities::fire(const std::string& identifier, int generation) {
     attachment.runningGeneration = generation;
     attachment.doesRunNeedNetwork = rows_.at(identifier).criteria.requiresNetwork;
     firings_.push_back({identifier, clock_.now()});
+    const CauseScope cause(queues_, identifier);
     ActivityHandler handler = attachment.handler;  // another handler may take its place during the run
     if (interference_.strikes(Defect::HandlerTwice)) handler([](BackgroundActivityResult) {});
     handler([this, identifier](BackgroundActivityResult result) { takeResult(identifier, result); });
