@@ -45,7 +45,7 @@ World::World() {
     host.accounts.tokens[platform::vendorIdentifier(".ks.supportapp.auth")] = "token";
     host.accounts.renewedToken = "renewed";
     host.http.answer(coverageUrl, [this](const platform::HttpRequest& request) { return answer(request); });
-    host.http.answer(versionsUrl, [this](const platform::HttpRequest&) { return versionsAnswer(); });
+    host.http.answer(versionsUrl, [this](const platform::HttpRequest& request) { return versionsAnswer(request); });
 }
 
 std::vector<platform::FollowUpItem>& World::items() {
@@ -124,6 +124,7 @@ bool World::changeMachine(const Event& event) {
     if (verb == "network") {
         isNetworkOn_ = words[0] == "on";
         host.activities.setNetworkAvailable(isNetworkOn_);
+        host.http.setNetworkAvailable(isNetworkOn_);
     } else if (verb == "metered") {
         isMetered_ = words[0] == "on";
         host.activities.setNetworkMetered(isMetered_);
@@ -275,10 +276,17 @@ HttpAnswer World::answer(const platform::HttpRequest& request) {
     return record == records_.end() ? HttpAnswer::status(404, "{}") : HttpAnswer::ok(fine);
 }
 
-HttpAnswer World::versionsAnswer() {
+// Kept for a while, then confirmed by its tag while it stays the same.
+HttpAnswer World::versionsAnswer(const platform::HttpRequest& request) {
     const std::string fine =
         propertyList(Dictionary{{"LowServerVersion", lowVersion_}, {"HighServerVersion", highVersion_}});
-    return troubledAnswer(versionTroubles_, fine).value_or(HttpAnswer::ok(fine));
+    if (std::optional<HttpAnswer> troubled = troubledAnswer(versionTroubles_, fine)) return *std::move(troubled);
+    const std::string tag = "\"" + std::to_string(lowVersion_) + "-" + std::to_string(highVersion_) + "\"";
+    const auto known = request.headers.find("If-None-Match");
+    const bool isKnown = known != request.headers.end() && known->second == tag;
+    HttpAnswer answer = isKnown ? HttpAnswer::status(304) : HttpAnswer::ok(fine);
+    answer.response.headers = {{"Cache-Control", "max-age=" + std::to_string(secondsVersionsAreKept)}, {"ETag", tag}};
+    return answer;
 }
 
 std::optional<HttpAnswer> World::troubledAnswer(std::deque<std::string>& troubles, const std::string& fine) {

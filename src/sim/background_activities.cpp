@@ -36,6 +36,9 @@ void BackgroundActivities::schedule(const platform::ActivityRegistration& regist
         Duration interval = registration.isByOwnRun ? platform::minimumInterval : atOnce;
         attachment.isRegisteredByOwnRun = registration.isByOwnRun && criteria.delay <= 0;
         platform::DueTime due = platform::dueTime(criteria, interval, now());
+        if (shareOfGrace_ > 0)
+            due = platform::dueAfter(due.wait + Duration(shareOfGrace_ * static_cast<double>(criteria.gracePeriod)),
+                                     now());
         const auto earlier = rows_.find(registration.identifier);
         if (earlier != rows_.end() && isAfterBoot()) due = platform::takenUp(due, earlier->second.due, now());
         addRow(registration.identifier, criteria, std::move(due));

@@ -30,6 +30,7 @@ void Process::kill() {
 }
 
 void Process::relaunch() {
+    const CauseScope cause(queues_, startCause);
     activities_.processStarted(agentVersion);
     content_ = main_();
     startHandler_();

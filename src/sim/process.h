@@ -48,6 +48,8 @@ public:
     // How often the process ended because it asked to.
     int cleanExits() const { return cleanExits_; }
 
+    // What is posted while the process starts has this cause.
+    static constexpr std::string_view startCause = "start";
     // The version of the agent that is started next.
     std::string agentVersion = "1";
 
