@@ -176,15 +176,18 @@ std::vector<std::string> rowOf(std::string_view server, std::string_view cause, 
             minuteText(hour.minute)};
 }
 
-std::string textOf(Server server, const Census& census) {
+// The busiest hour is that of the lives, whose requests come at random as well.
+std::string textOf(Server server, const Census& census, const FleetOptions& options) {
     const Counts& counts = census.servers[static_cast<std::size_t>(server)];
-    std::string text = std::string(describe(server)) + ": requests of all lives known to " +
-                       briefly(100 * samplingError(census, counts)) + " %; " +
-                       percent(counts.connections, counts.requests) + " open a connection, or " +
-                       percent(counts.connectionsKeptLong, counts.requests) + " if kept 2 min\n";
+    const std::uint64_t busiest = Curve(counts, {}, options).busiestHour().requests / options.devicesOfLife();
+    const double error = 1 / std::sqrt(static_cast<double>(std::max<std::uint64_t>(busiest, 1)));
+    std::string text = std::string(describe(server)) + ": by chance ± " + briefly(100 * samplingError(census, counts)) +
+                       " % in all, ± " + briefly(100 * error) + " % in the busiest hour\n    " +
+                       percent(counts.connections, counts.requests) + " open a connection, kept for 5 s; " +
+                       percent(counts.connectionsKeptLong, counts.requests) + " if kept for 2 min\n";
     if (server == Server::Versions)
         text += "    " + percent(counts.unchanged, counts.requests) + " are answered by 304; " +
-                percent(counts.doubled, counts.requests) + " are sent with another one under way\n";
+                percent(counts.doubled, counts.requests) + " go out with another one under way\n";
     return text;
 }
 
@@ -255,7 +258,7 @@ Outcome fleet(FleetOptions& options) {
         for (const Cause cause : causesIn(counts))
             rows.push_back(rowOf(describe(server), describe(cause), Curve(counts, cause, options), options));
         rows.push_back(rowOf(describe(server), "all", Curve(counts, {}, options), options));
-        notes += textOf(server, census);
+        notes += textOf(server, census, options);
         servers.push_back(documentOf(server, census, options));
     }
     const std::pair<std::string, std::string> files[] = {
@@ -277,7 +280,7 @@ Outcome fleet(FleetOptions& options) {
 }
 
 CLI::Option* addDay(CLI::App& app, const char* name, std::optional<double>& day, const std::string& help) {
-    return app.add_option(name, day, help)->type_name("DAY")->check(CLI::Range(0.0, 400.0), "");
+    return app.add_option(name, day, help)->type_name("DAY")->check(CLI::Range(0.0, 400.0));
 }
 
 }  // namespace
@@ -288,35 +291,46 @@ void addFleetVerb(CommandLine& line) {
     CLI::App& app = *line.add("fleet", "Plays many ordinary devices, and counts the requests that the servers see",
                               [options] { return fleet(*options); });
     app.add_option("--devices", options->devices, "How many there are")
-        ->check(CLI::Range(1, 1'000'000'000), "")
+        ->type_name("N")
+        ->check(CLI::Range(1, 1'000'000'000))
         ->capture_default_str();
-    app.add_option("--days", scenario.days, "How long")->check(CLI::Range(1, 400), "")->capture_default_str();
+    app.add_option("--days", scenario.days, "How long")->check(CLI::Range(1, 400))->capture_default_str();
     app.add_option("--lives", options->mostLives, "At most so many are played; each stands for as many devices")
-        ->check(CLI::Range(1, 10'000'000), "")
+        ->type_name("N")
+        ->check(CLI::Range(1, 10'000'000))
         ->capture_default_str();
     app.add_option("--scenario", options->begins,
                    "image: all get the agent with an image at first; steady: they have had it for long")
         ->check(CLI::IsMember({"image", "steady"}))
         ->capture_default_str();
     app.add_option("--over", scenario.overHours, "Hours within which image, upgrade and language reach the devices")
-        ->check(CLI::Range(0.0, 2400.0), "")
+        ->type_name("HOURS")
+        ->check(CLI::Range(0.0, 2400.0))
         ->capture_default_str();
     addDay(app, "--upgrade", scenario.upgrade, "When a newer agent comes");
     addDay(app, "--language", scenario.language, "When a share of the users changes language");
     app.add_option("--share", scenario.languageShare, "Which share, in percent")
-        ->check(CLI::Range(0.0, 100.0), "")
+        ->type_name("PERCENT")
+        ->check(CLI::Range(0.0, 100.0))
         ->capture_default_str();
     addDay(app, "--outage", scenario.outage, "When the coverage server fails");
     app.add_option("--hours", scenario.outageHours, "For how long")
-        ->check(CLI::Range(0.0, 2400.0), "")
+        ->type_name("HOURS")
+        ->check(CLI::Range(0.0, 2400.0))
         ->capture_default_str();
+    const auto isAnswer = [](const std::string& text) {
+        const bool isStatus = text.size() == 3 && text.find_first_not_of("0123456789") == text.npos && text >= "200";
+        return isStatus || text == "cut" || text == "never" ? "" : "'" + text + "' is neither cut, never nor a status";
+    };
     app.add_option("--answer", scenario.outageAnswer, "What it then answers: cut, never, or a status")
+        ->type_name("ANSWER")
+        ->check(isAnswer, "")
         ->capture_default_str();
     app.add_flag("--spread", scenario.isSpread,
                  "Activities fire at any moment of their grace period, as no agent does yet");
-    app.add_option("--csv", options->csvFile, "Write the requests of each minute");
-    app.add_option("--svg", options->svgFile, "Draw them");
-    app.add_option("--jobs", options->jobs, "How many processes play")->check(CLI::Range(1, 256));
+    app.add_option("--csv", options->csvFile, "Write the requests of each minute")->type_name("FILE");
+    app.add_option("--svg", options->svgFile, "Draw them")->type_name("FILE");
+    app.add_option("--jobs", options->jobs, "How many processes play")->type_name("N")->check(CLI::Range(1, 256));
 }
 
 }  // namespace vrx::apps

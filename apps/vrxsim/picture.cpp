@@ -2,6 +2,8 @@
 
 #include <algorithm>
 #include <cmath>
+#include <functional>
+#include <iomanip>
 #include <sstream>
 
 namespace vrx::simulation {
@@ -36,10 +38,14 @@ double roundStep(double least) {
     return 10 * power;
 }
 
+// With commas between the thousands.
 std::string numberText(double number) {
-    std::ostringstream text;
-    text << number;
-    return text.str();
+    std::ostringstream stream;
+    stream << std::setprecision(3) << number;
+    if (number < 1000) return stream.str();
+    std::string text = std::to_string(std::llround(number));
+    for (std::size_t at = text.size(); at > 3; text.insert(at, ",")) at -= 3;
+    return text;
 }
 
 // Requests a minute in each bin, of one cause.

@@ -143,9 +143,7 @@ private:
             addAt(moment, "network", {"off"});
             addAt(moment + random_.between(5 * aMinute, 3 * anHour), "network", {"on"});
         });
-        addEvery(daysBetweenRefusals, [this](std::int64_t moment) {
-            if (!isOutageAt(moment)) addAt(moment, "server", {"401", "1"});
-        });
+        addEvery(daysBetweenRefusals, [this](std::int64_t moment) { addAt(moment, "server", {"401", "1"}); });
         addEvery(daysBetweenPairings, [this](std::int64_t moment) { addAt(moment, "pair", {"WATCH3", "-"}); });
         if (random_.chance(percentOffAtNight)) addNights();
     }
@@ -156,11 +154,6 @@ private:
     }
 
     static std::int64_t momentOf(double days) { return std::llround(days * secondsOfDay); }
-    bool isOutageAt(std::int64_t moment) const {
-        if (!scenario_.outage) return false;
-        const std::int64_t begin = momentOf(*scenario_.outage);
-        return moment >= begin && moment < begin + momentOf(scenario_.outageHours / 24);
-    }
     void addScenario() {
         if (scenario_.upgrade) addAt(installedAfter(*scenario_.upgrade * secondsOfDay), "upgrade");
         if (scenario_.language && random_.chance(std::llround(scenario_.languageShare))) {
@@ -171,9 +164,9 @@ private:
         if (!scenario_.outage) return;
         const std::int64_t begin = momentOf(*scenario_.outage);
         const std::int64_t end = begin + momentOf(scenario_.outageHours / 24);
-        // The life may begin in the midst of it. More requests than this no device sends.
-        addAt(std::min(end, std::max(begin, resident_.begin)), "server", {scenario_.outageAnswer, "1000"});
-        addAt(end, "server", {scenario_.outageAnswer, "0"});
+        // The life may begin in the midst of it.
+        addAt(std::clamp(resident_.begin, begin, end), "outage", {scenario_.outageAnswer});
+        addAt(end, "outage", {"over"});
     }
 
     Random random_;

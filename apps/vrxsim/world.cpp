@@ -73,8 +73,8 @@ bool World::isTroubled() const {
 }
 
 bool World::isServerFine() const {
-    return serverTroubles_.empty() && versionTroubles_.empty() && lowVersion_ == 2 && highVersion_ == 3 &&
-           host.accounts.primary && host.accounts.renewalResult.code == 0;
+    return outage_.empty() && serverTroubles_.empty() && versionTroubles_.empty() && lowVersion_ == 2 &&
+           highVersion_ == 3 && host.accounts.primary && host.accounts.renewalResult.code == 0;
 }
 
 bool World::happen(const Event& event) {
@@ -161,6 +161,8 @@ bool World::changeServers(const Event& event) {
     } else if (verb == "server" || verb == "versions-server") {
         std::deque<std::string>& troubles = verb == "server" ? serverTroubles_ : versionTroubles_;
         troubles.assign(static_cast<std::size_t>(numberFrom(words[1])), words[0]);
+    } else if (verb == "outage") {
+        outage_ = words[0] == "over" ? "" : words[0];
     } else if (verb == "renewal") {
         host.accounts.renewalResult.code = words[0] == "fails" ? 1 : 0;
         host.accounts.renewalDelay = Duration(numberFrom(words[1]));
@@ -272,6 +274,7 @@ HttpAnswer World::answer(const platform::HttpRequest& request) {
     const auto record = records_.find(*serialNumber);
     const std::string fine =
         record == records_.end() ? "" : host.json.serialize(Value(coverage(record->second, *language))).value();
+    if (!outage_.empty()) return answerOfKind(outage_, fine);
     if (std::optional<HttpAnswer> troubled = troubledAnswer(serverTroubles_, fine)) return *std::move(troubled);
     return record == records_.end() ? HttpAnswer::status(404, "{}") : HttpAnswer::ok(fine);
 }
@@ -294,6 +297,10 @@ std::optional<HttpAnswer> World::troubledAnswer(std::deque<std::string>& trouble
     serverTroubledAt_ = elapsed();
     const std::string kind = std::move(troubles.front());
     troubles.pop_front();
+    return answerOfKind(kind, fine);
+}
+
+HttpAnswer World::answerOfKind(const std::string& kind, const std::string& fine) {
     if (kind == "cut") return HttpAnswer::failure();
     if (kind == "late") return HttpAnswer::ok(fine).after(Duration(28));
     if (kind == "never") return HttpAnswer::silence();

@@ -76,10 +76,12 @@ private:
     sim::HttpAnswer answer(const platform::HttpRequest& request);
     sim::HttpAnswer versionsAnswer(const platform::HttpRequest& request);
     std::optional<sim::HttpAnswer> troubledAnswer(std::deque<std::string>& troubles, const std::string& fine);
+    static sim::HttpAnswer answerOfKind(const std::string& kind, const std::string& fine);
 
     std::map<std::string, Record> records_;
     std::map<std::string, double> latestEnds_;                  // days
     std::deque<std::string> serverTroubles_, versionTroubles_;  // the kinds of the next answers
+    std::string outage_;                                        // the kind of all answers; empty without one
     double serverTroubledAt_ = -1;                              // the last time that an event changed how it answers
     std::int64_t lowVersion_ = 2, highVersion_ = 3;
     bool isNetworkOn_ = true, isMetered_ = false, isDeferring_ = false;
