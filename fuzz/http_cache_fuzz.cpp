@@ -37,7 +37,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t siz
     if (!stored) return 0;
     require(codec::parseCacheControl(answer.headers["Cache-Control"]).isStorable);
     require(cache.freshAnswer(*stored).has_value() == (age < lifetime));
-    for (const auto& [name, value] : codec::revalidationHeaders(stored->answer.headers)) require(codec::isOneLine(value));
+    for (const auto& [name, value] : codec::revalidationHeaders(stored->answer.headers))
+        require(codec::isOneLine(value));
     require(cache.revalidated(*stored, still.now(), answer.headers).status == 200);
     return 0;
 }

@@ -5,10 +5,10 @@
 #include <map>
 #include <set>
 
+#include "vrx/codec/http_cache_rules.h"
 #include "vrx/coverage/records/coverage_keys.h"
 #include "vrx/devices/records/device_info.h"
 #include "vrx/followup/follow_up_rules.h"
-#include "vrx/codec/http_cache_rules.h"
 #include "vrx/platform/clock.h"
 #include "vrx/platform/json.h"
 #include "vrx/platform/number_text.h"

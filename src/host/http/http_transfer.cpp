@@ -212,7 +212,8 @@ MaybeError HttpTransfer::setHeaders() {
         addHeaderLine(name, value);
     }
     if (stored_)
-        for (const auto& [name, value] : codec::revalidationHeaders(stored_->answer.headers)) addHeaderLine(name, value);
+        for (const auto& [name, value] : codec::revalidationHeaders(stored_->answer.headers))
+            addHeaderLine(name, value);
     set(CURLOPT_HTTPHEADER, headerList_.get());
     return std::nullopt;
 }

@@ -93,7 +93,7 @@ private:
     int redirects_ = 0;
     int sent_ = 0;  // times, to this address
 
-    bool isCached_ = false;     // may be answered from the cache and stored in it
+    bool isCached_ = false;            // may be answered from the cache and stored in it
     codec::HttpCache::Stored stored_;  // the answer that the request asks to confirm
     platform::Date asked_;
 
