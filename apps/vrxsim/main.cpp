@@ -16,6 +16,7 @@
 #include "common/command_line.h"
 #include "vrxsim/apart.h"
 #include "vrxsim/defects.h"
+#include "vrxsim/fleet_verb.h"
 #include "vrxsim/generator.h"
 #include "vrxsim/shrinker.h"
 
@@ -316,6 +317,7 @@ void addVerbs(CommandLine& line, Options& options) {
     verb->add_option("--days", options.mostDays, "How many days of each life")->check(CLI::Range(1, 4000));
     addJobs(*verb, options);
     addLevel(*verb, options);
+    addFleetVerb(line);
 }
 
 }  // namespace vrx::apps

@@ -24,9 +24,11 @@ struct Killed {};
 
 class Player {
 public:
-    Player(const Life& life, const PlayOptions& options) : life_(life) {
+    Player(const Life& life, const PlayOptions& options) : life_(life), options_(options) {
         trace_.show = options.show;
         world_.host.interference.planted = options.planted;
+        world_.host.activities.setShareOfGrace(options.shareOfGrace);
+        if (!options.isJudged) world_.host.log.lowest = platform::Level::Error;
         world_.host.failures.handler = [this](const std::string& text) {
             verdict_.report(day(), "simulation", text);
             world_.host.queues.stop();  // it may have no end
@@ -163,6 +165,12 @@ private:
     // Takes down what has happened since the last time, and checks what is there now.
     void lookAround() {
         clients_.check();
+        if (options_.takeSent) std::ranges::for_each(world_.host.http.sent(), options_.takeSent);
+        if (options_.isJudged) judge();
+        world_.host.forgetRecords();
+        nextCheckAt_ = world_.elapsed() + checkInterval;
+    }
+    void judge() {
         invariants_.check();
         for (const platform::LogEntry& line : world_.host.log.entries()) takeDown(line);
         for (const sim::SentRequest& sent : world_.host.http.sent()) {
@@ -179,8 +187,6 @@ private:
             trace_.add(item.title.value_or("") + item.informativeFooterText.value_or(""));
             if (trace_.show) trace_.show("  shown " + platform::describe(item.userInfo));
         }
-        world_.host.forgetRecords();
-        nextCheckAt_ = world_.elapsed() + checkInterval;
     }
     void takeDown(const platform::LogEntry& line) {
         trace_.add(line.format);
@@ -189,6 +195,7 @@ private:
     }
 
     const Life& life_;
+    const PlayOptions& options_;
     Verdict verdict_;
     Trace trace_;
     World world_;

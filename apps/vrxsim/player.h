@@ -5,6 +5,7 @@
 #include <functional>
 #include <optional>
 
+#include "vrx/sim/http.h"
 #include "vrx/sim/interference.h"
 #include "vrxsim/life.h"
 #include "vrxsim/verdict.h"
@@ -14,6 +15,9 @@ namespace vrx::simulation {
 struct PlayOptions {
     sim::Defect planted = sim::Defect::None;            // in the simulated host
     std::function<void(std::string_view line)> show{};  // gets what happens, line by line
+    bool isJudged = true;                               // else no rule is looked at, and neither log nor trace is made
+    std::function<void(const sim::SentRequest& sent)> takeSent{};  // gets each request that leaves the device
+    double shareOfGrace = 0;                                       // by which each firing is put off, from 0 to 1
 };
 
 struct Play {
