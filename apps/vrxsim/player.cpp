@@ -4,6 +4,7 @@
 #include <exception>
 #include <string>
 
+#include "timeline/recorder.h"
 #include "vrx/platform/text.h"
 #include "vrx/service/start_up.h"
 #include "vrxsim/clients.h"
@@ -24,7 +25,7 @@ struct Killed {};
 
 class Player {
 public:
-    Player(const Life& life, const PlayOptions& options) : life_(life) {
+    Player(const Life& life, const PlayOptions& options) : life_(life), isRecorded_(options.isRecorded) {
         trace_.show = options.show;
         world_.host.interference.planted = options.planted;
         world_.host.failures.handler = [this](const std::string& text) {
@@ -35,6 +36,7 @@ public:
 
     Play run() {
         for (const Event& event : life_.beginning) happen(event);
+        if (isRecorded_) recorder_.emplace(world_.host);
         start([this] { world_.host.process.launch([this] { return begin(); }); });
         lookAround();
         const double end = static_cast<double>(life_.days) * secondsOfDay;
@@ -45,7 +47,8 @@ public:
                 happen(life_.events[nextEvent_++]);
             lookAround();
         }
-        Play result{trace_.hash(), day(), verdict_.violation};
+        Play result{.trace = trace_.hash(), .days = day(), .violation = verdict_.violation};
+        if (recorder_) result.chronicle = recorder_->chronicle();
         disarm();
         world_.host.queues.letWaitingTasksGo();
         clients_.processEnds();
@@ -164,6 +167,7 @@ private:
     void lookAround() {
         clients_.check();
         invariants_.check();
+        if (recorder_) recorder_->look();
         for (const platform::LogEntry& line : world_.host.log.entries()) takeDown(line);
         for (const sim::SentRequest& sent : world_.host.http.sent()) {
             trace_.add(sent.request.url);
@@ -189,11 +193,13 @@ private:
     }
 
     const Life& life_;
+    const bool isRecorded_;
     Verdict verdict_;
     Trace trace_;
     World world_;
     Clients clients_{world_, verdict_, trace_};
     Invariants invariants_{world_, clients_, verdict_};
+    std::optional<timeline::Recorder> recorder_;
     std::size_t nextEvent_ = 0;
     double nextCheckAt_ = 0;
     std::optional<double> relaunchAt_;  // while there is no process

@@ -5,6 +5,7 @@
 #include <functional>
 #include <optional>
 
+#include "timeline/chronicle.h"
 #include "vrx/sim/interference.h"
 #include "vrxsim/life.h"
 #include "vrxsim/verdict.h"
@@ -14,12 +15,14 @@ namespace vrx::simulation {
 struct PlayOptions {
     sim::Defect planted = sim::Defect::None;            // in the simulated host
     std::function<void(std::string_view line)> show{};  // gets what happens, line by line
+    bool isRecorded = false;                            // for a chronicle
 };
 
 struct Play {
     std::uint64_t trace = 0;  // equal for equal plays
     double days = 0;          // up to the end, or to the violation
     std::optional<Violation> violation{};
+    std::optional<timeline::Chronicle> chronicle{};
 };
 
 Play play(const Life& life, const PlayOptions& options = {});
