@@ -181,7 +181,8 @@ Outcome replay(const Options& options) {
     Outcome outcome{.document = {{"days", play.days}, {"trace", hashText(play.trace)}},
                     .text = fixed(play.days, 2) + " days, trace " + hashText(play.trace) + "\n"};
     if (play.chronicle) {
-        const std::string problem = timeline::writePage(options.page, *play.chronicle, "The life in " + options.file);
+        const std::string problem = timeline::writePage(
+            options.page, *play.chronicle, "The life in " + options.file.substr(options.file.rfind('/') + 1));
         if (!problem.empty())
             return failed(ExitCode::NoAnswer, "cannot write the page to " + problem, "Name another file with --html.",
                           "not-written");
