@@ -183,15 +183,19 @@ void Recorder::noteFiring(const std::string& identifier) {
 void Recorder::lookAtItems() {
     const std::vector<FollowUpItem>& items = host_.followUps.pending(followUpClientIdentifier());
     const Date now = moment();
-    for (Presence& presence : presences_)
-        if (!presence.until && std::ranges::find(items, presence.item) == items.end()) {
+    const auto isGone = [&](const Presence& presence) {
+        return std::ranges::find(items, presence.item) == items.end();
+    };
+    for (Presence& presence : present_)
+        if (isGone(presence)) {
             presence.until = now;
+            past_.push_back(presence);
             lastChange_ = now;
         }
+    std::erase_if(present_, isGone);
     for (const FollowUpItem& item : items) {
-        const auto isThis = [&](const Presence& presence) { return !presence.until && presence.item == item; };
-        if (std::ranges::any_of(presences_, isThis)) continue;
-        presences_.push_back({.item = item, .from = now, .clockAhead = host_.clock.now() - now});
+        if (std::ranges::find(present_, item, &Presence::item) != present_.end()) continue;
+        present_.push_back({.item = item, .from = now, .clockAhead = host_.clock.now() - now});
         lastChange_ = now;
     }
 }
@@ -226,13 +230,15 @@ Chronicle Recorder::chronicle() {
     const Duration day = host::dayInterval(scope.settings());
     const Date end = moment();
     for (DeviceLane& lane : lanes_) lane.shown.clear();
-    for (const Presence& presence : presences_) {
+    const auto add = [&](const Presence& presence) {
         const std::string* serialNumber = serialNumberOfItem(presence.item);
         std::vector<Shown>& looks = laneOf(serialNumber ? *serialNumber : "").shown;
         addLooks(looks, presence.item, presence.from, presence.until.value_or(end), presence.clockAhead, day,
                  host_.locale);
         if (!presence.until && !looks.empty() && looks.back().until == end) looks.back().until.reset();
-    }
+    };
+    std::ranges::for_each(past_, add);
+    std::ranges::for_each(present_, add);
     // The item of the older layout can have gone in the moment in which it was seen.
     std::erase_if(lanes_, [](const DeviceLane& lane) { return lane.serialNumber.empty() && lane.shown.empty(); });
     return {.from = begin_, .until = end, .devices = lanes_, .activities = activities_};

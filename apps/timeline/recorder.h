@@ -50,7 +50,8 @@ private:
     const platform::Date begin_ = host_.clock.now();
     const platform::Duration elapsedAtBegin_ = host_.clock.elapsed();
     std::vector<DeviceLane> lanes_;
-    std::vector<Presence> presences_;
+    std::vector<Presence> past_;     // in the order in which they ended
+    std::vector<Presence> present_;  // in the order in which they began
     std::vector<ActivityLane> activities_;
     std::size_t runCount_ = 0;
     platform::Date lastChange_ = begin_;

@@ -51,8 +51,15 @@ std::vector<std::string> rowOf(const Shown& shown, const Shown* before, const Da
 std::string shownText(const DeviceLane& lane, const Dates& dates) {
     if (lane.shown.empty()) return "  Nothing is shown.\n";
     Rows rows{{"", "SHOWN FROM", "UNTIL", "", "TEXT"}};
-    for (std::size_t at = 0; at < lane.shown.size(); ++at)
+    constexpr std::size_t readable = 60, kept = 20;  // of more than that, so many at both ends
+    const std::size_t count = lane.shown.size();
+    for (std::size_t at = 0; at < count; ++at) {
+        if (count > readable && at == kept) {
+            at = count - kept;
+            rows.push_back({"", std::to_string(count - 2 * kept) + " more", "", "", "…"});
+        }
         rows.push_back(rowOf(lane.shown[at], at > 0 ? &lane.shown[at - 1] : nullptr, dates));
+    }
     return table(rows, apps::Fit::BreakLast);
 }
 

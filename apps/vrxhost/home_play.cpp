@@ -30,8 +30,9 @@ namespace {
 // The simulated files from which the agent of the play has what a server answers.
 constexpr const char* recordsUrl = "file:///server/Warranty.plist";
 constexpr const char* versionsUrl = "file:///server/ServerVersion.plist";
-// Test settings can make days of seconds: then there is no end to what happens.
-constexpr std::size_t mostRuns = 10'000;
+// More than an activity makes in a year that runs again and again at once, a quarter of an hour apart. Test settings
+// can make days and pauses of seconds: then there is no end to what happens.
+constexpr std::size_t mostRuns = 40'000;
 constexpr Duration step = std::chrono::hours(1), quietTime = std::chrono::days(1);
 
 std::string propertyList(const Value& root) {
@@ -44,8 +45,28 @@ std::optional<std::string> fileOfRecord(const std::string& serialNumber) {
     return url->withPathExtension(platform::filled("%@.%@", {serialNumber, url->pathExtension()})).filePath();
 }
 
+// As they were negotiated last, else all that the agent knows.
+Value serverVersions() {
+    namespace settings = platform::settings;
+    const platform::DefaultsStore& defaults = platform::Platform::current().defaultsStore();
+    const Value negotiated = defaults.get(serverVersionCacheKey);
+    if (negotiated.asDictionary()) return negotiated;
+    Dictionary versions;
+    for (const std::string_view key : {settings::lowServerVersion, settings::highServerVersion})
+        versions[std::string(key)] = defaults.integer(key);
+    return versions;
+}
+
 std::string fileOf(const char* url) {
     return platform::Url::parse(url)->filePath().value_or("");
+}
+
+// What is otherwise at present.
+std::string butNow(const MachineSituation& machine) {
+    std::string text;
+    if (!machine.isNetworkAvailable) text += " Now there is no network, says " + machine.networkJudge + ".";
+    if (machine.shouldDefer) text += " Now deferral is asked for, says " + machine.deferralJudge + ".";
+    return text;
 }
 
 std::string joined(const std::vector<std::string>& words) {
@@ -61,6 +82,7 @@ HomePlay::HomePlay(const HomeState& state, const AgentView& view) : state_(state
         if (failure_.empty()) failure_ = text;
         host_.queues.stop();
     };
+    host_.log.lowest = platform::Level::Error;  // composing what nobody reads would take most of the time
     host_.clock.set(state_.now.wall);
     takeDevice(view);
     takeSettings(view);
@@ -110,18 +132,7 @@ void HomePlay::takeRecords(const AgentView& view) {
         if (const auto content = files.read(view.home() + path.substr(homeSize)))
             host_.files.put(path, {reinterpret_cast<const char*>(content->data()), content->size()});
     };
-    const Value versions = host_.defaults.get(serverVersionCacheKey);
-    const auto number = [](std::string_view key) {
-        return Value(platform::Platform::current().defaultsStore().integer(key));
-    };
-    namespace settings = platform::settings;
-    host_.files.put(
-        fileOf(versionsUrl),
-        propertyList(
-            versions.asDictionary()
-                ? versions
-                : Dictionary{{std::string(settings::lowServerVersion), number(settings::lowServerVersion)},
-                             {std::string(settings::highServerVersion), number(settings::highServerVersion)}}));
+    host_.files.put(fileOf(versionsUrl), propertyList(serverVersions()));
     take(VRXWarranty::_legacyWarrantyPath());
     VRXAgentDefaultWarrantyProvider provider(platform::vendorIdentifier(platform::settingsAppRemainder), {});
     for (const auto& [serialNumber, device] : VRXDevicesManager::sharedManager()->allDevices()) {
@@ -184,9 +195,10 @@ timeline::Chronicle HomePlay::chronicle() {
     chronicle.isComplete = isOver_;
     if (end_) chronicle.until = *end_;
     auto& assumptions = chronicle.assumptions;
-    assumptions.emplace_back(
+    assumptions.push_back(
         "The machine is on, its network is there, and nothing asks for deferral, so no activity uses its grace "
-        "period.");
+        "period." +
+        butNow(state_.machine));
     assumptions.push_back("The coverage server answers with the records that are cached" +
                           (withoutRecord_.empty() ? std::string(".")
                                                   : ". There is none that counts of " + joined(withoutRecord_) +

@@ -29,6 +29,7 @@ platform::Result<HomeState> readHomeState(AgentView& view) {
     state.account = platform.accountStore().primaryCloudAccount();
     state.carriers = platform.telephonyNetworkInfo().serviceSubscriberCellularProviders();
     state.timeZoneOffset = platform.clock().timeZoneOffset();
+    state.machine = examineMachine(view.profile());
     state.isAgentRunning = host::HomeLock::isInUse(view.home());
     return state;
 }

@@ -11,6 +11,7 @@
 #include "vrx/platform/activity_timing.h"
 #include "vrx/platform/follow_up_controller.h"
 #include "vrxhost/agent_view.h"
+#include "vrxhost/machine_situation.h"
 
 namespace vrx::apps {
 
@@ -23,6 +24,7 @@ struct HomeState {
     std::optional<platform::CloudAccount> account;
     std::map<std::string, platform::Carrier> carriers;
     std::chrono::seconds timeZoneOffset{};
+    MachineSituation machine;
     bool isAgentRunning = false;
     // What the next start of an agent finds: for what the system has fired its own activities, and what has changed.
     std::optional<std::string> agentVersion, boot;
