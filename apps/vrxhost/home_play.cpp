@@ -49,7 +49,7 @@ std::optional<std::string> fileOfRecord(const std::string& serialNumber) {
 Value serverVersions() {
     namespace settings = platform::settings;
     const platform::DefaultsStore& defaults = platform::Platform::current().defaultsStore();
-    const Value negotiated = defaults.get(serverVersionCacheKey);
+    Value negotiated = defaults.get(serverVersionCacheKey);
     if (negotiated.asDictionary()) return negotiated;
     Dictionary versions;
     for (const std::string_view key : {settings::lowServerVersion, settings::highServerVersion})
