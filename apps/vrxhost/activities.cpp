@@ -17,17 +17,6 @@ using platform::Value;
 
 namespace {
 
-// The outcome of a run. The last one without an end is under way, or was when the agent ended.
-const char* outcomeOf(const host::ActivityRun& run, bool canBeRunning) {
-    if (!run.outcome) return canBeRunning ? "running" : "interrupted";
-    switch (*run.outcome) {
-        case host::RunOutcome::Finished: return "finished";
-        case host::RunOutcome::Deferred: return "deferred";
-        case host::RunOutcome::Interrupted: return "interrupted";
-    }
-    return "";
-}
-
 Value valueOf(const std::optional<Date>& date) {
     return date ? Value(*date) : Value();
 }

@@ -30,13 +30,16 @@ AgentActivity& entryFor(std::vector<AgentActivity>& activities, const std::strin
 
 }  // namespace
 
+std::vector<AgentActivity> ownActivities() {
+    return {own<VRXPostUpgradeActivity>(), own<VRXPostBootActivity>(), own<VRXOutreachActivity>(),
+            own<VRXFollowUpPost>(), own<VRXFollowUpRefresh>()};
+}
+
 platform::Result<std::vector<AgentActivity>> agentActivities(AgentView& view) {
     const platform::Result<host::ActivityList> list = host::listActivities(view.database());
     if (!list) return list.error();
     const platform::Moment now = host::presentMoment();
-    std::vector<AgentActivity> activities{own<VRXPostUpgradeActivity>(), own<VRXPostBootActivity>(),
-                                          own<VRXOutreachActivity>(), own<VRXFollowUpPost>(),
-                                          own<VRXFollowUpRefresh>()};
+    std::vector<AgentActivity> activities = ownActivities();
     for (const host::ScheduledActivity& scheduled : list->scheduled) {
         AgentActivity& activity = entryFor(activities, scheduled.identifier);
         activity.scheduled = scheduled;
@@ -44,6 +47,16 @@ platform::Result<std::vector<AgentActivity>> agentActivities(AgentView& view) {
     }
     for (const host::ActivityRun& run : list->runs) entryFor(activities, run.identifier).lastRun = run;
     return activities;
+}
+
+const char* outcomeOf(const host::ActivityRun& run, bool canBeRunning) {
+    if (!run.outcome) return canBeRunning ? "running" : "interrupted";
+    switch (*run.outcome) {
+        case host::RunOutcome::Finished: return "finished";
+        case host::RunOutcome::Deferred: return "deferred";
+        case host::RunOutcome::Interrupted: return "interrupted";
+    }
+    return "";
 }
 
 const AgentActivity& activityNamed(const std::vector<AgentActivity>& activities, std::string_view name) {

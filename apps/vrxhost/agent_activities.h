@@ -22,8 +22,13 @@ struct AgentActivity {
     std::optional<platform::Date> nextRun() const { return due ? std::max(due, targetDate) : std::nullopt; }
 };
 
+// The agent's own, in the order of their use, with their target dates alone.
+std::vector<AgentActivity> ownActivities();
 // All activities of the agent, in the order of their use, then whatever else is scheduled.
 platform::Result<std::vector<AgentActivity>> agentActivities(AgentView& view);
+
+// The outcome of a run. The last one without an end is under way, or was when the agent ended.
+const char* outcomeOf(const host::ActivityRun& run, bool canBeRunning);
 
 // The activity with that last part of its identifier, such as "outreach".
 const AgentActivity& activityNamed(const std::vector<AgentActivity>& activities, std::string_view name);

@@ -57,9 +57,11 @@ std::vector<std::string> ErrorLog::take() {
 }
 
 std::string AgentLocale::preferredLocaleIdentifier() const {
-    if (profile_.content()->language) return profile_.preferredLocaleIdentifier();
-    const std::optional<std::string> found = host::storedFact(database_, host::stored_facts::language);
-    return found ? *found : profile_.preferredLocaleIdentifier();
+    return after(host::storedFact(database_, host::stored_facts::language));
+}
+
+std::string AgentLocale::after(const std::optional<std::string>& noted) const {
+    return noted && !profile_.content()->language ? *noted : profile_.preferredLocaleIdentifier();
 }
 
 // The platform gets its facilities once all exist. Until then it can only log.
@@ -102,11 +104,16 @@ AgentView::AgentView(const std::string& home, const std::optional<std::string>& 
 MaybeError AgentView::open() {
     MaybeError error = database_.open();
     if (error) return error;
-    database_.read([this](host::Connection& connection) {
-        profile_.tell(host::keptFacts(connection, profile_.machine().identifier()));
-    });
+    readAtOnce([](host::Connection&) {});
     defaults_.useStore();
     return std::nullopt;
+}
+
+MaybeError AgentView::readAtOnce(const std::function<void(host::Connection&)>& body) {
+    return database_.read([&](host::Connection& connection) {
+        profile_.tell(host::keptFacts(connection, profile_.machine().identifier()));
+        body(connection);
+    });
 }
 
 void AgentView::use(platform::Queues* queues, platform::HttpSessions* sessions) {

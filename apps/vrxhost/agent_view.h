@@ -68,6 +68,8 @@ public:
     AgentLocale(const host::DeviceProfile& profile, host::Database& database)
         : profile_(profile), database_(database) {}
     std::string preferredLocaleIdentifier() const override;
+    // The same where the agent noted that one last.
+    std::string after(const std::optional<std::string>& noted) const;
     std::string decimalText(std::uint64_t number) const override { return profile_.decimalText(number); }
 
 private:
@@ -85,6 +87,10 @@ public:
     // Reads the database from now on, if possible. Until then settings have their registered values, and nothing is
     // pending.
     platform::MaybeError open();
+    // Reads the database in one transaction. What services have told is read in it as well.
+    platform::MaybeError readAtOnce(const std::function<void(host::Connection&)>& body);
+    // The agent's language, where it noted that one last.
+    std::string language(const std::optional<std::string>& noted) const { return locale_.after(noted); }
 
     const std::string& home() const { return home_; }
     host::Database& database() { return database_; }

@@ -95,26 +95,27 @@ Explanation explainUnposted(const Circumstances& device) {
                 std::nullopt,
                 next,
                 askForOutreach};
-    if (next == NextStep::Outreach && device.isCarrierOut)
+    if (next == NextStep::Outreach && device.isCarrierOut && !device.posting)
         return {NotOffered, "carrier", "the record leaves out a carrier of this device", std::nullopt, next};
 
     const Date run = std::max(device.now, next == NextStep::Post ? *device.postRun : *device.outreach);
     if (run >= end) return {NotOffered, "ends-first", "the offer ends before the next run", std::nullopt, next};
-    if (next == NextStep::Post && !device.posting)
+    if (!device.posting)
         return {Waiting,
                 "posts-end",
-                "the next post comes too early for it, and by the agent's rule for dates none follows" + posted,
+                (next == NextStep::Post ? "the next post" : "the post that the next outreach schedules") +
+                    (" comes too early for it, and by the agent's rule for dates none follows" + posted),
                 std::nullopt,
                 next,
                 askForOutreach};
     if (run < day) {
         Explanation explanation = explainPostDate(device);
-        explanation.until = next == NextStep::Post ? *device.posting : day;
+        explanation.until = device.posting;
         explanation.next = next;
         return explanation;
     }
     if (next == NextStep::Post) return {Waiting, "next-post", "it is due, and the next post shows it", run, next};
-    return {Waiting, "next-outreach", "it is due, and the next outreach has it posted", run, next};
+    return {Waiting, "next-outreach", "it is due, and the next outreach has it posted", device.posting, next};
 }
 
 }  // namespace

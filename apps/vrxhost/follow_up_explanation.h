@@ -26,8 +26,9 @@ struct FollowUpCircumstances {
     std::optional<platform::Date> displayDate{};  // that the record names
     // When the activities work next.
     std::optional<platform::Date> outreach{};
-    std::optional<platform::Date> postRun{};
-    std::optional<platform::Date> posting{};  // by the next post run, or one that follows it by the agent's date rule
+    std::optional<platform::Date> postRun{};  // null when an outreach comes before it and schedules another
+    // By the next post run, the one that the next outreach schedules, or one that follows it by the agent's date rule.
+    std::optional<platform::Date> posting{};
 };
 
 enum class FollowUpState : std::uint8_t { Shown, Dismissed, Waiting, NotOffered };

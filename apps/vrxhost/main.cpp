@@ -14,6 +14,7 @@ int main(int argc, char** argv) {
     addActivitiesVerb(line, places);
     addFireVerb(line, places);
     addWhyVerb(line, places);
+    addTimelineVerb(line, places);
     addProfileVerb(line, places);
     addDoctorVerb(line, places);
     addReportVerb(line, places);

@@ -35,6 +35,7 @@ void addNotes(CommandLine& line, const wire::LocationOverrides& places) {
     ManualNotes& notes = line.notes();
     notes.examples = {{"vrxhost doctor", "Tells what is wrong, and what to do first"},
                       {"vrxhost why SERIAL", "Tells why there is a follow-up for a device, or none"},
+                      {"vrxhost timeline --html page.html", "Writes a page of what will be shown when"},
                       {"vrxhost fire outreach", "Has the agent look for offers now"},
                       {"vrxhost defaults write WarrantyURL --string file:///srv/Warranty.plist",
                        "Has the agent take its records from a file"}};

@@ -14,6 +14,7 @@ void addFollowUpVerbs(CommandLine& line, const wire::LocationOverrides& places);
 void addActivitiesVerb(CommandLine& line, const wire::LocationOverrides& places);
 void addFireVerb(CommandLine& line, const wire::LocationOverrides& places);
 void addWhyVerb(CommandLine& line, const wire::LocationOverrides& places);
+void addTimelineVerb(CommandLine& line, const wire::LocationOverrides& places);
 void addProfileVerb(CommandLine& line, const wire::LocationOverrides& places);
 void addDoctorVerb(CommandLine& line, const wire::LocationOverrides& places);
 

@@ -3,6 +3,8 @@
 #include <memory>
 #include <set>
 
+#include "timeline/document.h"
+#include "timeline/timeline_text.h"
 #include "vrx/coverage/cache_metadata.h"
 #include "vrx/devices/devices_manager.h"
 #include "vrx/devices/records/device_info.h"
@@ -22,6 +24,8 @@
 #include "vrxhost/agent_view.h"
 #include "vrxhost/follow_up_explanation.h"
 #include "vrxhost/home.h"
+#include "vrxhost/home_play.h"
+#include "vrxhost/moment.h"
 #include "vrxhost/verbs.h"
 
 namespace vrx::apps {
@@ -75,6 +79,20 @@ PostDecision decide(const VRXDeviceInfo& info, const PostSettings& settings, con
     const std::string hash = platform::sha256Hash(info.device()->serialNumber().value_or(""));
     return decidePost(
         info, {.isDismissed = settings.dismissed.contains(hash), .outreachDelay = settings.dates.outreachDelay}, clock);
+}
+
+// The post that an outreach at that date schedules: when the first offer is due that it finds, if the records stay as
+// they are. Null when it finds none.
+std::optional<Date> postAfterOutreach(const DeviceInfoList& infos, Date outreach) {
+    std::optional<Date> first;
+    for (const InfoPtr& info : infos) {
+        const auto record = info->warranty();
+        if (!record || !record->qxOfferDisplay()) continue;
+        if (!VRXOutreachActivity::currentDeviceShouldReceiveOutreachForWarranty(*record)) continue;
+        const std::optional<Date> due = dueDateInRecord(*record);
+        if (due && *due < first.value_or(Date::max())) first = due;
+    }
+    return first ? std::optional(std::max(*first, outreach)) : std::nullopt;
 }
 
 // Predicts when the device's follow-up is posted, by the run at that date or by the runs that follow from it, if the
@@ -156,8 +174,8 @@ void addRecord(Findings& findings, const CachedRecord& cached, const std::string
 }
 
 // Evaluates the agent's own rules with what it would read now; stores nothing.
-Findings examine(AgentView& view, const std::string& serialNumber, const std::set<std::string>& pending,
-                 const Activities& activities) {
+Findings examine(const std::string& serialNumber, const std::set<std::string>& pending, const Activities& activities,
+                 Duration minimumInterval) {
     const platform::Clock& clock = Platform::current().clock();
     const DevicesBySerialNumber devices = VRXDevicesManager::sharedManager()->allDevices();
     const auto found = devices.find(serialNumber);
@@ -184,9 +202,15 @@ Findings examine(AgentView& view, const std::string& serialNumber, const std::se
     state.refresh = decideRefresh(*info, {.isPending = state.isPending}, clock);
     state.outreach = activities.outreach.nextRun();
     state.postRun = activities.post.nextRun();
-    if (state.postRun)
-        state.posting = predictedPosting(serialNumber, infos, settings, std::max(state.now, *state.postRun),
-                                         host::minimumInterval(view.profile()));
+    // An outreach that comes first schedules the post anew.
+    std::optional<Date> post = state.postRun;
+    if (state.outreach && (!post || *state.outreach < *post))
+        if (const auto anew = postAfterOutreach(infos, std::max(state.now, *state.outreach))) {
+            post = anew;
+            state.postRun.reset();
+        }
+    if (post)
+        state.posting = predictedPosting(serialNumber, infos, settings, std::max(state.now, *post), minimumInterval);
 
     findings.nextPost = nextPostDate(infos, settings.dates, state.now);
     findings.nextRefresh = nextRefreshDate(shown, true, RefreshDateSettings::read(), state.now);
@@ -266,25 +290,72 @@ Outcome report(const std::string& serialNumber, const Findings& findings, const 
     return outcome;
 }
 
-Outcome why(AgentView& view, const std::string& serialNumber) {
-    const Result<std::vector<AgentActivity>> all = agentActivities(view);
+struct WhyOptions {
+    std::string serialNumber;
+    std::string moment;
+};
+
+Outcome explain(const std::string& serialNumber, const std::vector<AgentActivity>& all, const AgentView& view,
+                bool isAgentRunning) {
     const Result<std::set<std::string>> pending = pendingSerialNumbers();
-    if (!all || !pending) return databaseFailure(all ? pending.error() : all.error(), "not-read");
-    const Activities activities{activityNamed(*all, "outreach"), activityNamed(*all, "followuppost"),
-                                activityNamed(*all, "followuprefresh")};
-    return report(serialNumber, examine(view, serialNumber, *pending, activities), activities,
-                  host::HomeLock::isInUse(view.home()));
+    if (!pending) return databaseFailure(pending.error(), "not-read");
+    const Activities activities{activityNamed(all, "outreach"), activityNamed(all, "followuppost"),
+                                activityNamed(all, "followuprefresh")};
+    const Findings findings = examine(serialNumber, *pending, activities, host::minimumInterval(view.profile()));
+    return report(serialNumber, findings, activities, isAgentRunning);
+}
+
+Outcome whyNow(AgentView& view, const std::string& serialNumber) {
+    const Result<std::vector<AgentActivity>> all = agentActivities(view);
+    if (!all) return databaseFailure(all.error(), "not-read");
+    return explain(serialNumber, *all, view, host::HomeLock::isInUse(view.home()));
+}
+
+void addLook(Outcome& outcome, const timeline::Chronicle& chronicle, const std::string& serialNumber) {
+    outcome.document["shown"] = nullptr;
+    const auto lane = std::ranges::find(chronicle.devices, serialNumber, &timeline::DeviceLane::serialNumber);
+    if (lane == chronicle.devices.end() || lane->shown.empty() || lane->shown.back().until) return;
+    const timeline::Shown& look = lane->shown.back();
+    outcome.document["shown"] = timeline::documentOf(look);
+    outcome.text += "Shown as\n  " + printable(look.title) + (look.hasBadge ? "  [badge]" : "") +
+                    (look.isExpired ? "  [expired]" : "") + "\n  " + printable(look.text) + "\n";
+}
+
+// The agent's own rules at a moment to come, with what a play of the home has come to by then.
+Outcome whyThen(AgentView& view, const WhyOptions& options) {
+    const Result<HomeState> state = readHomeState(view);
+    if (!state) return databaseFailure(state.error(), "not-read");
+    const std::optional<Date> moment = momentFrom(options.moment, state->now.wall);
+    if (!moment || *moment < state->now.wall)
+        return failed(ExitCode::Usage, "--at names a moment that is over", "Of the past only the last runs are known.");
+    HomePlay play(*state, view);
+    play.playUntil(*moment);
+    if (!play.failure().empty() || play.isCutShort())
+        return failed(ExitCode::NoAnswer,
+                      play.isCutShort() ? "too much happens before that moment" : "the play failed: " + play.failure(),
+                      "vrxhost timeline shows how far it can be told.", "failed");
+    Outcome outcome = explain(options.serialNumber, play.activities(), view, state->isAgentRunning);
+    const timeline::Chronicle chronicle = play.chronicle();
+    addLook(outcome, chronicle, options.serialNumber);
+    outcome.document["assumptions"] = platform::Array(chronicle.assumptions.begin(), chronicle.assumptions.end());
+    outcome.text += timeline::assumptionsText(chronicle);
+    return outcome;
 }
 
 }  // namespace
 
 void addWhyVerb(CommandLine& line, const wire::LocationOverrides& places) {
-    auto serialNumber = std::make_shared<std::string>();
+    auto options = std::make_shared<WhyOptions>();
     auto profile = std::make_shared<std::optional<std::string>>();
     CLI::App* verb =
         line.add("why", "Tells why a device's follow-up is shown, or is not",
-                 readOnlyVerb(places, profile, [serialNumber](AgentView& view) { return why(view, *serialNumber); }));
-    verb->add_option("SERIAL", *serialNumber, "The device's serial number")->required();
+                 readOnlyVerb(places, profile, [options](AgentView& view) {
+                     return options->moment.empty() ? whyNow(view, options->serialNumber) : whyThen(view, *options);
+                 }));
+    verb->add_option("SERIAL", options->serialNumber, "The device's serial number")->required();
+    verb->add_option("--at", options->moment, "The same at a moment to come, such as 2027-03-01 or +30d")
+        ->type_name("DATE")
+        ->check(momentMistake, "");
     addProfileOption(verb, *profile);
 }
 

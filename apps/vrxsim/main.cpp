@@ -14,6 +14,7 @@
 #include <tuple>
 
 #include "common/command_line.h"
+#include "timeline/page.h"
 #include "vrxsim/apart.h"
 #include "vrxsim/defects.h"
 #include "vrxsim/fleet_verb.h"
@@ -41,6 +42,7 @@ struct Options {
     std::string level = "rough";
     std::string defect;
     std::string file;
+    std::string page;
     std::uint64_t seed = 1;
     bool isTraced = false;
 };
@@ -173,12 +175,20 @@ platform::Result<simulation::Life> lifeIn(const std::string& file) {
 Outcome replay(const Options& options) {
     const platform::Result<simulation::Life> life = lifeIn(options.file);
     if (!life) return failed(ExitCode::Refused, life.error().text, "docs/simulation.md shows a life.", "not-a-life");
-    simulation::PlayOptions how{.planted = defectOf(options)};
+    simulation::PlayOptions how{.planted = defectOf(options), .isRecorded = !options.page.empty()};
     if (options.isTraced)
         how.show = [](std::string_view line) { std::fprintf(stderr, "%s\n", printable(line).c_str()); };
     const simulation::Play play = simulation::play(*life, how);
     Outcome outcome{.document = {{"days", play.days}, {"trace", hashText(play.trace)}},
                     .text = fixed(play.days, 2) + " days, trace " + hashText(play.trace) + "\n"};
+    if (play.chronicle) {
+        const std::string problem = timeline::writePage(
+            options.page, *play.chronicle, "The life in " + options.file.substr(options.file.rfind('/') + 1));
+        if (!problem.empty())
+            return failed(ExitCode::NoAnswer, "cannot write the page to " + problem, "Name another file with --html.",
+                          "not-written");
+        outcome.document["page"] = options.page;
+    }
     if (!play.violation) return outcome;
     const simulation::Violation& violation = *play.violation;
     outcome.document["rule"] = violation.rule;
@@ -300,6 +310,7 @@ void addVerbs(CommandLine& line, Options& options) {
     verb = line.add("replay", "Plays the life in a file", [&] { return replay(options); });
     verb->add_option("FILE", options.file, "The life")->required();
     verb->add_flag("--trace", options.isTraced, "Show all that happens on standard error");
+    verb->add_option("--html", options.page, "Write what was shown when as a page for a browser")->type_name("FILE");
     addDefect(*verb, options);
     verb = line.add("shrink", "Makes a life that breaks a rule small, and writes it to a file",
                     [&] { return shrink(options); });

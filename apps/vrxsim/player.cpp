@@ -4,6 +4,7 @@
 #include <exception>
 #include <string>
 
+#include "timeline/recorder.h"
 #include "vrx/platform/text.h"
 #include "vrx/service/start_up.h"
 #include "vrxsim/clients.h"
@@ -37,6 +38,7 @@ public:
 
     Play run() {
         for (const Event& event : life_.beginning) happen(event);
+        if (options_.isRecorded) recorder_.emplace(world_.host);
         start([this] { world_.host.process.launch([this] { return begin(); }); });
         lookAround();
         const double end = static_cast<double>(life_.days) * secondsOfDay;
@@ -47,7 +49,8 @@ public:
                 happen(life_.events[nextEvent_++]);
             lookAround();
         }
-        Play result{trace_.hash(), day(), verdict_.violation};
+        Play result{.trace = trace_.hash(), .days = day(), .violation = verdict_.violation};
+        if (recorder_) result.chronicle = recorder_->chronicle();
         disarm();
         world_.host.queues.letWaitingTasksGo();
         clients_.processEnds();
@@ -172,6 +175,7 @@ private:
     }
     void judge() {
         invariants_.check();
+        if (recorder_) recorder_->look();
         for (const platform::LogEntry& line : world_.host.log.entries()) takeDown(line);
         for (const sim::SentRequest& sent : world_.host.http.sent()) {
             trace_.add(sent.request.url);
@@ -201,6 +205,7 @@ private:
     World world_;
     Clients clients_{world_, verdict_, trace_};
     Invariants invariants_{world_, clients_, verdict_};
+    std::optional<timeline::Recorder> recorder_;
     std::size_t nextEvent_ = 0;
     double nextCheckAt_ = 0;
     std::optional<double> relaunchAt_;  // while there is no process

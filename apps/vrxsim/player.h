@@ -5,6 +5,7 @@
 #include <functional>
 #include <optional>
 
+#include "timeline/chronicle.h"
 #include "vrx/sim/http.h"
 #include "vrx/sim/interference.h"
 #include "vrxsim/life.h"
@@ -18,12 +19,14 @@ struct PlayOptions {
     bool isJudged = true;                               // else no rule is looked at, and neither log nor trace is made
     std::function<void(const sim::SentRequest& sent)> takeSent{};  // gets each request that leaves the device
     double shareOfGrace = 0;                                       // by which each firing is put off, from 0 to 1
+    bool isRecorded = false;                                       // for a chronicle
 };
 
 struct Play {
     std::uint64_t trace = 0;  // equal for equal plays
     double days = 0;          // up to the end, or to the violation
     std::optional<Violation> violation{};
+    std::optional<timeline::Chronicle> chronicle{};
 };
 
 Play play(const Life& life, const PlayOptions& options = {});

@@ -33,7 +33,7 @@ void BackgroundActivities::schedule(const platform::ActivityRegistration& regist
     attachment.handler.swap(handler);  // the old handler is released at the end
     if (!registration.isPreregistered) {
         ActivityCriteria criteria = registration.criteria.value_or(ActivityCriteria());
-        Duration interval = registration.isByOwnRun ? platform::minimumInterval : atOnce;
+        Duration interval = registration.isByOwnRun ? minimumInterval_ : atOnce;
         attachment.isRegisteredByOwnRun = registration.isByOwnRun && criteria.delay <= 0;
         platform::DueTime due = platform::dueTime(criteria, interval, now());
         if (shareOfGrace_ > 0)
@@ -113,6 +113,25 @@ void BackgroundActivities::booted() {
     isBootActivityOwed_ = true;
 }
 
+void BackgroundActivities::takeOver(const std::string& identifier, const Registered& registered) {
+    rows_[identifier] = {.criteria = registered.criteria,
+                         .due = platform::dueAfter(registered.timeLeft, now()),
+                         .generation = ++lastGeneration_,
+                         .deferrals = registered.deferrals,
+                         .isInterrupted = registered.isInterrupted};
+}
+
+void BackgroundActivities::takeOverFired(std::string agentVersion, bool isBootActivityFired) {
+    lastVersion_ = std::move(agentVersion);
+    isBootActivityOwed_ = !isBootActivityFired;
+}
+
+std::vector<std::string> BackgroundActivities::registered() const {
+    std::vector<std::string> identifiers;
+    for (const auto& [identifier, row] : rows_) identifiers.push_back(identifier);
+    return identifiers;
+}
+
 std::optional<ActivityCriteria> BackgroundActivities::criteria(const std::string& identifier) const {
     auto row = rows_.find(identifier);
     return row == rows_.end() ? std::nullopt : std::optional(row->second.criteria);
@@ -185,6 +204,7 @@ void BackgroundActivities::fire(const std::string& identifier, int generation) {
     attachment.runningGeneration = generation;
     attachment.doesRunNeedNetwork = rows_.at(identifier).criteria.requiresNetwork;
     firings_.push_back({identifier, clock_.now()});
+    if (firingObserver_) firingObserver_(identifier);
     const CauseScope cause(queues_, identifier);
     ActivityHandler handler = attachment.handler;  // another handler may take its place during the run
     if (interference_.strikes(Defect::HandlerTwice)) handler([](BackgroundActivityResult) {});
@@ -199,7 +219,7 @@ void BackgroundActivities::takeResult(const std::string& identifier, BackgroundA
     if (entry == rows_.end()) return;
     Row& row = entry->second;
     if (row.generation != ranGeneration)  // registered during the run
-        row.due = platform::noSoonerThan(row.due, isByOwnRun ? platform::minimumInterval : atOnce, now());
+        row.due = platform::noSoonerThan(row.due, isByOwnRun ? minimumInterval_ : atOnce, now());
     else if (interference_.planted == Defect::FiringAgain)
         row.due = platform::dueAfter(platform::firingMargin, now());
     else if (result == BackgroundActivityResult::Finished)

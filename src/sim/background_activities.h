@@ -52,9 +52,24 @@ public:
     void processEnded();
     void booted();
 
+    // For a simulation that begins in the midst of a life, before the first start of the process: what an earlier
+    // process has registered. It is due when the time left is over.
+    struct Registered {
+        platform::ActivityCriteria criteria{};
+        platform::Duration timeLeft{};
+        int deferrals = 0;           // deferred or interrupted runs in a row
+        bool isInterrupted = false;  // a run of it was under way when that process ended
+    };
+    void takeOver(const std::string& identifier, const Registered& registered);
+    // What the system has fired on its own by then: the upgrade activity of that version, and that of this boot.
+    void takeOverFired(std::string agentVersion, bool isBootActivityFired);
+    // The least time between a run and the next one that it registers with no delay.
+    void setMinimumInterval(platform::Duration interval) { minimumInterval_ = interval; }
+
     // What is registered; null once an activity has finished.
     std::optional<platform::ActivityCriteria> criteria(const std::string& identifier) const;
     std::optional<platform::Duration> timeLeft(const std::string& identifier) const;
+    std::vector<std::string> registered() const;
     bool isRunning() const;
 
     struct Firing {
@@ -66,6 +81,10 @@ public:
     const std::vector<Firing>& firings() const { return firings_; }
     void forgetFirings() { firings_.clear(); }
     int firingCount(std::string_view identifier) const;
+    // Called at each firing, before its handler.
+    void setFiringObserver(std::function<void(const std::string& identifier)> observer) {
+        firingObserver_ = std::move(observer);
+    }
 
 private:
     // Stored.
@@ -113,6 +132,8 @@ private:
     bool isNetworkMetered_ = false;
     double shareOfGrace_ = 0;
     std::vector<Firing> firings_;
+    std::function<void(const std::string& identifier)> firingObserver_;
+    platform::Duration minimumInterval_ = platform::minimumInterval;
 };
 
 }  // namespace vrx::sim

@@ -27,6 +27,7 @@ public:
             pending().push_back(item);
         else
             *present = item;
+        service_.changed();
         return std::nullopt;
     }
     MaybeError clearPendingFollowUpItems(const std::vector<std::string>& uniqueIdentifiers) override {
@@ -37,6 +38,7 @@ public:
         std::erase_if(pending(), [&](const FollowUpItem& item) {
             return std::ranges::find(uniqueIdentifiers, item.uniqueIdentifier) != uniqueIdentifiers.end();
         });
+        service_.changed();
         return std::nullopt;
     }
     Result<std::vector<FollowUpItem>> pendingFollowUpItems() override {

@@ -2,6 +2,7 @@
 // Each request is recorded and may be made to fail.
 #pragma once
 
+#include <functional>
 #include <map>
 #include <memory>
 #include <string>
@@ -34,6 +35,8 @@ public:
         const auto failure = failures_.find(request);
         return failure != failures_.end() && failure->second > 0;
     }
+    // Called after each request that has changed what is pending.
+    void setChangeObserver(std::function<void()> observer) { changeObserver_ = std::move(observer); }
     // Every request of every client, failed ones included: "list", "post IDENTIFIER", "clear IDENTIFIER IDENTIFIER".
     const std::vector<std::string>& asked() const { return asked_; }
     void forgetAsked() { asked_.clear(); }
@@ -43,11 +46,15 @@ private:
 
     // Records the request and returns the failure that is scripted for it.
     platform::MaybeError begin(Request request, std::string text);
+    void changed() const {
+        if (changeObserver_) changeObserver_();
+    }
 
     const Interference& interference_;
     std::map<std::string, std::vector<platform::FollowUpItem>> pending_;
     std::map<Request, int> failures_;
     std::vector<std::string> asked_;
+    std::function<void()> changeObserver_;
 };
 
 }  // namespace vrx::sim

@@ -122,12 +122,18 @@ Dictionary DefaultsStore::dictionaryRepresentation() const {
     if (presets_)
         for (const auto& [key, value] : *presets_()) all[key] = value;
     logFailure(database_.read([&](Connection& connection) {
-        Statement& rows = connection.statement(selectAll);
-        while (rows.step())
-            if (Value value = storedValue(rows, rows.text(1)); !value.isNull()) all[std::string(rows.text(1))] = value;
+        for (const auto& [key, value] : storedSettings(connection)) all[key] = value;
     }),
                "read", "list");
     return all;
+}
+
+Dictionary storedSettings(Connection& connection) {
+    Dictionary settings;
+    Statement& rows = connection.statement(selectAll);
+    while (rows.step())
+        if (Value value = storedValue(rows, rows.text(1)); !value.isNull()) settings[std::string(rows.text(1))] = value;
+    return settings;
 }
 
 Value DefaultsStore::unwritten(std::string_view key) const {

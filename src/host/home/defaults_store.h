@@ -54,4 +54,7 @@ private:
     platform::Dictionary registered_;
 };
 
+// Every stored setting, without presets and registered values. Within a transaction.
+platform::Dictionary storedSettings(Connection& connection);
+
 }  // namespace vrx::host

@@ -135,4 +135,12 @@ bool FollowUpControllers::isPending(Connection& connection, const Database::Stam
     return row.step() && storedItem(row) == item;
 }
 
+std::vector<FollowUpItem> pendingFollowUps(Connection& connection, const std::string& client) {
+    std::vector<FollowUpItem> items;
+    Statement& rows = connection.statement(selectAll).bind(0, client);
+    while (rows.step())
+        if (std::optional<FollowUpItem> item = storedItem(rows)) items.push_back(*std::move(item));
+    return items;
+}
+
 }  // namespace vrx::host

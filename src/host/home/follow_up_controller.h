@@ -49,4 +49,7 @@ private:
     Copies copies_;  // used within Database::peek only, so by one thread at a time
 };
 
+// What is pending for a client. Within a transaction.
+std::vector<platform::FollowUpItem> pendingFollowUps(Connection& connection, const std::string& client);
+
 }  // namespace vrx::host

@@ -50,6 +50,18 @@ bool includes(const std::set<std::string>& all, const std::set<std::string>& som
 
 }  // namespace
 
+std::vector<std::string_view> owedNotifications(Connection& connection, const DeviceProfile& profile,
+                                                const std::string& language) {
+    const std::set<std::string> watches = pairedWatches(profile);
+    const std::optional<std::string> lastLanguage = storedFact(connection, stored_facts::language);
+    const std::optional<std::string> lastWatches = storedFact(connection, stored_facts::pairedWatches);
+    std::vector<std::string_view> owed;
+    if (lastLanguage && *lastLanguage != language) owed.push_back(platform::languageChangedNotification);
+    if (lastWatches && !includes(linesOf(*lastWatches), watches)) owed.push_back(platform::devicePairedNotification);
+    if (lastWatches && !includes(watches, linesOf(*lastWatches))) owed.push_back(platform::deviceUnpairedNotification);
+    return owed;
+}
+
 void ProfileNotifier::start(sd_event* loop, std::function<void()> onEdit, platform::Duration pause) {
     watch_ = std::make_unique<FileWatch>(loop, profile_.sources(), pause, [this, onEdit = std::move(onEdit)] {
         compare();
@@ -75,21 +87,15 @@ void ProfileNotifier::compare() {
     const std::string machine = profile_.machine().identifier();
     const std::shared_ptr<const ToldFacts> told = profile_.told();
     const std::string language = profile_.preferredLocaleIdentifier();
-    const std::set<std::string> watches = pairedWatches(profile_);
     std::vector<std::string_view> raised;
     const MaybeError error = database_.write([&](Connection& connection) {
-        raised.clear();
+        raised = owedNotifications(connection, profile_, language);
         if (*told != keptFacts(connection, machine)) keepFacts(connection, machine, *told);
-        const std::optional<std::string> lastLanguage = storedFact(connection, stored_facts::language);
-        const std::optional<std::string> lastWatches = storedFact(connection, stored_facts::pairedWatches);
-        if (lastLanguage && *lastLanguage != language) raised.push_back(platform::languageChangedNotification);
-        if (lastWatches && !includes(linesOf(*lastWatches), watches))
-            raised.push_back(platform::devicePairedNotification);
-        if (lastWatches && !includes(watches, linesOf(*lastWatches)))
-            raised.push_back(platform::deviceUnpairedNotification);
-        if (lastLanguage && lastWatches && raised.empty()) return;
+        const bool isFirst =
+            !storedFact(connection, stored_facts::language) || !storedFact(connection, stored_facts::pairedWatches);
+        if (!isFirst && raised.empty()) return;
         setStoredFact(connection, stored_facts::language, language);
-        setStoredFact(connection, stored_facts::pairedWatches, textOf(watches));
+        setStoredFact(connection, stored_facts::pairedWatches, textOf(pairedWatches(profile_)));
     });
     if (error && error->code == SQLITE_BUSY && watch_) return watch_->callIn(retryAfterBusy);
     if (error) {

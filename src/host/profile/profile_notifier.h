@@ -7,6 +7,9 @@
 #include <functional>
 #include <memory>
 #include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
 
 #include "vrx/host/base/notification_center.h"
 #include "vrx/host/home/database.h"
@@ -39,5 +42,10 @@ private:
     std::unique_ptr<FileWatch> watch_;
     std::optional<platform::Duration> heldUntil_;  // on the boot clock
 };
+
+// The notifications that are raised when an agent with the profile, in that language, starts next. Within a
+// transaction.
+std::vector<std::string_view> owedNotifications(Connection& connection, const DeviceProfile& profile,
+                                                const std::string& language);
 
 }  // namespace vrx::host
