@@ -10,6 +10,7 @@
 #include <cstdio>
 #include <cstring>
 #include <memory>
+#include <sstream>
 #include <string>
 #include <system_error>
 #include <utility>
@@ -23,12 +24,33 @@ namespace {
 
 constexpr unsigned mostSeconds = 300;  // of a life, however slow the build is
 
-// A play as a line: trace, days, and what was broken, each after a tab.
+// Each as NAME MISSED NEEDLESS OLDTEXT and a blank.
+std::string textOf(const DifferentSeconds& differences) {
+    std::string text;
+    for (const auto& [name, seconds] : differences) {
+        text.append(name);
+        for (const std::int64_t number : seconds) text += " " + std::to_string(number);
+        text += " ";
+    }
+    return text;
+}
+
+DifferentSeconds differencesFrom(const std::string& text) {
+    DifferentSeconds differences;
+    std::istringstream words(text);
+    for (std::string name; words >> name;) {
+        const auto known = std::ranges::find(namedDifferences(), name, &NamedDifference::name);
+        for (std::int64_t& number : differences[known->name]) words >> number;
+    }
+    return differences;
+}
+
+// A play as a line: trace, days, differences, and what was broken, each after a tab.
 std::string lineOf(const Play& play) {
     std::array<char, 80> numbers;
     std::snprintf(numbers.data(), numbers.size(), "%016llx\t%.17g\t", static_cast<unsigned long long>(play.trace),
                   play.days);
-    std::string line = numbers.data();
+    std::string line = numbers.data() + textOf(play.differences) + "\t";
     if (play.violation)
         line += std::to_string(play.violation->day) + "\t" + play.violation->rule + "\t" + play.violation->detail;
     std::ranges::replace(line, '\n', ' ');
@@ -40,8 +62,9 @@ Play playFrom(std::string line) {
     for (std::size_t tab; (tab = line.find('\t')) != std::string::npos; line.erase(0, tab + 1))
         parts.push_back(line.substr(0, tab));
     parts.push_back(line);
-    Play play{std::stoull(parts.at(0), nullptr, 16), std::stod(parts.at(1))};
-    if (parts.size() == 5) play.violation = Violation{std::stod(parts[2]), parts[3], parts[4]};
+    Play play{.trace = std::stoull(parts.at(0), nullptr, 16), .days = std::stod(parts.at(1))};
+    play.differences = differencesFrom(parts.at(2));
+    if (parts.size() == 6) play.violation = Violation{std::stod(parts[3]), parts[4], parts[5]};
     return play;
 }
 

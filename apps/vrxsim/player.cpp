@@ -7,7 +7,9 @@
 #include "vrx/platform/text.h"
 #include "vrx/service/start_up.h"
 #include "vrxsim/clients.h"
+#include "vrxsim/differences.h"
 #include "vrxsim/invariants.h"
+#include "vrxsim/rules.h"
 #include "vrxsim/world.h"
 
 namespace vrx::simulation {
@@ -26,6 +28,11 @@ class Player {
 public:
     Player(const Life& life, const PlayOptions& options) : life_(life) {
         trace_.show = options.show;
+        rules_.beforeChange = [this] { differences_.judge(); };
+        clients_.dismissalIsAsked = [this](const std::string& serialNumber) {
+            rules_.dismissalIsAsked(serialNumber);
+            differences_.dismissalIsAsked(serialNumber);
+        };
         world_.host.interference.planted = options.planted;
         world_.host.failures.handler = [this](const std::string& text) {
             verdict_.report(day(), "simulation", text);
@@ -45,7 +52,7 @@ public:
                 happen(life_.events[nextEvent_++]);
             lookAround();
         }
-        Play result{trace_.hash(), day(), verdict_.violation};
+        Play result{trace_.hash(), day(), verdict_.violation, differences_.found()};
         disarm();
         world_.host.queues.letWaitingTasksGo();
         clients_.processEnds();
@@ -74,6 +81,7 @@ private:
         }
         isStarting_ = false;
         invariants_.processStarted();
+        differences_.processStarts();
         if (isKillWanted_) cutShort();
     }
     void relaunch() {
@@ -84,7 +92,8 @@ private:
     // Lets time pass up to a moment, or to the death of the process before it.
     void advance(double until) {
         while (world_.elapsed() < until - instant && !isKillWanted_ && !verdict_.violation) {
-            const Duration rest(until - world_.elapsed());
+            differences_.judge();
+            const Duration rest(std::min(until, differences_.nextMoment().value_or(until)) - world_.elapsed());
             try {
                 if (piecesLeft_ > 0)
                     workOff(world_.host.clock.now() + rest);
@@ -93,6 +102,7 @@ private:
             } catch (const Killed&) {
             }
         }
+        differences_.judge();
         if (isKillWanted_) cutShort();
     }
     // One piece after another, the last of which ends the process.
@@ -104,6 +114,7 @@ private:
     void die(double downTime) {
         disarm();
         clients_.processEnds();
+        rules_.processEnds();
         world_.host.process.kill();
         relaunchAt_ = world_.elapsed() + downTime;
     }
@@ -131,10 +142,14 @@ private:
     }
 
     void happen(const Event& event) {
+        differences_.judge();
         trace_.add(event.verb);
         if (trace_.show) trace_.show(textOf(event));
         if (event.verb == "clock") lookAround();  // while its dates still tell when things were
-        if (event.verb == "take-back") clients_.takeBackDismissals();
+        if (event.verb == "take-back") {
+            clients_.takeBackDismissals();
+            differences_.dismissalsAreTakenBack();
+        }
         if (!world_.happen(event) && !clients_.happen(event)) happenToProcess(event);
     }
     void happenToProcess(const Event& event) {
@@ -164,6 +179,7 @@ private:
     void lookAround() {
         clients_.check();
         invariants_.check();
+        rules_.check();
         for (const platform::LogEntry& line : world_.host.log.entries()) takeDown(line);
         for (const sim::SentRequest& sent : world_.host.http.sent()) {
             trace_.add(sent.request.url);
@@ -192,8 +208,10 @@ private:
     Verdict verdict_;
     Trace trace_;
     World world_;
-    Clients clients_{world_, verdict_, trace_};
+    Rules rules_{world_, verdict_};
+    Clients clients_{world_, rules_, verdict_, trace_};
     Invariants invariants_{world_, clients_, verdict_};
+    Differences differences_{world_, rules_, verdict_};
     std::size_t nextEvent_ = 0;
     double nextCheckAt_ = 0;
     std::optional<double> relaunchAt_;  // while there is no process

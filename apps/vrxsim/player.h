@@ -6,6 +6,7 @@
 #include <optional>
 
 #include "vrx/sim/interference.h"
+#include "vrxsim/differences.h"
 #include "vrxsim/life.h"
 #include "vrxsim/verdict.h"
 
@@ -20,6 +21,7 @@ struct Play {
     std::uint64_t trace = 0;  // equal for equal plays
     double days = 0;          // up to the end, or to the violation
     std::optional<Violation> violation{};
+    DifferentSeconds differences{};
 };
 
 Play play(const Life& life, const PlayOptions& options = {});

@@ -2,6 +2,7 @@
 // Each request is recorded and may be made to fail.
 #pragma once
 
+#include <functional>
 #include <map>
 #include <memory>
 #include <string>
@@ -34,6 +35,14 @@ public:
         const auto failure = failures_.find(request);
         return failure != failures_.end() && failure->second > 0;
     }
+    // Hears each request when it has been answered. The item is that of a post, the identifiers are those of a clear.
+    struct Answered {
+        Request request{};
+        bool isDone = false;
+        const platform::FollowUpItem* item = nullptr;
+        const std::vector<std::string>* identifiers = nullptr;
+    };
+    std::function<void(const Answered& answered)> listener;
     // Every request of every client, failed ones included: "list", "post IDENTIFIER", "clear IDENTIFIER IDENTIFIER".
     const std::vector<std::string>& asked() const { return asked_; }
     void forgetAsked() { asked_.clear(); }
@@ -43,6 +52,9 @@ private:
 
     // Records the request and returns the failure that is scripted for it.
     platform::MaybeError begin(Request request, std::string text);
+    void tell(const Answered& answered) const {
+        if (listener) listener(answered);
+    }
 
     const Interference& interference_;
     std::map<std::string, std::vector<platform::FollowUpItem>> pending_;
