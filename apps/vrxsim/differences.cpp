@@ -21,10 +21,10 @@ constexpr std::string_view firstDays = "first-days", beforeOutreach = "before-ou
                            refreshWaits = "refresh-waits", displayMoved = "display-moved", lastDay = "last-day",
                            olderLayout = "older-layout", wrongClock = "wrong-clock", failedWrite = "failed-write",
                            strangeAnswer = "strange-answer", refused = "refused", dismissalLost = "dismissal-lost",
-                           failedRead = "failed-read", pairingCutShort = "pairing-cut-short", failedListing = "failed-listing",
-                           noActivation = "no-activation", clockSet = "clock-set";
+                           failedRead = "failed-read", pairingCutShort = "pairing-cut-short",
+                           failedListing = "failed-listing", noActivation = "no-activation", clockSet = "clock-set";
 
-constexpr double clockTolerance = 60;
+constexpr Duration clockTolerance{60};
 
 }  // namespace
 
@@ -33,7 +33,8 @@ std::span<const NamedDifference> namedDifferences() {
         {firstDays, "for two days after its activation a device is offered nothing"},
         {beforeOutreach, "nothing is offered before the first outreach, two days after the agent's first start"},
         {offerAfterOutreach, "the offer came, or moved, after the last run that plans posts had asked for it"},
-        {failedLook, "a download failed where the run finishes all the same, or where an item is removed for want of it"},
+        {failedLook,
+         "a download failed where the run finishes all the same, or where an item is removed for want of it"},
         {signedOut, "the user was signed out when the record was needed; without an account none counts"},
         {languageChange, "the record in the cache was in another language, and none could be downloaded"},
         {failedRead, "the record in the cache could not be read, and the item was removed for want of it"},
@@ -42,7 +43,8 @@ std::span<const NamedDifference> namedDifferences() {
         {offerRenewed, "an offer ended or was withdrawn and came again, and what was posted once gets no date"},
         {takenBack, "a dismissal was taken back, and nothing posts the item again"},
         {watchesOff, "the flag or the server's version for watches went off or on, of which nothing tells the agent"},
-        {carrierAtOutreach, "the carrier is asked only by an outreach, and has changed since, or the item was there before"},
+        {carrierAtOutreach,
+         "the carrier is asked only by an outreach, and has changed since, or the item was there before"},
         {daysBeforeEnd, "a record that names no day to show it from gets no date beside another device's"},
         {noEnd, "a record without an end, of another device, takes the date away"},
         {dueAtPairing, "a watch whose offer is due when it is paired gets no date: only days ahead count"},
@@ -56,7 +58,8 @@ std::span<const NamedDifference> namedDifferences() {
         {failedWrite, "a write of the record failed, and its date and language were written all the same"},
         {failedListing, "a listing failed, so that a refresh saw no item, and planned no other"},
         {refused, "the follow-up service refused a post, an update or a clear, which is not tried again"},
-        {dismissalLost, "a dismissal was not stored, because the service or the settings failed or the agent was killed"},
+        {dismissalLost,
+         "a dismissal was not stored, because the service or the settings failed or the agent was killed"},
         {wrongClock, "the clock was wrong when the activation was stored, or is now"},
         {clockSet, "the clock was set after the run was planned, which waits as long as before"},
     };
@@ -68,8 +71,8 @@ std::optional<Way> Differences::wayOf(const std::string& serialNumber, Date mome
     const auto item = rules_.items().find(serialNumber);
     if (item == rules_.items().end()) return wish ? std::optional(Way::Missed) : std::nullopt;
     if (!wish) return Way::Needless;
-    const bool isTextRight = item->second.title == World::title(wish->language) &&
-                             Rules::numberIn(item->second.footer) == wish->days;
+    const bool isTextRight =
+        item->second.title == World::title(wish->language) && Rules::numberIn(item->second.footer) == wish->days;
     return isTextRight ? std::nullopt : std::optional(Way::OldText);
 }
 
@@ -92,15 +95,18 @@ void Differences::judge(const std::string& serialNumber, Date moment, double now
         if (known != open_.end()) open_.erase(known);
         return;
     }
-    if (known == open_.end() || known->second.way != *way)
-        open_[serialNumber] = {*way, judgedUntil_, judgedUntil_};
+    if (known == open_.end() || known->second.way != *way) open_[serialNumber] = {*way, judgedUntil_, judgedUntil_};
     Open& open = open_[serialNumber];
     const double since = std::max(open.since, quietSince_);
     if (now - since <= patience) return;
     std::string_view name = nameOf(serialNumber, *way, moment);
-    // A cause has just ended: a run that does something about it is to be expected, and until then it lasts on.
-    if (name.empty() && now - std::max(open.namedAt, quietSince_) <= patience) name = open.name;
-    else open.namedAt = now;
+    // Where one cause follows another, a run that does something about it is to be expected: until then the first
+    // lasts.
+    const bool isNew = name != open.name && now - std::max(open.namedAt, quietSince_) > patience;
+    if (isNew || name == open.name || open.name.empty())
+        open.namedAt = now;
+    else
+        name = open.name;
     open.name = name;
     if (name.empty()) {
         constexpr std::string_view what[] = {"is not shown", "is shown", "is shown with old texts"};
@@ -140,10 +146,10 @@ std::string_view Differences::nameOf(const std::string& serialNumber, Way way, D
 std::string_view Differences::nameOfMissed(const std::string& serialNumber, Date moment) const {
     const Record& record = *world_.record(serialNumber);
     if (const std::optional<Date> activation = rules_.activation(serialNumber)) {
-        const Date trueNow = sim::Clock::start + world_.host.clock.elapsed();
+        const Date trueMoment = moment - world_.clockOffset();
         if (*activation + rules_.outreachDelay() > moment) {
-            const bool isClockWrong = *activation > trueNow + Duration(clockTolerance) ||
-                                      *activation + rules_.outreachDelay() < trueNow - Duration(clockTolerance);
+            const bool isClockWrong = *activation > trueMoment + clockTolerance ||
+                                      *activation + rules_.outreachDelay() < trueMoment - clockTolerance;
             return isClockWrong ? wrongClock : firstDays;
         }
     }
@@ -152,7 +158,8 @@ std::string_view Differences::nameOfMissed(const std::string& serialNumber, Date
     if (removal && !(plan && plan->run == PlannersView::Run::Post && plan->at > removal->at))
         return nameOfRemoval(*removal, record);
     const auto pairedAt = world_.pairedAt.find(serialNumber);
-    if (pairedAt != world_.pairedAt.end() && rules_.wasPairingCutShort(pairedAt->second)) return pairingCutShort;
+    const bool isNewSincePlan = pairedAt != world_.pairedAt.end() && (!plan || plan->at < pairedAt->second);
+    if (isNewSincePlan && rules_.wasPairingCutShort(pairedAt->second)) return pairingCutShort;
     const double* const leftOutAt = rules_.leftOutAt(serialNumber);
     if (leftOutAt && (!plan || *leftOutAt > plan->at)) return watchesOff;
     if (!plan) return rules_.lastOutreachAt() < 0 ? beforeOutreach : "";
@@ -182,11 +189,14 @@ std::string_view Differences::nameOfRemoval(const Removal& removal, const Record
         case Ended: break;
     }
     if (removal.found.answer == 0) return strangeAnswer;
-    return record.changedAt > removal.at ? offerRenewed : unseenRecord;
+    const bool wasClockWrong = std::abs(removal.clockOffset.count()) > clockTolerance.count();
+    if (removal.cause == Ended && wasClockWrong) return wrongClock;
+    if (record.changedAt > removal.at) return offerRenewed;
+    return record.saysTheSameAs(world_.answer(removal.found.answer).record) ? "" : unseenRecord;
 }
 
 std::string_view Differences::nameByPlan(const PlannersView& plan, const Record& record) const {
-    if (!plan.found.isRecord()) return nameOfLack(plan.found);
+    if (!plan.found.isRecord()) return record.changedAt > plan.at ? offerAfterOutreach : nameOfLack(plan.found);
     if (plan.found.answer == 0) return strangeAnswer;
     if (!record.saysTheSameAs(world_.answer(plan.found.answer).record)) return offerAfterOutreach;
     if (plan.isDismissed) return takenBack;
@@ -195,7 +205,7 @@ std::string_view Differences::nameByPlan(const PlannersView& plan, const Record&
     if (world_.clockSetAt > plan.at) return clockSet;
     if (plan.run == PlannersView::Run::Outreach) return "";
     if (!record.shownFrom) return daysBeforeEnd;
-    if (plan.standsBesideOfferWithoutEnd) return noEnd;
+    if (plan.isDateTakenAway) return noEnd;
     return plan.isDue && plan.run == PlannersView::Run::Pairing ? dueAtPairing : "";
 }
 
@@ -243,7 +253,8 @@ std::string_view Differences::nameOfOldRecord(const std::string& serialNumber, c
     if (rules_.isCacheBehind(serialNumber)) return failedWrite;
     if (item.answer >= last->answer || last->at < item.filledAt) return "";
     if (item.hasRequestFailed) return refused;
-    return rules_.listingFailedAt() >= last->at ? failedListing : refreshWaits;
+    if (rules_.listingFailedAt() >= last->at) return failedListing;
+    return isRefreshPlanned() ? refreshWaits : nameByRefreshes(serialNumber, item);
 }
 
 std::string_view Differences::nameOfOldText(const std::string& serialNumber, const ShownItem& item) const {

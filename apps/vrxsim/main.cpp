@@ -143,15 +143,18 @@ public:
         }
     }
     std::string text() const {
-        std::vector<std::vector<std::string>> rows{{"DIFFERENCE", "LIVES", "PERCENT", "MISSED", "NEEDLESS", "OLD TEXT"}};
+        std::vector<std::vector<std::string>> rows{
+            {"DIFFERENCE", "LIVES", "PERCENT", "MISSED", "NEEDLESS", "OLD TEXT"}};
         for (const simulation::NamedDifference& named : simulation::namedDifferences()) {
             const auto sum = sums_.find(named.name);
             if (sum == sums_.end()) continue;
-            rows.push_back({std::string(named.name), std::to_string(sum->second.lives), fixed(percent(sum->second), 1)});
+            rows.push_back(
+                {std::string(named.name), std::to_string(sum->second.lives), fixed(percent(sum->second), 1)});
             for (const std::int64_t seconds : sum->second.seconds)
                 rows.back().push_back(fixed(static_cast<double>(seconds) / simulation::secondsOfDay, 1));
         }
-        return rows.size() == 1 ? "" : table(rows) + "Missed, needless and with an old text for so many days of all.\n\n";
+        return rows.size() == 1 ? ""
+                                : table(rows) + "Missed, needless and with an old text for so many days of all.\n\n";
     }
     Dictionary document() const {
         Dictionary document;
@@ -206,8 +209,8 @@ Outcome explore(const Options& options) {
                                  {"yearsPerMinute", progress.perMinute()},
                                  {"findings", std::move(findings)},
                                  {"differences", differences.document()}}};
-    outcome.text = text + differences.text() + std::to_string(progress.lives) + " lives, " + fixed(progress.years, 0) + " years, " +
-                   fixed(progress.perMinute(), 0) + " years a minute\n";
+    outcome.text = text + differences.text() + std::to_string(progress.lives) + " lives, " + fixed(progress.years, 0) +
+                   " years, " + fixed(progress.perMinute(), 0) + " years a minute\n";
     return isFine ? outcome : asBroken(std::move(outcome), "lives broke a rule");
 }
 
@@ -225,8 +228,11 @@ Outcome replay(const Options& options) {
     if (options.isTraced)
         how.show = [](std::string_view line) { std::fprintf(stderr, "%s\n", printable(line).c_str()); };
     const simulation::Play play = simulation::play(*life, how);
-    Outcome outcome{.document = {{"days", play.days}, {"trace", hashText(play.trace)}},
-                    .text = fixed(play.days, 2) + " days, trace " + hashText(play.trace) + "\n"};
+    DifferenceTable differences;
+    differences.add(play.differences);
+    Outcome outcome{
+        .document = {{"days", play.days}, {"trace", hashText(play.trace)}, {"differences", differences.document()}},
+        .text = differences.text() + fixed(play.days, 2) + " days, trace " + hashText(play.trace) + "\n"};
     if (!play.violation) return outcome;
     const simulation::Violation& violation = *play.violation;
     outcome.document["rule"] = violation.rule;

@@ -6,6 +6,7 @@
 #include <utility>
 
 #include "vrx/platform/sha256_hash.h"
+#include "vrx/platform/text.h"
 #include "vrx/platform/vendor.h"
 
 namespace vrx::simulation {
@@ -135,6 +136,7 @@ void Rules::hear(const platform::LogEntry& line) {
          [](Rules& rules, const auto&) { rules.pairingPlans(); }},
         {"%s: devices: %@",
          [](Rules& rules, const auto&) {
+             rules.noteSupport();
              rules.outreach_.clear();
              rules.outreachDevices_.clear();
          }},
@@ -143,6 +145,12 @@ void Rules::hear(const platform::LogEntry& line) {
         {"Complete activity and schedule followUp post for: %@",
          [](Rules& rules, const auto&) { rules.outreachEnds(); }},
         {"No devices eligible for followUp posts", [](Rules& rules, const auto&) { rules.outreachEnds(); }},
+        {"%s: Re-schedule followUp post for: %@",
+         [](Rules& rules, const auto& arguments) { rules.postIsPlanned(PlannersView::Run::Post, arguments[1].text); }},
+        {"Watch paired after phone's refreshActivity has already finished. Schedule followUp post for: %@",
+         [](Rules& rules, const auto& arguments) {
+             rules.postIsPlanned(PlannersView::Run::Pairing, arguments[0].text);
+         }},
         {"Schedule next refresh for %@", [](Rules& rules, const auto&) { rules.refreshIsPlanned(false); }},
         {"%s: Schedule refresh for: %@", [](Rules& rules, const auto&) { rules.refreshIsPlanned(true); }},
         {"No followups present, don't schedule another refresh",
@@ -201,6 +209,7 @@ Found Rules::cachedRecord(const std::string& serialNumber) const {
 
 void Rules::lookupBegins(const std::string& serialNumber, std::uint64_t policy) {
     finishWork();
+    noteSupport();
     if (downloadingCount_ == 0 && lastLookupAt_ < world_.elapsed()) found_.clear();
     lastLookupAt_ = world_.elapsed();
     asked_ = {serialNumber, policy, cachedRecord(serialNumber), world_.host.files.isFailing()};
@@ -216,8 +225,8 @@ void Rules::cacheIsEmpty() {
 void Rules::lookupDecided(bool isDownloading) {
     bool isExpected = asked_.policy == 2;
     if (asked_.policy == 0) {
-        const auto stored =
-            world_.host.defaults.stored().find(platform::sha256Hash(asked_.serialNumber) + "_CachedWarrantyLastUpdatedDate");
+        const auto stored = world_.host.defaults.stored().find(platform::sha256Hash(asked_.serialNumber) +
+                                                               "_CachedWarrantyLastUpdatedDate");
         const std::optional<Date> at =
             stored == world_.host.defaults.stored().end() ? std::nullopt : stored->second.asDate();
         const Duration validity(settingOr(world_, "CachedWarrantyValidityDuration", validityIfNoneIsSet));
@@ -266,20 +275,21 @@ void Rules::lookupEnds(const std::string& serialNumber, bool isDownloaded) {
 
 void Rules::downloads(const std::string& text) {
     lastDownloaded_ = World::answerIn(text);
-    if (lastDownloaded_ > 0) downloaded_[world_.answer(lastDownloaded_).serialNumber] = {lastDownloaded_, world_.elapsed()};
+    if (lastDownloaded_ > 0)
+        downloaded_[world_.answer(lastDownloaded_).serialNumber] = {lastDownloaded_, world_.elapsed()};
 }
 
 // Takes the devices from the text, in their order: NAME (SERIAL NUMBER) (DATE) - TYPE: and so on.
 void Rules::listEnds(const std::string& text) {
     finishWork();
     list_.clear();
-    for (std::size_t between = text.find(") ("); between != std::string::npos; between = text.find(") (", between + 1)) {
+    for (std::size_t between = text.find(") ("); between != std::string::npos;
+         between = text.find(") (", between + 1)) {
         const std::size_t open = text.rfind('(', between);
         const std::string serialNumber = text.substr(open + 1, between - open - 1);
         const std::string date = text.substr(between + 3, text.find(')', between + 3) - between - 3);
         const auto found = found_.find(serialNumber);
-        list_.push_back(
-            {serialNumber, dateFrom(date), found == found_.end() ? std::vector<Found>() : found->second});
+        list_.push_back({serialNumber, dateFrom(date), found == found_.end() ? std::vector<Found>() : found->second});
     }
     armed_ = Armed::List;
     std::vector<std::string> listed;
@@ -287,7 +297,23 @@ void Rules::listEnds(const std::string& text) {
     noteLeftOut(listed);
 }
 
+// What keeps watches out of a list that is begun now.
+void Rules::noteSupport() {
+    const platform::Dictionary& settings = world_.host.defaults.stored();
+    const auto cache = settings.find("ServerVersionCache");
+    const platform::Value versions = cache == settings.end() ? platform::Value() : cache->second;
+    const bool isVersionMissing = versions.asDictionary() && versions["LowServerVersion"].asInteger() != 3 &&
+                                  versions["HighServerVersion"].asInteger() != 3;
+    if (world_.host.flags.enabled.empty() || isVersionMissing) unsupportedAt_ = world_.elapsed();
+}
+
+bool Rules::wasUnsupported() const {
+    constexpr double longestList = 1800;
+    return unsupportedAt_ >= 0 && world_.elapsed() - unsupportedAt_ < longestList;
+}
+
 void Rules::noteLeftOut(const std::vector<std::string>& listed) {
+    if (!wasUnsupported()) return;
     for (const platform::PairedWatch& watch : world_.host.watches.all)
         if (watch.serialNumber && std::ranges::find(listed, *watch.serialNumber) == listed.end())
             leftOut_[*watch.serialNumber] = world_.elapsed();
@@ -321,7 +347,7 @@ void Rules::refreshBegins(bool isWhole, bool isListed) {
         for (const Found& found : device.found)
             if (const auto cause = causeOfRemoval(found)) {
                 ++removals;
-                toRemove_[device.serialNumber] = {world_.elapsed(), *cause, found};
+                toRemove_[device.serialNumber] = {world_.elapsed(), *cause, found, world_.clockOffset()};
             } else if (isShown) {
                 posting.answers.push_back(found.answer);
             }
@@ -333,9 +359,9 @@ void Rules::refreshBegins(bool isWhole, bool isListed) {
     if (!isWhole) return;
     for (const auto& [serialNumber, item] : pending) {
         if (listed.contains(serialNumber)) continue;
-        const bool isUnpaired = serialNumber != phone && !world_.isPaired(serialNumber);
-        toRemove_[serialNumber] = {world_.elapsed(),
-                                   isUnpaired ? Removal::Cause::Unpaired : Removal::Cause::Unsupported};
+        const bool isThere = serialNumber == phone || world_.isPaired(serialNumber);
+        toRemove_[serialNumber] = {
+            world_.elapsed(), isThere && wasUnsupported() ? Removal::Cause::Unsupported : Removal::Cause::Unpaired};
         work.mayClear.insert(identifierOf(serialNumber));
         work.mustClear.insert(identifierOf(serialNumber));
     }
@@ -358,8 +384,7 @@ bool Rules::isDue(const Listed& device, const Found& found, Duration tolerance) 
 bool Rules::isListed(const std::string& key, const std::string& serialNumber) const {
     const auto list = world_.host.defaults.stored().find(key);
     const platform::Array* hashes = list == world_.host.defaults.stored().end() ? nullptr : list->second.asArray();
-    return hashes &&
-           std::ranges::find(*hashes, platform::Value(platform::sha256Hash(serialNumber))) != hashes->end();
+    return hashes && std::ranges::find(*hashes, platform::Value(platform::sha256Hash(serialNumber))) != hashes->end();
 }
 
 PlannersView Rules::viewOf(const Listed& device, PlannersView::Run run) const {
@@ -368,14 +393,46 @@ PlannersView Rules::viewOf(const Listed& device, PlannersView::Run run) const {
     view.isDismissed = isListed(dismissedKey, device.serialNumber);
     view.wasPosted = isListed(postedKey, device.serialNumber);
     view.isDue = isDue(device, view.found, Duration(0));
-    const auto isOfferWithoutEnd = [this](const Found& found) {
-        const Record& record = world_.answer(found.answer).record;
-        return found.isRecord() && record.isOffered && !record.until;
-    };
-    view.isOfferWithoutEnd = isOfferWithoutEnd(view.found);
-    view.standsBesideOfferWithoutEnd = std::ranges::any_of(
-        list_, [&](const Listed& other) { return std::ranges::any_of(other.found, isOfferWithoutEnd); });
+    const std::optional<Date> named =
+        view.found.isRecord() ? sentDate(world_.answer(view.found.answer).record.shownFrom) : std::nullopt;
+    if (!named) return view;
+    const Date due = device.activation ? std::max(*named, *device.activation + outreachDelay()) : *named;
+    const std::optional<Date> next = nextPost(run, WithoutEnd::Counts);
+    const std::optional<Date> otherwise = nextPost(run, WithoutEnd::IsLeftOut);
+    view.isDateTakenAway = otherwise && *otherwise <= due && (!next || *next > due);
     return view;
+}
+
+// The date for which a run plans the next post: the earliest that lies ahead, where a date that is not there counts as
+// now and can take that of another device away.
+std::optional<Date> Rules::nextPost(PlannersView::Run run, WithoutEnd withoutEnd) const {
+    const Date now = world_.host.clock.now();
+    std::optional<Date> next;
+    for (const Listed& device : list_) {
+        if (device.found.empty() || !device.found.back().isRecord()) continue;
+        const Record& record = world_.answer(device.found.back().answer).record;
+        const bool isPostedNow = run == PlannersView::Run::Post && isDue(device, device.found.back(), Duration(0));
+        if (!record.isOffered || isPostedNow || isListed(postedKey, device.serialNumber)) continue;
+        const std::optional<Date> until = sentDate(record.until);
+        if (!until && withoutEnd == WithoutEnd::IsLeftOut) continue;
+        if (until && *until > now) {
+            std::optional<Date> from = device.activation;
+            if (from) *from += outreachDelay();
+            if (const auto named = sentDate(record.shownFrom); named && *named >= from.value_or(now)) from = named;
+            if (from && *from > now && (!next || *from < *next)) next = from;
+        }
+        if (until.value_or(now) < next.value_or(now)) next = until;
+        if (next && *next < now) break;
+    }
+    return next;
+}
+
+void Rules::postIsPlanned(PlannersView::Run run, const std::string& date) {
+    const bool isCertain = std::ranges::all_of(list_, [](const Listed& device) { return device.found.size() == 1; });
+    const std::optional<Date> expected = nextPost(run, WithoutEnd::Counts), planned = dateFrom(date);
+    const bool isAsExpected = expected && planned && std::abs((*expected - *planned).count()) < roundingOfDates.count();
+    if (isCertain && !isAsExpected)
+        disagree("the next post is planned for " + date + " instead of " + platform::describe(expected));
 }
 
 void Rules::postBegins() {
@@ -396,8 +453,7 @@ void Rules::postBegins() {
 void Rules::pairingPlans() {
     finishWork();
     lastPairingPlansAt_ = world_.elapsed();
-    for (const Listed& device : list_)
-        planned_[device.serialNumber] = viewOf(device, PlannersView::Run::Pairing);
+    for (const Listed& device : list_) planned_[device.serialNumber] = viewOf(device, PlannersView::Run::Pairing);
 }
 
 void Rules::outreachLooks(const std::string& serialNumber, bool isDownloaded) {
@@ -434,8 +490,7 @@ void Rules::refreshIsPlanned(bool isForAll) {
 
 const std::string& Rules::identifierOf(const std::string& serialNumber) {
     std::string& identifier = identifiers_[serialNumber];
-    if (identifier.empty())
-        identifier = platform::vendorIdentifier(".Vireo.") + platform::sha256Hash(serialNumber);
+    if (identifier.empty()) identifier = platform::vendorIdentifier(".Vireo.") + platform::sha256Hash(serialNumber);
     return identifier;
 }
 
@@ -450,7 +505,9 @@ std::string Rules::differenceFrom(const FollowUpItem& item, int number) const {
     const std::optional<Date> until = sentDate(answer.record.until);
     const double oneDay = settingOr(world_, "OneDayInterval", secondsOfDay);
     const double days =
-        until ? std::max(std::ceil((*until - world_.host.clock.now()).count() / (oneDay > 0 ? oneDay : secondsOfDay)), 0.0) : 0;
+        until ? std::max(std::ceil((*until - world_.host.clock.now()).count() / (oneDay > 0 ? oneDay : secondsOfDay)),
+                         0.0)
+              : 0;
     if (labelOf(item) != World::label(number))
         return "has the texts of '" + labelOf(item) + "' instead of those of answer " + std::to_string(number);
     if (item.title != World::title(answer.language)) return "has a title that the server did not send";

@@ -41,6 +41,7 @@ struct Removal {
     double at = 0;
     Cause cause = Cause::NoRecord;
     Found found{};
+    platform::Duration clockOffset{0};  // then
 };
 
 // What the last run that plans posts knew of a device: an outreach, a post or the refresh after a pairing.
@@ -49,12 +50,12 @@ struct PlannersView {
     double at = 0;
     Run run = Run::Outreach;
     Found found{};
-    bool isExcluded = false;      // by its carrier; asked by outreaches only
-    bool isDismissed = false;     // so it is not posted
-    bool wasPosted = false;       // before, so it gets no date
-    bool isDue = false;           // now
-    bool isOfferWithoutEnd = false, standsBesideOfferWithoutEnd = false;
-    bool wasRefused = false;      // the service took no item
+    bool isExcluded = false;       // by its carrier; asked by outreaches only
+    bool isDismissed = false;      // so it is not posted
+    bool wasPosted = false;        // before, so it gets no date
+    bool isDue = false;            // now
+    bool isDateTakenAway = false;  // by another device's offer without an end
+    bool wasRefused = false;       // the service took no item
 };
 
 struct Download {
@@ -99,8 +100,9 @@ public:
     bool isCacheBehind(const std::string& serialNumber) const;
     bool isDismissalStored(const std::string& serialNumber) const;
     double lastOutreachAt() const { return lastOutreachAt_; }  // below 0: none has ended
-    // Whether the process ended before it had looked after a pairing or unpairing at that second.
-    bool wasPairingCutShort(double at) const { return lastPairingPlansAt_ < at && processEndedAt_ >= at; }
+    // Whether the process ended before it had looked after a pairing or unpairing at that second of its life. Of what
+    // was paired at the beginning no process is told.
+    bool wasPairingCutShort(double at) const { return at > 0 && lastPairingPlansAt_ < at && processEndedAt_ >= at; }
     double listingFailedAt() const { return listingFailedAt_; }  // of a refresh; below 0: never
     // Whether no refresh is planned any more because a listing failed, so that nothing seemed to be shown.
     bool wereRefreshesEndedByListing() const { return wereRefreshesEnded_; }
@@ -172,6 +174,11 @@ private:
     std::optional<Removal::Cause> causeOfRemoval(const Found& found) const;
     bool isDue(const Listed& device, const Found& found, platform::Duration tolerance) const;
     bool isListed(const std::string& key, const std::string& serialNumber) const;
+    enum class WithoutEnd : bool { Counts, IsLeftOut };
+    std::optional<platform::Date> nextPost(PlannersView::Run run, WithoutEnd withoutEnd) const;
+    void postIsPlanned(PlannersView::Run run, const std::string& date);
+    void noteSupport();
+    bool wasUnsupported() const;
     PlannersView viewOf(const Listed& device, PlannersView::Run run) const;
     std::string differenceFrom(const platform::FollowUpItem& item, int answer) const;
     const std::string& identifierOf(const std::string& serialNumber);
@@ -193,6 +200,7 @@ private:
     std::vector<PlannersView> outreach_;     // the run under way, with the devices in
     std::vector<std::string> outreachDevices_;
     double lastOutreachAt_ = -1, lastPairingPlansAt_ = -1, processEndedAt_ = -1, listingFailedAt_ = -1;
+    double unsupportedAt_ = -1;  // when watches were last left out for the flag or the server's version
 
     Lookup asked_;
     int lastDownloaded_ = 0;

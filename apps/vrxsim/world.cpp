@@ -308,7 +308,9 @@ HttpAnswer World::answer(const platform::HttpRequest& request) {
     if (!serialNumber || !language) return HttpAnswer::status(400);
     const auto record = records_.find(*serialNumber);
     const std::string fine =
-        record == records_.end() ? "" : host.json.serialize(Value(coverage(*serialNumber, record->second, *language))).value();
+        record == records_.end()
+            ? ""
+            : host.json.serialize(Value(coverage(*serialNumber, record->second, *language))).value();
     if (std::optional<HttpAnswer> troubled = troubledAnswer(serverTroubles_, fine)) return *std::move(troubled);
     return record == records_.end() ? HttpAnswer::status(404, "{}") : HttpAnswer::ok(fine);
 }

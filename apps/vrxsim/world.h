@@ -27,9 +27,9 @@ struct Record {
     double changedAt = 0;  // elapsed seconds
 
     bool saysTheSameAs(const Record& other) const {
-        return version > 0 && std::tie(shownFrom, until, daysBeforeEnd, isOffered, excludedCarrier) ==
-                                  std::tie(other.shownFrom, other.until, other.daysBeforeEnd, other.isOffered,
-                                           other.excludedCarrier);
+        return version > 0 &&
+               std::tie(shownFrom, until, daysBeforeEnd, isOffered, excludedCarrier) ==
+                   std::tie(other.shownFrom, other.until, other.daysBeforeEnd, other.isOffered, other.excludedCarrier);
     }
 };
 
@@ -66,6 +66,9 @@ public:
     bool areWatchesSupported() const;
     // The moment of a day of the life on the wall clock that was right at its beginning.
     static platform::Date dateOf(double days) { return sim::Clock::start + platform::Duration(secondsOfDay * days); }
+
+    // How far ahead the wall clock is.
+    platform::Duration clockOffset() const { return host.clock.now() - (sim::Clock::start + host.clock.elapsed()); }
 
     // Whether something may keep the agent from its work: no network, deferral, a failure that is still to come.
     bool isTroubled() const;
@@ -108,7 +111,7 @@ private:
 
     std::map<std::string, Record> records_;
     int lastVersion_ = 0;
-    std::vector<Answer> answers_{Answer()};  // by their numbers
+    std::vector<Answer> answers_{Answer()};                     // by their numbers
     std::map<std::string, double> latestEnds_;                  // days
     std::deque<std::string> serverTroubles_, versionTroubles_;  // the kinds of the next answers
     double serverTroubledAt_ = -1;                              // the last time that an event changed how it answers
