@@ -126,11 +126,10 @@ void HomePlay::takeSettings(const AgentView& view) {
 
 // What is cached stays so, and is what the server answers as far as it counts.
 void HomePlay::takeRecords(const AgentView& view) {
-    const host::Files files(view.home());
     const std::size_t homeSize = host_.files.homeDirectory().size();
     const auto take = [&](const std::string& path) {
-        if (const auto content = files.read(view.home() + path.substr(homeSize)))
-            host_.files.put(path, {reinterpret_cast<const char*>(content->data()), content->size()});
+        if (const auto content = host::readFile(view.home() + path.substr(homeSize)))
+            host_.files.put(path, content->text());
     };
     host_.files.put(fileOf(versionsUrl), propertyList(serverVersions()));
     take(VRXWarranty::_legacyWarrantyPath());
