@@ -38,13 +38,33 @@ inline sd_bus* connectTo(const std::string& path) {
     return bus;
 }
 
+constexpr std::uint64_t cachedOnly = 1;
+
 // The reply to a lookup of this device's cached record. The caller unreferences it.
 inline sd_bus_message* lookUp(sd_bus* bus) {
-    constexpr std::uint64_t cachedOnly = 1;
     sd_bus_message* reply = nullptr;
     check(sd_bus_call_method(bus, wire::serviceName, wire::objectPath, wire::interfaceName,
                              wire::operation(wire::OperationIndex::GetDefaultDeviceInfo).member, nullptr, &reply, "t",
                              cachedOnly),
+          "call");
+    return reply;
+}
+
+// So, of the cached records of all devices.
+inline sd_bus_message* lookUpAll(sd_bus* bus) {
+    sd_bus_message* reply = nullptr;
+    check(sd_bus_call_method(bus, wire::serviceName, wire::objectPath, wire::interfaceName,
+                             wire::operation(wire::OperationIndex::GetAllDeviceInfos).member, nullptr, &reply, "tb",
+                             cachedOnly, 0),
+          "call");
+    return reply;
+}
+
+// So, of the follow-ups that are shown.
+inline sd_bus_message* askForFollowUps(sd_bus* bus) {
+    sd_bus_message* reply = nullptr;
+    check(sd_bus_call_method(bus, wire::serviceName, wire::followUpsInterface.path, wire::followUpsInterface.name,
+                             wire::pendingFollowUpsOperation.member, nullptr, &reply, nullptr),
           "call");
     return reply;
 }

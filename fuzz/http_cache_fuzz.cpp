@@ -3,9 +3,9 @@
 #include <cmath>
 
 #include "require.h"
-#include "vrx/host/base/text.h"
-#include "vrx/host/http/http_cache.h"
-#include "vrx/host/http/http_cache_rules.h"
+#include "vrx/codec/http_cache.h"
+#include "vrx/codec/http_cache_rules.h"
+#include "vrx/codec/line_text.h"
 
 using namespace vrx;
 
@@ -24,20 +24,21 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t siz
         const std::string_view line = rest.substr(0, rest.find('\n'));
         rest.remove_prefix(std::min(line.size() + 1, rest.size()));
         const std::size_t colon = std::min(line.find(':'), line.size());
-        answer.headers.emplace(line.substr(0, colon), host::trimmed(line.substr(std::min(colon + 1, line.size()))));
+        answer.headers.emplace(line.substr(0, colon), codec::trimmed(line.substr(std::min(colon + 1, line.size()))));
     }
-    static host::HttpCache cache(still, 4096);
+    static codec::HttpCache cache(still, 4096);
     const std::string url = "https://host/" + std::to_string(size);
     cache.store(url, still.now(), answer);
     require(cache.bytes() <= 4096);
     const auto stored = cache.find(url);
-    const platform::Duration age = host::ageOnArrival(answer.headers, still.now(), still.now());
-    const platform::Duration lifetime = host::freshnessLifetime(answer.headers, still.now());
+    const platform::Duration age = codec::ageOnArrival(answer.headers, still.now(), still.now());
+    const platform::Duration lifetime = codec::freshnessLifetime(answer.headers, still.now());
     require(age.count() >= 0 && lifetime.count() >= 0 && std::isfinite(age.count() + lifetime.count()));
     if (!stored) return 0;
-    require(host::parseCacheControl(answer.headers["Cache-Control"]).isStorable);
+    require(codec::parseCacheControl(answer.headers["Cache-Control"]).isStorable);
     require(cache.freshAnswer(*stored).has_value() == (age < lifetime));
-    for (const auto& [name, value] : host::revalidationHeaders(stored->answer.headers)) require(host::isOneLine(value));
+    for (const auto& [name, value] : codec::revalidationHeaders(stored->answer.headers))
+        require(codec::isOneLine(value));
     require(cache.revalidated(*stored, still.now(), answer.headers).status == 200);
     return 0;
 }

@@ -84,6 +84,8 @@ std::optional<int> parse(int argc, char** argv, Options& options) {
     app.set_version_flag("--version", "vrx-coverage-server " VRX_VERSION);
     static const vrx::apps::ManualNotes notes{
         .exitCodes = {{"0", "Ended by a signal"}, {"1", "Could not start"}, {"2", "Usage"}},
+        .files = {{"SERIAL.json, default.json", "The records in the folder of --records, read for each request"}},
+        .environment = {{"TMPDIR", "Where the certificate of --tls is, and what check keeps while it runs"}},
         .examples = {{"vrx-coverage-server --port 8080 --control-port 8081 --records examples/records",
                       "Serves the records of a folder"},
                      {"curl --data-binary coverage:status=401,count=1 http://127.0.0.1:8081/faults",

@@ -5,10 +5,10 @@
 #include <map>
 #include <set>
 
+#include "vrx/codec/http_cache_rules.h"
 #include "vrx/coverage/records/coverage_keys.h"
 #include "vrx/devices/records/device_info.h"
 #include "vrx/followup/follow_up_rules.h"
-#include "vrx/host/http/http_cache_rules.h"
 #include "vrx/platform/clock.h"
 #include "vrx/platform/json.h"
 #include "vrx/platform/number_text.h"
@@ -241,11 +241,11 @@ Finding transportFailure(const std::string& name, const std::string& url, const 
 Finding cachingOf(const Exchange& exchange) {
     const platform::HttpHeaders& headers = exchange.response.headers;
     const std::string name = "server version cache";
-    if (exchange.response.status != 200 || !host::mayStore(headers, exchange.arrived))
+    if (exchange.response.status != 200 || !codec::mayStore(headers, exchange.arrived))
         return note(name, "not kept: it is asked for before each record",
                     "Send Cache-Control: max-age=SECONDS, or an ETag or Last-Modified.");
-    const auto seconds = host::freshnessLifetime(headers, exchange.arrived).count();
-    const std::string confirmed = host::revalidationHeaders(headers).empty() ? "" : ", then confirmed";
+    const auto seconds = codec::freshnessLifetime(headers, exchange.arrived).count();
+    const std::string confirmed = codec::revalidationHeaders(headers).empty() ? "" : ", then confirmed";
     return good(name, "kept for " + Value(seconds).description() + " s" + confirmed);
 }
 

@@ -1,4 +1,6 @@
-// vrxhost activities: what the agent has scheduled, when it is due, and how the last run ended.
+// vrxhost activities: what the agent has scheduled, when it is due, and how the last runs ended.
+#include <set>
+
 #include "vrx/host/home/home_lock.h"
 #include "vrx/platform/text.h"
 #include "vrxhost/agent_activities.h"
@@ -23,6 +25,10 @@ std::string textOf(const std::optional<Date>& date) {
     return date ? dateText(*date) : "";
 }
 
+Dictionary documentOf(const host::ActivityRun& run, bool canBeRunning) {
+    return {{"began", run.began}, {"ended", valueOf(run.ended)}, {"outcome", outcomeOf(run, canBeRunning)}};
+}
+
 Value documentOf(const AgentActivity& activity, bool isAgentRunning) {
     Dictionary document{{"identifier", activity.identifier},
                         {"scheduled", activity.scheduled.has_value()},
@@ -34,9 +40,7 @@ Value documentOf(const AgentActivity& activity, bool isAgentRunning) {
         document["requiresNetwork"] = scheduled->criteria.requiresNetwork;
         document["deferrals"] = scheduled->deferrals;
     }
-    if (const auto& run = activity.lastRun)
-        document["lastRun"] = Dictionary{
-            {"began", run->began}, {"ended", valueOf(run->ended)}, {"outcome", outcomeOf(*run, isAgentRunning)}};
+    if (const auto& run = activity.lastRun) document["lastRun"] = documentOf(*run, isAgentRunning);
     return document;
 }
 
@@ -61,7 +65,25 @@ std::vector<std::string> rowOf(const AgentActivity& activity, bool isAgentRunnin
             run ? outcomeOf(*run, isAgentRunning) + (" " + textOf(run->ended.value_or(run->began))) : "never"};
 }
 
-Outcome activities(AgentView& view) {
+// Adds the runs, in the order in which they began.
+void addHistory(Outcome& outcome, const std::vector<host::ActivityRun>& runs, bool isAgentRunning) {
+    std::set<std::string> seen;  // from the last run back
+    Array documents(runs.size());
+    std::vector<std::vector<std::string>> rows(runs.size() + 1);
+    for (std::size_t i = runs.size(); i-- > 0;) {
+        const host::ActivityRun& run = runs[i];
+        const bool canBeRunning = seen.insert(run.identifier).second && isAgentRunning;
+        Dictionary document = documentOf(run, canBeRunning);
+        document["identifier"] = run.identifier;
+        documents[i] = std::move(document);
+        rows[i + 1] = {dateText(run.began), run.identifier, outcomeOf(run, canBeRunning), textOf(run.ended)};
+    }
+    rows[0] = {"BEGAN", "IDENTIFIER", "OUTCOME", "ENDED"};
+    outcome.document["history"] = std::move(documents);
+    outcome.text = runs.empty() ? "Nothing has run yet.\n" : table(rows);
+}
+
+Outcome activities(AgentView& view, bool hasHistory) {
     const Result<std::vector<AgentActivity>> list = agentActivities(view);
     if (!list) return databaseFailure(list.error(), "not-read");
     const bool isAgentRunning = host::HomeLock::isInUse(view.home());
@@ -71,17 +93,27 @@ Outcome activities(AgentView& view) {
         documents.push_back(documentOf(activity, isAgentRunning));
         rows.push_back(rowOf(activity, isAgentRunning));
     }
-    return {
+    Outcome outcome{
         .document = {{"activities", documents}, {"agentRunning", isAgentRunning}},
         .text = table(rows) + (isAgentRunning ? "" : "No agent has this home: nothing runs until one is started.\n")};
+    if (!hasHistory) return outcome;
+    const auto all = host::listActivities(view.database());
+    if (!all) return databaseFailure(all.error(), "not-read");
+    addHistory(outcome, all->history, isAgentRunning);
+    return outcome;
 }
 
 }  // namespace
 
 void addActivitiesVerb(CommandLine& line, const wire::LocationOverrides& places) {
     auto profile = std::make_shared<std::optional<std::string>>();
-    line.add("activities", "Shows the background activities: when they are due, and their last runs",
-             readOnlyVerb(places, profile, activities));
+    auto hasHistory = std::make_shared<bool>(false);
+    CLI::App* verb = line.add(
+        "activities", "Shows the background activities: when they are due, and their last runs",
+        readOnlyVerb(places, profile, [hasHistory](AgentView& view) { return activities(view, *hasHistory); }));
+    verb->add_flag("--history", *hasHistory,
+                   "Shows the last " + std::to_string(host::ActivityRegistry::mostRuns) +
+                       " runs of each, the latest one at the end");
 }
 
 }  // namespace vrx::apps

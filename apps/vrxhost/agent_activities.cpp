@@ -49,8 +49,8 @@ platform::Result<std::vector<AgentActivity>> agentActivities(AgentView& view) {
     return activities;
 }
 
-const char* outcomeOf(const host::ActivityRun& run, bool isAgentRunning) {
-    if (!run.outcome) return isAgentRunning ? "running" : "interrupted";
+const char* outcomeOf(const host::ActivityRun& run, bool canBeRunning) {
+    if (!run.outcome) return canBeRunning ? "running" : "interrupted";
     switch (*run.outcome) {
         case host::RunOutcome::Finished: return "finished";
         case host::RunOutcome::Deferred: return "deferred";

@@ -27,8 +27,8 @@ std::vector<AgentActivity> ownActivities();
 // All activities of the agent, in the order of their use, then whatever else is scheduled.
 platform::Result<std::vector<AgentActivity>> agentActivities(AgentView& view);
 
-// The outcome of the last run. A run without an end is under way, or was when the agent ended.
-const char* outcomeOf(const host::ActivityRun& run, bool isAgentRunning);
+// The outcome of a run. The last one without an end is under way, or was when the agent ended.
+const char* outcomeOf(const host::ActivityRun& run, bool canBeRunning);
 
 // The activity with that last part of its identifier, such as "outreach".
 const AgentActivity& activityNamed(const std::vector<AgentActivity>& activities, std::string_view name);

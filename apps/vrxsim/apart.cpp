@@ -1,27 +1,21 @@
 #include "vrxsim/apart.h"
 
 #include <poll.h>
-#include <sys/wait.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <array>
-#include <csignal>
 #include <cstdio>
-#include <cstring>
 #include <memory>
 #include <string>
-#include <system_error>
 #include <utility>
 #include <vector>
 
 #include "vrxsim/generator.h"
+#include "vrxsim/worker.h"
 
 namespace vrx::simulation {
 
 namespace {
-
-constexpr unsigned mostSeconds = 300;  // of a life, however slow the build is
 
 // A play as a line: trace, days, and what was broken, each after a tab.
 std::string lineOf(const Play& play) {
@@ -32,7 +26,7 @@ std::string lineOf(const Play& play) {
     if (play.violation)
         line += std::to_string(play.violation->day) + "\t" + play.violation->rule + "\t" + play.violation->detail;
     std::ranges::replace(line, '\n', ' ');
-    return line + "\n";
+    return line;
 }
 
 Play playFrom(std::string line) {
@@ -45,75 +39,9 @@ Play playFrom(std::string line) {
     return play;
 }
 
-Play crashed(int status) {
-    const int signal = WIFSIGNALED(status) ? WTERMSIG(status) : 0;
-    const std::string how = signal == SIGALRM ? "it has no end"
-                            : signal != 0     ? std::string("it ended by ") + strsignal(signal)
-                                              : "it exited with " + std::to_string(WEXITSTATUS(status));
-    return {.violation = Violation{0, crash, how}};
+Play crashed(const Worker& worker) {
+    return {.violation = Violation{0, crash, worker.ending()}};
 }
-
-// A process that plays one life after another and writes a line for each.
-class Worker {
-public:
-    // The body plays and hands over lines until it returns.
-    using Write = std::function<void(const Play& play)>;
-    explicit Worker(const std::function<void(const Write&)>& body) {
-        std::array<int, 2> ends;
-        if (pipe(ends.data()) != 0) throw std::system_error(errno, std::generic_category(), "pipe");
-        std::fflush(nullptr);
-        process_ = fork();
-        if (process_ < 0) throw std::system_error(errno, std::generic_category(), "fork");
-        if (process_ == 0) work(ends, body);
-        close(ends[1]);
-        output_ = ends[0];
-    }
-    ~Worker() {
-        close(output_);
-        if (status_) return;
-        kill(process_, SIGKILL);
-        waitpid(process_, nullptr, 0);
-    }
-    Worker(const Worker&) = delete;
-    Worker& operator=(const Worker&) = delete;
-
-    int output() const { return output_; }
-    // The plays that have come by now; waits for something to come. After the last one, isOver().
-    std::vector<Play> read() {
-        std::array<char, 4096> bytes;
-        const ssize_t count = ::read(output_, bytes.data(), bytes.size());
-        if (count <= 0) finish();
-        text_.append(bytes.data(), static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
-        std::vector<Play> plays;
-        for (std::size_t end; (end = text_.find('\n')) != std::string::npos; text_.erase(0, end + 1))
-            plays.push_back(playFrom(text_.substr(0, end)));
-        return plays;
-    }
-    bool isOver() const { return status_.has_value(); }
-    int status() const { return status_.value_or(0); }
-
-private:
-    [[noreturn]] static void work(const std::array<int, 2>& ends, const std::function<void(const Write&)>& body) {
-        close(ends[0]);
-        std::FILE* const output = fdopen(ends[1], "w");
-        alarm(mostSeconds);
-        body([output](const Play& play) {
-            if (std::fputs(lineOf(play).c_str(), output) < 0 || std::fflush(output) != 0) _exit(1);
-            alarm(mostSeconds);
-        });
-        _exit(0);
-    }
-    void finish() {
-        int status = 0;
-        waitpid(process_, &status, 0);
-        status_ = status;
-    }
-
-    pid_t process_ = -1;
-    int output_ = -1;
-    std::string text_;
-    std::optional<int> status_;
-};
 
 // A worker with its share of the seeds: every so many. After a crash another one goes on behind the life that crashed.
 class Share {
@@ -124,15 +52,16 @@ public:
     bool isOver() const { return !worker_; }
     // Returns false when the taker wants no more.
     bool read(const std::function<bool(std::uint64_t, const Play&)>& take) {
-        for (const Play& play : worker_->read())
-            if (!take(std::exchange(next_, next_ + step()), play)) return false;
+        for (const std::string& line : worker_->read())
+            if (!take(std::exchange(next_, next_ + step()), playFrom(line))) return false;
         if (!worker_->isOver()) return true;
-        const int status = worker_->status();
+        const bool hasFailed = worker_->hasFailed();
+        const Play last = crashed(*worker_);
         worker_.reset();
-        if (status == 0) return true;
+        if (!hasFailed) return true;
         const std::uint64_t seed = std::exchange(next_, next_ + step());
         if (next_ <= exploration_.last) begin();
-        return take(seed, crashed(status));
+        return take(seed, last);
     }
 
 private:
@@ -143,7 +72,7 @@ private:
                 if (exploration_.end && std::chrono::steady_clock::now() >= *exploration_.end) break;
                 Life life = lifeFromSeed(seed, exploration_.level);
                 life.days = std::min(life.days, exploration_.mostDays);
-                write(play(life, {.planted = exploration_.planted}));
+                write(lineOf(play(life, {.planted = exploration_.planted})));
             }
         });
     }
@@ -156,11 +85,11 @@ private:
 }  // namespace
 
 Play playApart(const Life& life, sim::Defect planted) {
-    Worker worker([&](const Worker::Write& write) { write(play(life, {.planted = planted})); });
+    Worker worker([&](const Worker::Write& write) { write(lineOf(play(life, {.planted = planted}))); });
     std::optional<Play> result;
     while (!worker.isOver())
-        for (const Play& play : worker.read()) result = play;
-    return result.value_or(crashed(worker.status()));
+        for (const std::string& line : worker.read()) result = playFrom(line);
+    return result.value_or(crashed(worker));
 }
 
 void explore(const Exploration& exploration, const std::function<bool(std::uint64_t seed, const Play& play)>& take) {

@@ -68,6 +68,7 @@ int Clients::send(int connection, const std::string& what,
     const int number = ++lastNumber_;
     open_[number] = {connection, what};
     connected->lastAsked = world_.elapsed();
+    const sim::CauseScope cause(world_.host.queues, causeOfClients + what);
     connected->service->request([call = std::move(call), number](VRXAgentProtocol& agent) { call(agent, number); });
     return number;
 }
@@ -79,7 +80,7 @@ void Clients::ask(const std::vector<std::string>& words) {
     if (operation == "outreach") ++outreaches_;
     const bool isUpdate = operation == "all-update";
     const std::function<bool()> hasFailed = failureWatch();
-    send(static_cast<int>(numberFrom(words[0])), operation + " " + serialNumber,
+    send(static_cast<int>(numberFrom(words[0])), operation + " " + serialNumber + " " + words[3],
          [=, this](VRXAgentProtocol& agent, int request) {
              if (operation == "outreach") return agent.scheduleOutreachWithReply(reply<bool>(request));
              if (operation == "store") return agent.checkIsAvailableInStore(serialNumber, reply<Value>(request));

@@ -15,6 +15,9 @@
 
 namespace vrx::simulation {
 
+// With what the cause of a client's request begins; the operation follows.
+inline const std::string causeOfClients = "client ";
+
 class Clients {
 public:
     Clients(World& world, Verdict& verdict, Trace& trace) : world_(world), verdict_(verdict), trace_(trace) {}

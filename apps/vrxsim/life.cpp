@@ -50,6 +50,7 @@ constexpr Verb verbs[] = {
     {"clock", "n"},
     {"server", "ti"},
     {"versions-server", "ti"},
+    {"outage", "t"},  // of the coverage server: what it answers, or over
     {"renewal", "ti"},
     {"fail", "ti"},
     {"power-cut-in-write", ""},

@@ -17,6 +17,7 @@
 #include "timeline/page.h"
 #include "vrxsim/apart.h"
 #include "vrxsim/defects.h"
+#include "vrxsim/fleet_verb.h"
 #include "vrxsim/generator.h"
 #include "vrxsim/shrinker.h"
 
@@ -327,6 +328,7 @@ void addVerbs(CommandLine& line, Options& options) {
     verb->add_option("--days", options.mostDays, "How many days of each life")->check(CLI::Range(1, 4000));
     addJobs(*verb, options);
     addLevel(*verb, options);
+    addFleetVerb(line);
 }
 
 }  // namespace vrx::apps

@@ -25,9 +25,11 @@ struct Killed {};
 
 class Player {
 public:
-    Player(const Life& life, const PlayOptions& options) : life_(life), isRecorded_(options.isRecorded) {
+    Player(const Life& life, const PlayOptions& options) : life_(life), options_(options) {
         trace_.show = options.show;
         world_.host.interference.planted = options.planted;
+        world_.host.activities.setShareOfGrace(options.shareOfGrace);
+        if (!options.isJudged) world_.host.log.lowest = platform::Level::Error;
         world_.host.failures.handler = [this](const std::string& text) {
             verdict_.report(day(), "simulation", text);
             world_.host.queues.stop();  // it may have no end
@@ -36,7 +38,7 @@ public:
 
     Play run() {
         for (const Event& event : life_.beginning) happen(event);
-        if (isRecorded_) recorder_.emplace(world_.host);
+        if (options_.isRecorded) recorder_.emplace(world_.host);
         start([this] { world_.host.process.launch([this] { return begin(); }); });
         lookAround();
         const double end = static_cast<double>(life_.days) * secondsOfDay;
@@ -166,6 +168,12 @@ private:
     // Takes down what has happened since the last time, and checks what is there now.
     void lookAround() {
         clients_.check();
+        if (options_.takeSent) std::ranges::for_each(world_.host.http.sent(), options_.takeSent);
+        if (options_.isJudged) judge();
+        world_.host.forgetRecords();
+        nextCheckAt_ = world_.elapsed() + checkInterval;
+    }
+    void judge() {
         invariants_.check();
         if (recorder_) recorder_->look();
         for (const platform::LogEntry& line : world_.host.log.entries()) takeDown(line);
@@ -183,8 +191,6 @@ private:
             trace_.add(item.title.value_or("") + item.informativeFooterText.value_or(""));
             if (trace_.show) trace_.show("  shown " + platform::describe(item.userInfo));
         }
-        world_.host.forgetRecords();
-        nextCheckAt_ = world_.elapsed() + checkInterval;
     }
     void takeDown(const platform::LogEntry& line) {
         trace_.add(line.format);
@@ -193,7 +199,7 @@ private:
     }
 
     const Life& life_;
-    const bool isRecorded_;
+    const PlayOptions& options_;
     Verdict verdict_;
     Trace trace_;
     World world_;

@@ -6,6 +6,7 @@
 #include <optional>
 
 #include "timeline/chronicle.h"
+#include "vrx/sim/http.h"
 #include "vrx/sim/interference.h"
 #include "vrxsim/life.h"
 #include "vrxsim/verdict.h"
@@ -15,7 +16,10 @@ namespace vrx::simulation {
 struct PlayOptions {
     sim::Defect planted = sim::Defect::None;            // in the simulated host
     std::function<void(std::string_view line)> show{};  // gets what happens, line by line
-    bool isRecorded = false;                            // for a chronicle
+    bool isJudged = true;                               // else no rule is looked at, and neither log nor trace is made
+    std::function<void(const sim::SentRequest& sent)> takeSent{};  // gets each request that leaves the device
+    double shareOfGrace = 0;                                       // by which each firing is put off, from 0 to 1
+    bool isRecorded = false;                                       // for a chronicle
 };
 
 struct Play {

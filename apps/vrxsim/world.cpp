@@ -45,7 +45,7 @@ World::World() {
     host.accounts.tokens[platform::vendorIdentifier(".ks.supportapp.auth")] = "token";
     host.accounts.renewedToken = "renewed";
     host.http.answer(coverageUrl, [this](const platform::HttpRequest& request) { return answer(request); });
-    host.http.answer(versionsUrl, [this](const platform::HttpRequest&) { return versionsAnswer(); });
+    host.http.answer(versionsUrl, [this](const platform::HttpRequest& request) { return versionsAnswer(request); });
 }
 
 std::vector<platform::FollowUpItem>& World::items() {
@@ -73,8 +73,8 @@ bool World::isTroubled() const {
 }
 
 bool World::isServerFine() const {
-    return serverTroubles_.empty() && versionTroubles_.empty() && lowVersion_ == 2 && highVersion_ == 3 &&
-           host.accounts.primary && host.accounts.renewalResult.code == 0;
+    return outage_.empty() && serverTroubles_.empty() && versionTroubles_.empty() && lowVersion_ == 2 &&
+           highVersion_ == 3 && host.accounts.primary && host.accounts.renewalResult.code == 0;
 }
 
 bool World::happen(const Event& event) {
@@ -124,6 +124,7 @@ bool World::changeMachine(const Event& event) {
     if (verb == "network") {
         isNetworkOn_ = words[0] == "on";
         host.activities.setNetworkAvailable(isNetworkOn_);
+        host.http.setNetworkAvailable(isNetworkOn_);
     } else if (verb == "metered") {
         isMetered_ = words[0] == "on";
         host.activities.setNetworkMetered(isMetered_);
@@ -160,6 +161,8 @@ bool World::changeServers(const Event& event) {
     } else if (verb == "server" || verb == "versions-server") {
         std::deque<std::string>& troubles = verb == "server" ? serverTroubles_ : versionTroubles_;
         troubles.assign(static_cast<std::size_t>(numberFrom(words[1])), words[0]);
+    } else if (verb == "outage") {
+        outage_ = words[0] == "over" ? "" : words[0];
     } else if (verb == "renewal") {
         host.accounts.renewalResult.code = words[0] == "fails" ? 1 : 0;
         host.accounts.renewalDelay = Duration(numberFrom(words[1]));
@@ -271,14 +274,22 @@ HttpAnswer World::answer(const platform::HttpRequest& request) {
     const auto record = records_.find(*serialNumber);
     const std::string fine =
         record == records_.end() ? "" : host.json.serialize(Value(coverage(record->second, *language))).value();
+    if (!outage_.empty()) return answerOfKind(outage_, fine);
     if (std::optional<HttpAnswer> troubled = troubledAnswer(serverTroubles_, fine)) return *std::move(troubled);
     return record == records_.end() ? HttpAnswer::status(404, "{}") : HttpAnswer::ok(fine);
 }
 
-HttpAnswer World::versionsAnswer() {
+// Kept for a while, then confirmed by its tag while it stays the same.
+HttpAnswer World::versionsAnswer(const platform::HttpRequest& request) {
     const std::string fine =
         propertyList(Dictionary{{"LowServerVersion", lowVersion_}, {"HighServerVersion", highVersion_}});
-    return troubledAnswer(versionTroubles_, fine).value_or(HttpAnswer::ok(fine));
+    if (std::optional<HttpAnswer> troubled = troubledAnswer(versionTroubles_, fine)) return *std::move(troubled);
+    const std::string tag = "\"" + std::to_string(lowVersion_) + "-" + std::to_string(highVersion_) + "\"";
+    const auto known = request.headers.find("If-None-Match");
+    const bool isKnown = known != request.headers.end() && known->second == tag;
+    HttpAnswer answer = isKnown ? HttpAnswer::status(304) : HttpAnswer::ok(fine);
+    answer.response.headers = {{"Cache-Control", "max-age=" + std::to_string(secondsVersionsAreKept)}, {"ETag", tag}};
+    return answer;
 }
 
 std::optional<HttpAnswer> World::troubledAnswer(std::deque<std::string>& troubles, const std::string& fine) {
@@ -286,6 +297,10 @@ std::optional<HttpAnswer> World::troubledAnswer(std::deque<std::string>& trouble
     serverTroubledAt_ = elapsed();
     const std::string kind = std::move(troubles.front());
     troubles.pop_front();
+    return answerOfKind(kind, fine);
+}
+
+HttpAnswer World::answerOfKind(const std::string& kind, const std::string& fine) {
     if (kind == "cut") return HttpAnswer::failure();
     if (kind == "late") return HttpAnswer::ok(fine).after(Duration(28));
     if (kind == "never") return HttpAnswer::silence();

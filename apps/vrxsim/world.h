@@ -17,6 +17,8 @@ inline const std::string phone = "PHONE";
 
 class World {
 public:
+    static constexpr int secondsVersionsAreKept = 300;  // by the document's own headers
+
     World();
 
     // Lets an event happen that is none of the process or its clients. Returns false for any other.
@@ -32,8 +34,11 @@ public:
     // Whether something may keep the agent from its work: no network, deferral, a failure that is still to come.
     bool isTroubled() const;
     bool isFailing() const;
-    // Whether the server has answered as it should at least since then, for a signed-in user.
-    bool isServerFineSince(double second) const { return isServerFine() && serverTroubledAt_ < second; }
+    // Whether the servers have answered as they should at least since then, for a signed-in user, and nothing is kept
+    // of what they said before.
+    bool isServerFineSince(double second) const {
+        return isServerFine() && serverTroubledAt_ + secondsVersionsAreKept < second;
+    }
 
     sim::Host host;
     std::map<std::string, double> unpairedAt;  // elapsed seconds; of watches that are not paired now
@@ -69,12 +74,14 @@ private:
 
     platform::Dictionary coverage(const Record& record, const std::string& language) const;
     sim::HttpAnswer answer(const platform::HttpRequest& request);
-    sim::HttpAnswer versionsAnswer();
+    sim::HttpAnswer versionsAnswer(const platform::HttpRequest& request);
     std::optional<sim::HttpAnswer> troubledAnswer(std::deque<std::string>& troubles, const std::string& fine);
+    static sim::HttpAnswer answerOfKind(const std::string& kind, const std::string& fine);
 
     std::map<std::string, Record> records_;
     std::map<std::string, double> latestEnds_;                  // days
     std::deque<std::string> serverTroubles_, versionTroubles_;  // the kinds of the next answers
+    std::string outage_;                                        // the kind of all answers; empty without one
     double serverTroubledAt_ = -1;                              // the last time that an event changed how it answers
     std::int64_t lowVersion_ = 2, highVersion_ = 3;
     bool isNetworkOn_ = true, isMetered_ = false, isDeferring_ = false;

@@ -5,6 +5,7 @@
 #include "vrx/codec/base64.h"
 #include "vrx/codec/expat.h"
 #include "vrx/codec/iso_date.h"
+#include "vrx/codec/line_text.h"
 #include "vrx/codec/property_list_error.h"
 #include "vrx/codec/value_builder.h"
 #include "vrx/codec/xml_property_list.h"
@@ -16,14 +17,6 @@ using platform::Result;
 using platform::Value;
 
 namespace {
-
-constexpr std::string_view whiteSpace = " \t\r\n";
-
-std::string_view trimmed(std::string_view text) {
-    const std::size_t begin = text.find_first_not_of(whiteSpace);
-    if (begin == text.npos) return {};
-    return text.substr(begin, text.find_last_not_of(whiteSpace) + 1 - begin);
-}
 
 // The whole text as a number in that form; null when it is not one or is out of range.
 template <class Number, class... Form>

@@ -37,10 +37,7 @@ std::string pathForSerialNumber(const std::optional<std::string>& serialNumber) 
 
 // Null when the file is missing or is not a property list.
 Value propertyListAt(const std::string& path) {
-    Platform& platform = Platform::current();
-    Result<Data> document = platform.files().read(path);
-    if (!document) return nullptr;
-    Result<Value> root = platform.propertyList().parse(*document);
+    Result<Value> root = Platform::current().files().readPropertyList(path);
     return root ? *root : Value();
 }
 

@@ -15,6 +15,8 @@ public:
     virtual std::string homeDirectory() const = 0;
     // Reads the whole file. A file larger than limits::fileBytes is an error, and so is anything but a regular file.
     virtual Result<Data> read(const std::string& path) const = 0;
+    // The root of the property list that the file is. What was decoded may be kept for as long as the file is the same.
+    virtual Result<Value> readPropertyList(const std::string& path) const = 0;
     // Replaces the file as one step, or leaves it as it was: a reader, and the next start after a power cut, sees the
     // whole old or the whole new content. The directory must exist.
     virtual MaybeError replace(const std::string& path, const Data& content) = 0;

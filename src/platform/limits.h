@@ -36,5 +36,7 @@ inline constexpr std::size_t requestsPerUser = 128;
 // HTTP transfers at the same time, in all and to one host.
 inline constexpr std::size_t transfers = 16;
 inline constexpr std::size_t transfersPerHost = 8;
+// All HTTP answers together that a process keeps.
+inline constexpr std::size_t storedAnswerBytes = 1024 * 1024;
 
 }  // namespace vrx::platform::limits

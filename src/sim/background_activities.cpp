@@ -36,6 +36,9 @@ void BackgroundActivities::schedule(const platform::ActivityRegistration& regist
         Duration interval = registration.isByOwnRun ? minimumInterval_ : atOnce;
         attachment.isRegisteredByOwnRun = registration.isByOwnRun && criteria.delay <= 0;
         platform::DueTime due = platform::dueTime(criteria, interval, now());
+        if (shareOfGrace_ > 0)
+            due = platform::dueAfter(due.wait + Duration(shareOfGrace_ * static_cast<double>(criteria.gracePeriod)),
+                                     now());
         const auto earlier = rows_.find(registration.identifier);
         if (earlier != rows_.end() && isAfterBoot()) due = platform::takenUp(due, earlier->second.due, now());
         addRow(registration.identifier, criteria, std::move(due));
@@ -202,6 +205,7 @@ void BackgroundActivities::fire(const std::string& identifier, int generation) {
     attachment.doesRunNeedNetwork = rows_.at(identifier).criteria.requiresNetwork;
     firings_.push_back({identifier, clock_.now()});
     if (firingObserver_) firingObserver_(identifier);
+    const CauseScope cause(queues_, identifier);
     ActivityHandler handler = attachment.handler;  // another handler may take its place during the run
     if (interference_.strikes(Defect::HandlerTwice)) handler([](BackgroundActivityResult) {});
     handler([this, identifier](BackgroundActivityResult result) { takeResult(identifier, result); });

@@ -41,6 +41,9 @@ public:
     void setShouldDefer(bool shouldDefer);
     // What needs the network then defers.
     void setNetworkMetered(bool isNetworkMetered);
+    // Every activity fires this share of its grace period later, from 0 to 1: what a registry would do that spreads
+    // what many devices do at the same time.
+    void setShareOfGrace(double share) { shareOfGrace_ = share; }
     void wallClockWasSet() { considerAll(); }
 
     // What happens to the process. Its life begins with the first start.
@@ -127,6 +130,7 @@ private:
     bool isNetworkAvailable_ = true;
     bool shouldDefer_ = false;
     bool isNetworkMetered_ = false;
+    double shareOfGrace_ = 0;
     std::vector<Firing> firings_;
     std::function<void(const std::string& identifier)> firingObserver_;
     platform::Duration minimumInterval_ = platform::minimumInterval;

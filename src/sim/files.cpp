@@ -4,6 +4,7 @@
 #include <cerrno>
 #include <cstring>
 
+#include "vrx/codec/property_list.h"
 #include "vrx/platform/limits.h"
 
 namespace vrx::sim {
@@ -12,6 +13,7 @@ using platform::Data;
 using platform::Error;
 using platform::MaybeError;
 using platform::Result;
+using platform::Value;
 
 namespace {
 
@@ -38,6 +40,11 @@ Result<Data> Files::read(const std::string& path) const {
     if (file == files_.end()) return fileError("open", path, ENOENT);
     if (file->second.size() > platform::limits::fileBytes) return fileError("read", path, EFBIG);
     return file->second;
+}
+
+Result<Value> Files::readPropertyList(const std::string& path) const {
+    const Result<Data> document = read(path);
+    return document ? codec::parsePropertyList(*document) : document.error();
 }
 
 MaybeError Files::replace(const std::string& path, const Data& content) {

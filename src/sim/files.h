@@ -20,6 +20,7 @@ public:
 
     std::string homeDirectory() const override { return "/home/user"; }
     platform::Result<platform::Data> read(const std::string& path) const override;
+    platform::Result<platform::Value> readPropertyList(const std::string& path) const override;
     platform::MaybeError replace(const std::string& path, const platform::Data& content) override;
     platform::MaybeError createDirectories(const std::string& path) override;
     platform::MaybeError remove(const std::string& path) override;

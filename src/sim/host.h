@@ -81,12 +81,12 @@ public:
     InstalledApps installedApps;
     LocalizedStrings localizedStrings;
     BackgroundActivities activities{clock, queues, interference};
-    NotificationCenter notifications{interference};
+    NotificationCenter notifications{queues, interference};
     codec::Json json;
     codec::PropertyList propertyList;
     codec::Digest digest;
     UuidSource uuids;
-    Process process{queues, defaults, activities, notifications};
+    Process process{queues, defaults, activities, notifications, http};
     platform::Platform platform;
 
 private:

@@ -3,6 +3,7 @@
 #include <limits>
 #include <utility>
 
+#include "vrx/codec/http_cache_rules.h"
 #include "vrx/platform/url.h"
 
 namespace vrx::sim {
@@ -43,11 +44,24 @@ HttpAnswer HttpAnswer::silence() {
     return HttpAnswer().after(Duration(std::numeric_limits<double>::infinity()));
 }
 
+// A request on its way, and the kept answer about which it asks.
+struct HttpSessions::Exchange {
+    bool isShared = false;
+    HttpRequest request{};
+    platform::OnceCallback<HttpResponse> completion{};
+    codec::HttpCache::Stored stored{};
+    platform::Date asked{};
+
+    // Whether it may be answered by what is kept: headers of its own could name an account.
+    bool isCached() const { return request.method == "GET" && request.body.empty() && request.headers.empty(); }
+};
+
 class HttpSessions::Session final : public platform::HttpSession {
 public:
     Session(HttpSessions& sessions, bool isShared) : sessions_(sessions), isShared_(isShared) {}
     void send(HttpRequest request, platform::OnceCallback<HttpResponse> completion) override {
-        sessions_.send(isShared_, std::move(request), std::move(completion));
+        sessions_.interference_.call();
+        sessions_.send({.isShared = isShared_, .request = std::move(request), .completion = std::move(completion)});
     }
 
 private:
@@ -77,22 +91,60 @@ std::vector<SentRequest> HttpSessions::sentTo(std::string_view url) const {
     return requests;
 }
 
-void HttpSessions::send(bool isShared, HttpRequest request, platform::OnceCallback<HttpResponse> completion) {
-    interference_.call();
-    HttpAnswer answer = answerTo(request);
-    Duration limit = request.timeout.value_or(defaultTimeout);
-    if (answer.delay >= limit) answer = transportError(timedOut, "the request timed out").after(limit);
+void HttpSessions::send(Exchange exchange) {
+    exchange.asked = clock_.now();
+    exchange.stored = exchange.isShared && exchange.isCached() ? cache_.find(exchange.request.url) : nullptr;
+    std::optional<HttpResponse> kept = exchange.stored ? cache_.freshAnswer(*exchange.stored) : std::nullopt;
+    HttpAnswer answer = kept ? HttpAnswer{*std::move(kept), Duration(0)} : transferred(exchange);
     if (interference_.strikes(Defect::AnswerLost)) answer = HttpAnswer::silence();
-    sent_.push_back({std::move(request), isShared, clock_.now()});
+    const Duration delay = answer.delay;
     queues_.workers(platform::Priority::UserInitiated)
-        .postAfter(answer.delay, [response = std::move(answer.response), completion = std::move(completion)]() mutable {
-            completion(std::move(response));
+        .postAfter(delay, [this, exchange = std::move(exchange), answer = std::move(answer)]() mutable {
+            arrive(std::move(exchange), std::move(answer));
         });
+}
+
+// What becomes of it on its way to the server and back, within the time that it has.
+HttpAnswer HttpSessions::transferred(const Exchange& exchange) {
+    HttpRequest request = exchange.request;
+    if (exchange.stored) request.headers.merge(codec::revalidationHeaders(exchange.stored->answer.headers));
+    HttpAnswer answer = answerTo(request);
+    const Duration limit = request.timeout.value_or(defaultTimeout);
+    if (answer.delay >= limit) answer = transportError(timedOut, "the request timed out").after(limit);
+    answer.isTransferred = true;
+    if (hasLeft(request))
+        sent_.push_back(
+            {std::move(request), exchange.isShared, exchange.asked, answer.response.status, queues_.cause()});
+    return answer;
+}
+
+// Without a network nothing leaves the device.
+bool HttpSessions::hasLeft(const HttpRequest& request) const {
+    return isNetworkAvailable_ || request.url.starts_with("file:");
+}
+
+// Handles what has come from a server as the real host does: the confirmation of what is kept, and a final answer.
+void HttpSessions::arrive(Exchange exchange, HttpAnswer answer) {
+    HttpResponse& response = answer.response;
+    const std::string& url = exchange.request.url;
+    if (!answer.isTransferred || response.error) return exchange.completion(std::move(response));
+    if (exchange.stored && response.status == 304) {
+        if (codec::isConfirmed(exchange.stored->answer.headers, response.headers))
+            return exchange.completion(cache_.revalidated(*exchange.stored, exchange.asked, response.headers));
+        cache_.forget(url);
+        return send(std::move(exchange));
+    }
+    if (exchange.isCached() && response.status == 200) cache_.store(url, exchange.asked, response);
+    // A successful change makes what is kept of the address out of date.
+    const bool isChange = exchange.request.method != "GET" && exchange.request.method != "HEAD";
+    if (isChange && response.status < 400) cache_.forget(url);
+    exchange.completion(std::move(response));
 }
 
 HttpAnswer HttpSessions::answerTo(const HttpRequest& request) {
     std::optional<platform::Url> url = platform::Url::parse(request.url);
     if (!url) return transportError(unreadable, "no URL");
+    if (!hasLeft(request)) return transportError(lost, "there is no network");
     if (std::deque<HttpAnswer>& answers = once_[request.url]; !answers.empty()) {
         HttpAnswer answer = std::move(answers.front());
         answers.pop_front();

@@ -1,6 +1,9 @@
 // HTTP with scripted answers. A test scripts the answer at a URL and afterwards reads what was sent. A URL without an
-// answer refuses connections; a file URL reads the simulated files. Answers arrive on a worker, after their delay in
-// virtual time. Nothing is cached.
+// answer refuses connections, as all do without a network; a file URL reads the simulated files. Answers arrive on a
+// worker, after their delay in virtual time.
+//
+// As on a real host, the shared session keeps answers as their headers allow, for as long as the process lives; an
+// uncached one does not use them, but stores its own answer in their place. Redirects are not followed.
 #pragma once
 
 #include <deque>
@@ -11,7 +14,9 @@
 #include <string_view>
 #include <vector>
 
+#include "vrx/codec/http_cache.h"
 #include "vrx/platform/http_request.h"
+#include "vrx/platform/limits.h"
 #include "vrx/sim/clock.h"
 #include "vrx/sim/files.h"
 #include "vrx/sim/interference.h"
@@ -22,6 +27,7 @@ namespace vrx::sim {
 struct HttpAnswer {
     platform::HttpResponse response;
     platform::Duration delay{0.1};
+    bool isTransferred = false;  // set by the sessions: it comes from a server, and not from what is kept
 
     static HttpAnswer ok(std::string_view body) { return status(200, body); }
     static HttpAnswer status(int status, std::string_view body = {});
@@ -38,9 +44,11 @@ struct HttpAnswer {
 };
 
 struct SentRequest {
-    platform::HttpRequest request;
-    bool isShared;        // through the shared session; otherwise through one that bypasses caches
-    platform::Date date;  // when it was sent
+    platform::HttpRequest request;  // as the server saw it, with what asks about a kept answer
+    bool isShared;                  // through the shared session; otherwise through one that bypasses caches
+    platform::Date date;            // when it was sent
+    int status;                     // of the answer that follows; 0 when none does
+    std::string_view cause;         // Queues::cause() at that moment
     std::string_view body() const { return {reinterpret_cast<const char*>(request.body.data()), request.body.size()}; }
 };
 
@@ -60,7 +68,12 @@ public:
     // Answers that come before the standing one, each once, in the order in which they were set.
     void answerOnce(std::string url, HttpAnswer answer) { once_[std::move(url)].push_back(std::move(answer)); }
 
-    // All requests, file URLs included, in the order in which they were sent.
+    void setNetworkAvailable(bool isNetworkAvailable) { isNetworkAvailable_ = isNetworkAvailable; }
+    // What the process had kept ends with it.
+    void processEnded() { cache_.clear(); }
+
+    // All requests that left the device, and those for files, in the order in which they were sent. What was kept is
+    // answered without one.
     const std::vector<SentRequest>& sent() const { return sent_; }
     void forgetSent() { sent_.clear(); }
     std::vector<SentRequest> sentTo(std::string_view url) const;
@@ -68,7 +81,12 @@ public:
 private:
     class Session;
 
-    void send(bool isShared, platform::HttpRequest request, platform::OnceCallback<platform::HttpResponse> completion);
+    struct Exchange;
+
+    void send(Exchange exchange);
+    HttpAnswer transferred(const Exchange& exchange);
+    bool hasLeft(const platform::HttpRequest& request) const;
+    void arrive(Exchange exchange, HttpAnswer answer);
     HttpAnswer answerTo(const platform::HttpRequest& request);
     HttpAnswer fileAnswer(const std::string& path) const;
 
@@ -80,6 +98,8 @@ private:
     std::map<std::string, Server> standing_;
     std::map<std::string, std::deque<HttpAnswer>> once_;
     std::vector<SentRequest> sent_;
+    codec::HttpCache cache_{clock_, platform::limits::storedAnswerBytes};
+    bool isNetworkAvailable_ = true;
 };
 
 }  // namespace vrx::sim

@@ -30,6 +30,7 @@ void NotificationCenter::raise(std::string_view nameRemainder) {
 
 // A registration that is cancelled before its turn is not called.
 void NotificationCenter::deliver(const std::shared_ptr<Registration>& registration) {
+    const CauseScope cause(queues_, registration->name);
     registration->queue.post([weak = std::weak_ptr(registration)] {
         if (auto registered = weak.lock()) registered->handler();
     });

@@ -9,12 +9,14 @@
 
 #include "vrx/platform/notification_center.h"
 #include "vrx/sim/interference.h"
+#include "vrx/sim/queues.h"
 
 namespace vrx::sim {
 
 class NotificationCenter final : public platform::NotificationCenter {
 public:
-    explicit NotificationCenter(const Interference& interference) : interference_(interference) {}
+    NotificationCenter(Queues& queues, const Interference& interference)
+        : queues_(queues), interference_(interference) {}
 
     std::int32_t registerForNotification(std::string name, platform::Queue& queue,
                                          std::function<void()> handler) override;
@@ -32,8 +34,9 @@ private:
         std::function<void()> handler;
     };
 
-    static void deliver(const std::shared_ptr<Registration>& registration);
+    void deliver(const std::shared_ptr<Registration>& registration);
 
+    Queues& queues_;
     const Interference& interference_;
     std::map<std::int32_t, std::shared_ptr<Registration>> registrations_;
     std::int32_t lastToken_ = 0;

@@ -7,8 +7,8 @@
 namespace vrx::sim {
 
 Process::Process(Queues& queues, DefaultsStore& defaults, BackgroundActivities& activities,
-                 NotificationCenter& notifications)
-    : queues_(queues), defaults_(defaults), activities_(activities), notifications_(notifications) {
+                 NotificationCenter& notifications, HttpSessions& http)
+    : queues_(queues), defaults_(defaults), activities_(activities), notifications_(notifications), http_(http) {
     queues_.setIdleHandler([this] { exitIfWanted(); });
 }
 
@@ -23,12 +23,14 @@ void Process::kill() {
     content_ = nullptr;
     activities_.processEnded();
     notifications_.processEnded();
+    http_.processEnded();
     defaults_.forgetRegistered();
     inFlight_ = std::make_shared<int>();
     isExitWanted_ = false;
 }
 
 void Process::relaunch() {
+    const CauseScope cause(queues_, startCause);
     activities_.processStarted(agentVersion);
     content_ = main_();
     startHandler_();

@@ -14,6 +14,7 @@
 #include "vrx/platform/process_lifecycle.h"
 #include "vrx/sim/background_activities.h"
 #include "vrx/sim/defaults_store.h"
+#include "vrx/sim/http.h"
 #include "vrx/sim/notification_center.h"
 #include "vrx/sim/queues.h"
 
@@ -22,7 +23,7 @@ namespace vrx::sim {
 class Process final : public platform::ProcessLifecycle {
 public:
     Process(Queues& queues, DefaultsStore& defaults, BackgroundActivities& activities,
-            NotificationCenter& notifications);
+            NotificationCenter& notifications, HttpSessions& http);
 
     void exitCleanWhenIdle() override { isExitWanted_ = true; }
     platform::WorkInFlight beginWork() override { return inFlight_; }
@@ -47,6 +48,8 @@ public:
     // How often the process ended because it asked to.
     int cleanExits() const { return cleanExits_; }
 
+    // What is posted while the process starts has this cause.
+    static constexpr std::string_view startCause = "start";
     // The version of the agent that is started next.
     std::string agentVersion = "1";
 
@@ -58,6 +61,7 @@ private:
     DefaultsStore& defaults_;
     BackgroundActivities& activities_;
     NotificationCenter& notifications_;
+    HttpSessions& http_;
     Main main_;
     std::function<void()> startHandler_ = [] {};
     std::shared_ptr<void> content_;

@@ -28,7 +28,7 @@ public:
 
     void post(Task task) override { postAfter(Duration(0), std::move(task)); }
     void postAfter(Duration delay, Task task) override {
-        queues_.add(delay, {shared_from_this(), std::move(task), nullptr});
+        queues_.add(delay, {shared_from_this(), std::move(task), nullptr, queues_.cause()});
     }
 
     const std::string label;
@@ -63,6 +63,7 @@ struct Queues::Strand {
     std::optional<Key> wakeUp;   // the pending work that ends its wait
     platform::Date waitingSince{};
     bool isAbandoned = false;
+    std::string_view cause;
 };
 
 Queues::Queues(Clock& clock, const Failures& failures)
@@ -94,6 +95,14 @@ std::shared_ptr<platform::Event> Queues::makeEvent() {
 
 std::string Queues::currentLabel() const {
     return current_ ? current_->lane->label : std::string();
+}
+
+std::string_view& Queues::causeNow() {
+    return current_ ? current_->cause : causeOfBody_;
+}
+
+std::string_view Queues::causeNow() const {
+    return current_ ? current_->cause : causeOfBody_;
 }
 
 std::size_t Queues::pendingCount() const {
@@ -161,6 +170,7 @@ void Queues::execute(Work work) {
         current_ = idle_.back();
         idle_.pop_back();
         current_->lane = std::move(work.lane);
+        current_->cause = work.cause;
         current_->lane->isBusy = current_->lane->isSerial;
         current_->fiber.start([task = std::move(work.task)]() mutable {
             try {
@@ -187,7 +197,7 @@ bool Queues::wait(Event& event, std::optional<Duration> limit) {
     if (!strand.isAbandoned) {
         std::shared_ptr<Event> kept = event.shared_from_this();  // keeps it alive even if the simulation ends meanwhile
         event.waiting.push_back(&strand);
-        if (limit) strand.wakeUp = add(*limit, {strand.lane, nullptr, &strand});
+        if (limit) strand.wakeUp = add(*limit, {strand.lane, nullptr, &strand, {}});
         strand.waitingSince = clock_.now();
         strand.fiber.suspend();
         std::erase(event.waiting, &strand);
@@ -208,7 +218,7 @@ bool Queues::runUntilSet(const Event& event, std::optional<Duration> limit) {
 
 void Queues::wake(Strand& strand) {
     if (strand.wakeUp) pending_.erase(*strand.wakeUp);
-    strand.wakeUp = add(Duration(0), {strand.lane, nullptr, &strand});
+    strand.wakeUp = add(Duration(0), {strand.lane, nullptr, &strand, {}});
 }
 
 bool Queues::isInBody(const char* what) const {
@@ -241,7 +251,7 @@ void Queues::discardWork() {
         if (strand->fiber.isIdle()) continue;
         strand->isAbandoned = true;
         if (strand->wakeUp) pending_.erase(*strand->wakeUp);
-        execute({strand->lane, nullptr, strand.get()});
+        execute({strand->lane, nullptr, strand.get(), {}});
         strand->isAbandoned = false;
     }
     while (!pending_.empty()) pending_.extract(pending_.begin());

@@ -14,7 +14,9 @@
 #include <map>
 #include <memory>
 #include <optional>
+#include <set>
 #include <string>
+#include <string_view>
 #include <utility>
 #include <vector>
 
@@ -48,6 +50,9 @@ public:
     // The label of the queue whose task is running: "main", "background", "userInitiated" or a serial queue's own;
     // empty in the test's body.
     std::string currentLabel() const;
+    // What began the work under way, such as an activity or a client's request; empty when nothing is known to have. A
+    // task has the cause of the work that posted it. The text lives as long as the queues.
+    std::string_view cause() const { return causeNow(); }
     bool isInTask() const { return current_ != nullptr; }
     void stop() { isStopped_ = true; }
     // Tasks that have not begun, delayed ones included.
@@ -81,7 +86,12 @@ private:
         std::shared_ptr<Lane> lane;
         platform::Task task;
         Strand* strand = nullptr;
+        std::string_view cause{};
     };
+
+    friend class CauseScope;
+    std::string_view& causeNow();
+    std::string_view causeNow() const;
 
     Key add(platform::Duration delay, Work work);
     void runWork(platform::Duration until);
@@ -105,11 +115,27 @@ private:
     bool isClosed_ = false;
     bool isStopped_ = false;
     bool areWaitingTasksLetGo_ = false;
+    std::set<std::string, std::less<>> causes_;  // all that there were
+    std::string_view causeOfBody_;
     std::function<void()> idleHandler_;
 
     std::shared_ptr<Lane> main_;
     std::shared_ptr<Lane> background_;
     std::shared_ptr<Lane> userInitiated_;
+};
+
+// While one lives, what its task posts, or the test's body, has this cause.
+class CauseScope {
+public:
+    CauseScope(Queues& queues, std::string_view cause)
+        : now_(queues.causeNow()), before_(std::exchange(now_, *queues.causes_.emplace(cause).first)) {}
+    ~CauseScope() { now_ = before_; }
+    CauseScope(const CauseScope&) = delete;
+    CauseScope& operator=(const CauseScope&) = delete;
+
+private:
+    std::string_view& now_;
+    const std::string_view before_;
 };
 
 }  // namespace vrx::sim

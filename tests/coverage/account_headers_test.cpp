@@ -69,13 +69,18 @@ TEST_F(AccountHeadersTest, OfferRequestsNeedNoAccount) {
     host.device.contentSizeCategory = "XL";
     host.device.strings.erase("ProductVersion");
     host.accounts.primary.reset();
+    host.accounts.mediaStorefront = "143441";
+    first.headers["storefrontLocale"] = "an earlier one";
     vrx_addTarnHeadersWithOfferID(first, "O", "S");
+    EXPECT_EQ(host.log.messages()[0], "Primary Nimbus Account is nil!");
+    host.accounts.primary.emplace();
     vrx_addTarnHeadersWithOfferID(second, "O", "S");
     EXPECT_EQ(headerDescription(first).text,
               "{Offer-ID = O; User-Agent = <com.orvane.vrxagent/(null)/Simulated1,1>; X-Orvane-Content-Size = XL; "
               "X-Orvane-DM = No; X-Orvane-SN = S; X-Orvane-Txn-ID = 00000000-0000-4000-8000-000000000001;}");
     EXPECT_NE(first.headers["X-Orvane-Txn-ID"], second.headers["X-Orvane-Txn-ID"]);
-    EXPECT_EQ(host.log.messages()[0], "Primary Nimbus Account is nil!");
+    EXPECT_EQ(second.headers["storefrontLocale"], "143441");
+    EXPECT_EQ(host.log.messages().back(), "storeLocale 143441");
 }
 
 TEST_F(AccountHeadersTest, TheBodyAsksForOneDeviceHereAndNow) {
@@ -88,6 +93,12 @@ TEST_F(AccountHeadersTest, TheBodyAsksForOneDeviceHereAndNow) {
               R"({"locale":"en_US","requestTimestamp":1735689600999,"requestTimezone":-9,"serialNumber":"S\"1"})");
     request.body.back() = 0xff;
     EXPECT_EQ(bodyDescription(request), std::nullopt);
+    host.clock.set(dateFromEpoch(-1.5));
+    vrx_setCoverageRequestBodyWithSerialNumber(request, "S");
+    EXPECT_THAT(bodyDescription(request).value_or(""), HasSubstr(R"("requestTimestamp":0,)"));
+    HttpRequest unwritable;
+    vrx_setCoverageRequestBodyWithSerialNumber(unwritable, "\xff");
+    EXPECT_TRUE(unwritable.body.empty());
 }
 
 }  // namespace

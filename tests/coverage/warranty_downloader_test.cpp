@@ -3,6 +3,7 @@
 #include "vrx/coverage/warranty_downloader.h"
 
 #include "support/simulated_host.h"
+#include "vrx/coverage/account_headers.h"
 #include "vrx/coverage/cache_metadata.h"
 #include "vrx/coverage/records/warranty.h"
 
@@ -142,7 +143,10 @@ TEST_F(ServerTest, RenewsARefusedTokenAndTriesAgain) {
     EXPECT_EQ(metadata(cachedWarrantyVersionKey), Value("2"));
     EXPECT_EQ(sentTokens(), "T0T1T1");
     EXPECT_TRUE(host.accounts.asked[0].avoidUI);
-    EXPECT_EQ(host.http.sentTo(url)[2].request.sourceApplication, "com.orvane.Preferences");
+    const platform::HttpRequest last = host.http.sentTo(url)[2].request;
+    EXPECT_EQ(last.sourceApplication, "com.orvane.Preferences");
+    EXPECT_THAT(last.method + bodyDescription(last).value_or(""),
+                AllOf(HasSubstr("POST"), HasSubstr(R"("serialNumber":"S")")));
 
     std::string formats;
     for (const auto& entry : host.log.entries()) formats.append(entry.format).append("|");

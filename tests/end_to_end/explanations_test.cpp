@@ -155,6 +155,11 @@ TEST_F(Explanations, FireWhatTheTargetDateLets) {
     awaitEnd("outreach", "deferred");
     EXPECT_EQ(activity("outreach")["targetDate"], outreach["targetDate"]);
 
+    std::string history;
+    for (const Value& run : *vrxhost({"activities", "--history"}).document["history"].asArray())
+        history += run["identifier"].description().substr(20) + " " + run["outcome"].description() + ";";
+    EXPECT_THAT(history, MatchesRegex("(boot finished;upgrade|upgrade finished;boot) finished;outreach deferred;"));
+
     ASSERT_EQ(place_.stop(), 0) << place_.agent().errors();
     const Dictionary before = homeContents();
     EXPECT_EQ(vrxhost({"fire", "outreach"}).code, 3);

@@ -7,6 +7,7 @@
 
 #include "support/simulated_host.h"
 #include "vrx/devices/records/device_info.h"
+#include "vrx/followup/default_follow_up_provider.h"
 #include "vrx/followup/follow_up_rules.h"
 #include "vrx/followup/serial_number_hashes.h"
 #include "vrx/platform/sha256_hash.h"
@@ -184,6 +185,31 @@ TEST_F(FollowUpTest, PostsWhatIsDue) {
     EXPECT_TRUE(VRXFollowUp().postFollowUpWithDevicesInfo({d, a}));
     EXPECT_EQ(host.defaults.get(postedSerialNumberHashesKey), Value(Array{"other", sha256Hash("A")}));
     EXPECT_FALSE(VRXFollowUp().postFollowUpWithDevicesInfo({b, c}));
+}
+
+// Such a device info has no item to be found, posted or removed by.
+TEST_F(FollowUpTest, LeavesAloneWhatHasNoDeviceOrRecord) {
+    const auto nobody = VRXDeviceInfo::deviceInfoWithDevice(nullptr, a->warranty());
+    EXPECT_TRUE(VRXFollowUp().postFollowUpWithDevicesInfo({nobody}));
+    for (const auto& lacking : {info("A", {}), info("A", Dictionary{})})
+        VRXFollowUp().postFollowUpWithDeviceInfo(lacking);
+    EXPECT_THAT(host.log.messages(Level::Error),
+                ElementsAre("Failed to post follow-up:<Missing serial number>",
+                            "Failed to post follow-up:<Missing warranty>", "Failed to post follow-up:"));
+    EXPECT_THAT(VRXFollowUp().refreshFollowupWithDeviceInfos({nobody}), IsEmpty());
+    EXPECT_EQ(outcome(), "list ->");
+    FollowUpItem item;
+    VRXFollowUp()._setupFollowUpItem(item, nobody);
+    EXPECT_FALSE(item.userInfo.contains("FollowupSerialNumber"));
+}
+
+// The provider's callers need not take its errors.
+TEST_F(FollowUpTest, FailsQuietlyWhereNobodyAsksWhy) {
+    VRXDefaultFolllowUpProvider provider;
+    host.followUps.fail(Request::Post);
+    EXPECT_FALSE(provider.postFollowUpItem(itemOf("A"), nullptr));
+    host.followUps.fail(Request::List);
+    EXPECT_THAT(provider.pendingFollowUpItems(nullptr), IsEmpty());
 }
 
 TEST_F(FollowUpTest, RefreshesRemovalsFirstThenUpdatesThenReposts) {

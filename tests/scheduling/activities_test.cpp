@@ -4,7 +4,9 @@
 #include "vrx/followup/follow_up.h"
 #include "vrx/scheduling/follow_up_post.h"
 #include "vrx/scheduling/follow_up_refresh.h"
+#include "vrx/scheduling/outreach_activity.h"
 #include "vrx/scheduling/scheduler.h"
+#include "vrx/scheduling/start_up_activities.h"
 #include "vrx/service/agent.h"
 
 namespace vrx {
@@ -75,6 +77,16 @@ TEST(Outreach, EndsWhenItsActivityIsReplacedMeanwhile) {
     EXPECT_EQ(world.runs("outreach"), 2);
 }
 
+// On the last day the number of days changes no more, and the refresh that follows a post comes at once.
+TEST(Post, OnTheLastDayIsRefreshedAtOnce) {
+    AgentWorld world;
+    world.setRecord("PHONE", {.until = 10.5, .shownFrom = 10});
+    world.install();
+    world.runToDay(10.01);
+    EXPECT_THAT(world.shown(), ElementsAre("PHONE"));
+    EXPECT_EQ(world.runs("followuprefresh"), 1);
+}
+
 // No devices, as soon as it is told so.
 class SlowInventory final : public VRXAgentDeviceProvider {
 public:
@@ -102,9 +114,25 @@ protected:
         return activity;
     }
 
+    static constexpr Duration watchInterval{2e9};
     std::shared_ptr<VRXScheduler> scheduler;
     std::vector<BackgroundActivityResult> results;
 };
+
+TEST_F(ActivityTest, NeedsTheNetworkOnlyForDownloads) {
+    const ActivityCollaborators none{};
+    const std::pair<std::shared_ptr<VRXSchedulerActivityDelegate>, bool> activities[] = {
+        {std::make_shared<VRXPostUpgradeActivity>(none), false},
+        {std::make_shared<VRXPostBootActivity>(none), false},
+        {std::make_shared<VRXOutreachActivity>(none), true},
+        {std::make_shared<VRXFollowUpPost>(none), true},
+        {std::make_shared<VRXFollowUpRefresh>(none), false}};
+    for (const auto& [activity, needsNetwork] : activities) {
+        VRXScheduler::newSchedulerWithActivityDelegate(activity)->scheduleActivityWithDelay(Duration(60));
+        EXPECT_EQ(host.activities.criteria(activity->identifier()).value().requiresNetwork, needsNetwork)
+            << activity->identifier();
+    }
+}
 
 TEST_F(ActivityTest, IsDeferredWhenNoDeviceInfosCanBeLoaded) {
     run<VRXFollowUpPost>(nullptr);
@@ -115,15 +143,14 @@ TEST_F(ActivityTest, IsDeferredWhenNoDeviceInfosCanBeLoaded) {
 }
 
 TEST_F(ActivityTest, EndsOnceWhetherItsWorkOrItsWatchComesFirst) {
-    constexpr Duration watchInterval{2e9};
     auto inventory = std::make_shared<SlowInventory>();
     auto agent = VRXAgent::initWithWarrantyProvider(nullptr, inventory);
     auto post = run<VRXFollowUpPost>(agent);
-    host.runFor(watchInterval);
+    host.runFor(watchInterval * 2.5);
     EXPECT_THAT(results, IsEmpty()) << "nobody asked it to defer";
     EXPECT_TRUE(post->followUpPostInProgress() && post->followUpPostTimer());
     host.activities.setShouldDefer(true);
-    host.runFor(watchInterval);
+    host.runFor(watchInterval * 0.75);
     EXPECT_THAT(results, ElementsAre(Deferred));
     EXPECT_FALSE(post->followUpPostInProgress() || post->followUpPostTimer());
     inventory->isReady->set();
@@ -135,6 +162,24 @@ TEST_F(ActivityTest, EndsOnceWhetherItsWorkOrItsWatchComesFirst) {
     run<VRXFollowUpRefresh>(agent);
     host.runFor(watchInterval * 2.0);
     EXPECT_THAT(results, ElementsAre(Deferred, Finished, Finished));
+}
+
+TEST_F(ActivityTest, AnOutreachEndsOnceToo) {
+    const Dictionary versions{{"LowServerVersion", 2}, {"HighServerVersion", 3}};
+    host.defaults.registerDefaults(versions);
+    host.defaults.set("ServerVersionOverride", versions);
+    host.defaults.set("WarrantyURL", "https://coverage.example/summary");
+    host.accounts.renewalDelay = watchInterval * 2.0;  // so long the downloads wait for a token
+    host.activities.setShouldDefer(true);
+    auto outreach = run<VRXOutreachActivity>(nullptr);
+    EXPECT_TRUE(outreach->outreachInProgress() && outreach->outReachTimer());
+    host.runFor(watchInterval * 1.5);
+    EXPECT_THAT(results, ElementsAre(Deferred));
+    EXPECT_FALSE(outreach->outreachInProgress() || outreach->outReachTimer());
+    EXPECT_EQ(host.log.count("No devices eligible for followUp posts"), 0);
+    host.runFor(watchInterval);
+    EXPECT_EQ(host.log.count("No devices eligible for followUp posts"), 1) << "the downloads have ended";
+    EXPECT_THAT(results, ElementsAre(Deferred));
 }
 
 }  // namespace

@@ -31,7 +31,8 @@ public:
     // What the coverage server answers for a device from now on, in the user's language.
     void setRecord(const std::string& serialNumber, const Record& record) {
         records[serialNumber] = record;
-        Dictionary toggles{{"qxOfferDisplay", true}, {"qxOfferToggle", Array{record.excludedCarrier}}};
+        Dictionary toggles{{"qxOfferDisplay", true}};
+        if (!record.excludedCarrier.empty()) toggles["qxOfferToggle"] = Array{record.excludedCarrier};
         Dictionary answer{{"featureToggleParameters", toggles},
                           {"qxLocalizedOfferLabel", host.locale.identifier},
                           {"qxLocalizedOfferPluralDescFormat", "%@"},

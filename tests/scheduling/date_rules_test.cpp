@@ -9,6 +9,7 @@ namespace vrx {
 namespace {
 
 constexpr Date now = sim::Clock::start;
+constexpr double second = 1.0 / 86400;
 
 Duration days(double count) {
     return Duration(count * 86400);
@@ -18,6 +19,7 @@ struct Device {
     std::optional<double> activated{}, shownFrom{}, until{};
     bool asksForOffer = true;
     std::string serialNumber = "A";
+    bool isKnown = true;
 };
 
 DeviceInfoList infos(const std::vector<Device>& devices) {
@@ -28,9 +30,9 @@ DeviceInfoList infos(const std::vector<Device>& devices) {
         warranty->setQxOfferDisplay(device.asksForOffer);
         warranty->setQxOfferEligibleUntil(date(device.until));
         warranty->setQxOfferFollowupDisplayDate(date(device.shownFrom));
-        list.push_back(VRXDeviceInfo::deviceInfoWithDevice(
-            VRXDevice::deviceWithName({}, device.serialNumber, date(device.activated), VRXDeviceTypeWatch),
-            std::move(warranty)));
+        auto known = VRXDevice::deviceWithName({}, device.serialNumber, date(device.activated), VRXDeviceTypeWatch);
+        list.push_back(
+            VRXDeviceInfo::deviceInfoWithDevice(device.isKnown ? std::move(known) : nullptr, std::move(warranty)));
     }
     list.push_back(VRXDeviceInfo::deviceInfoWithDevice(
         VRXDevice::deviceWithName({}, "no record", now, VRXDeviceTypeWatch), nullptr));
@@ -61,6 +63,7 @@ TEST(PostDate, FollowsTheRule) {
     const PostDateSettings settings{{platform::sha256Hash("POSTED")}, days(2)};
     const Device posted{.activated = -9, .until = -3, .serialNumber = "POSTED"}, endsIn5{.activated = -9, .until = 5};
     const Device withoutEnd{.activated = -1, .shownFrom = 3}, dueIn5{.activated = 3, .shownFrom = 2, .until = 300};
+    const Device inAMoment{.activated = -9, .shownFrom = second / 2, .until = 300};
     const Device dueIn7{.activated = 0, .shownFrom = 7, .until = 300},
         dueIn20{.activated = 0, .shownFrom = 20, .until = 300};
     const Case cases[] = {
@@ -83,6 +86,11 @@ TEST(PostDate, FollowsTheRule) {
         {.name = "no end", .devices = {withoutEnd}},
         {.name = "an unknown end counts as now", .devices = {dueIn10, withoutEnd}},
         {.name = "and what follows it sets the date", .devices = {dueIn10, withoutEnd, dueIn20}, .expected = 20},
+        {.name = "in a moment", .devices = {inAMoment}, .expected = second / 2},
+        {.name = "now is earlier than that", .devices = {inAMoment, withoutEnd}},
+        {.name = "due now", .devices = {{.activated = -9, .shownFrom = 0, .until = 300}}},
+        {.name = "ends now", .devices = {{.activated = -9, .until = 0}}},
+        {.name = "a record of no device", .devices = {{.shownFrom = 4, .until = 9, .isKnown = false}}, .expected = 4},
     };
     for (const Case& c : cases) expectDate(c, nextPostDate(infos(c.devices), settings, now));
 }
@@ -119,6 +127,10 @@ TEST(RefreshDate, FollowsTheRule) {
         {.name = "a later call, ended", .devices = {ended}, .expected = -3, .isInitial = false},
         {.name = "days of an hour", .devices = {changesInHalfAnHour}, .expected = 0.5 / 24, .oneDay = 1.0 / 24},
         {.name = "days of no length", .devices = {shown}, .oneDay = 0},
+        {.name = "days of half a second",
+         .devices = {{.activated = -3, .until = 0.9 * second}},
+         .expected = 0.4 * second,
+         .oneDay = second / 2},
     };
     for (const Case& c : cases)
         expectDate(c, nextRefreshDate(infos(c.devices), c.isInitial, {days(c.oneDay), days(2)}, now));

@@ -42,6 +42,7 @@ protected:
 };
 
 TEST_F(SchedulerTest, RegistersTruncatedCriteriaAndStoresTheDateAsItIs) {
+    scheduler->monitorForScheduledActivity();  // which takes no criteria
     for (const auto& [delay, registered, gracePeriod] :
          {std::tuple(172800.0, 172800, 17280), {1, 1, 0}, {9.99, 9, 0}, {95, 95, 9}, {-50, 0, 0}}) {
         const Date date = host.clock.now() + Duration(delay);

@@ -4,6 +4,7 @@
 #include "support/simulated_host.h"
 #include "vrx/coverage/records/warranty.h"
 #include "vrx/devices/records/device_info.h"
+#include "vrx/service/default_warranty_provider.h"
 #include "vrx/service/register_defaults.h"
 #include "vrx/service/start_up.h"
 
@@ -95,6 +96,7 @@ TEST_F(AgentTest, GivesAnyDeviceBySerialNumber) {
     EXPECT_EQ(info("B", VRXWarrantyLookupPolicyCachedOnly)->device()->serialNumber(), "WATCH");
     EXPECT_EQ(host.log.lastMessage("Override Serial Number: %@ found for SN: %@"),
               "Override Serial Number: WATCH found for SN: B");
+    EXPECT_THAT(followUps, ElementsAre("refresh WATCH", "refresh STRANGER", "refresh PHONE", "refresh WATCH"));
 }
 
 TEST_F(AgentTest, GivesAllDevicesOnThePolicyQueue) {
@@ -159,6 +161,57 @@ TEST_F(AgentTest, AnswersTheSmallRequests) {
     host.device.isInternal = true;
     EXPECT_EQ(override(), "https://flow.example/");
     agent->readWebURLOverride(nullptr);
+    host.defaults.set("WebFlowURL", 5);
+    EXPECT_EQ(override(), std::nullopt);
+
+    const auto device =
+        replyOf<std::shared_ptr<VRXDevice>>([&](auto reply) { agent->defaultDevice(std::move(reply)); });
+    EXPECT_EQ(device->serialNumber(), "PHONE");
+    EXPECT_TRUE(replyOf<std::shared_ptr<VRXWarranty>>(
+        [&](auto reply) { agent->getWarrantyUsingPolicy(VRXWarrantyLookupPolicyRefresh, std::move(reply)); }));
+}
+
+class StoreOfWords final : public VRXSupportManaging {
+    void checkIsAvailableInStore(std::string identifier, platform::OnceCallback<Value> reply) override {
+        reply("store " + identifier);
+    }
+    void appSupportAvailability(std::string identifier, platform::OnceCallback<Value> reply) override {
+        reply("support " + identifier);
+    }
+};
+
+// What it has no collaborator for, it does without.
+TEST_F(AgentTest, HandsWorkToItsCollaborators) {
+    std::vector<Duration> outreaches;
+    const auto full = VRXAgent::initWithCallingProcessBundleID(
+        {}, {.makeFollowUp = nullptr,
+             .scheduleOutreach = [&](Duration delay) { outreaches.push_back(delay); },
+             .makeSupportManager = [] { return std::make_shared<StoreOfWords>(); }});
+    const auto bare = VRXAgent::initWithCallingProcessBundleID({}, {});
+    const auto answersOf = [this](const std::shared_ptr<VRXAgent>& asked) {
+        EXPECT_TRUE(replyOf<bool>([&](auto reply) { asked->scheduleOutreachWithReply(std::move(reply)); }));
+        return std::pair(replyOf<Value>([&](auto reply) { asked->checkIsAvailableInStore("A", std::move(reply)); }),
+                         replyOf<Value>([&](auto reply) { asked->appSupportAvailability("A", std::move(reply)); }));
+    };
+    EXPECT_EQ(answersOf(full), std::pair(Value("store A"), Value("support A")));
+    EXPECT_EQ(answersOf(bare), std::pair(Value(), Value()));
+    EXPECT_THAT(outreaches, ElementsAre(Duration(1)));
+
+    agent = bare;
+    EXPECT_TRUE(info("WATCH", VRXWarrantyLookupPolicyCachedOnly));
+    EXPECT_EQ(allInfos(VRXWarrantyLookupPolicyCachedOnly, true).size(), 2u);
+    EXPECT_TRUE(replyOf<bool>([&](auto reply) { agent->dismissFollowUpForSerialNumber("WATCH", std::move(reply)); }));
+    agent->performMigrationIfNeeded();
+    EXPECT_TRUE(VRXAgentDefaultWarrantyProvider("", {}).lastUpdatedDateForSerialNumber({}).isNull());
+}
+
+TEST_F(AgentTest, HasDefaults) {
+    for (const auto& [key, number] : {std::pair("CachedWarrantyValidityDuration", 86400),
+                                      {"OneDayInterval", 86400},
+                                      {"PostUpgradeOutreachDelay", 172800},
+                                      {"LowServerVersion", 2},
+                                      {"HighServerVersion", 3}})
+        EXPECT_EQ(host.defaults.integer(key), number) << key;
 }
 
 TEST_F(AgentTest, NotesAMigrationOnceItIsDone) {
@@ -179,6 +232,8 @@ TEST_F(AgentTest, OnlyEntitledCallersAreServed) {
     }
 
     host.bundles.addApplication(7, "com.example.client");
+    host.bundles.executables[8] = "\xff";
+    host.bundles.bundles["\xff"] = {"/", "com.example.odd"};
     auto first = host.listener.connect(7, {{entitlement, true}});
     auto second = host.listener.connect(8, {{entitlement, true}});
     ASSERT_TRUE(first && first->isServing() && second && second->isServing());

@@ -114,6 +114,9 @@ TEST_F(LookupTest, LogsWhyInOrder) {
     host.log.clear();
     expectAnswer(VRXWarrantyLookupPolicyCachedOnly, true, Cached, 0);
     EXPECT_FALSE(host.log.contains("Default policy query: cached warranty is valid, examine expiration date"));
+    provider->state.isCached = false;
+    expectAnswer(VRXWarrantyLookupPolicyCachedOnly, true, Nothing, 0);
+    EXPECT_TRUE(host.log.contains("no cached warranty : %@"));
 }
 
 }  // namespace

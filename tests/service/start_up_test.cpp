@@ -27,7 +27,8 @@ TEST(StartUp, MakesItsPartsInAFixedOrder) {
 
 TEST(StartUp, BeginsTheAgentsWorkOnceAndTakesItUpAtEachBoot) {
     sim::Host host;
-    const std::string outreach = "com.orvane.vrxagent.outreach";
+    const std::string outreach = "com.orvane.vrxagent.outreach", refresh = "com.orvane.vrxagent.followuprefresh";
+    const std::string rescheduled = "' not complete, rescheduling";
     for (const char* key : {"left over.TargetDate", "no.TargetDate.at all"}) host.defaults.set(key, "value");
     host.process.launch([] { return std::make_shared<StartUp>(); });
     host.runFor(Duration(1));
@@ -36,16 +37,19 @@ TEST(StartUp, BeginsTheAgentsWorkOnceAndTakesItUpAtEachBoot) {
     EXPECT_EQ(host.defaults.date("DefaultDeviceActivationDate"), sim::Clock::start);
     EXPECT_EQ(host.activities.criteria(outreach), (platform::ActivityCriteria{172800, 17280, true}));
 
+    host.defaults.set(refresh + ".TargetDate", sim::Clock::start + Duration(86400 * 9));
     host.process.agentVersion = "2";
     host.process.reboot(Duration(86400 * 3));
     host.runFor(Duration(0.5));
     EXPECT_EQ(host.log.count("post upgrade activity already performed"), 1);
-    EXPECT_EQ(host.log.lastMessage("'%@' not complete, rescheduling"), "'" + outreach + "' not complete, rescheduling");
+    EXPECT_THAT(host.log.messages(),
+                testing::IsSupersetOf({"'" + outreach + rescheduled, "'" + refresh + rescheduled}));
+    EXPECT_EQ(host.activities.criteria(refresh), (platform::ActivityCriteria{518399, 51839, false}));
     EXPECT_EQ(host.activities.criteria(outreach), (platform::ActivityCriteria{0, 0, true}));
     host.runFor(Duration(60));
     host.process.reboot();
     host.runFor(Duration(60));
-    EXPECT_EQ(host.log.count("'%@' not complete, rescheduling"), 1) << "it has run";
+    EXPECT_EQ(host.log.count("'%@' not complete, rescheduling"), 3) << "the outreach has run";
     EXPECT_EQ(host.activities.firingCount(outreach), 1);
 }
 

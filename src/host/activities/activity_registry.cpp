@@ -74,9 +74,18 @@ void ActivityRegistry::remove(std::int64_t generation) {
 }
 
 std::vector<ActivityRun> ActivityRegistry::runs() {
+    return runsIn(connection_.statement(
+        "SELECT identifier, generation, began, ended, outcome FROM activity_runs "
+        "WHERE number IN (SELECT max(number) FROM activity_runs GROUP BY identifier) ORDER BY began, identifier"));
+}
+
+std::vector<ActivityRun> ActivityRegistry::history() {
+    return runsIn(connection_.statement(
+        "SELECT identifier, generation, began, ended, outcome FROM activity_runs ORDER BY number"));
+}
+
+std::vector<ActivityRun> ActivityRegistry::runsIn(Statement& query) {
     std::vector<ActivityRun> runs;
-    Statement& query = connection_.statement(
-        "SELECT identifier, generation, began, ended, outcome FROM activity_runs ORDER BY began, identifier");
     while (query.step()) {
         ActivityRun run{std::string(query.text(0)), query.integer(1), platform::dateFromEpoch(query.number(2))};
         if (query.type(3) != SQLITE_NULL) {
@@ -89,15 +98,26 @@ std::vector<ActivityRun> ActivityRegistry::runs() {
 }
 
 void ActivityRegistry::beginRun(std::string_view identifier, std::int64_t generation, Date now) {
-    connection_.statement("REPLACE INTO activity_runs (identifier, generation, began) VALUES (?, ?, ?)")
+    connection_.statement("INSERT INTO activity_runs (identifier, generation, began) VALUES (?, ?, ?)")
         .bind(0, identifier)
         .bind(1, generation)
         .bind(2, platform::epochSeconds(now))
         .step();
+    connection_
+        .statement(
+            "DELETE FROM activity_runs WHERE identifier = ? AND number NOT IN "
+            "(SELECT number FROM activity_runs WHERE identifier = ? ORDER BY number DESC LIMIT ?)")
+        .bind(0, identifier)
+        .bind(1, identifier)
+        .bind(2, mostRuns)
+        .step();
 }
 
 void ActivityRegistry::endRun(std::string_view identifier, RunOutcome outcome, Date now) {
-    connection_.statement("UPDATE activity_runs SET ended = ?, outcome = ? WHERE identifier = ?")
+    connection_
+        .statement(
+            "UPDATE activity_runs SET ended = ?, outcome = ? "
+            "WHERE number = (SELECT max(number) FROM activity_runs WHERE identifier = ?)")
         .bind(0, platform::epochSeconds(now))
         .bind(1, static_cast<std::int64_t>(outcome))
         .bind(2, identifier)
@@ -108,7 +128,7 @@ platform::Result<ActivityList> listActivities(Database& database) {
     ActivityList list;
     MaybeError error = database.read([&](Connection& connection) {
         ActivityRegistry registry(connection);
-        list = {registry.scheduled(), registry.runs()};
+        list = {registry.scheduled(), registry.runs(), registry.history()};
     });
     if (error) return *error;
     return list;

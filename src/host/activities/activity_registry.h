@@ -1,4 +1,4 @@
-// The background activities in host.db: what is scheduled, and how the last run of each ended. Each operation is part
+// The background activities in host.db: what is scheduled, and how the last runs of each ended. Each operation is part
 // of the caller's transaction.
 #pragma once
 
@@ -50,10 +50,15 @@ public:
 
     // The last run of each identifier.
     std::vector<ActivityRun> runs();
+    // The last ones of each, in the order in which they began.
+    std::vector<ActivityRun> history();
+    static constexpr std::int64_t mostRuns = 50;  // that are kept of an identifier
     void beginRun(std::string_view identifier, std::int64_t generation, platform::Date now);
     void endRun(std::string_view identifier, RunOutcome outcome, platform::Date now);
 
 private:
+    static std::vector<ActivityRun> runsIn(Statement& query);
+
     Connection& connection_;
 };
 
@@ -61,6 +66,7 @@ private:
 struct ActivityList {
     std::vector<ScheduledActivity> scheduled;
     std::vector<ActivityRun> runs;
+    std::vector<ActivityRun> history;
 };
 platform::Result<ActivityList> listActivities(Database& database);
 

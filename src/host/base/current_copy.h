@@ -1,17 +1,15 @@
-// A parsed copy of a file. Each read compares the file's identity, size and times with those of the copy, which takes
-// half a microsecond, and parses the file again when they differ. A file that changed within the last tick of the clock
-// is read again at each call: a second change in the same tick would not show. Any thread may ask.
+// A parsed copy of a file. Each read, but of a request only the first, compares the file's stamp with that of the copy,
+// which takes half a microsecond, and parses the file again when they differ. Any thread may ask.
 #pragma once
 
-#include <sys/stat.h>
-
-#include <ctime>
 #include <functional>
 #include <memory>
 #include <mutex>
 #include <string>
 
+#include "vrx/host/base/file_stamp.h"
 #include "vrx/host/base/files.h"
+#include "vrx/host/base/request_scope.h"
 
 namespace vrx::host {
 
@@ -28,7 +26,8 @@ public:
 
     std::shared_ptr<const T> get() const {
         std::lock_guard lock(mutex_);
-        Stamp stamp = Stamp::of(path_);
+        if (copy_ && !RequestScope::isFirstLook(this)) return copy_;
+        const FileStamp stamp = FileStamp::of(path_);
         if (copy_ && isSettled_ && stamp == stamp_) return copy_;
         // The stamp is from before reading: a change in between shows at the next call.
         isSettled_ = stamp.isSettled();
@@ -38,38 +37,11 @@ public:
     }
 
 private:
-    struct Stamp {
-        dev_t device = 0;
-        ino_t inode = 0;
-        off_t size = 0;
-        std::int64_t modified = 0;
-        std::int64_t changed = 0;  // also when owner or mode change
-        bool operator==(const Stamp&) const = default;
-
-        static std::int64_t nanoseconds(const timespec& time) {
-            return std::int64_t{time.tv_sec} * 1'000'000'000 + time.tv_nsec;
-        }
-        static Stamp of(const std::string& path) {
-            struct stat status;
-            if (stat(path.c_str(), &status) != 0) return {};
-            return {status.st_dev, status.st_ino, status.st_size, nanoseconds(status.st_mtim),
-                    nanoseconds(status.st_ctim)};
-        }
-        // Whether a later change must show in the stamp. True for a missing file.
-        bool isSettled() const {
-            constexpr std::int64_t tick = 20'000'000;
-            timespec now{};
-            clock_gettime(CLOCK_REALTIME_COARSE, &now);
-            const std::int64_t age = nanoseconds(now) - changed;
-            return age > tick || age < -tick;
-        }
-    };
-
     const std::string path_;
     const Parse parse_;
     mutable std::mutex mutex_;
     mutable std::shared_ptr<const T> copy_;
-    mutable Stamp stamp_;
+    mutable FileStamp stamp_;
     mutable bool isSettled_ = false;
 };
 

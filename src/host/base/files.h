@@ -7,11 +7,14 @@
 
 #include <cerrno>
 #include <cstddef>
+#include <deque>
+#include <mutex>
 #include <span>
 #include <string>
 #include <string_view>
 
 #include "vrx/host/base/descriptor.h"
+#include "vrx/host/base/file_stamp.h"
 #include "vrx/platform/files.h"
 #include "vrx/platform/limits.h"
 
@@ -45,18 +48,43 @@ constexpr bool isShortage(int number) {
     return number == EMFILE || number == ENFILE || number == ENOMEM || number == ENOBUFS;
 }
 
+// What was decoded of small files, the last few, while they are unchanged. Any thread may ask.
+class KeptDocuments {
+public:
+    using Parse = platform::Result<platform::Value> (*)(const platform::Data& document);
+    explicit KeptDocuments(Parse parse) : parse_(parse) {}
+
+    platform::Result<platform::Value> read(const std::string& path);
+
+private:
+    struct Document {
+        std::string path;
+        FileStamp stamp;
+        platform::Value root;
+    };
+    const Parse parse_;
+    std::mutex mutex_;
+    std::deque<Document> documents_;  // the one read last at the end
+};
+
 class Files final : public platform::Files {
 public:
-    explicit Files(std::string homeDirectory) : homeDirectory_(std::move(homeDirectory)) {}
+    // With a parser of property lists, which are handed in because they are read above this room.
+    Files(std::string homeDirectory, KeptDocuments::Parse parsePropertyList)
+        : homeDirectory_(std::move(homeDirectory)), documents_(parsePropertyList) {}
 
     std::string homeDirectory() const override { return homeDirectory_; }
     platform::Result<platform::Data> read(const std::string& path) const override;
+    platform::Result<platform::Value> readPropertyList(const std::string& path) const override {
+        return documents_.read(path);
+    }
     platform::MaybeError replace(const std::string& path, const platform::Data& content) override;
     platform::MaybeError createDirectories(const std::string& path) override;
     platform::MaybeError remove(const std::string& path) override;
 
 private:
     const std::string homeDirectory_;
+    mutable KeptDocuments documents_;
 };
 
 }  // namespace vrx::host

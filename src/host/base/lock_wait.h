@@ -8,6 +8,8 @@
 #include <mutex>
 #include <thread>
 
+#include "vrx/host/base/request_scope.h"
+
 namespace vrx::host {
 
 class LockWait {
@@ -19,6 +21,7 @@ public:
     // Waits a moment before the next attempt. False when there is to be none.
     bool again() const {
         if (isOver()) return false;
+        RequestScope::handOverLines();
         std::this_thread::sleep_for(std::chrono::milliseconds(2));
         return true;
     }
@@ -29,8 +32,9 @@ public:
     // Takes a mutex of this process. On a thread that must not wait it tries only for as long as others hold it without
     // waiting themselves.
     static std::unique_lock<std::mutex> take(std::mutex& mutex) {
-        if (!isForbidden_) return std::unique_lock(mutex);
         std::unique_lock lock(mutex, std::try_to_lock);
+        if (!lock) RequestScope::handOverLines();
+        if (!lock && !isForbidden_) lock.lock();
         for (int tries = 0; !lock && tries < 20; ++tries) {
             std::this_thread::sleep_for(std::chrono::milliseconds(1));
             static_cast<void>(lock.try_lock());

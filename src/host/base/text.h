@@ -3,12 +3,12 @@
 
 #include <string_view>
 
+#include "vrx/codec/line_text.h"
+
 namespace vrx::host {
 
-// Removes blanks and line ends from both ends.
-std::string_view trimmed(std::string_view text);
-// Whether it holds no control character, so that it may stand on a line of its own or be a header's value.
-bool isOneLine(std::string_view text);
+using codec::isOneLine;
+using codec::trimmed;
 // Whether it is valid as the name of a header.
 bool isHeaderName(std::string_view text);
 // Whether it is made as the identifiers of applications are, "com.example.Viewer", so that it may stand in the name of

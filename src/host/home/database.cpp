@@ -12,6 +12,7 @@
 
 #include "vrx/host/base/descriptor.h"
 #include "vrx/host/base/files.h"
+#include "vrx/host/base/request_scope.h"
 #include "vrx/platform/log.h"
 
 namespace vrx::host {
@@ -41,6 +42,14 @@ constexpr const char* steps[] = {
     ") WITHOUT ROWID;"
     "CREATE TABLE activity_requests ("
     "    number INTEGER PRIMARY KEY AUTOINCREMENT, identifier TEXT NOT NULL, answer INTEGER)",
+    // Of the runs of each activity, more than the last one.
+    "ALTER TABLE activity_runs RENAME TO last_runs;"
+    "CREATE TABLE activity_runs ("
+    "    number INTEGER PRIMARY KEY, identifier TEXT NOT NULL, generation INTEGER NOT NULL,"
+    "    began REAL NOT NULL, ended REAL, outcome INTEGER);"
+    "INSERT INTO activity_runs (identifier, generation, began, ended, outcome)"
+    "    SELECT identifier, generation, began, ended, outcome FROM last_runs ORDER BY began;"
+    "DROP TABLE last_runs",
 };
 
 void check(int result, sqlite3* connection) {
@@ -386,6 +395,7 @@ std::shared_ptr<Database::Opening> Database::opening(MaybeError& error) {
         return nullptr;
     }
     if (opening_) {
+        if (!RequestScope::isFirstLook(this)) return opening_;
         const auto present = FileIdentity::of(path_);
         if (!present || *present == opening_->file) return opening_;
     }

@@ -16,7 +16,6 @@ class Curl {
 
 public:
     decltype(&::curl_global_init) globalInit = library_.function("curl_global_init");
-    decltype(&::curl_getdate) getdate = library_.function("curl_getdate");
     decltype(&::curl_free) free = library_.function("curl_free");
     decltype(&::curl_slist_append) slistAppend = library_.function("curl_slist_append");
     decltype(&::curl_slist_free_all) slistFreeAll = library_.function("curl_slist_free_all");

@@ -11,10 +11,10 @@
 #include <thread>
 #include <vector>
 
+#include "vrx/codec/http_cache.h"
 #include "vrx/host/base/descriptor.h"
 #include "vrx/host/base/files.h"
 #include "vrx/host/http/curl.h"
-#include "vrx/host/http/http_cache.h"
 #include "vrx/host/http/http_transfer.h"
 #include "vrx/host/http/transfer_line.h"
 #include "vrx/platform/url.h"
@@ -61,7 +61,7 @@ private:
     Descriptor wakeFile_;  // the library's own way to wake it can be missing without a word
 
     // Used by the transfer thread only.
-    HttpCache cache_;
+    codec::HttpCache cache_;
     TransferLine line_;
     std::map<HttpTransfer*, std::unique_ptr<HttpTransfer>> running_;
 };

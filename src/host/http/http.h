@@ -5,8 +5,8 @@
 // only. A GET follows redirects, which carry none of the request's own headers and never leave https; any other method
 // gets the redirect itself as its answer. Headers and bodies are never logged here.
 //
-// The shared session keeps answers as their headers allow (http_cache.h). An uncached one does not use them, but stores
-// its own answer in their place, so that nobody gets an older one afterwards.
+// The shared session keeps answers as their headers allow (codec/http_cache.h). An uncached one does not use them, but
+// stores its own answer in their place, so that nobody gets an older one afterwards.
 //
 // A request reaches its server once; only a GET, which changes nothing, is sent a second time after a connection that
 // broke before the answer.
@@ -32,7 +32,7 @@ struct HttpLimits {
     std::size_t transfers = platform::limits::transfers;
     std::size_t transfersPerHost = platform::limits::transfersPerHost;
     platform::Duration longestWait = std::chrono::seconds(60);
-    std::size_t storedBytes = 1024 * 1024;  // of all stored answers together
+    std::size_t storedBytes = platform::limits::storedAnswerBytes;  // of all stored answers together
 };
 
 class HttpTransfers;

@@ -4,9 +4,9 @@
 
 #include <algorithm>
 
+#include "vrx/codec/http_cache_rules.h"
 #include "vrx/host/base/secret.h"
 #include "vrx/host/base/text.h"
-#include "vrx/host/http/http_cache_rules.h"
 
 namespace vrx::host {
 
@@ -142,7 +142,7 @@ void HttpTransfer::nameSourceApplication() {
 std::optional<HttpResponse> HttpTransfer::storedAnswer() {
     isCached_ = request_.method == "GET" && request_.body.empty() && ownHeaders().empty();
     if (!isCached_) return std::nullopt;
-    HttpCache& cache = surroundings_.cache;
+    codec::HttpCache& cache = surroundings_.cache;
     asked_ = cache.now();
     stored_ = isUncached_ ? nullptr : cache.find(address_);
     return stored_ ? cache.freshAnswer(*stored_) : std::nullopt;
@@ -212,7 +212,8 @@ MaybeError HttpTransfer::setHeaders() {
         addHeaderLine(name, value);
     }
     if (stored_)
-        for (const auto& [name, value] : revalidationHeaders(stored_->answer.headers)) addHeaderLine(name, value);
+        for (const auto& [name, value] : codec::revalidationHeaders(stored_->answer.headers))
+            addHeaderLine(name, value);
     set(CURLOPT_HTTPHEADER, headerList_.get());
     return std::nullopt;
 }
@@ -285,10 +286,10 @@ std::optional<HttpResponse> HttpTransfer::finish(CURLcode result) {
         response.status = static_cast<int>(status);  // of an answer that broke off
         return response;
     }
-    HttpCache& cache = surroundings_.cache;
+    codec::HttpCache& cache = surroundings_.cache;
 
     if (stored_ && status == 304) {
-        if (isConfirmed(stored_->answer.headers, headers_)) return cache.revalidated(*stored_, asked_, headers_);
+        if (codec::isConfirmed(stored_->answer.headers, headers_)) return cache.revalidated(*stored_, asked_, headers_);
         cache.forget(address_);
         return std::nullopt;
     }

@@ -8,10 +8,10 @@
 #include <optional>
 #include <string>
 
+#include "vrx/codec/http_cache.h"
 #include "vrx/host/base/requester.h"
 #include "vrx/host/http/curl.h"
 #include "vrx/host/http/http.h"
-#include "vrx/host/http/http_cache.h"
 #include "vrx/host/profile/device_profile.h"
 
 namespace vrx::host {
@@ -24,7 +24,7 @@ platform::HttpResponse httpSuccess(int status, platform::HttpHeaders headers, pl
 struct HttpSurroundings {
     const HttpLimits& limits;
     const DeviceProfile& profile;
-    HttpCache& cache;
+    codec::HttpCache& cache;
 };
 
 class HttpTransfer {
@@ -93,8 +93,8 @@ private:
     int redirects_ = 0;
     int sent_ = 0;  // times, to this address
 
-    bool isCached_ = false;     // may be answered from the cache and stored in it
-    HttpCache::Stored stored_;  // the answer that the request asks to confirm
+    bool isCached_ = false;            // may be answered from the cache and stored in it
+    codec::HttpCache::Stored stored_;  // the answer that the request asks to confirm
     platform::Date asked_;
 
     std::unique_ptr<CURL, Freed> easy_;

@@ -6,6 +6,7 @@
 
 #include <cerrno>
 
+#include "vrx/host/base/request_scope.h"
 #include "vrx/host/base/requester.h"
 #include "vrx/platform/log.h"
 #include "vrx/wire/encoding.h"
@@ -139,7 +140,8 @@ void ClientSession::performWaiting() {
         if (!place) return;
         auto [number, operation, arguments] = std::move(waiting_.front());
         waiting_.pop_front();
-        const RequesterScope scope(peer_.user());
+        const RequesterScope requester(peer_.user());
+        const RequestScope scope;
         perform(*operation, std::move(arguments), PendingReply(box_, number, agent_, {work_, std::move(place)}));
     }
 }
@@ -244,6 +246,7 @@ int ClientSession::handle(sd_bus_message* call, const wire::Operation& operation
 void ClientSession::send(const RequestReply& reply) {
     auto call = openCalls_.extract(reply.request);
     if (call.empty()) return;
+    RequestScope::handOverLines();
     sd_bus_message* const request = call.mapped().get();
     if (!reply.root) {
         sd_bus_reply_method_errorf(request, wire::noReply, "the agent gave the request up");

@@ -7,7 +7,7 @@
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/uio.h>
-#include <sys/un.h>
+#include <syslog.h>
 #include <systemd/sd-journal.h>
 #include <unistd.h>
 
@@ -33,15 +33,16 @@ constexpr std::size_t enoughPending = 16 * 1024;
 // With more bytes pending than this a thread that logs waits: nothing is dropped, and memory stays bounded.
 constexpr std::size_t mostPending = 64 * 1024;
 
-sockaddr_un journalAddress() {
-    return {AF_UNIX, "/run/systemd/journal/socket"};
+// A stream of our own, for standard error may have been opened under another name. None without a journal.
+Descriptor openJournalStream() {
+    constexpr bool understandsPriorities = true;
+    return Descriptor(
+        std::max(sd_journal_stream_fd(program_invocation_short_name, LOG_INFO, understandsPriorities), -1));
 }
 
-Descriptor openJournal() {
-    Descriptor journal(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
-    constexpr int size = 8 * 1024 * 1024;  // the journal may be slow for a while
-    if (journal) setsockopt(journal.number(), SOL_SOCKET, SO_SNDBUF, &size, sizeof size);
-    return journal;
+std::string_view lineOf(const LogLines& lines, std::size_t index) {
+    const std::size_t begin = index == 0 ? 0 : lines.ends[index - 1];
+    return std::string_view(lines.bytes).substr(begin, lines.ends[index] - begin);
 }
 
 // Others may share the open pipe, whose mode would then change for them as well.
@@ -102,8 +103,7 @@ private:
     }
 };
 
-LogWriter::LogWriter(int file, Form form)
-    : file_(file), pipe_(openPipe(file)), journal_(form == Form::Journal ? openJournal() : Descriptor()) {
+LogWriter::LogWriter(int file, Form form) : file_(file), pipe_(openPipe(file)), form_(form) {
     CrashGuard::add(this);
 }
 
@@ -118,17 +118,11 @@ LogWriter::~LogWriter() {
     flush();
 }
 
-std::string_view LogWriter::Batch::record(std::size_t index) const {
-    const std::size_t begin = index == 0 ? 0 : ends[index - 1];
-    return std::string_view(bytes).substr(begin, ends[index] - begin);
-}
-
-void LogWriter::add(std::string_view record) {
+void LogWriter::take(const LogLines& lines) {
     std::unique_lock lock(mutex_);
     hasRoom_.wait(lock, [this] { return pending_.bytes.size() <= mostPending; });
     const bool wasEnough = isEnough();
-    pending_.bytes += record;
-    pending_.ends.push_back(pending_.bytes.size());
+    pending_.append(lines);
     if (!thread_.joinable()) {
         // The new thread takes no signals.
         sigset_t all, before;
@@ -149,7 +143,7 @@ void LogWriter::run() {
     pthread_setname_np(pthread_self(), "log");
     std::unique_lock lock(mutex_);
     while (!isEnding_) {
-        isIdle_ = pending_.ends.empty();
+        isIdle_ = pending_.isEmpty();
         if (isIdle_) changed_.wait(lock, [this] { return isEnding_ || !isIdle_; });
         changed_.wait_for(lock, gatheringTime, [this] { return isEnding_ || isEnough(); });
         lock.unlock();
@@ -160,23 +154,27 @@ void LogWriter::run() {
 
 void LogWriter::flush() {
     std::lock_guard writing(writing_);
-    writtenBatch_.bytes.clear();
-    writtenBatch_.ends.clear();
+    written_.clear();
     {
         std::lock_guard lock(mutex_);
-        std::swap(pending_, writtenBatch_);
+        std::swap(pending_, written_);
     }
     hasRoom_.notify_all();
-    write(writtenBatch_);
+    write(written_);
 }
 
-void LogWriter::write(const Batch& batch) {
-    if (journal_) return sendToJournal(batch);
-    // Joins lines up to PIPE_BUF: a write of that size is not mixed with those of other processes.
-    for (std::size_t begin = 0, next = 0; next < batch.ends.size();) {
-        std::size_t end = batch.ends[next++];
-        while (next < batch.ends.size() && batch.ends[next] - begin <= PIPE_BUF) end = batch.ends[next++];
-        writeToFile(std::string_view(batch.bytes).substr(begin, end - begin));
+// Joins lines, up to PIPE_BUF for a file: a write of that size is not mixed with those of other processes.
+void LogWriter::write(const LogLines& lines) {
+    const bool isJournal = form_ == Form::Journal;
+    const std::size_t most = isJournal ? mostPending : PIPE_BUF;
+    const auto hasFields = [&](std::size_t i) { return isJournal && !lineOf(lines, i).starts_with('<'); };
+    for (std::size_t begin = 0, next = 0; next < lines.ends.size();) {
+        const bool isAlone = hasFields(next);
+        std::size_t end = lines.ends[next++];
+        while (!isAlone && next < lines.ends.size() && !hasFields(next) && lines.ends[next] - begin <= most)
+            end = lines.ends[next++];
+        const std::string_view bytes = std::string_view(lines.bytes).substr(begin, end - begin);
+        isAlone ? sendToJournal(bytes) : isJournal ? writeToJournal(bytes) : writeToFile(bytes);
         begin = end;
     }
 }
@@ -206,40 +204,29 @@ bool LogWriter::hasRoomInPipe() {
     return pipe_ && poll(&room, 1, leftOut_ > 0 ? 0 : moment) > 0 && (room.revents & POLLOUT) != 0;
 }
 
-// Sends as many datagrams as possible with one system call.
-void LogWriter::sendToJournal(const Batch& batch) {
-    constexpr std::size_t most = 64;
-    sockaddr_un address = journalAddress();
-    for (std::size_t next = 0; next < batch.ends.size();) {
-        std::array<iovec, most> parts;
-        std::array<mmsghdr, most> messages{};
-        const std::size_t count = std::min(most, batch.ends.size() - next);
-        for (std::size_t i = 0; i < count; ++i) {
-            const std::string_view record = batch.record(next + i);
-            parts[i] = {const_cast<char*>(record.data()), record.size()};
-            messages[i].msg_hdr.msg_name = &address;
-            messages[i].msg_hdr.msg_namelen = sizeof address;
-            messages[i].msg_hdr.msg_iov = &parts[i];
-            messages[i].msg_hdr.msg_iovlen = 1;
-        }
-        const int sent = sendmmsg(journal_.number(), messages.data(), static_cast<unsigned>(count), MSG_NOSIGNAL);
-        if (sent > 0) {
-            next += static_cast<std::size_t>(sent);
-        } else if (errno != EINTR) {
-            sendLargeToJournal(batch.record(next++));
+// A journal that was started anew takes no more on an earlier stream.
+void LogWriter::writeToJournal(std::string_view lines) {
+    for (int streams = 0; !lines.empty();) {
+        const ssize_t count =
+            stream_ ? send(stream_.number(), lines.data(), lines.size(), MSG_NOSIGNAL) : (errno = ENOTCONN, -1);
+        if (count < 0 && errno == EINTR) continue;
+        if (count > 0) {
+            lines.remove_prefix(static_cast<std::size_t>(count));
+        } else if (streams++ > 0 || !(stream_ = openJournalStream())) {
+            return writeToFile(lines);
         }
     }
 }
 
-// For a record that is too large for a datagram, which the journal's library can send, or when there is no journal.
-void LogWriter::sendLargeToJournal(std::string_view record) {
-    std::vector<iovec> fields;
-    for (std::string_view rest = record; !rest.empty();) {
+void LogWriter::sendToJournal(std::string_view fields) {
+    std::array<iovec, 8> parts;  // on the stack, for a crash may have been in the allocator
+    int count = 0;
+    for (std::string_view rest = fields; !rest.empty() && count < static_cast<int>(parts.size());) {
         const std::size_t end = std::min(rest.find('\n'), rest.size() - 1);
-        fields.push_back({const_cast<char*>(rest.data()), end});
+        parts[static_cast<std::size_t>(count++)] = {const_cast<char*>(rest.data()), end};
         rest.remove_prefix(end + 1);
     }
-    if (sd_journal_sendv(fields.data(), static_cast<int>(fields.size())) < 0) writeToFile(record);
+    if (sd_journal_sendv(parts.data(), count) < 0) writeToFile(fields);
 }
 
 // Runs in a signal handler. The interrupted thread may hold the locks itself, so they are only tried for a while.
@@ -253,7 +240,9 @@ void LogWriter::flushInCrash() {
         }
         return false;
     };
-    if (lockInTime(writing_) && lockInTime(mutex_)) write(pending_);
+    if (!lockInTime(writing_) || !lockInTime(mutex_)) return;
+    write(pending_);
+    write(RequestScope::ownLines());
 }
 
 }  // namespace vrx::host

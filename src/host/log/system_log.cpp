@@ -26,36 +26,38 @@ bool isJournalStream(int file) {
     return std::to_string(status.st_dev) + ":" + std::to_string(status.st_ino) == stream;
 }
 
-// Escapes control characters, those of Unicode's second range and its line separators, so that an argument can neither
-// forge a line nor steer a terminal.
-std::string escaped(std::string_view text) {
-    std::string result;
-    result.reserve(text.size());
+// The length of the control character at that place, Unicode's second range and its line separators among them; 0 for
+// any other.
+std::size_t controlLength(std::string_view text, std::size_t place) {
     auto byteAt = [&](std::size_t i) { return i < text.size() ? static_cast<unsigned char>(text[i]) : 0u; };
-    auto escape = [&](std::size_t at, std::size_t length) {
-        static constexpr char digits[] = "0123456789abcdef";
-        for (std::size_t i = at; i < at + length; ++i)
-            result.append("\\x").append({digits[byteAt(i) >> 4], digits[byteAt(i) & 15]});
-    };
+    const unsigned first = byteAt(place), second = byteAt(place + 1), third = byteAt(place + 2);
+    if (first < 0x20 || first == 0x7f) return 1;
+    if (first == 0xc2 && second >= 0x80 && second < 0xa0) return 2;
+    return first == 0xe2 && second == 0x80 && (third == 0xa8 || third == 0xa9) ? 3 : 0;
+}
+
+// Escapes control characters, so that an argument can neither forge a line nor steer a terminal.
+void appendEscaped(std::string& line, std::string_view text) {
+    static constexpr char digits[] = "0123456789abcdef";
+    std::size_t begin = 0;  // of what has no control character
     for (std::size_t i = 0; i < text.size();) {
-        std::size_t length = 1;
-        bool isHarmful = byteAt(i) < 0x20 || byteAt(i) == 0x7f;
-        if (byteAt(i) == 0xc2 && byteAt(i + 1) >= 0x80 && byteAt(i + 1) < 0xa0) {
-            length = 2;
-            isHarmful = true;
-        } else if (byteAt(i) == 0xe2 && byteAt(i + 1) == 0x80 && (byteAt(i + 2) == 0xa8 || byteAt(i + 2) == 0xa9)) {
-            length = 3;
-            isHarmful = true;
+        const std::size_t length = controlLength(text, i);
+        if (length == 0) {
+            ++i;
+            continue;
         }
-        if (text[i] == '\n')
-            result += "\\n";
-        else if (isHarmful)
-            escape(i, length);
-        else
-            result += text[i];
-        i += length;
+        line += text.substr(begin, i - begin);
+        if (text[i] == '\n') {
+            line += "\\n";
+        } else {
+            for (const char character : text.substr(i, length)) {
+                const auto byte = static_cast<unsigned char>(character);
+                line.append("\\x").append({digits[byte >> 4], digits[byte & 15]});
+            }
+        }
+        begin = i += length;
     }
-    return result;
+    line += text.substr(begin);
 }
 
 const char* levelName(Level level) {
@@ -92,17 +94,28 @@ std::string timeStamp() {
     return std::string(text.data(), length) + "." + milliseconds + "Z";
 }
 
-std::string journalRecord(const LogEntry& entry) {
-    std::string record = "MESSAGE=" + escaped(entry.message());
-    record.append("\nPRIORITY=").append(std::to_string(journalPriority(entry.level)));
-    record.append("\nCODE_FILE=").append(entry.file).append("\nCODE_LINE=").append(std::to_string(entry.line));
-    record.append("\nSUBSYSTEM=").append(subsystem()).append("\nCATEGORY=").append(platform::logCategory);
-    return record.append("\nSYSLOG_IDENTIFIER=").append(program_invocation_short_name).append("\n");
+// With the fields by which people look for what went wrong.
+void appendFields(std::string& lines, const LogEntry& entry) {
+    lines += "MESSAGE=";
+    appendEscaped(lines, entry.message());
+    lines.append("\nPRIORITY=").append(std::to_string(journalPriority(entry.level)));
+    lines.append("\nCODE_FILE=").append(entry.file).append("\nCODE_LINE=").append(std::to_string(entry.line));
+    lines.append("\nSUBSYSTEM=").append(subsystem()).append("\nCATEGORY=").append(platform::logCategory);
+    lines.append("\nSYSLOG_IDENTIFIER=").append(program_invocation_short_name).append("\n");
 }
 
-std::string lineRecord(const LogEntry& entry) {
-    return timeStamp() + " " + levelName(entry.level) + " " + subsystem() + ":" + std::string(platform::logCategory) +
-           " " + escaped(entry.message()) + "\n";
+// A line of the journal's stream, which begins with its priority.
+void appendStreamLine(std::string& lines, const LogEntry& entry) {
+    lines.append("<").append(std::to_string(journalPriority(entry.level))).append(">");
+    appendEscaped(lines, entry.message());
+    lines += '\n';
+}
+
+void appendFileLine(std::string& lines, const LogEntry& entry) {
+    lines.append(timeStamp()).append(" ").append(levelName(entry.level)).append(" ").append(subsystem());
+    lines.append(":").append(platform::logCategory).append(" ");
+    appendEscaped(lines, entry.message());
+    lines += '\n';
 }
 
 }  // namespace
@@ -112,11 +125,22 @@ SystemLog::SystemLog(Level lowest, int file)
       isJournal_(isJournalStream(file)),
       writer_(file, isJournal_ ? LogWriter::Form::Journal : LogWriter::Form::Lines) {}
 
+// Lines of a request are gathered, up to a limit and to an error.
 void SystemLog::write(const LogEntry& entry) {
+    constexpr std::size_t mostGathered = 16 * 1024;
     if (!isOn(entry.level)) return;
     const int saved = errno;
-    writer_.add(isJournal_ ? journalRecord(entry) : lineRecord(entry));
-    if (entry.level == Level::Error) writer_.flush();
+    const bool isError = entry.level == Level::Error;
+    LogLines own;
+    LogLines* const gathered = RequestScope::linesFor(writer_);
+    LogLines& lines = gathered ? *gathered : own;
+    (isJournal_ ? isError ? appendFields : appendStreamLine : appendFileLine)(lines.bytes, entry);
+    lines.ends.push_back(lines.bytes.size());
+    if (!gathered)
+        writer_.take(own);
+    else if (isError || lines.bytes.size() > mostGathered)
+        RequestScope::handOverLines();
+    if (isError) writer_.flush();
     errno = saved;
 }
 

@@ -6,6 +6,7 @@
 #include <utility>
 
 #include "vrx/host/base/current_copy.h"
+#include "vrx/host/base/request_scope.h"
 #include "vrx/host/profile/profile_reader.h"
 #include "vrx/platform/log.h"
 
@@ -88,6 +89,7 @@ ProfileLayers::~ProfileLayers() = default;
 
 std::shared_ptr<const ProfileContent> ProfileLayers::content() const {
     std::lock_guard lock(mutex_);
+    if (content_ && !RequestScope::isFirstLook(this)) return content_;
     const bool isFirst = !content_;
     const bool isSingleFile = paths_.size() == 1 && !paths_.front().ends_with('/');
     if (isFirst && !paths_.empty() && !isSingleFile) changes_ = std::make_unique<FolderChanges>(paths_);

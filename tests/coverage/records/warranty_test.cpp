@@ -3,9 +3,11 @@
 
 #include <cmath>
 #include <limits>
+#include <set>
 
 #include "support/simulated_host.h"
 #include "vrx/codec/core/keyed_archive.h"
+#include "vrx/coverage/records/coverage_keys.h"
 
 namespace vrx {
 namespace {
@@ -140,7 +142,8 @@ TEST_F(WarrantyTest, ReadsDatesFromTheirPlaces) {
     expectReading(epochs, dateFromEpoch(10000000000), {10000000000});
     expectReading(epochs, dateFromEpoch(10000000), {10000000001});
     expectReading(epochs, dateFromEpoch(9223372036854775.0), {std::numeric_limits<std::int64_t>::max()});
-    expectReading(epochs, dateFromEpoch(18446744073709551.0), {1e308});
+    expectReading(epochs, dateFromEpoch(9007199254740.0), {9007199254740999});  // which no double can hold
+    expectReading(epochs, dateFromEpoch(18446744073709551.0), {18446744073709551616.0, 1e308});
     expectReading(epochs, {}, {-1, -1.5, "1700000000", true, nullptr, std::nan(""), infinity, Dictionary{}});
     expectDefault(epochs);
 }
@@ -161,6 +164,18 @@ TEST_F(WarrantyTest, KeepsTheRestAsItWasSent) {
     expectReading(neverFilled, {}, {"text"});
     EXPECT_FALSE(record({{"coverageValidityDate", 1}})->coverageValidityDate());
     EXPECT_EQ(record({{"unknown", 7}})->dictionaryRepresentation(), Value(Dictionary{{"unknown", 7}}));
+}
+
+// What is told to programs that judge a server's answers.
+TEST_F(WarrantyTest, ListsThePlacesFromWhichItReads) {
+    std::multiset<std::pair<std::string, CoverageKey::Kind>> listed, read;
+    for (const auto& [object, key, kind] : coverageKeys())
+        listed.emplace(std::string(object) + (object.empty() ? "" : ".") + std::string(key), kind);
+    for (const auto& [path, field] : flags) read.emplace(path, CoverageKey::Kind::Flag);
+    for (const auto& [path, field] : epochs) read.emplace(path, CoverageKey::Kind::Date);
+    for (const auto& [path, field] : days) read.emplace(path, CoverageKey::Kind::Days);
+    for (const auto& [path, field] : asSent) read.emplace(path, CoverageKey::Kind::AsSent);
+    EXPECT_EQ(listed, read);
 }
 
 TEST_F(WarrantyTest, IsOfADictionaryHoweverEmpty) {

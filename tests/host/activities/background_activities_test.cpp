@@ -78,6 +78,26 @@ TEST_F(StoredActivities, KeepWhatCannotBeStoredAndFireNothingMeanwhile) {
     EXPECT_EQ(subject.wakeUps(), wakeUps) << "nothing was due meanwhile";
 }
 
+TEST_F(StoredActivities, KeepTheLastRunsOfEach) {
+    schedule("once", 0);
+    EXPECT_THAT(firingsAfter(1s), ElementsAre("once"));
+    completions.back()(Finished);
+    for (int run = 0; run < 60; ++run) {
+        schedule("often", 0);
+        subject.pass(1s);
+        completions.back()(run % 2 == 0 ? Finished : BackgroundActivityResult::Deferred);
+        subject.pass(1s);
+    }
+    const std::vector<ActivityRun> history = listActivities(tool)->history;
+    ASSERT_EQ(history.size(), 51u);
+    EXPECT_EQ(history[0].identifier, "once");
+    for (std::size_t i = 1; i < history.size(); ++i) {
+        EXPECT_EQ(history[i].outcome, i % 2 == 1 ? RunOutcome::Finished : RunOutcome::Deferred);
+        EXPECT_LE(history[i - 1].began, history[i].began);
+    }
+    EXPECT_EQ(listActivities(tool)->runs.size(), 2u);
+}
+
 TEST_F(StoredActivities, FollowTheFileWhenAnotherTakesItsPlace) {
     schedule("running", 0);
     schedule("due here only", 59);

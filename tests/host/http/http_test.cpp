@@ -8,7 +8,6 @@
 #include "host/http/loopback_server.h"
 #include "host/support.h"
 #include "support/eventually.h"
-#include "vrx/host/http/http_cache_rules.h"
 #include "vrx/host/http/transfer_line.h"
 #include "vrx/host/loop/queues.h"
 
@@ -167,57 +166,6 @@ TEST_F(HttpTest, ReachesOtherMachinesByTheProxyOfTheEnvironment) {
     EXPECT_EQ(requests, std::vector<std::string>(2, "CONNECT 0.0.0.0:1 HTTP/1.1"));
 }
 
-TEST_F(HttpTest, KeepsAnswersAsTheirHeadersAllow) {
-    constexpr const char* ifNoneMatch = "If-None-Match: \"a\"";
-    constexpr const char* ifModifiedSince = "If-Modified-Since: Sun, 06 Nov 1994 08:00:00 GMT";
-    // What the first answer says, how much later the second request comes, and how it asks whether that still holds:
-    // empty for not, null when it does not go out.
-    const std::tuple<std::string, double, const char*> cases[] = {
-        {"Cache-Control: max-age=60", 59, nullptr},
-        {"Cache-Control: max-age=60", 60, ""},
-        {"Cache-Control: max-age=60\r\nAge: 10", 50, ""},
-        {"Cache-Control: max-age=60", -1, ""},  // the clock was set back
-        {"Cache-Control: max-age=60\r\nETag: \"a\"", 60, ifNoneMatch},
-        {"Cache-Control: no-cache, max-age=60\r\nETag: \"a\"", 0, ifNoneMatch},
-        {"Cache-Control: max-age=60\r\ncache-control: no-store\r\nETag: \"a\"", 0, ""},
-        {"ETag: \"a\", \"b\"", 0, ""},
-        {"Last-Modified: Sun, 06 Nov 1994 08:00:00 GMT", 0, ifModifiedSince},
-        {"Expires: Sun, 06 Nov 1994 08:50:37 GMT\r\nDate: Sun, 06 Nov 1994 08:49:37 GMT", 59, nullptr},
-        {"Expires: 0\r\nLast-Modified: Sun, 06 Nov 1994 08:00:00 GMT", 0, ifModifiedSince},
-        {"Cache-Control: max-age=60\r\nVary: Accept-Encoding, X-Other", 1, nullptr},
-        {"Cache-Control: max-age=60\r\nVary: Accept, *", 1, ""},
-        {"X-None: 1", 0, ""},
-    };
-    std::string headers;
-    LoopbackServer server([&](const std::string& request) {
-        requests.push_back(request);
-        const bool isAsked = request.find("\r\nIf-") != request.npos;
-        return isAsked ? "HTTP/1.1 304 Not Modified\r\nX-New: 1\r\nCache-Control: max-age=60\r\n\r\n"
-                       : answer("200 OK", std::to_string(requests.size()), headers);
-    });
-    for (const auto& [said, secondsLater, condition] : cases) {
-        SCOPED_TRACE(said);
-        requests.clear();
-        headers = said + "\r\n";
-        const std::string url = server.url("/" + std::to_string(&said - &std::get<0>(cases[0])));
-        EXPECT_EQ(body(get(url)), "1");
-        clock.seconds = clock.seconds + secondsLater;
-        const bool isConfirmed = condition && *condition;
-        HttpResponse second = get(url);
-        EXPECT_EQ(body(second), condition && !isConfirmed ? "2" : "1");
-        EXPECT_EQ(second.status, 200);
-        ASSERT_EQ(requests.size(), condition ? 2u : 1u);
-        EXPECT_EQ(requests.back().find("\r\nIf-") != std::string::npos, isConfirmed);
-        if (isConfirmed) {
-            EXPECT_THAT(requests[1], HasSubstr(condition));
-            EXPECT_EQ(second.headers["X-New"], "1");
-            EXPECT_EQ(get(url).headers["Age"], "0");  // it is fresh anew
-            EXPECT_EQ(requests.size(), 2u);
-        }
-        clock.seconds = 784'111'777;
-    }
-}
-
 TEST_F(HttpTest, KeepsNothingThatIsDoubtful) {
     std::string next;
     LoopbackServer server([&](const std::string& request) {
@@ -247,21 +195,6 @@ TEST_F(HttpTest, KeepsNothingThatIsDoubtful) {
         EXPECT_THAT(requests.back(), Not(HasSubstr("If-None-Match"))) << first;
     }
     EXPECT_EQ(body(fetch(typed)), "new");
-
-    auto fetched = [&](platform::HttpSession& session, const std::string& answer) {
-        next = answer;
-        return body(fetch(session, plain));
-    };
-    fetched(http.shared(), answer("200 OK", "1", fresh));
-    EXPECT_EQ(fetched(*http.makeUncached(), answer("200 OK", "2", fresh)), "2");
-    EXPECT_EQ(fetched(http.shared(), answer("200 OK", "3", fresh)), "2");  // the reload has taken its place
-    fetch(posted);
-    EXPECT_EQ(fetched(http.shared(), next), "3");  // it was changed
-    clock.seconds = clock.seconds + 60;
-    EXPECT_EQ(fetched(http.shared(), answer("500 Broken", "broken")), "broken");
-    requests.clear();
-    fetched(http.shared(), "HTTP/1.1 304 Not Modified\r\nETag: \"b\"\r\n\r\n");  // of another answer
-    EXPECT_THAT(requests, ElementsAre(HasSubstr("If-None-Match"), Not(HasSubstr("If-None-Match"))));
 }
 
 TEST_F(HttpTest, TrustsTheProfilesAuthorityWhileTheProfileIsTrusted) {
@@ -320,7 +253,7 @@ TEST_F(HttpTest, SendsOnceWhatCannotBeRepeated) {
 
 TEST_F(HttpTest, LetsTransfersWaitForTheirTurn) {
     const platform::ShutdownScope shutdown;  // nobody answers
-    HttpCache cache(clock, 1000);
+    codec::HttpCache cache(clock, 1000);
     const auto add = [&](TransferLine& line, const char* host, Requester requester, const HttpLimits& limits) {
         const RequesterScope scope(requester);
         line.add(std::make_unique<HttpTransfer>(requestTo(std::string("https://") + host + "/x"), false,
@@ -370,49 +303,6 @@ TEST_F(HttpTest, AnswersRequestsAtOnceAndLetsGoOfThoseUnderWayAtItsEnd) {
     http.stop();
     EXPECT_THROW(unanswered.get(), std::future_error) << "let go";
     http.shared().send(requestTo(server.url()), [](HttpResponse) { FAIL(); });
-}
-
-TEST(HttpCacheRules, ReadCacheControlAndDates) {
-    // Storable, to be revalidated, max-age.
-    const std::map<std::string, std::tuple<bool, bool, std::optional<std::chrono::seconds>>> cases{
-        {"", {true, false, {}}},
-        {" MAX-AGE = 5 ", {true, false, 5s}},
-        {"max-age=\"5\", max-age=6", {true, false, 5s}},
-        {"s-maxage=9,public,,x=\"no-store, \\\" no-cache\" , max-age=1", {true, false, 1s}},
-        {"private=\"Set-Cookie\", no-cache=\"X-A\"", {true, true, {}}},
-        {"max-age=1,No-Store", {false, false, 1s}},
-        {"max-age=\"1, no-store", {false, false, {}}},
-        {"max-age=\"1\\", {false, false, {}}},
-        {"max-age", {true, false, 0s}},
-        {"max-age=-1", {true, false, 0s}},
-        {"max-age=99999999999999999999", {true, false, std::chrono::seconds(std::int64_t{1} << 31)}},
-    };
-    for (const auto& [text, expected] : cases) {
-        const CacheControl read = parseCacheControl(text);
-        EXPECT_EQ(std::tuple(read.isStorable, read.mustRevalidate, read.maxAge), expected) << text;
-    }
-    for (const char* text :
-         {"Sun, 06 Nov 1994 08:49:37 GMT", "Sunday, 06-Nov-94 08:49:37 GMT", "Sun Nov  6 08:49:37 1994"})
-        EXPECT_EQ(parseHttpDate(text), dateFromEpoch(784'111'777)) << text;
-    for (const char* text : {"", "0", "-1", "now", "Sun, 06 Nov 1994 25:49:37 GMT", "Nov 1994"})
-        EXPECT_EQ(parseHttpDate(text), std::nullopt) << text;
-}
-
-TEST(HttpCache, StaysWithinItsBound) {
-    SettableClock clock;
-    HttpCache cache(clock, 4000);
-    auto add = [&](const std::string& url, std::size_t size) {
-        platform::HttpResponse answer{.status = 200, .headers = {{"Cache-Control", "max-age=9"}}};
-        answer.body = Data(size);
-        cache.store(url, clock.now(), answer);
-        EXPECT_LE(cache.bytes(), 4000u);
-    };
-    for (const char* url : {"a", "b", "a"}) add(url, 1000);
-    EXPECT_TRUE(cache.find("a") && cache.find("b") && !cache.find("c"));
-    add("c", 2000);  // there is no room for it beside them
-    EXPECT_TRUE(!cache.find("a") && !cache.find("b") && cache.find("c"));
-    add("c", 5000);  // and this one replaces what it cannot be itself
-    EXPECT_EQ(cache.bytes(), 0u);
 }
 
 }  // namespace

@@ -111,6 +111,14 @@ TEST_F(DeviceProfileTest, EachReadSeesTheFileAsItIsEvenWithinOneTickOfTheClock) 
         }
         ASSERT_EQ(profile.string("SerialNumber"), serial);
     }
+    {
+        const RequestScope request;
+        EXPECT_EQ(profile.string("SerialNumber"), "SN299");
+        ASSERT_FALSE(replaceFile(path(), Data()));
+        EXPECT_EQ(profile.string("SerialNumber"), "SN299") << "a request sees one state of it";
+    }
+    EXPECT_EQ(profile.string("SerialNumber"), std::nullopt);
+    writeFile(path(), "[device]\nserial_number = 'SN299'");
     const auto facts = profile.content();
     std::filesystem::remove(path());
     EXPECT_EQ(profile.string("SerialNumber"), std::nullopt);  // and the bare machine has none

@@ -1,8 +1,8 @@
-#include "vrx/host/http/http_cache.h"
+#include "vrx/codec/http_cache.h"
 
-#include "vrx/host/http/http_cache_rules.h"
+#include "vrx/codec/http_cache_rules.h"
 
-namespace vrx::host {
+namespace vrx::codec {
 
 using platform::Date;
 using platform::Duration;
@@ -40,10 +40,7 @@ void HttpCache::store(const std::string& url, Date asked, const HttpResponse& an
     const Date arrived = now();
     const std::size_t size = sizeOf(url, answer);
     if (size > mostBytes_ || !mayStore(answer.headers, arrived)) return;
-    if (bytes_ + size > mostBytes_) {
-        entries_.clear();
-        bytes_ = 0;
-    }
+    if (bytes_ + size > mostBytes_) clear();
     const Duration age = ageOnArrival(answer.headers, asked, arrived);
     const Duration lifetime = freshnessLifetime(answer.headers, arrived);
     entries_.emplace(url, std::make_shared<const Entry>(Entry{url, answer, arrived, age, lifetime, size}));
@@ -64,4 +61,9 @@ void HttpCache::forget(const std::string& url) {
     entries_.erase(entry);
 }
 
-}  // namespace vrx::host
+void HttpCache::clear() {
+    entries_.clear();
+    bytes_ = 0;
+}
+
+}  // namespace vrx::codec

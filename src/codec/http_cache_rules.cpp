@@ -1,15 +1,14 @@
-#include "vrx/host/http/http_cache_rules.h"
+#include "vrx/codec/http_cache_rules.h"
 
 #include <strings.h>
 
 #include <algorithm>
 #include <charconv>
-#include <ctime>
 
-#include "vrx/host/base/text.h"
-#include "vrx/host/http/curl.h"
+#include "vrx/codec/http_date.h"
+#include "vrx/codec/line_text.h"
 
-namespace vrx::host {
+namespace vrx::codec {
 
 using platform::Date;
 using platform::Duration;
@@ -87,12 +86,6 @@ CacheControl parseCacheControl(std::string_view value) {
     return result;
 }
 
-std::optional<Date> parseHttpDate(const std::string& text) {
-    const std::time_t time = curl().problem.empty() ? curl().getdate(text.c_str(), nullptr) : -1;
-    if (time == -1) return std::nullopt;
-    return platform::dateFromEpoch(static_cast<double>(time));
-}
-
 bool mayStore(const HttpHeaders& answer, Date arrived) {
     if (!parseCacheControl(valueOf(answer, "Cache-Control")).isStorable || variesByMoreThanHeaders(answer))
         return false;
@@ -146,4 +139,4 @@ HttpHeaders revalidatedHeaders(HttpHeaders stored, const HttpHeaders& confirmati
     return stored;
 }
 
-}  // namespace vrx::host
+}  // namespace vrx::codec

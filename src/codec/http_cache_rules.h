@@ -10,7 +10,7 @@
 #include "vrx/platform/date.h"
 #include "vrx/platform/http_request.h"
 
-namespace vrx::host {
+namespace vrx::codec {
 
 // The directives that a private cache obeys. The others are for shared caches, or allow stale answers, which are never
 // given.
@@ -20,9 +20,6 @@ struct CacheControl {
     std::optional<std::chrono::seconds> maxAge{};
 };
 CacheControl parseCacheControl(std::string_view value);
-
-// A date in any of the forms that headers use. Nothing for anything else, such as the customary "0".
-std::optional<platform::Date> parseHttpDate(const std::string& text);
 
 // Whether the answer may be kept for requests with the same headers, and could be used later.
 bool mayStore(const platform::HttpHeaders& answer, platform::Date arrived);
@@ -43,4 +40,4 @@ bool isConfirmed(const platform::HttpHeaders& stored, const platform::HttpHeader
 // The stored answer's headers, updated by those of the confirming one.
 platform::HttpHeaders revalidatedHeaders(platform::HttpHeaders stored, const platform::HttpHeaders& confirmation);
 
-}  // namespace vrx::host
+}  // namespace vrx::codec

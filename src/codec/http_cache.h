@@ -11,7 +11,7 @@
 #include "vrx/platform/clock.h"
 #include "vrx/platform/http_request.h"
 
-namespace vrx::host {
+namespace vrx::codec {
 
 class HttpCache {
 public:
@@ -39,6 +39,7 @@ public:
     platform::HttpResponse revalidated(const Entry& stored, platform::Date asked,
                                        const platform::HttpHeaders& confirmation);
     void forget(const std::string& url);
+    void clear();
 
     // The size of all kept answers, headers included.
     std::size_t bytes() const { return bytes_; }
@@ -50,4 +51,4 @@ private:
     std::size_t bytes_ = 0;
 };
 
-}  // namespace vrx::host
+}  // namespace vrx::codec
