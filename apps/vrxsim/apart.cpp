@@ -6,6 +6,7 @@
 #include <array>
 #include <cstdio>
 #include <memory>
+#include <sstream>
 #include <string>
 #include <utility>
 #include <vector>
@@ -17,12 +18,33 @@ namespace vrx::simulation {
 
 namespace {
 
-// A play as a line: trace, days, and what was broken, each after a tab.
+// Each as NAME MISSED NEEDLESS OLDTEXT and a blank.
+std::string textOf(const DifferentSeconds& differences) {
+    std::string text;
+    for (const auto& [name, seconds] : differences) {
+        text.append(name);
+        for (const std::int64_t number : seconds) text += " " + std::to_string(number);
+        text += " ";
+    }
+    return text;
+}
+
+DifferentSeconds differencesFrom(const std::string& text) {
+    DifferentSeconds differences;
+    std::istringstream words(text);
+    for (std::string name; words >> name;) {
+        const auto known = std::ranges::find(namedDifferences(), name, &NamedDifference::name);
+        for (std::int64_t& number : differences[known->name]) words >> number;
+    }
+    return differences;
+}
+
+// A play as a line: trace, days, differences, and what was broken, each after a tab.
 std::string lineOf(const Play& play) {
     std::array<char, 80> numbers;
     std::snprintf(numbers.data(), numbers.size(), "%016llx\t%.17g\t", static_cast<unsigned long long>(play.trace),
                   play.days);
-    std::string line = numbers.data();
+    std::string line = numbers.data() + textOf(play.differences) + "\t";
     if (play.violation)
         line += std::to_string(play.violation->day) + "\t" + play.violation->rule + "\t" + play.violation->detail;
     std::ranges::replace(line, '\n', ' ');
@@ -34,8 +56,9 @@ Play playFrom(std::string line) {
     for (std::size_t tab; (tab = line.find('\t')) != std::string::npos; line.erase(0, tab + 1))
         parts.push_back(line.substr(0, tab));
     parts.push_back(line);
-    Play play{std::stoull(parts.at(0), nullptr, 16), std::stod(parts.at(1))};
-    if (parts.size() == 5) play.violation = Violation{std::stod(parts[2]), parts[3], parts[4]};
+    Play play{.trace = std::stoull(parts.at(0), nullptr, 16), .days = std::stod(parts.at(1))};
+    play.differences = differencesFrom(parts.at(2));
+    if (parts.size() == 6) play.violation = Violation{std::stod(parts[3]), parts[4], parts[5]};
     return play;
 }
 

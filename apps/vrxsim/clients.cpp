@@ -104,6 +104,7 @@ void Clients::ask(const std::vector<std::string>& words) {
 void Clients::dismiss(const std::string& serialNumber) {
     const std::function<bool()> hasFailed = failureWatch();
     send(0, "dismiss " + serialNumber, [=, this](VRXAgentProtocol& agent, int request) {
+        dismissalIsAsked(serialNumber);
         agent.dismissFollowUpForSerialNumber(serialNumber, [=, this](bool isDone) {
             if (!hasFailed()) dismissed_.insert(serialNumber);
             take(request, textOfReply(isDone));
@@ -119,6 +120,7 @@ std::function<bool()> Clients::failureWatch() const {
 
 void Clients::take(int request, std::string_view reply) {
     trace_.add(reply);
+    rules_.replyArrives();
     const auto open = open_.find(request);
     if (open == open_.end()) return;  // its connection has ended
     if (++open->second.replies == 2)

@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "vrx/protocols/agent_protocol.h"
+#include "vrxsim/rules.h"
 #include "vrxsim/verdict.h"
 #include "vrxsim/world.h"
 
@@ -20,7 +21,10 @@ inline const std::string causeOfClients = "client ";
 
 class Clients {
 public:
-    Clients(World& world, Verdict& verdict, Trace& trace) : world_(world), verdict_(verdict), trace_(trace) {}
+    Clients(World& world, Rules& rules, Verdict& verdict, Trace& trace)
+        : world_(world), rules_(rules), verdict_(verdict), trace_(trace) {}
+
+    std::function<void(const std::string& serialNumber)> dismissalIsAsked = [](const auto&) {};
 
     // Lets an event happen that is a client's. Returns false for any other.
     bool happen(const Event& event);
@@ -58,6 +62,7 @@ private:
     auto reply(int request);
 
     World& world_;
+    Rules& rules_;
     Verdict& verdict_;
     Trace& trace_;
     std::map<int, Connection> connections_;

@@ -134,13 +134,64 @@ Outcome asBroken(Outcome outcome, const std::string& what) {
     return outcome;
 }
 
+// In how many lives each difference occurred, and for how long in all of them.
+class DifferenceTable {
+public:
+    void add(const simulation::DifferentSeconds& differences) {
+        ++lives_;
+        for (const auto& [name, seconds] : differences) {
+            Sum& sum = sums_[name];
+            ++sum.lives;
+            for (std::size_t way = 0; way < seconds.size(); ++way) sum.seconds[way] += seconds[way];
+        }
+    }
+    std::string text() const {
+        std::vector<std::vector<std::string>> rows{
+            {"DIFFERENCE", "LIVES", "PERCENT", "MISSED", "NEEDLESS", "OLD TEXT"}};
+        for (const simulation::NamedDifference& named : simulation::namedDifferences()) {
+            const auto sum = sums_.find(named.name);
+            if (sum == sums_.end()) continue;
+            rows.push_back(
+                {std::string(named.name), std::to_string(sum->second.lives), fixed(percent(sum->second), 1)});
+            for (const std::int64_t seconds : sum->second.seconds)
+                rows.back().push_back(fixed(static_cast<double>(seconds) / simulation::secondsOfDay, 1));
+        }
+        return rows.size() == 1 ? ""
+                                : table(rows) + "Missed, needless and with an old text for so many days of all.\n\n";
+    }
+    Dictionary document() const {
+        Dictionary document;
+        for (const auto& [name, sum] : sums_)
+            document[std::string(name)] = Dictionary{{"lives", sum.lives},
+                                                     {"percent", percent(sum)},
+                                                     {"missedSeconds", sum.seconds[0]},
+                                                     {"needlessSeconds", sum.seconds[1]},
+                                                     {"oldTextSeconds", sum.seconds[2]}};
+        return document;
+    }
+
+private:
+    struct Sum {
+        std::int64_t lives = 0;
+        std::array<std::int64_t, simulation::ways> seconds{};
+    };
+    double percent(const Sum& sum) const {
+        return 100.0 * static_cast<double>(sum.lives) / static_cast<double>(lives_);
+    }
+
+    std::int64_t lives_ = 0;
+    std::map<std::string_view, Sum> sums_;
+};
+
 Outcome explore(const Options& options) {
     if (options.seeds.empty() && options.seconds <= 0)
         return failed(ExitCode::Usage, "neither --seeds nor --for says how many", "See vrxsim explore --help.");
     Progress progress;
+    DifferenceTable differences;
     std::map<std::uint64_t, simulation::Violation> broken;
     simulation::explore(explorationOf(options), [&](std::uint64_t seed, const simulation::Play& play) {
         progress.add(play.days);
+        differences.add(play.differences);
         if (play.violation) broken.emplace(seed, *play.violation);
         return broken.size() < mostFindings;
     });
@@ -159,9 +210,10 @@ Outcome explore(const Options& options) {
     Outcome outcome{.document = {{"lives", static_cast<std::int64_t>(progress.lives)},
                                  {"years", progress.years},
                                  {"yearsPerMinute", progress.perMinute()},
-                                 {"findings", std::move(findings)}}};
-    outcome.text = text + std::to_string(progress.lives) + " lives, " + fixed(progress.years, 0) + " years, " +
-                   fixed(progress.perMinute(), 0) + " years a minute\n";
+                                 {"findings", std::move(findings)},
+                                 {"differences", differences.document()}}};
+    outcome.text = text + differences.text() + std::to_string(progress.lives) + " lives, " + fixed(progress.years, 0) +
+                   " years, " + fixed(progress.perMinute(), 0) + " years a minute\n";
     return isFine ? outcome : asBroken(std::move(outcome), "lives broke a rule");
 }
 
@@ -179,8 +231,11 @@ Outcome replay(const Options& options) {
     if (options.isTraced)
         how.show = [](std::string_view line) { std::fprintf(stderr, "%s\n", printable(line).c_str()); };
     const simulation::Play play = simulation::play(*life, how);
-    Outcome outcome{.document = {{"days", play.days}, {"trace", hashText(play.trace)}},
-                    .text = fixed(play.days, 2) + " days, trace " + hashText(play.trace) + "\n"};
+    DifferenceTable differences;
+    differences.add(play.differences);
+    Outcome outcome{
+        .document = {{"days", play.days}, {"trace", hashText(play.trace)}, {"differences", differences.document()}},
+        .text = differences.text() + fixed(play.days, 2) + " days, trace " + hashText(play.trace) + "\n"};
     if (play.chronicle) {
         const std::string problem = timeline::writePage(
             options.page, *play.chronicle, "The life in " + options.file.substr(options.file.rfind('/') + 1));

@@ -8,7 +8,9 @@
 #include "vrx/platform/text.h"
 #include "vrx/service/start_up.h"
 #include "vrxsim/clients.h"
+#include "vrxsim/differences.h"
 #include "vrxsim/invariants.h"
+#include "vrxsim/rules.h"
 #include "vrxsim/world.h"
 
 namespace vrx::simulation {
@@ -27,9 +29,17 @@ class Player {
 public:
     Player(const Life& life, const PlayOptions& options) : life_(life), options_(options) {
         trace_.show = options.show;
+        rules_.beforeChange = [this] { differences_.judge(); };
+        clients_.dismissalIsAsked = [this](const std::string& serialNumber) {
+            rules_.dismissalIsAsked(serialNumber);
+            differences_.dismissalIsAsked(serialNumber);
+        };
         world_.host.interference.planted = options.planted;
         world_.host.activities.setShareOfGrace(options.shareOfGrace);
-        if (!options.isJudged) world_.host.log.lowest = platform::Level::Error;
+        if (!options.isJudged) {
+            world_.host.log.lowest = platform::Level::Error;
+            rules_.turnOff();
+        }
         world_.host.failures.handler = [this](const std::string& text) {
             verdict_.report(day(), "simulation", text);
             world_.host.queues.stop();  // it may have no end
@@ -49,7 +59,10 @@ public:
                 happen(life_.events[nextEvent_++]);
             lookAround();
         }
-        Play result{.trace = trace_.hash(), .days = day(), .violation = verdict_.violation};
+        Play result{.trace = trace_.hash(),
+                    .days = day(),
+                    .violation = verdict_.violation,
+                    .differences = differences_.found()};
         if (recorder_) result.chronicle = recorder_->chronicle();
         disarm();
         world_.host.queues.letWaitingTasksGo();
@@ -79,6 +92,7 @@ private:
         }
         isStarting_ = false;
         invariants_.processStarted();
+        differences_.processStarts();
         if (isKillWanted_) cutShort();
     }
     void relaunch() {
@@ -89,7 +103,8 @@ private:
     // Lets time pass up to a moment, or to the death of the process before it.
     void advance(double until) {
         while (world_.elapsed() < until - instant && !isKillWanted_ && !verdict_.violation) {
-            const Duration rest(until - world_.elapsed());
+            judgeDifferences();
+            const Duration rest(std::min(until, differences_.nextMoment().value_or(until)) - world_.elapsed());
             try {
                 if (piecesLeft_ > 0)
                     workOff(world_.host.clock.now() + rest);
@@ -98,6 +113,7 @@ private:
             } catch (const Killed&) {
             }
         }
+        judgeDifferences();
         if (isKillWanted_) cutShort();
     }
     // One piece after another, the last of which ends the process.
@@ -109,6 +125,7 @@ private:
     void die(double downTime) {
         disarm();
         clients_.processEnds();
+        rules_.processEnds();
         world_.host.process.kill();
         relaunchAt_ = world_.elapsed() + downTime;
     }
@@ -136,10 +153,14 @@ private:
     }
 
     void happen(const Event& event) {
+        judgeDifferences();
         trace_.add(event.verb);
         if (trace_.show) trace_.show(textOf(event));
         if (event.verb == "clock") lookAround();  // while its dates still tell when things were
-        if (event.verb == "take-back") clients_.takeBackDismissals();
+        if (event.verb == "take-back") {
+            clients_.takeBackDismissals();
+            differences_.dismissalsAreTakenBack();
+        }
         if (!world_.happen(event) && !clients_.happen(event)) happenToProcess(event);
     }
     void happenToProcess(const Event& event) {
@@ -173,8 +194,12 @@ private:
         world_.host.forgetRecords();
         nextCheckAt_ = world_.elapsed() + checkInterval;
     }
+    void judgeDifferences() {
+        if (options_.isJudged) differences_.judge();
+    }
     void judge() {
         invariants_.check();
+        rules_.check();
         if (recorder_) recorder_->look();
         for (const platform::LogEntry& line : world_.host.log.entries()) takeDown(line);
         for (const sim::SentRequest& sent : world_.host.http.sent()) {
@@ -203,9 +228,11 @@ private:
     Verdict verdict_;
     Trace trace_;
     World world_;
-    Clients clients_{world_, verdict_, trace_};
+    Rules rules_{world_, verdict_};
+    Clients clients_{world_, rules_, verdict_, trace_};
     Invariants invariants_{world_, clients_, verdict_};
     std::optional<timeline::Recorder> recorder_;
+    Differences differences_{world_, rules_, verdict_};
     std::size_t nextEvent_ = 0;
     double nextCheckAt_ = 0;
     std::optional<double> relaunchAt_;  // while there is no process

@@ -8,6 +8,7 @@
 #include "timeline/chronicle.h"
 #include "vrx/sim/http.h"
 #include "vrx/sim/interference.h"
+#include "vrxsim/differences.h"
 #include "vrxsim/life.h"
 #include "vrxsim/verdict.h"
 
@@ -27,6 +28,7 @@ struct Play {
     double days = 0;          // up to the end, or to the violation
     std::optional<Violation> violation{};
     std::optional<timeline::Chronicle> chronicle{};
+    DifferentSeconds differences{};
 };
 
 Play play(const Life& life, const PlayOptions& options = {});

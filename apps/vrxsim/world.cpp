@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <charconv>
 
 #include "vrx/platform/vendor.h"
 
@@ -19,10 +20,6 @@ namespace {
 const std::string coverageUrl = "https://coverage.orvane.example/api/v2/coverage/summary";
 const std::string versionsUrl = "https://configuration.orvane.example/library/ORVANE/asset/vrxV2.plist";
 constexpr std::string_view dismissals = "FollowupDismissedSerialNumberHashes";
-
-Date dateOf(double days) {
-    return sim::Clock::start + Duration(secondsOfDay * days);
-}
 
 std::optional<double> maybe(const std::string& word) {
     return word == "-" ? std::nullopt : std::optional(numberFrom(word));
@@ -59,6 +56,31 @@ bool World::isPaired(const std::string& serialNumber) const {
 std::optional<Date> World::latestEnd(const std::string& serialNumber) const {
     const auto end = latestEnds_.find(serialNumber);
     return end == latestEnds_.end() ? std::nullopt : std::optional(dateOf(end->second));
+}
+
+const Record* World::record(const std::string& serialNumber) const {
+    const auto record = records_.find(serialNumber);
+    return record == records_.end() ? nullptr : &record->second;
+}
+
+int World::answerIn(std::string_view text) {
+    constexpr std::string_view before = "Answer ";
+    const std::size_t found = text.find(before);
+    int number = 0;
+    if (found != std::string_view::npos)
+        std::from_chars(text.data() + found + before.size(), text.data() + text.size(), number);
+    return number;
+}
+
+bool World::hasCarrier(const std::string& code) const {
+    return std::ranges::any_of(host.telephony.carriers, [&](const auto& entry) {
+        return entry.second.mobileCountryCode.value_or("") + entry.second.mobileNetworkCode.value_or("") == code;
+    });
+}
+
+bool World::areWatchesSupported() const {
+    constexpr std::int64_t needed = 3;
+    return !host.flags.enabled.empty() && (lowVersion_ == needed || highVersion_ == needed);
 }
 
 bool World::isFailing() const {
@@ -151,7 +173,11 @@ bool World::changeServers(const Event& event) {
     if (verb == "record") {
         setRecord(words);
     } else if (verb == "no-record") {
-        if (const auto record = records_.find(words[0]); record != records_.end()) record->second.isOffered = false;
+        if (const auto record = records_.find(words[0]); record != records_.end()) {
+            Record withoutOffer = record->second;
+            withoutOffer.isOffered = false;
+            takeRecord(words[0], withoutOffer);
+        }
     } else if (verb == "account") {
         host.accounts.primary =
             words[0] == "in" ? std::optional(platform::CloudAccount{"user@cloud", "ALT-1"}) : std::nullopt;
@@ -174,12 +200,20 @@ bool World::changeServers(const Event& event) {
 }
 
 void World::setRecord(const std::vector<std::string>& words) {
-    const Record record{maybe(words[1]), maybe(words[2]), maybe(words[3]), numberFrom(words[4]) != 0, words[5]};
-    takeRecord(words[0], record);
+    takeRecord(words[0], {.shownFrom = maybe(words[1]),
+                          .until = maybe(words[2]),
+                          .daysBeforeEnd = maybe(words[3]),
+                          .isOffered = numberFrom(words[4]) != 0,
+                          .excludedCarrier = words[5]});
 }
 
-void World::takeRecord(const std::string& serialNumber, const Record& record) {
-    records_[serialNumber] = record;
+void World::takeRecord(const std::string& serialNumber, Record record) {
+    Record& present = records_[serialNumber];
+    if (!present.saysTheSameAs(record)) {
+        record.version = ++lastVersion_;
+        record.changedAt = elapsed();
+        present = record;
+    }
     everKnown.insert(serialNumber);
     if (!record.until) return;
     const auto latest = latestEnds_.try_emplace(serialNumber, *record.until).first;
@@ -195,6 +229,7 @@ void World::pair(const std::string& serialNumber, const std::string& dayWord) {
                                 .pairedDate = since ? std::optional(dateOf(*since)) : std::nullopt,
                                 .isPaired = true});
     unpairedAt.erase(serialNumber);
+    pairedAt[serialNumber] = elapsed();
     everKnown.insert(serialNumber);
     pairedDevicesChangedAt = elapsed();
     host.tellChanges();
@@ -204,6 +239,7 @@ void World::unpair(const std::string& serialNumber) {
     if (!isPaired(serialNumber)) return;
     std::erase_if(host.watches.all, [&](const auto& watch) { return watch.serialNumber == serialNumber; });
     unpairedAt[serialNumber] = elapsed();
+    pairedAt.erase(serialNumber);
     pairedDevicesChangedAt = elapsed();
     host.tellChanges();
 }
@@ -239,12 +275,12 @@ void World::fail(const std::string& what, int count) {
 
 // One record and one follow-up, and neither names a device.
 void World::makeOldLayout(double until) {
-    const Record record{std::nullopt, until, std::nullopt, true, "-"};
+    const Record record{.until = until, .isOffered = true, .excludedCarrier = "-"};
     latestEnds_.try_emplace(phone, until).first->second = std::max(until, latestEnds_[phone]);
-    records_.try_emplace(phone, record);
+    if (!records_.contains(phone)) takeRecord(phone, record);
     host.files.put(host.files.homeDirectory() + "/Library/Application Support/" + platform::vendorIdentifier(".Vireo") +
                        "/Warranty.plist",
-                   propertyList(coverage(record, host.locale.identifier)));
+                   propertyList(coverage(phone, record, host.locale.identifier)));
     host.defaults.set("CachedWarrantyLastUpdatedDate", host.clock.now());
     host.defaults.set("CachedWarrantyLocale", host.locale.identifier);
     host.defaults.set("CachedWarrantyVersion", "2");
@@ -252,11 +288,13 @@ void World::makeOldLayout(double until) {
     hadOldLayout = true;
 }
 
-Dictionary World::coverage(const Record& record, const std::string& language) const {
+Dictionary World::coverage(const std::string& serialNumber, const Record& record, const std::string& language) {
+    answers_.push_back({serialNumber, record, language});
     Dictionary toggles{{"qxOfferDisplay", record.isOffered}, {"qxOfferToggle", Array{record.excludedCarrier}}};
     if (record.daysBeforeEnd) toggles["qxOfferDurationDaysBeforeEndDate"] = *record.daysBeforeEnd;
     Dictionary coverage{{"featureToggleParameters", toggles},
                         {"qxLocalizedOfferLabel", title(language)},
+                        {"qxLocalizedOfferCTA", label(static_cast<int>(answers_.size()) - 1)},
                         {"qxLocalizedOfferPluralDescFormat", "%@"},
                         {"qxLocalizedOfferSingularDesc", "1"}};
     if (record.until) coverage["qxOfferEligibleUntil"] = whole(platform::epochSeconds(dateOf(*record.until)));
@@ -273,7 +311,9 @@ HttpAnswer World::answer(const platform::HttpRequest& request) {
     if (!serialNumber || !language) return HttpAnswer::status(400);
     const auto record = records_.find(*serialNumber);
     const std::string fine =
-        record == records_.end() ? "" : host.json.serialize(Value(coverage(record->second, *language))).value();
+        record == records_.end()
+            ? ""
+            : host.json.serialize(Value(coverage(*serialNumber, record->second, *language))).value();
     if (!outage_.empty()) return answerOfKind(outage_, fine);
     if (std::optional<HttpAnswer> troubled = troubledAnswer(serverTroubles_, fine)) return *std::move(troubled);
     return record == records_.end() ? HttpAnswer::status(404, "{}") : HttpAnswer::ok(fine);

@@ -18,6 +18,24 @@ public:
     Controller(FollowUpControllers& service, std::string client) : service_(service), client_(std::move(client)) {}
 
     MaybeError postFollowUpItem(const FollowUpItem& item) override {
+        MaybeError error = post(item);
+        service_.tell({.request = Request::Post, .isDone = !error, .item = &item});
+        return error;
+    }
+    MaybeError clearPendingFollowUpItems(const std::vector<std::string>& uniqueIdentifiers) override {
+        MaybeError error = clear(uniqueIdentifiers);
+        service_.tell({.request = Request::Clear, .isDone = !error, .identifiers = &uniqueIdentifiers});
+        return error;
+    }
+    Result<std::vector<FollowUpItem>> pendingFollowUpItems() override {
+        MaybeError error = service_.begin(Request::List, "list");
+        service_.tell({.request = Request::List, .isDone = !error});
+        if (error) return *error;
+        return pending();
+    }
+
+private:
+    MaybeError post(const FollowUpItem& item) {
         if (MaybeError error = service_.begin(Request::Post, "post " + item.uniqueIdentifier)) return error;
         auto stored = codec::serializePropertyList(item.userInfo, platform::PropertyListFormat::Binary);
         if (!stored) return stored.error();
@@ -30,7 +48,7 @@ public:
         service_.changed();
         return std::nullopt;
     }
-    MaybeError clearPendingFollowUpItems(const std::vector<std::string>& uniqueIdentifiers) override {
+    MaybeError clear(const std::vector<std::string>& uniqueIdentifiers) {
         std::string request = "clear";
         for (const std::string& identifier : uniqueIdentifiers) request += " " + identifier;
         if (MaybeError error = service_.begin(Request::Clear, std::move(request))) return error;
@@ -41,12 +59,6 @@ public:
         service_.changed();
         return std::nullopt;
     }
-    Result<std::vector<FollowUpItem>> pendingFollowUpItems() override {
-        if (MaybeError error = service_.begin(Request::List, "list")) return *error;
-        return pending();
-    }
-
-private:
     std::vector<FollowUpItem>& pending() { return service_.pending(client_); }
 
     FollowUpControllers& service_;

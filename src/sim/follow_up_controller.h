@@ -37,6 +37,14 @@ public:
     }
     // Called after each request that has changed what is pending.
     void setChangeObserver(std::function<void()> observer) { changeObserver_ = std::move(observer); }
+    // Hears each request when it has been answered. The item is that of a post, the identifiers are those of a clear.
+    struct Answered {
+        Request request{};
+        bool isDone = false;
+        const platform::FollowUpItem* item = nullptr;
+        const std::vector<std::string>* identifiers = nullptr;
+    };
+    std::function<void(const Answered& answered)> listener;
     // Every request of every client, failed ones included: "list", "post IDENTIFIER", "clear IDENTIFIER IDENTIFIER".
     const std::vector<std::string>& asked() const { return asked_; }
     void forgetAsked() { asked_.clear(); }
@@ -48,6 +56,9 @@ private:
     platform::MaybeError begin(Request request, std::string text);
     void changed() const {
         if (changeObserver_) changeObserver_();
+    }
+    void tell(const Answered& answered) const {
+        if (listener) listener(answered);
     }
 
     const Interference& interference_;

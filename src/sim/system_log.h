@@ -1,6 +1,7 @@
 // The log, kept for tests to read.
 #pragma once
 
+#include <functional>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -12,10 +13,15 @@ namespace vrx::sim {
 class SystemLog final : public platform::SystemLog {
 public:
     bool isOn(platform::Level level) const override { return level >= lowest; }
-    void write(const platform::LogEntry& entry) override { entries_.push_back(entry); }
+    void write(const platform::LogEntry& entry) override {
+        entries_.push_back(entry);
+        if (listener) listener(entry);
+    }
 
     // Entries below this level are not even composed.
     platform::Level lowest = platform::Level::Debug;
+
+    std::function<void(const platform::LogEntry& entry)> listener;  // hears each line when it is written
 
     const std::vector<platform::LogEntry>& entries() const { return entries_; }
     // The lines of a level or above, in order, with their private arguments revealed.

@@ -61,7 +61,7 @@ TEST(Defects, AreAllFound) {
          "life 273\nday 269 dismiss WATCH2\nday 271 language hi_IN\nday 272 dismiss WATCH1"},
         {"setting-forgotten", "dismissed",
          "life 29\nday 3 reboot 0\nday 17 reboot 0\nday 26 dismiss WATCH2\nday 28 reboot 0"},
-        {"post-lost", "acknowledged",
+        {"post-lost", "as-the-rules",
          "life 32\nrecord PHONE 15 44 0 1 -\nday 19 pair WATCH2 0\nday 22 versions 0 0\nday 23 kill-before-call 18 "
          "0\nday 26.45833 ask 0 all-update PHONE 2\nday 27 versions 0 2\nday 31 ask 0 outreach WATCH1 0"},
         {"clear-lost", "acknowledged",
