@@ -27,8 +27,9 @@ using platform::Value;
 
 namespace {
 
-// With days of a few seconds an item's text can change more often than anybody would read.
-constexpr std::size_t mostTexts = 10'000;
+// With days of a few seconds an item's text can change more often than anybody would read: from then on it stands as it
+// is.
+constexpr std::size_t mostTexts = 50'000;
 // Added to the moment of a change, so that rounding leaves no doubt of what it has changed to.
 constexpr Duration justAfter{1e-3};
 
@@ -131,10 +132,11 @@ std::optional<Offer> offerFor(const std::shared_ptr<VRXDevice>& device, const st
 // Takes down how the item looks from one moment to another.
 void addLooks(std::vector<Shown>& looks, const FollowUpItem& item, Date from, Date until, Duration clockAhead,
               Duration day, const platform::Locale& locale) {
-    while (from < until && looks.size() < mostTexts) {
+    while (from < until) {
         const host::ShownFollowUp shown = host::shownFollowUp(item, from + clockAhead + justAfter, day, locale);
         Date next = until;
-        if (shown.nextTextChange) next = std::min(next, std::max(*shown.nextTextChange - clockAhead, from + justAfter));
+        if (shown.nextTextChange && looks.size() < mostTexts)
+            next = std::min(next, std::max(*shown.nextTextChange - clockAhead, from + justAfter));
         Shown look{.from = from,
                    .until = next,
                    .title = item.title.value_or(""),
