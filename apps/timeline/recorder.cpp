@@ -4,6 +4,7 @@
 #include <cerrno>
 #include <utility>
 
+#include "vrx/codec/property_list.h"
 #include "vrx/coverage/records/warranty.h"
 #include "vrx/devices/devices_manager.h"
 #include "vrx/devices/records/device.h"
@@ -61,6 +62,10 @@ public:
         const std::optional<std::string> content = files_.content(path);
         if (!content) return platform::Error{platform::error_domain::system, ENOENT, path};
         return platform::Data(content->begin(), content->end());
+    }
+    platform::Result<Value> readPropertyList(const std::string& path) const override {
+        const platform::Result<platform::Data> content = read(path);
+        return content ? codec::parsePropertyList(*content) : content.error();
     }
     platform::MaybeError replace(const std::string&, const platform::Data&) override { return std::nullopt; }
     platform::MaybeError createDirectories(const std::string&) override { return std::nullopt; }

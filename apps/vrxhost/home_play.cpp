@@ -2,6 +2,7 @@
 
 #include <algorithm>
 
+#include "vrx/codec/property_list.h"
 #include "vrx/coverage/records/warranty.h"
 #include "vrx/devices/devices_manager.h"
 #include "vrx/devices/records/device.h"
@@ -126,7 +127,7 @@ void HomePlay::takeSettings(const AgentView& view) {
 
 // What is cached stays so, and is what the server answers as far as it counts.
 void HomePlay::takeRecords(const AgentView& view) {
-    const host::Files files(view.home());
+    const host::Files files(view.home(), codec::parsePropertyList);
     const std::size_t homeSize = host_.files.homeDirectory().size();
     const auto take = [&](const std::string& path) {
         if (const auto content = files.read(view.home() + path.substr(homeSize)))

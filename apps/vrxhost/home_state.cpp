@@ -16,7 +16,7 @@ platform::Result<HomeState> readHomeState(AgentView& view) {
         host::ActivityRegistry registry(connection);
         state.settings = host::storedSettings(connection);
         state.items = host::pendingFollowUps(connection, followUpClientIdentifier());
-        state.activities = {registry.scheduled(), registry.runs()};
+        state.activities = {registry.scheduled(), registry.runs(), {}};
         state.language = view.language(host::storedFact(connection, host::stored_facts::language));
         state.agentVersion = host::storedFact(connection, host::stored_facts::agentVersion);
         state.boot = host::storedFact(connection, host::stored_facts::boot);
