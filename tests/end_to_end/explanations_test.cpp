@@ -156,8 +156,9 @@ TEST_F(Explanations, FireWhatTheTargetDateLets) {
     awaitEnd("outreach", "deferred");
     EXPECT_EQ(activity("outreach")["targetDate"], outreach["targetDate"]);
 
+    const Value runs = vrxhost({"activities", "--history"}).document["history"];
     std::string history;
-    for (const Value& run : *vrxhost({"activities", "--history"}).document["history"].asArray())
+    for (const Value& run : *runs.asArray())
         history += run["identifier"].description().substr(20) + " " + run["outcome"].description() + ";";
     EXPECT_THAT(history,
                 testing::MatchesRegex("(boot finished;upgrade|upgrade finished;boot) finished;outreach deferred;"));
