@@ -2,6 +2,7 @@
 
 #include <algorithm>
 
+#include "vrx/codec/property_list.h"
 #include "vrx/coverage/records/warranty.h"
 #include "vrx/devices/devices_manager.h"
 #include "vrx/devices/records/device.h"

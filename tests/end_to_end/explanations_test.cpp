@@ -1,4 +1,5 @@
 // What vrxhost makes of an agent's home: what is scheduled, why a follow-up is where it is, and what is wrong.
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <chrono>
@@ -155,10 +156,12 @@ TEST_F(Explanations, FireWhatTheTargetDateLets) {
     awaitEnd("outreach", "deferred");
     EXPECT_EQ(activity("outreach")["targetDate"], outreach["targetDate"]);
 
+    const Value runs = vrxhost({"activities", "--history"}).document["history"];
     std::string history;
-    for (const Value& run : *vrxhost({"activities", "--history"}).document["history"].asArray())
+    for (const Value& run : *runs.asArray())
         history += run["identifier"].description().substr(20) + " " + run["outcome"].description() + ";";
-    EXPECT_THAT(history, MatchesRegex("(boot finished;upgrade|upgrade finished;boot) finished;outreach deferred;"));
+    EXPECT_THAT(history,
+                testing::MatchesRegex("(boot finished;upgrade|upgrade finished;boot) finished;outreach deferred;"));
 
     ASSERT_EQ(place_.stop(), 0) << place_.agent().errors();
     const Dictionary before = homeContents();
