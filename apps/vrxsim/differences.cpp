@@ -50,7 +50,8 @@ std::span<const NamedDifference> namedDifferences() {
         {dueAtPairing, "a watch whose offer is due when it is paired gets no date: only days ahead count"},
         {pairingCutShort, "the agent was killed before it had looked after a pairing or an unpairing"},
         {unseenRecord, "the server's record has changed, and nobody has asked for it since"},
-        {refreshWaits, "a new record came without a refresh, which waits for the next one"},
+        {refreshWaits,
+         "a new record came outside of the refreshes, and waits for the one that the older record has set"},
         {displayMoved, "the day to show it from moved ahead while it is shown: it stays, and its text stands still"},
         {lastDay, "in an offer's last day its end sets no date where another device's sets one"},
         {noActivation, "a watch without a pairing date sets no date for refreshes"},
@@ -174,6 +175,7 @@ std::string_view Differences::nameOfLack(const Found& found) const {
         case Found::Lack::SignedOut: return signedOut;
         case Found::Lack::OtherLanguage: return languageChange;
         case Found::Lack::Unreadable: return failedRead;
+        case Found::Lack::NotKept: return failedWrite;
         default: return "";
     }
 }
@@ -236,6 +238,9 @@ std::string_view Differences::nameByRefreshes(const std::string& serialNumber, c
     }
     const RefreshView* const plan = rules_.refreshed(serialNumber);
     if (!plan) return "";
+    const Record& record = world_.answer(item.answer).record;
+    if (!plan->found.isRecord()) return nameOfLack(plan->found);
+    if (!record.saysTheSameAs(world_.answer(plan->found.answer).record)) return refreshWaits;
     if (plan->isDisplayAhead) return displayMoved;
     if (plan->daysLeft <= 1) return lastDay;
     return plan->hasNoActivation ? noActivation : "";
@@ -250,8 +255,14 @@ std::string_view Differences::nameOfOldRecord(const std::string& serialNumber, c
     const Record* const record = world_.record(serialNumber);
     const Download* const last = rules_.downloaded(serialNumber);
     if (!record || !last || !record->saysTheSameAs(world_.answer(last->answer).record)) return unseenRecord;
+    return nameOfOldAnswer(serialNumber, item);
+}
+
+// Why an item is filled from another answer than the one that was downloaded last.
+std::string_view Differences::nameOfOldAnswer(const std::string& serialNumber, const ShownItem& item) const {
+    const Download* const last = rules_.downloaded(serialNumber);
     if (rules_.isCacheBehind(serialNumber)) return failedWrite;
-    if (item.answer >= last->answer || last->at < item.filledAt) return "";
+    if (!last || item.answer >= last->answer || last->at < item.filledAt) return "";
     if (item.hasRequestFailed) return refused;
     if (rules_.listingFailedAt() >= last->at) return failedListing;
     return isRefreshPlanned() ? refreshWaits : nameByRefreshes(serialNumber, item);
@@ -263,7 +274,7 @@ std::string_view Differences::nameOfOldText(const std::string& serialNumber, con
     const Answer& answer = world_.answer(item.answer);
     if (answer.language != world_.host.locale.identifier) {
         if (world_.languageChangedAt > item.filledAt) return languageChange;
-        return rules_.isCacheBehind(serialNumber) ? failedWrite : "";
+        return nameOfOldAnswer(serialNumber, item);
     }
     return nameByRefreshes(serialNumber, item);
 }

@@ -73,6 +73,7 @@ private:
     std::string_view nameOfNeedless(const std::string& serialNumber, const ShownItem& item,
                                     platform::Date moment) const;
     std::string_view nameOfOldText(const std::string& serialNumber, const ShownItem& item) const;
+    std::string_view nameOfOldAnswer(const std::string& serialNumber, const ShownItem& item) const;
     std::string_view nameOfOldRecord(const std::string& serialNumber, const ShownItem& item) const;
 
     const World& world_;

@@ -146,11 +146,9 @@ void Rules::hear(const platform::LogEntry& line) {
          [](Rules& rules, const auto&) { rules.outreachEnds(); }},
         {"No devices eligible for followUp posts", [](Rules& rules, const auto&) { rules.outreachEnds(); }},
         {"%s: Re-schedule followUp post for: %@",
-         [](Rules& rules, const auto& arguments) { rules.postIsPlanned(PlannersView::Run::Post, arguments[1].text); }},
+         [](Rules& rules, const auto& arguments) { rules.postIsPlanned(arguments[1].text); }},
         {"Watch paired after phone's refreshActivity has already finished. Schedule followUp post for: %@",
-         [](Rules& rules, const auto& arguments) {
-             rules.postIsPlanned(PlannersView::Run::Pairing, arguments[0].text);
-         }},
+         [](Rules& rules, const auto& arguments) { rules.postIsPlanned(arguments[0].text); }},
         {"Schedule next refresh for %@", [](Rules& rules, const auto&) { rules.refreshIsPlanned(false); }},
         {"%s: Schedule refresh for: %@", [](Rules& rules, const auto&) { rules.refreshIsPlanned(true); }},
         {"No followups present, don't schedule another refresh",
@@ -200,6 +198,7 @@ bool Rules::isDismissalStored(const std::string& serialNumber) const {
 Found Rules::cachedRecord(const std::string& serialNumber) const {
     const std::string hash = platform::sha256Hash(serialNumber);
     const std::optional<std::string> file = cachedFile(serialNumber);
+    if (!file && downloaded(serialNumber)) return {0, Found::Lack::NotKept};
     if (!file || textOr(world_, hash + "_CachedWarrantyVersion") != "2") return {0, Found::Lack::NeverAnswered};
     if (textOr(world_, hash + "_CachedWarrantyLocale") != world_.host.locale.identifier)
         return {0, Found::Lack::OtherLanguage};
@@ -219,7 +218,10 @@ void Rules::cacheIsEmpty() {
     if (asked_.cached.isRecord() && !asked_.mayReadFail)
         disagree("the record of " + asked_.serialNumber + " is cached, and the agent has none");
     const bool isUnreadable = cachedFile(asked_.serialNumber).has_value();
-    asked_.cached = {0, isUnreadable ? Found::Lack::Unreadable : Found::Lack::NeverAnswered};
+    if (isUnreadable)
+        asked_.cached = {0, Found::Lack::Unreadable};
+    else if (asked_.cached.isRecord())
+        asked_.cached = {0, Found::Lack::NeverAnswered};
 }
 
 void Rules::lookupDecided(bool isDownloading) {
@@ -397,21 +399,21 @@ PlannersView Rules::viewOf(const Listed& device, PlannersView::Run run) const {
         view.found.isRecord() ? sentDate(world_.answer(view.found.answer).record.shownFrom) : std::nullopt;
     if (!named) return view;
     const Date due = device.activation ? std::max(*named, *device.activation + outreachDelay()) : *named;
-    const std::optional<Date> next = nextPost(run, WithoutEnd::Counts);
-    const std::optional<Date> otherwise = nextPost(run, WithoutEnd::IsLeftOut);
+    const std::optional<Date> next = nextPost(run == PlannersView::Run::Post, WithoutEnd::Counts);
+    const std::optional<Date> otherwise = nextPost(run == PlannersView::Run::Post, WithoutEnd::IsLeftOut);
     view.isDateTakenAway = otherwise && *otherwise <= due && (!next || *next > due);
     return view;
 }
 
 // The date for which a run plans the next post: the earliest that lies ahead, where a date that is not there counts as
 // now and can take that of another device away.
-std::optional<Date> Rules::nextPost(PlannersView::Run run, WithoutEnd withoutEnd) const {
+std::optional<Date> Rules::nextPost(bool areDueOnesPosted, WithoutEnd withoutEnd) const {
     const Date now = world_.host.clock.now();
     std::optional<Date> next;
     for (const Listed& device : list_) {
         if (device.found.empty() || !device.found.back().isRecord()) continue;
         const Record& record = world_.answer(device.found.back().answer).record;
-        const bool isPostedNow = run == PlannersView::Run::Post && isDue(device, device.found.back(), Duration(0));
+        const bool isPostedNow = areDueOnesPosted && isDue(device, device.found.back(), Duration(0));
         if (!record.isOffered || isPostedNow || isListed(postedKey, device.serialNumber)) continue;
         const std::optional<Date> until = sentDate(record.until);
         if (!until && withoutEnd == WithoutEnd::IsLeftOut) continue;
@@ -427,9 +429,9 @@ std::optional<Date> Rules::nextPost(PlannersView::Run run, WithoutEnd withoutEnd
     return next;
 }
 
-void Rules::postIsPlanned(PlannersView::Run run, const std::string& date) {
+void Rules::postIsPlanned(const std::string& date) {
     const bool isCertain = std::ranges::all_of(list_, [](const Listed& device) { return device.found.size() == 1; });
-    const std::optional<Date> expected = nextPost(run, WithoutEnd::Counts), planned = dateFrom(date);
+    const std::optional<Date> expected = nextPost(false, WithoutEnd::Counts), planned = dateFrom(date);
     const bool isAsExpected = expected && planned && std::abs((*expected - *planned).count()) < roundingOfDates.count();
     if (isCertain && !isAsExpected)
         disagree("the next post is planned for " + date + " instead of " + platform::describe(expected));
@@ -473,16 +475,16 @@ void Rules::outreachEnds() {
 void Rules::refreshIsPlanned(bool isForAll) {
     wereRefreshesEnded_ = false;
     for (const Listed& device : list_) {
-        if (device.found.empty() || causeOfRemoval(device.found.back())) continue;
-        if (!isForAll && !items_.contains(device.serialNumber)) continue;
-        const Record& record = world_.answer(device.found.back().answer).record;
+        if (device.found.empty() || !(isForAll || items_.contains(device.serialNumber))) continue;
+        RefreshView& view = refreshed_[device.serialNumber];
+        view = {.at = world_.elapsed(), .found = device.found.back()};
+        if (causeOfRemoval(view.found)) continue;
+        const Record& record = world_.answer(view.found.answer).record;
         const Date now = world_.host.clock.now();
-        RefreshView view{.at = world_.elapsed()};
         view.daysLeft = (*sentDate(record.until) - now).count() / settingOr(world_, "OneDayInterval", secondsOfDay);
         view.isDisplayAhead = (record.shownFrom && *sentDate(record.shownFrom) > now) ||
                               (device.activation && *device.activation + outreachDelay() > now);
         view.hasNoActivation = !device.activation;
-        refreshed_[device.serialNumber] = view;
     }
 }
 

@@ -20,7 +20,7 @@ namespace vrx::simulation {
 
 // What a lookup replied: an answer of the server by its number, or none and why.
 struct Found {
-    enum class Lack { None, NeverAnswered, Failed, SignedOut, OtherLanguage, Unreadable };
+    enum class Lack { None, NeverAnswered, Failed, SignedOut, OtherLanguage, Unreadable, NotKept };
     int answer = 0;
     Lack lack = Lack::None;
 
@@ -66,6 +66,7 @@ struct Download {
 // A device when the next refresh was planned.
 struct RefreshView {
     double at = 0;
+    Found found{};
     double daysLeft = 0;
     bool isDisplayAhead = false;
     bool hasNoActivation = false;
@@ -177,8 +178,8 @@ private:
     bool isDue(const Listed& device, const Found& found, platform::Duration tolerance) const;
     bool isListed(const std::string& key, const std::string& serialNumber) const;
     enum class WithoutEnd : bool { Counts, IsLeftOut };
-    std::optional<platform::Date> nextPost(PlannersView::Run run, WithoutEnd withoutEnd) const;
-    void postIsPlanned(PlannersView::Run run, const std::string& date);
+    std::optional<platform::Date> nextPost(bool areDueOnesPosted, WithoutEnd withoutEnd) const;
+    void postIsPlanned(const std::string& date);
     void noteSupport();
     bool wasUnsupported() const;
     PlannersView viewOf(const Listed& device, PlannersView::Run run) const;
