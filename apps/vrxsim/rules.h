@@ -137,8 +137,8 @@ private:
         bool isMust = false;
     };
     struct Work {
-        std::set<std::string> mustClear{}, mayClear{};  // identifiers
-        std::vector<Posting> posts{};
+        std::set<std::string> mustClear, mayClear;  // identifiers
+        std::vector<Posting> posts;
     };
 
     template <class T>

@@ -85,8 +85,8 @@ TEST_F(StoredActivities, KeepTheLastRunsOfEach) {
     for (int run = 0; run < 60; ++run) {
         schedule("often", 0);
         subject.pass(1s);
-        completions.back()(run % 2 == 0 ? Finished : BackgroundActivityResult::Deferred);
-        subject.pass(1s);
+        completions.back()(run % 2 == 0 ? Finished : Deferred);
+        subject.pass(0s);
     }
     const std::vector<ActivityRun> history = listActivities(tool)->history;
     ASSERT_EQ(history.size(), 51u);
