@@ -1,5 +1,6 @@
 // The input is an answer's headers, a line each. Whatever they are, the cache stays within its bounds, keeps nothing
 // that no-store forbids, and asks about what it keeps by headers that can be sent.
+#include <algorithm>
 #include <cmath>
 
 #include "require.h"

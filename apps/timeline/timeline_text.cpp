@@ -1,5 +1,6 @@
 #include "timeline/timeline_text.h"
 
+#include <algorithm>
 #include <cmath>
 
 #include "common/command_line.h"
