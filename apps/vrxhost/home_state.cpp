@@ -15,12 +15,13 @@ platform::Result<HomeState> readHomeState(AgentView& view) {
     const platform::MaybeError error = view.readAtOnce([&](host::Connection& connection) {
         host::ActivityRegistry registry(connection);
         state.settings = host::storedSettings(connection);
-        state.items = host::pendingFollowUps(connection, followUpClientIdentifier());
+        state.items = host::FollowUpControllers::pending(connection, followUpClientIdentifier());
         state.activities = {registry.scheduled(), registry.runs(), registry.history()};
         state.language = view.language(host::storedFact(connection, host::stored_facts::language));
         state.agentVersion = host::storedFact(connection, host::stored_facts::agentVersion);
         state.boot = host::storedFact(connection, host::stored_facts::boot);
-        for (const std::string_view name : host::owedNotifications(connection, view.profile(), state.language))
+        for (const std::string_view name :
+             host::owedNotifications(connection, host::pairedWatches(view.profile()), state.language))
             state.owedNotifications.emplace_back(name);
         state.now = host::presentMoment();
     });

@@ -21,9 +21,14 @@ struct LogLines {
         bytes.clear();
         ends.clear();
     }
+    // What is left of a line for whose rest there was no memory is dropped.
+    void dropUnfinished() { bytes.resize(isEmpty() ? 0 : ends.back()); }
+    // The bytes first: without memory for an end, its line is one that was not finished.
     void append(const LogLines& lines) {
-        for (const std::size_t end : lines.ends) ends.push_back(bytes.size() + end);
+        dropUnfinished();
+        const std::size_t before = bytes.size();
         bytes += lines.bytes;
+        for (const std::size_t end : lines.ends) ends.push_back(before + end);
     }
 };
 

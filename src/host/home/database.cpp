@@ -388,14 +388,14 @@ MaybeError Database::open() {
     return error;
 }
 
-std::shared_ptr<Database::Opening> Database::opening(MaybeError& error) {
+std::shared_ptr<Database::Opening> Database::opening(MaybeError& error, Look look) {
     const auto lock = LockWait::take(mutex_);
     if (!lock) {
         error = busy();
         return nullptr;
     }
     if (opening_) {
-        if (!RequestScope::isFirstLook(this)) return opening_;
+        if (!RequestScope::isFirstLook(this) && look == Look::OnceARequest) return opening_;
         const auto present = FileIdentity::of(path_);
         if (!present || *present == opening_->file) return opening_;
     }
@@ -545,7 +545,7 @@ MaybeError Database::write(const std::function<void(Connection&)>& body) {
     const auto lock = LockWait::take(writing_);
     if (!lock) return busy();
     MaybeError error;
-    std::shared_ptr<Opening> current = opening(error);
+    std::shared_ptr<Opening> current = opening(error, Look::Anew);
     if (current && !current->writer)
         error = Error{platform::error_domain::database, SQLITE_READONLY, path_ + ": is only looked at"};
     return error ? error : transaction(*current->writer, current, "BEGIN IMMEDIATE", body);

@@ -140,7 +140,9 @@ private:
     struct Opening;
 
     Database(std::string path, Schema schema, std::chrono::milliseconds busyLimit, bool isReadOnly);
-    std::shared_ptr<Opening> opening(platform::MaybeError& error);
+    // Whether another file has taken the path is looked at once a request; before each write, which must not be lost.
+    enum class Look : bool { OnceARequest, Anew };
+    std::shared_ptr<Opening> opening(platform::MaybeError& error, Look look = Look::OnceARequest);
     std::shared_ptr<Opening> openChecked();
     std::shared_ptr<Opening> openOnce() const;
     std::shared_ptr<Opening> openReadOnly() const;

@@ -111,6 +111,10 @@ const FollowUpControllers::Listing& FollowUpControllers::listing(Connection& con
                                                                  const std::string& client) {
     if (stamp != copies_.stamp) copies_ = {stamp, {}};
     if (auto copy = copies_.listings.find(client); copy != copies_.listings.end()) return copy->second;
+    return copies_.listings.emplace(client, listed(connection, client)).first->second;
+}
+
+FollowUpControllers::Listing FollowUpControllers::listed(Connection& connection, const std::string& client) {
     Listing listing;
     Statement& rows = connection.statement(selectAll).bind(0, client);
     while (rows.step()) {
@@ -119,7 +123,11 @@ const FollowUpControllers::Listing& FollowUpControllers::listing(Connection& con
         else
             listing.isWhole = false;
     }
-    return copies_.listings.emplace(client, std::move(listing)).first->second;
+    return listing;
+}
+
+std::vector<FollowUpItem> FollowUpControllers::pending(Connection& connection, const std::string& client) {
+    return listed(connection, client).items;
 }
 
 // Whether the item is pending with the same content. Without a current listing it reads one row: in a series of posts
@@ -133,14 +141,6 @@ bool FollowUpControllers::isPending(Connection& connection, const Database::Stam
     }
     Statement& row = connection.statement(selectOne).bind(0, client).bind(1, item.uniqueIdentifier);
     return row.step() && storedItem(row) == item;
-}
-
-std::vector<FollowUpItem> pendingFollowUps(Connection& connection, const std::string& client) {
-    std::vector<FollowUpItem> items;
-    Statement& rows = connection.statement(selectAll).bind(0, client);
-    while (rows.step())
-        if (std::optional<FollowUpItem> item = storedItem(rows)) items.push_back(*std::move(item));
-    return items;
 }
 
 }  // namespace vrx::host

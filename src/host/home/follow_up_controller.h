@@ -22,6 +22,9 @@ public:
     std::unique_ptr<platform::FollowUpController> makeController(std::string clientIdentifier) override;
     std::string settingsAppBundleIdentifier() const override;
 
+    // What is pending for a client. Within a transaction.
+    static std::vector<platform::FollowUpItem> pending(Connection& connection, const std::string& client);
+
 private:
     class Controller;
 
@@ -42,14 +45,12 @@ private:
 
     // Within Database::peek.
     const Listing& listing(Connection& connection, const Database::Stamp& stamp, const std::string& client);
+    static Listing listed(Connection& connection, const std::string& client);
     bool isPending(Connection& connection, const Database::Stamp& stamp, const std::string& client,
                    const platform::FollowUpItem& item) const;
 
     Database& database_;
     Copies copies_;  // used within Database::peek only, so by one thread at a time
 };
-
-// What is pending for a client. Within a transaction.
-std::vector<platform::FollowUpItem> pendingFollowUps(Connection& connection, const std::string& client);
 
 }  // namespace vrx::host

@@ -134,6 +134,7 @@ void SystemLog::write(const LogEntry& entry) {
     LogLines own;
     LogLines* const gathered = RequestScope::linesFor(writer_);
     LogLines& lines = gathered ? *gathered : own;
+    lines.dropUnfinished();
     (isJournal_ ? isError ? appendFields : appendStreamLine : appendFileLine)(lines.bytes, entry);
     lines.ends.push_back(lines.bytes.size());
     if (!gathered)

@@ -18,19 +18,6 @@ namespace {
 constexpr platform::Duration retryAfterFailure{60.0};
 constexpr platform::Duration retryAfterBusy{1.0};  // another process is writing
 
-// A line for each paired watch, told apart by its serial number, else by its names. A watch that is paired anew counts
-// as another. Only hashes of serial numbers are stored.
-std::set<std::string> pairedWatches(const DeviceProfile& profile) {
-    std::set<std::string> lines;
-    for (const PairedWatch& watch : profile.watches()) {
-        if (!watch.isActive()) continue;
-        const std::string name = watch.name.value_or("") + "\n" + watch.localizedModelName.value_or("");
-        const double paired = watch.pairedDate ? platform::epochSeconds(*watch.pairedDate) : 0;
-        lines.insert(platform::sha256Hash(watch.serialNumber.value_or(name) + "\n" + std::to_string(paired)));
-    }
-    return lines;
-}
-
 std::set<std::string> linesOf(std::string_view text) {
     std::set<std::string> lines;
     for (std::size_t end; (end = text.find('\n')) != text.npos; text.remove_prefix(end + 1))
@@ -50,9 +37,19 @@ bool includes(const std::set<std::string>& all, const std::set<std::string>& som
 
 }  // namespace
 
-std::vector<std::string_view> owedNotifications(Connection& connection, const DeviceProfile& profile,
+std::set<std::string> pairedWatches(const DeviceProfile& profile) {
+    std::set<std::string> lines;
+    for (const PairedWatch& watch : profile.watches()) {
+        if (!watch.isActive()) continue;
+        const std::string name = watch.name.value_or("") + "\n" + watch.localizedModelName.value_or("");
+        const double paired = watch.pairedDate ? platform::epochSeconds(*watch.pairedDate) : 0;
+        lines.insert(platform::sha256Hash(watch.serialNumber.value_or(name) + "\n" + std::to_string(paired)));
+    }
+    return lines;
+}
+
+std::vector<std::string_view> owedNotifications(Connection& connection, const std::set<std::string>& watches,
                                                 const std::string& language) {
-    const std::set<std::string> watches = pairedWatches(profile);
     const std::optional<std::string> lastLanguage = storedFact(connection, stored_facts::language);
     const std::optional<std::string> lastWatches = storedFact(connection, stored_facts::pairedWatches);
     std::vector<std::string_view> owed;
@@ -87,15 +84,16 @@ void ProfileNotifier::compare() {
     const std::string machine = profile_.machine().identifier();
     const std::shared_ptr<const ToldFacts> told = profile_.told();
     const std::string language = profile_.preferredLocaleIdentifier();
+    const std::set<std::string> watches = pairedWatches(profile_);  // what is told is what is noted as told
     std::vector<std::string_view> raised;
     const MaybeError error = database_.write([&](Connection& connection) {
-        raised = owedNotifications(connection, profile_, language);
+        raised = owedNotifications(connection, watches, language);
         if (*told != keptFacts(connection, machine)) keepFacts(connection, machine, *told);
         const bool isFirst =
             !storedFact(connection, stored_facts::language) || !storedFact(connection, stored_facts::pairedWatches);
         if (!isFirst && raised.empty()) return;
         setStoredFact(connection, stored_facts::language, language);
-        setStoredFact(connection, stored_facts::pairedWatches, textOf(pairedWatches(profile_)));
+        setStoredFact(connection, stored_facts::pairedWatches, textOf(watches));
     });
     if (error && error->code == SQLITE_BUSY && watch_) return watch_->callIn(retryAfterBusy);
     if (error) {

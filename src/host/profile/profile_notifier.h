@@ -7,6 +7,7 @@
 #include <functional>
 #include <memory>
 #include <optional>
+#include <set>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -43,9 +44,13 @@ private:
     std::optional<platform::Duration> heldUntil_;  // on the boot clock
 };
 
-// The notifications that are raised when an agent with the profile, in that language, starts next. Within a
+// A line for each paired watch, told apart by its serial number, else by its names. A watch that is paired anew counts
+// as another. Only hashes of serial numbers are stored.
+std::set<std::string> pairedWatches(const DeviceProfile& profile);
+
+// The notifications that are raised when an agent with those watches, in that language, starts next. Within a
 // transaction.
-std::vector<std::string_view> owedNotifications(Connection& connection, const DeviceProfile& profile,
+std::vector<std::string_view> owedNotifications(Connection& connection, const std::set<std::string>& watches,
                                                 const std::string& language);
 
 }  // namespace vrx::host

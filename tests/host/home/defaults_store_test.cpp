@@ -191,6 +191,12 @@ TEST_F(DefaultsStoreTest, OpensAReplacedFileAgainAndKeepsItsOwnLogOutOfIt) {
     EXPECT_EQ(store.get("whose"), Value());
     store.set("whose", "again");
     EXPECT_EQ(store.get("whose"), Value("again"));
+    // A request looks once, and yet writes to no file that is gone.
+    const RequestScope request;
+    EXPECT_EQ(store.get("whose"), Value("again"));
+    std::filesystem::remove(path());
+    store.set("whose", "request");
+    EXPECT_EQ(Opened(path()).store.get("whose"), Value("request"));
 }
 
 TEST_F(DefaultsStoreTest, TakesNoFailedLookForAReplacedFile) {
