@@ -11,7 +11,6 @@
 #include <utility>
 
 #include "vrx/codec/codec.h"
-#include "vrx/codec/property_list.h"
 #include "vrx/coverage/warranty_downloader.h"
 #include "vrx/host/account/account_session.h"
 #include "vrx/host/account/account_store.h"
@@ -250,7 +249,7 @@ private:
     host::MainLoop loop_;
     host::ProcessLifecycle lifecycle_{loop_};
     host::Queues queues_{loop_};
-    host::Files files_{home_.path(), codec::parsePropertyList};
+    host::Files files_{home_.path()};
     host::UuidSource uuids_;
     SettingsInMemory settings_;
     host::DeviceProfile profile_;

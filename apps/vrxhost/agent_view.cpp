@@ -2,7 +2,6 @@
 
 #include <utility>
 
-#include "vrx/codec/property_list.h"
 #include "vrx/host/home/stored_facts.h"
 #include "vrx/service/register_defaults.h"
 #include "vrxhost/home.h"
@@ -71,7 +70,7 @@ AgentView::AgentView(const std::string& home, const std::optional<std::string>& 
       facilities_{.systemLog = &errors_},
       platform_(facilities_),
       current_(platform_),
-      files_(home, codec::parsePropertyList),
+      files_(home),
       database_(host::Database::readOnly(Home::databasePath(home))),
       stored_(database_),
       defaults_(stored_),

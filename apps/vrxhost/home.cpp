@@ -6,7 +6,6 @@
 #include <cstring>
 #include <sstream>
 
-#include "vrx/codec/property_list.h"
 #include "vrx/host/home/stored_facts.h"
 #include "vrx/service/register_defaults.h"
 #include "vrxhost/running_agent.h"
@@ -16,7 +15,7 @@ namespace vrx::apps {
 Home::Home(const std::string& path, Access access, std::vector<std::string> usualProfile)
     : path_(path),
       usualProfile_(std::move(usualProfile)),
-      files_(path, codec::parsePropertyList),
+      files_(path),
       database_(access == Access::ReadOnly ? host::Database::readOnly(databasePath(path))
                                            : host::Database(databasePath(path))) {
     judgeAsAgentAt(path);

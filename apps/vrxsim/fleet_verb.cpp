@@ -9,10 +9,10 @@
 #include <cstdio>
 #include <fstream>
 #include <memory>
-#include <thread>
 
 #include "vrxsim/fleet.h"
 #include "vrxsim/picture.h"
+#include "vrxsim/worker.h"
 
 namespace vrx::apps {
 
@@ -34,7 +34,7 @@ struct FleetOptions {
     std::string begins = "image";
     std::uint64_t devices = 100'000;
     std::uint64_t mostLives = 20'000;
-    int jobs = static_cast<int>(std::max(1u, std::thread::hardware_concurrency()));
+    int jobs = simulation::usualJobs();
     std::string csvFile, svgFile;
 
     // Each life stands for the same whole number of devices.

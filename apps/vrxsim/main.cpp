@@ -10,7 +10,6 @@
 #include <iterator>
 #include <map>
 #include <memory>
-#include <thread>
 #include <tuple>
 
 #include "common/command_line.h"
@@ -20,6 +19,7 @@
 #include "vrxsim/fleet_verb.h"
 #include "vrxsim/generator.h"
 #include "vrxsim/shrinker.h"
+#include "vrxsim/worker.h"
 
 namespace vrx::apps {
 
@@ -38,7 +38,7 @@ struct Options {
     std::string seeds;
     double seconds = 0;
     std::int64_t mostDays = 4000;
-    int jobs = static_cast<int>(std::max(1u, std::thread::hardware_concurrency()));
+    int jobs = simulation::usualJobs();
     std::string level = "rough";
     std::string defect;
     std::string file;

@@ -10,6 +10,7 @@
 #include <cstdio>
 #include <cstring>
 #include <system_error>
+#include <thread>
 
 namespace vrx::simulation {
 
@@ -29,6 +30,10 @@ constexpr unsigned mostSeconds = 300;  // from one line to the next, however slo
 }
 
 }  // namespace
+
+int usualJobs() {
+    return static_cast<int>(std::max(1u, std::thread::hardware_concurrency()));
+}
 
 Worker::Worker(const std::function<void(const Write&)>& body) {
     std::array<int, 2> ends;

@@ -11,6 +11,9 @@
 
 namespace vrx::simulation {
 
+// As many workers side by side as there are processors.
+int usualJobs();
+
 class Worker {
 public:
     // The body writes lines, which hold no line break, until it returns. It is ended when none comes for too long.

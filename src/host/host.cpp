@@ -5,7 +5,6 @@
 
 #include <filesystem>
 
-#include "vrx/codec/property_list.h"
 #include "vrx/host/base/trust.h"
 #include "vrx/host/bus/hardware_serial.h"
 #include "vrx/host/home/kept_facts.h"
@@ -26,7 +25,7 @@ Host::Host(const HostLocations& locations, platform::Level lowestLevel, const Ho
       platform_(facilities_),
       current_(platform_),
       queues_(mainLoop_),
-      files_(home_, codec::parsePropertyList),
+      files_(home_),
       database_(home_ + "/host.db"),
       defaults_(database_),
       followUps_(database_),

@@ -9,7 +9,6 @@
 #include <optional>
 
 #include "host/support.h"
-#include "vrx/codec/property_list.h"
 #include "vrx/host/base/files.h"
 #include "vrx/host/home/defaults_store.h"
 #include "vrx/host/home/follow_up_controller.h"
@@ -64,7 +63,7 @@ private:
     std::optional<host::Database> database_{folder / "host.db"};
     std::optional<host::DefaultsStore> defaults_{*database_};
     std::optional<host::FollowUpControllers> followUps_{*database_};
-    host::Files files_{folder.path(), codec::parsePropertyList};
+    host::Files files_{folder.path()};
     host::MainLoop loop_;
     host::Queues queues_{loop_, 2};
 };

@@ -6,7 +6,6 @@
 
 #include "host/activities/real_activities.h"
 #include "host/support.h"
-#include "vrx/codec/property_list.h"
 #include "vrx/coverage/records/warranty.h"
 #include "vrx/host/base/files.h"
 #include "vrx/host/home/defaults_store.h"
@@ -35,8 +34,7 @@ std::string key(int number) {
 using Firings = std::map<std::string, int>;
 
 struct Agent {
-    Agent(const std::string& home, Firings& firings)
-        : firings(firings), process(home + "/host.db"), files(home, codec::parsePropertyList) {
+    Agent(const std::string& home, Firings& firings) : firings(firings), process(home + "/host.db"), files(home) {
         process.activities().setHandlerFactory([this](const std::string& name) { return handler(name); });
     }
 

@@ -9,6 +9,8 @@
 #include <cstdio>
 #include <cstring>
 
+#include "vrx/codec/property_list.h"
+
 namespace vrx::host {
 
 using platform::Data;
@@ -165,7 +167,7 @@ Result<Value> KeptDocuments::read(const std::string& path) {
     }
     const Result<FileContent> content = readFile(path);
     if (!content) return content.error();
-    Result<Value> root = parse_(content->bytes);
+    Result<Value> root = codec::parsePropertyList(content->bytes);
     if (!root || !isKept) return root;
     const std::lock_guard lock(mutex_);
     std::erase_if(documents_, [&](const Document& document) { return document.path == path; });

@@ -48,12 +48,9 @@ constexpr bool isShortage(int number) {
     return number == EMFILE || number == ENFILE || number == ENOMEM || number == ENOBUFS;
 }
 
-// What was decoded of small files, the last few, while they are unchanged. Any thread may ask.
+// What was decoded of small property lists, the last few, while they are unchanged. Any thread may ask.
 class KeptDocuments {
 public:
-    using Parse = platform::Result<platform::Value> (*)(const platform::Data& document);
-    explicit KeptDocuments(Parse parse) : parse_(parse) {}
-
     platform::Result<platform::Value> read(const std::string& path);
 
 private:
@@ -62,16 +59,13 @@ private:
         FileStamp stamp;
         platform::Value root;
     };
-    const Parse parse_;
     std::mutex mutex_;
-    std::deque<Document> documents_;  // the one read last at the end
+    std::deque<Document> documents_;  // the one decoded last at the end
 };
 
 class Files final : public platform::Files {
 public:
-    // With a parser of property lists, which are handed in because they are read above this room.
-    Files(std::string homeDirectory, KeptDocuments::Parse parsePropertyList)
-        : homeDirectory_(std::move(homeDirectory)), documents_(parsePropertyList) {}
+    explicit Files(std::string homeDirectory) : homeDirectory_(std::move(homeDirectory)) {}
 
     std::string homeDirectory() const override { return homeDirectory_; }
     platform::Result<platform::Data> read(const std::string& path) const override;
