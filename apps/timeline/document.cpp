@@ -3,7 +3,6 @@
 namespace vrx::timeline {
 
 using platform::Array;
-using platform::Date;
 using platform::Dictionary;
 using platform::Value;
 
