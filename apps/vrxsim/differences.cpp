@@ -22,9 +22,11 @@ constexpr std::string_view firstDays = "first-days", beforeOutreach = "before-ou
                            olderLayout = "older-layout", wrongClock = "wrong-clock", failedWrite = "failed-write",
                            strangeAnswer = "strange-answer", refused = "refused", dismissalLost = "dismissal-lost",
                            failedRead = "failed-read", pairingCutShort = "pairing-cut-short",
-                           failedListing = "failed-listing", noActivation = "no-activation", clockSet = "clock-set";
+                           failedListing = "failed-listing", noActivation = "no-activation", clockSet = "clock-set",
+                           planCutShort = "plan-cut-short";
 
 constexpr Duration clockTolerance{60};
+constexpr std::string_view post = ".vrxagent.followuppost", refresh = ".vrxagent.followuprefresh";
 
 }  // namespace
 
@@ -62,6 +64,7 @@ std::span<const NamedDifference> namedDifferences() {
         {dismissalLost,
          "a dismissal was not stored, because the service or the settings failed or the agent was killed"},
         {wrongClock, "the clock was wrong when the activation was stored, or is now"},
+        {planCutShort, "the agent was killed before it had planned the next post or refresh"},
         {clockSet, "the clock was set after the run was planned, which waits as long as before"},
     };
     return all;
@@ -205,6 +208,7 @@ std::string_view Differences::nameByPlan(const PlannersView& plan, const Record&
     if (plan.isExcluded) return carrierAtOutreach;
     if (plan.wasRefused) return refused;
     if (world_.clockSetAt > plan.at) return clockSet;
+    if (rules_.wasPostPlanCutShort() && !isPlanned(post)) return planCutShort;
     if (plan.run == PlannersView::Run::Outreach) return "";
     if (!record.shownFrom) return daysBeforeEnd;
     if (plan.isDateTakenAway) return noEnd;
@@ -216,13 +220,16 @@ std::string_view Differences::nameOfNeedless(const std::string& serialNumber, co
     const Record* const record = world_.record(serialNumber);
     if (dismissed_.contains(serialNumber)) return rules_.isDismissalStored(serialNumber) ? "" : dismissalLost;
     if (item.hasRequestFailed) return refused;
-    if (serialNumber != phone && !world_.isPaired(serialNumber))
-        return rules_.wasPairingCutShort(world_.unpairedAt.at(serialNumber)) ? pairingCutShort : "";
+    if (serialNumber != phone && !world_.isPaired(serialNumber)) {
+        const double unpairedAt = world_.unpairedAt.at(serialNumber);
+        if (rules_.listingFailedAt() >= unpairedAt) return failedListing;
+        return rules_.wasPairingCutShort(unpairedAt) ? pairingCutShort : "";
+    }
     if (serialNumber != phone && !world_.areWatchesSupported()) return watchesOff;
     if (!record || !record->saysTheSameAs(world_.answer(item.answer).record))
         return nameOfOldRecord(serialNumber, item);
     if (world_.hasCarrier(record->excludedCarrier)) return carrierAtOutreach;
-    if (item.isFromOlderLayout && !isRefreshPlanned()) return olderLayout;
+    if (item.isFromOlderLayout && !isPlanned(refresh)) return olderLayout;
     if (offeredFrom(*record) > moment) return displayMoved;
     return nameByRefreshes(serialNumber, item);
 }
@@ -232,12 +239,15 @@ std::string_view Differences::nameByRefreshes(const std::string& serialNumber, c
     if (item.hasRequestFailed) return refused;
     if (rules_.listingFailedAt() >= item.filledAt) return failedListing;
     if (world_.clockSetAt > item.filledAt) return clockSet;
-    if (!isRefreshPlanned()) {
-        if (rules_.wereRefreshesEndedByListing()) return failedListing;
+    if (!isPlanned(refresh)) {
+        if (rules_.endOfRefreshes() == Rules::EndOfRefreshes::FailedListing) return failedListing;
+        if (rules_.endOfRefreshes() == Rules::EndOfRefreshes::RefusedClear) return refused;
+        if (item.isRunCutShort || rules_.wasRefreshPlanCutShort()) return planCutShort;
         return item.isFromOlderLayout ? olderLayout : "";
     }
     const RefreshView* const plan = rules_.refreshed(serialNumber);
     if (!plan) return "";
+    if (world_.clockSetAt > plan->at) return clockSet;
     const Record& record = world_.answer(item.answer).record;
     if (!plan->found.isRecord()) return nameOfLack(plan->found);
     if (!record.saysTheSameAs(world_.answer(plan->found.answer).record)) return refreshWaits;
@@ -246,8 +256,8 @@ std::string_view Differences::nameByRefreshes(const std::string& serialNumber, c
     return plan->hasNoActivation ? noActivation : "";
 }
 
-bool Differences::isRefreshPlanned() const {
-    return world_.host.activities.timeLeft(platform::vendorIdentifier(".vrxagent.followuprefresh")).has_value();
+bool Differences::isPlanned(std::string_view activity) const {
+    return world_.host.activities.timeLeft(platform::vendorIdentifier(activity)).has_value();
 }
 
 // Why an item is still filled from a record that is not the present one.
@@ -265,7 +275,7 @@ std::string_view Differences::nameOfOldAnswer(const std::string& serialNumber, c
     if (!last || item.answer >= last->answer || last->at < item.filledAt) return "";
     if (item.hasRequestFailed) return refused;
     if (rules_.listingFailedAt() >= last->at) return failedListing;
-    return isRefreshPlanned() ? refreshWaits : nameByRefreshes(serialNumber, item);
+    return isPlanned(refresh) ? refreshWaits : nameByRefreshes(serialNumber, item);
 }
 
 std::string_view Differences::nameOfOldText(const std::string& serialNumber, const ShownItem& item) const {

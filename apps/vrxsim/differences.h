@@ -63,7 +63,7 @@ private:
 
     std::optional<Way> wayOf(const std::string& serialNumber, platform::Date moment) const;
     void judge(const std::string& serialNumber, platform::Date moment, double now);
-    bool isRefreshPlanned() const;
+    bool isPlanned(std::string_view activity) const;
     std::string_view nameByRefreshes(const std::string& serialNumber, const ShownItem& item) const;
     std::string_view nameOf(const std::string& serialNumber, Way way, platform::Date moment) const;
     std::string_view nameOfMissed(const std::string& serialNumber, platform::Date moment) const;

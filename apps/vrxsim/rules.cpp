@@ -79,7 +79,14 @@ void Rules::turnOff() {
 }
 
 void Rules::processEnds() {
-    if (world_.host.process.isRunning()) processEndedAt_ = world_.elapsed();
+    constexpr double longestStep = 60;
+    if (world_.host.process.isRunning()) {
+        processEndedAt_ = world_.elapsed();
+        for (Plan* plan : {&postPlan_, &refreshPlan_})
+            if (processEndedAt_ - plan->at < longestStep) plan->isCutShort = true;
+        for (auto& [serialNumber, item] : items_)
+            if (processEndedAt_ - item.filledAt < longestStep) item.isRunCutShort = true;
+    }
     forgetWork();
 }
 
@@ -334,6 +341,7 @@ std::optional<Removal::Cause> Rules::causeOfRemoval(const Found& found) const {
 
 void Rules::refreshBegins(bool isWhole, bool isListed) {
     wasListingRefused_ = !isListed;
+    wasClearRefused_ = false;
     if (!isListed) listingFailedAt_ = world_.elapsed();
     static const std::map<std::string, ShownItem> none;
     const std::map<std::string, ShownItem>& pending = isListed ? items_ : none;
@@ -430,6 +438,7 @@ std::optional<Date> Rules::nextPost(bool areDueOnesPosted, WithoutEnd withoutEnd
 }
 
 void Rules::postIsPlanned(const std::string& date) {
+    postPlan_ = {world_.elapsed()};
     const bool isCertain = std::ranges::all_of(list_, [](const Listed& device) { return device.found.size() == 1; });
     const std::optional<Date> expected = nextPost(false, WithoutEnd::Counts), planned = dateFrom(date);
     const bool isAsExpected = expected && planned && std::abs((*expected - *planned).count()) < roundingOfDates.count();
@@ -455,6 +464,7 @@ void Rules::postBegins() {
 void Rules::pairingPlans() {
     finishWork();
     lastPairingPlansAt_ = world_.elapsed();
+    postPlan_ = {world_.elapsed()};
     for (const Listed& device : list_) planned_[device.serialNumber] = viewOf(device, PlannersView::Run::Pairing);
 }
 
@@ -469,11 +479,13 @@ void Rules::outreachLooks(const std::string& serialNumber, bool isDownloaded) {
 void Rules::outreachEnds() {
     for (std::size_t i = 0; i < outreach_.size(); ++i) planned_[outreachDevices_[i]] = outreach_[i];
     lastOutreachAt_ = world_.elapsed();
+    postPlan_ = {world_.elapsed()};
     noteLeftOut(outreachDevices_);
 }
 
 void Rules::refreshIsPlanned(bool isForAll) {
-    wereRefreshesEnded_ = false;
+    endOfRefreshes_ = EndOfRefreshes::None;
+    refreshPlan_ = {world_.elapsed()};
     for (const Listed& device : list_) {
         if (device.found.empty() || !(isForAll || items_.contains(device.serialNumber))) continue;
         RefreshView& view = refreshed_[device.serialNumber];
@@ -486,6 +498,11 @@ void Rules::refreshIsPlanned(bool isForAll) {
                               (device.activation && *device.activation + outreachDelay() > now);
         view.hasNoActivation = !device.activation;
     }
+}
+
+void Rules::refreshesEnd() {
+    using enum EndOfRefreshes;
+    endOfRefreshes_ = wasListingRefused_ ? FailedListing : wasClearRefused_ ? RefusedClear : None;
 }
 
 // Items.
@@ -563,6 +580,7 @@ void Rules::cleared(const std::vector<std::string>& identifiers, bool isDone) {
         std::ranges::includes(all, work_->mustClear)) {
         work_->mayClear.clear();
         work_->mustClear.clear();
+        wasClearRefused_ = !isDone;
         for (const auto& [serialNumber, removal] : std::exchange(toRemove_, {})) {
             const auto shown = items_.find(serialNumber);
             if (shown == items_.end() || !all.contains(identifierOf(serialNumber))) continue;

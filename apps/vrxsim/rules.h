@@ -34,6 +34,7 @@ struct ShownItem {
     std::string title{}, footer{};
     bool isFromOlderLayout = false;  // it was migrated
     bool hasRequestFailed = false;   // the service refused the last update or clear
+    bool isRunCutShort = false;      // the process ended right after it was filled
 };
 
 struct Removal {
@@ -106,9 +107,14 @@ public:
     // Whether the process ended before it had looked after a pairing or unpairing at that second of its life. Of what
     // was paired at the beginning no process is told.
     bool wasPairingCutShort(double at) const { return at > 0 && lastPairingPlansAt_ < at && processEndedAt_ >= at; }
+    // Whether the process ended right after it had turned to the next post, or refresh, which can lose it.
+    bool wasPostPlanCutShort() const { return postPlan_.isCutShort; }
+    bool wasRefreshPlanCutShort() const { return refreshPlan_.isCutShort; }
     double listingFailedAt() const { return listingFailedAt_; }  // of a refresh; below 0: never
-    // Whether no refresh is planned any more because a listing failed, so that nothing seemed to be shown.
-    bool wereRefreshesEndedByListing() const { return wereRefreshesEnded_; }
+    // Why no refresh is planned any more although an item is left: none was seen, for a listing failed, or it was to be
+    // cleared, which was refused.
+    enum class EndOfRefreshes { None, FailedListing, RefusedClear };
+    EndOfRefreshes endOfRefreshes() const { return endOfRefreshes_; }
     platform::Duration outreachDelay() const;
     std::optional<platform::Date> activation(const std::string& serialNumber) const;
 
@@ -149,6 +155,11 @@ private:
 
     void hear(const platform::LogEntry& line);
     void hear(const sim::FollowUpControllers::Answered& answered);
+    struct Plan {
+        double at = -secondsOfDay;
+        bool isCutShort = false;
+    };
+
     void forgetWork();
     void disagree(const std::string& text);
 
@@ -169,7 +180,7 @@ private:
     Found cachedRecord(const std::string& serialNumber) const;
     Found failedLook(const Lookup& lookup) const;
     void refreshBegins(bool isWhole, bool isListed);
-    void refreshesEnd() { wereRefreshesEnded_ = wasListingRefused_; }
+    void refreshesEnd();
     void finishWork();
     void posted(const platform::FollowUpItem& item, bool isDone);
     void cleared(const std::vector<std::string>& identifiers, bool isDone);
@@ -203,6 +214,7 @@ private:
     std::vector<PlannersView> outreach_;     // the run under way, with the devices in
     std::vector<std::string> outreachDevices_;
     double lastOutreachAt_ = -1, lastPairingPlansAt_ = -1, processEndedAt_ = -1, listingFailedAt_ = -1;
+    Plan postPlan_, refreshPlan_;
     double unsupportedAt_ = -1;  // when watches were last left out for the flag or the server's version
 
     Lookup asked_;
@@ -214,7 +226,8 @@ private:
     };
     std::map<std::string, Downloads> downloading_;
     int downloadingCount_ = 0;
-    bool wasListingRefused_ = false, wereRefreshesEnded_ = false;
+    bool wasListingRefused_ = false, wasClearRefused_ = false;  // of the last refresh
+    EndOfRefreshes endOfRefreshes_ = EndOfRefreshes::None;
     double lastLookupAt_ = 0;
     std::map<std::string, std::vector<Found>> found_;  // since nothing was under way
     std::vector<Found> lastFound_;

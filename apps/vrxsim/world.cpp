@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <charconv>
+#include <utility>
 
 #include "vrx/platform/vendor.h"
 
@@ -110,8 +111,7 @@ bool World::changeDevice(const Event& event) {
     } else if (verb == "unpair") {
         unpair(words[0]);
     } else if (verb == "language") {
-        host.locale.identifier = words[0];
-        languageChangedAt = elapsed();
+        if (words[0] != std::exchange(host.locale.identifier, words[0])) languageChangedAt = elapsed();
         host.tellChanges();
     } else if (verb == "zone") {
         host.clock.setTimeZoneOffset(std::chrono::seconds(whole(numberFrom(words[0]))));
