@@ -39,12 +39,14 @@ DifferentSeconds differencesFrom(const std::string& text) {
     return differences;
 }
 
-// A play as a line: trace, days, differences, and what was broken, each after a tab.
+// A play as a line: trace, days, differences, restless days, and what was broken, each after a tab.
 std::string lineOf(const Play& play) {
     std::array<char, 80> numbers;
     std::snprintf(numbers.data(), numbers.size(), "%016llx\t%.17g\t", static_cast<unsigned long long>(play.trace),
                   play.days);
     std::string line = numbers.data() + textOf(play.differences) + "\t";
+    for (const auto& [activity, days] : play.restlessDays) line += activity + " " + std::to_string(days) + " ";
+    line += "\t";
     if (play.violation)
         line += std::to_string(play.violation->day) + "\t" + play.violation->rule + "\t" + play.violation->detail;
     std::ranges::replace(line, '\n', ' ');
@@ -58,7 +60,9 @@ Play playFrom(std::string line) {
     parts.push_back(line);
     Play play{.trace = std::stoull(parts.at(0), nullptr, 16), .days = std::stod(parts.at(1))};
     play.differences = differencesFrom(parts.at(2));
-    if (parts.size() == 6) play.violation = Violation{std::stod(parts[3]), parts[4], parts[5]};
+    std::istringstream restless(parts.at(3));
+    for (std::string activity; restless >> activity;) restless >> play.restlessDays[activity];
+    if (parts.size() == 7) play.violation = Violation{std::stod(parts[4]), parts[5], parts[6]};
     return play;
 }
 

@@ -52,7 +52,7 @@ private:
             if (random_.chance(85)) addRecord(serialNumber);
         for (const char* watch : watches)
             if (random_.chance(40)) add("pair", {watch, random_.chance(90) ? number(-400, 0) : "-"});
-        if (random_.chance(10)) add("old-layout", {number(5, 200)});
+        if (random_.chance(10)) addOldLayout();
         if (random_.chance(10)) addCarrier();
         if (random_.chance(5)) add("versions", {"1", "2"});
         if (life_.level == Trouble::Wild && random_.chance(20)) add("kill-before-call", {number(1, 60), "0"});
@@ -90,12 +90,18 @@ private:
         const std::string offer = random_.chance(85) ? "1" : "0";
         const std::string carrier = random_.chance(20) ? random_.oneOf(carriers) : "-";
         add("record", {serialNumber, shownFrom, until, before, offer, carrier});
-        // Few servers keep offering what has ended.
-        if (until != "-" && random_.chance(95)) endOffer(serialNumber, numberFrom(until));
+        if (until != "-") endOffer(serialNumber, numberFrom(until));
     }
+    void addOldLayout() {
+        const std::string until = number(5, 200);
+        add("old-layout", {until});
+        endOffer("PHONE", numberFrom(until));
+    }
+    // Few servers keep offering what has ended, and none for longer than it takes to see that posts are tried all
+    // along.
     void endOffer(const std::string& serialNumber, double until) {
         const auto end = std::max(second_, static_cast<std::int64_t>(until * day));
-        const std::int64_t later = random_.below(8 * hour);
+        const std::int64_t later = random_.below(random_.chance(95) ? 8 * hour : 4 * day);
         life_.events.push_back({end + later, "no-record", {serialNumber}});
     }
     void addZone() { add("zone", {std::to_string(random_.between(-12, 14) * hour)}); }

@@ -17,6 +17,8 @@ namespace {
 constexpr std::string_view targetDateSuffix = ".TargetDate";
 // One every quarter of an hour, and a first one by each other activity.
 constexpr int mostRunsOfOneDay = 96 + 4;
+// The machine may be off, or in trouble, for half of a day.
+constexpr int leastRunsOfRestlessDay = 96 / 2;
 // A chain of activities that follow from one cause, each of which may be deferred now and then.
 constexpr int mostRunsOfOneCause = 4;
 
@@ -203,9 +205,11 @@ void Invariants::checkRuns() {
             report("one-run", line.arguments[0].text + " ran without a firing");
     }
     for (auto& [activity, days] : runs_) {
-        for (const auto& [day, runs] : days)
+        for (const auto& [day, runs] : days) {
             if (runs > mostRunsOfOneDay + mostRunsOfOneCause * (admitted_[day] + admitted_[day - 1]))
                 report("few-runs", activity + " ran " + std::to_string(runs) + " times on day " + std::to_string(day));
+            if (day < today && runs >= leastRunsOfRestlessDay) ++restlessDays_[activity];
+        }
         std::erase_if(days, [&](const auto& entry) { return entry.first < today; });
     }
     std::erase_if(admitted_, [&](const auto& entry) { return entry.first < today - 2; });

@@ -24,6 +24,8 @@ public:
     void processWasCutShort();
     // To be called after each event, and now and then, before the host's records are forgotten.
     void check();
+    // On how many days each activity ran again and again, as often as it can.
+    const std::map<std::string, std::int64_t>& restlessDays() const { return restlessDays_; }
 
 private:
     void report(const char* rule, std::string detail);
@@ -58,6 +60,7 @@ private:
     std::map<std::string, platform::Date> excused_;  // target dates that may be without a registration
     std::map<std::string, Overdue> overdue_;
     std::map<std::string, std::map<std::int64_t, int>> runs_;  // by activity and day, of two days
+    std::map<std::string, std::int64_t> restlessDays_;
     std::map<std::string, int> unfiredRuns_;
     std::map<std::int64_t, int> admitted_;  // by day: what may cause a run besides the agent itself
     int outreaches_ = 0;

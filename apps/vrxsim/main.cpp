@@ -183,15 +183,47 @@ private:
     std::map<std::string_view, Sum> sums_;
 };
 
+// In how many lives an activity ran again and again, and on how many days of all.
+class RestlessActivities {
+public:
+    void add(const std::map<std::string, std::int64_t>& days) {
+        for (const auto& [activity, count] : days) {
+            ++sums_[activity].lives;
+            sums_[activity].days += count;
+        }
+    }
+    std::string text() const {
+        std::string text;
+        for (const auto& [activity, sum] : sums_)
+            text += activity + " ran every quarter of an hour on " + std::to_string(sum.days) + " days of " +
+                    std::to_string(sum.lives) + " lives.\n";
+        return text.empty() ? "" : text + "\n";
+    }
+    Dictionary document() const {
+        Dictionary document;
+        for (const auto& [activity, sum] : sums_)
+            document[activity] = Dictionary{{"lives", sum.lives}, {"days", sum.days}};
+        return document;
+    }
+
+private:
+    struct Sum {
+        std::int64_t lives = 0, days = 0;
+    };
+    std::map<std::string, Sum> sums_;
+};
+
 Outcome explore(const Options& options) {
     if (options.seeds.empty() && options.seconds <= 0)
         return failed(ExitCode::Usage, "neither --seeds nor --for says how many", "See vrxsim explore --help.");
     Progress progress;
     DifferenceTable differences;
+    RestlessActivities restless;
     std::map<std::uint64_t, simulation::Violation> broken;
     simulation::explore(explorationOf(options), [&](std::uint64_t seed, const simulation::Play& play) {
         progress.add(play.days);
         differences.add(play.differences);
+        restless.add(play.restlessDays);
         if (play.violation) broken.emplace(seed, *play.violation);
         return broken.size() < mostFindings;
     });
@@ -211,9 +243,10 @@ Outcome explore(const Options& options) {
                                  {"years", progress.years},
                                  {"yearsPerMinute", progress.perMinute()},
                                  {"findings", std::move(findings)},
-                                 {"differences", differences.document()}}};
-    outcome.text = text + differences.text() + std::to_string(progress.lives) + " lives, " + fixed(progress.years, 0) +
-                   " years, " + fixed(progress.perMinute(), 0) + " years a minute\n";
+                                 {"differences", differences.document()},
+                                 {"restless", restless.document()}}};
+    outcome.text = text + differences.text() + restless.text() + std::to_string(progress.lives) + " lives, " +
+                   fixed(progress.years, 0) + " years, " + fixed(progress.perMinute(), 0) + " years a minute\n";
     return isFine ? outcome : asBroken(std::move(outcome), "lives broke a rule");
 }
 

@@ -62,7 +62,8 @@ public:
         Play result{.trace = trace_.hash(),
                     .days = day(),
                     .violation = verdict_.violation,
-                    .differences = differences_.found()};
+                    .differences = differences_.found(),
+                    .restlessDays = invariants_.restlessDays()};
         if (recorder_) result.chronicle = recorder_->chronicle();
         disarm();
         world_.host.queues.letWaitingTasksGo();

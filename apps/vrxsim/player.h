@@ -2,8 +2,11 @@
 // one play at a time in a process.
 #pragma once
 
+#include <cstdint>
 #include <functional>
+#include <map>
 #include <optional>
+#include <string>
 
 #include "timeline/chronicle.h"
 #include "vrx/sim/http.h"
@@ -29,6 +32,7 @@ struct Play {
     std::optional<Violation> violation{};
     std::optional<timeline::Chronicle> chronicle{};
     DifferentSeconds differences{};
+    std::map<std::string, std::int64_t> restlessDays{};  // by activity: on which it ran as often as it can
 };
 
 Play play(const Life& life, const PlayOptions& options = {});
