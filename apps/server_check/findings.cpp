@@ -206,7 +206,10 @@ void judgeOffer(const std::shared_ptr<VRXWarranty>& record, std::vector<Finding>
             if (!until)
                 return findings.push_back(problem("offer", "never shown: qxOfferEligibleUntil is not there",
                                                   "Say until when the offer holds."));
-            return findings.push_back(note("offer", "no longer shown: it ended at " + platform::describe(*until)));
+            return findings.push_back(
+                note("offer", "no longer shown: it ended at " + platform::describe(*until),
+                     "Withdraw what has ended, by featureToggleParameters.qxOfferDisplay: devices "
+                     "that never posted it ask again every quarter of an hour."));
         case PostReason::Due:
         case PostReason::DueLater: break;
     }

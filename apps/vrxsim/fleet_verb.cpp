@@ -326,6 +326,10 @@ void addFleetVerb(CommandLine& line) {
         ->type_name("ANSWER")
         ->check(isAnswer, "")
         ->capture_default_str();
+    app.add_option("--ended", scenario.endedShare, "Which share of phones is still offered what has ended, in percent")
+        ->type_name("PERCENT")
+        ->check(CLI::Range(0.0, 100.0))
+        ->capture_default_str();
     app.add_flag("--spread", scenario.isSpread,
                  "Activities fire at any moment of their grace period, as no agent does yet");
     app.add_option("--csv", options->csvFile, "Write the requests of each minute")->type_name("FILE");

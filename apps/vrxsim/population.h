@@ -21,6 +21,7 @@ struct Scenario {
     std::optional<double> outage{};    // of the coverage server
     double outageHours = 6;
     std::string outageAnswer = "503";  // a status, or as World has it
+    double endedShare = 0;             // percent of phones that the server keeps offering what ended before
     bool isSpread = false;             // activities fire at any moment of their grace period
 };
 
