@@ -101,7 +101,8 @@ private:
     // along.
     void endOffer(const std::string& serialNumber, double until) {
         const auto end = std::max(second_, static_cast<std::int64_t>(until * day));
-        const std::int64_t later = random_.below(random_.chance(95) ? 8 * hour : 4 * day);
+        const bool isSoon = random_.chance(95);
+        const std::int64_t later = random_.below(isSoon ? 8 * hour : 4 * day);
         life_.events.push_back({end + later, "no-record", {serialNumber}});
     }
     void addZone() { add("zone", {std::to_string(random_.between(-12, 14) * hour)}); }

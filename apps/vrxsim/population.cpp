@@ -121,8 +121,8 @@ private:
         const std::string shownFrom = dayWord(-20, 60);
         const std::string until = dayWord(60, 240);
         addFirst("record", {serialNumber, hasShownFrom ? shownFrom : "-", until, "60", isOffered ? "1" : "0", "-"});
-        const bool isPhone = serialNumber == "PHONE";
-        if (isPhone && random_.below(10'000) < std::llround(100 * scenario_.endedShare))
+        const bool mayBeEnded = scenario_.endedShare > 0 && serialNumber == "PHONE";
+        if (mayBeEnded && random_.below(10'000) < std::llround(100 * scenario_.endedShare))
             addFirst("record", {serialNumber, "-", dayWord(-60, -20), "60", "1", "-"});
     }
 

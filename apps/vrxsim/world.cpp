@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <cerrno>
 #include <charconv>
-#include <utility>
 
 #include "vrx/platform/vendor.h"
 
@@ -111,7 +110,8 @@ bool World::changeDevice(const Event& event) {
     } else if (verb == "unpair") {
         unpair(words[0]);
     } else if (verb == "language") {
-        if (words[0] != std::exchange(host.locale.identifier, words[0])) languageChangedAt = elapsed();
+        if (host.locale.identifier != words[0]) languageChangedAt = elapsed();
+        host.locale.identifier = words[0];
         host.tellChanges();
     } else if (verb == "zone") {
         host.clock.setTimeZoneOffset(std::chrono::seconds(whole(numberFrom(words[0]))));

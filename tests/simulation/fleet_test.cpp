@@ -64,6 +64,18 @@ TEST(Fleet, CountsWhatLeavesADeviceByItsCause) {
     EXPECT_EQ(coverageOf(later).inMinute(0), 2u);
 }
 
+TEST(Fleet, CountsWhatIsAskedForAnOfferThatHasEnded) {
+    const Resident resident = residentFrom(1, {.days = 4, .hasImage = false, .endedShare = 100});
+    Census census;
+    count(resident, {.days = 4}, census);
+    const double perDay = static_cast<double>(coverageOf(census).total(Cause::Post)) / 4;
+    EXPECT_GE(perDay, 48) << "it is on for half of each day at least";
+    EXPECT_LE(perDay, 96 * 3) << "for three devices at the most";
+    const Play played = play(lifeFrom("life 6\nrecord PHONE - -20 60 1 -\nday 4.1 no-record PHONE").value());
+    using Days = std::map<std::string, std::int64_t>;
+    EXPECT_EQ(played.restlessDays, (Days{{"com.orvane.vrxagent.followuppost", 2}})) << "from the outreach of day 2 on";
+}
+
 TEST(Fleet, AddsUpTheSameForEachNumberOfJobs) {
     const Scenario scenario{.days = 4, .overHours = 4, .upgrade = 3, .language = 3, .languageShare = 50, .outage = 2.2};
     Census alone;
