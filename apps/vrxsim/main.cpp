@@ -195,8 +195,8 @@ public:
     std::string text() const {
         std::string text;
         for (const auto& [activity, sum] : sums_)
-            text += activity + " ran every quarter of an hour on " + std::to_string(sum.days) + " days of " +
-                    std::to_string(sum.lives) + " lives.\n";
+            text += activity.substr(activity.rfind('.') + 1) + " ran every quarter of an hour on " +
+                    std::to_string(sum.days) + " days of " + std::to_string(sum.lives) + " lives.\n";
         return text.empty() ? "" : text + "\n";
     }
     Dictionary document() const {
