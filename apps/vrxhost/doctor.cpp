@@ -212,7 +212,8 @@ Check Examination::watches() const {
     if (onlyOthers_) return skipped("needs the home");
     if (view_.profile().content()->hasWatches) return good("by the profile");
     std::string silent;
-    for (const host::KnownWatch& watch : view_.profile().told()->watches)
+    const auto told = view_.profile().told();
+    for (const host::KnownWatch& watch : told->watches)
         if (!watch.serialNumber) silent += (silent.empty() ? "" : ", ") + watch.name;
     if (!silent.empty())
         return note("never told a serial number, and so not reported: " + silent,

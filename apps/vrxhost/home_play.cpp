@@ -118,7 +118,8 @@ void HomePlay::takeDevice(const AgentView& view) {
 
 // A preset stands in for what is not stored.
 void HomePlay::takeSettings(const AgentView& view) {
-    for (const auto& [key, value] : *view.profile().defaults()) host_.defaults.set(key, value);
+    const auto presets = view.profile().defaults();
+    for (const auto& [key, value] : *presets) host_.defaults.set(key, value);
     for (const auto& [key, value] : state_.settings) host_.defaults.set(key, value);
     host_.defaults.set(platform::settings::warrantyURL, recordsUrl);
     host_.defaults.set(platform::settings::serverVersionURL, versionsUrl);

@@ -119,8 +119,9 @@ Dictionary DefaultsStore::dictionaryRepresentation() const {
         std::lock_guard lock(mutex_);
         all = registered_;
     }
-    if (presets_)
-        for (const auto& [key, value] : *presets_()) all[key] = value;
+    // Held, for the profile may be read anew meanwhile.
+    if (const std::shared_ptr<const Dictionary> presets = presets_ ? presets_() : nullptr)
+        for (const auto& [key, value] : *presets) all[key] = value;
     logFailure(database_.read([&](Connection& connection) {
         for (const auto& [key, value] : storedSettings(connection)) all[key] = value;
     }),

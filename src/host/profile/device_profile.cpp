@@ -67,7 +67,8 @@ std::vector<PairedWatch> DeviceProfile::watches() const {
     const std::shared_ptr<const ProfileContent> content = this->content();
     if (content->hasWatches) return content->watches;
     std::vector<PairedWatch> watches;
-    for (const KnownWatch& watch : told()->watches)
+    const std::shared_ptr<const ToldFacts> told = this->told();
+    for (const KnownWatch& watch : told->watches)
         watches.push_back({.name = watch.name.empty() ? std::nullopt : std::optional(watch.name),
                            .localizedModelName = watch.model,
                            .serialNumber = watch.serialNumber,

@@ -51,8 +51,9 @@ InstalledAppRecord InstalledApps::recordOf(const BundleFile& bundle) const {
 }
 
 std::vector<std::string> InstalledApps::problems() const {
+    const std::shared_ptr<const ProfileContent> content = profile_.content();
     std::vector<std::string> texts;
-    for (const std::string& folder : profile_.content()->applicationFolders)
+    for (const std::string& folder : content->applicationFolders)
         for (const std::string& candidate : candidates(folder))
             if (auto bundle = readBundleFile(candidate); !bundle && bundle.error().code != ENOENT)
                 texts.push_back(bundle.error().text);

@@ -39,8 +39,8 @@ TEST_F(DefaultsStoreTest, KeepsItsFilesForItsUserAndWhatIsNotANumber) {
 
 TEST_F(DefaultsStoreTest, PresetsStandBetweenWhatIsWrittenAndWhatIsRegistered) {
     Opened opened(path());
-    auto presets = std::make_shared<const Dictionary>(Dictionary{{"a", "preset"}, {"b", "preset"}});
-    opened.store.setPresets([&] { return presets; });
+    Dictionary presets{{"a", "preset"}, {"b", "preset"}};
+    opened.store.setPresets([&] { return std::make_shared<const Dictionary>(presets); });  // read anew each time
     opened.store.registerDefaults({{"b", "registered"}, {"c", "registered"}});
     opened.store.set("a", "written");
     EXPECT_EQ(opened.store.dictionaryRepresentation(),
@@ -50,7 +50,7 @@ TEST_F(DefaultsStoreTest, PresetsStandBetweenWhatIsWrittenAndWhatIsRegistered) {
     opened.store.update("b", [](const Value& present) { return Value(present.asString()->substr(1)); });
     EXPECT_EQ(opened.store.get("b"), Value("reset"));
     opened.store.remove("a");
-    presets = std::make_shared<const Dictionary>(Dictionary{{"a", "another"}});
+    presets = {{"a", "another"}};
     EXPECT_EQ(opened.store.get("a"), Value("another"));
 }
 
