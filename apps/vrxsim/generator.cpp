@@ -97,8 +97,8 @@ private:
         add("old-layout", {until});
         endOffer("PHONE", numberFrom(until));
     }
-    // Few servers keep offering what has ended, and none for longer than it takes to see that posts are tried all
-    // along.
+    // Few servers keep offering what has ended, and here none for more than four days: posts are then tried every
+    // quarter of an hour, which soon shows nothing new.
     void endOffer(const std::string& serialNumber, double until) {
         const auto end = std::max(second_, static_cast<std::int64_t>(until * day));
         const bool isSoon = random_.chance(95);

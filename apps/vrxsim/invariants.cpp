@@ -15,10 +15,11 @@ using platform::FollowUpItem;
 namespace {
 
 constexpr std::string_view targetDateSuffix = ".TargetDate";
-// One every quarter of an hour, and a first one by each other activity.
-constexpr int mostRunsOfOneDay = 96 + 4;
+constexpr int quartersOfAnHour = 96;  // in a day
+// One in each, and a first one by each other activity.
+constexpr int mostRunsOfOneDay = quartersOfAnHour + 4;
 // The machine may be off, or in trouble, for half of a day.
-constexpr int leastRunsOfRestlessDay = 96 / 2;
+constexpr int leastRunsOfRestlessDay = quartersOfAnHour / 2;
 // A chain of activities that follow from one cause, each of which may be deferred now and then.
 constexpr int mostRunsOfOneCause = 4;
 

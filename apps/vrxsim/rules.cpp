@@ -340,8 +340,7 @@ std::optional<Removal::Cause> Rules::causeOfRemoval(const Found& found) const {
 }
 
 void Rules::refreshBegins(bool isWhole, bool isListed) {
-    wasListingRefused_ = !isListed;
-    wasClearRefused_ = false;
+    endByLastRefresh_ = isListed ? EndOfRefreshes::None : EndOfRefreshes::FailedListing;
     if (!isListed) listingFailedAt_ = world_.elapsed();
     static const std::map<std::string, ShownItem> none;
     const std::map<std::string, ShownItem>& pending = isListed ? items_ : none;
@@ -500,11 +499,6 @@ void Rules::refreshIsPlanned(bool isForAll) {
     }
 }
 
-void Rules::refreshesEnd() {
-    using enum EndOfRefreshes;
-    endOfRefreshes_ = wasListingRefused_ ? FailedListing : wasClearRefused_ ? RefusedClear : None;
-}
-
 // Items.
 
 const std::string& Rules::identifierOf(const std::string& serialNumber) {
@@ -580,7 +574,7 @@ void Rules::cleared(const std::vector<std::string>& identifiers, bool isDone) {
         std::ranges::includes(all, work_->mustClear)) {
         work_->mayClear.clear();
         work_->mustClear.clear();
-        wasClearRefused_ = !isDone;
+        if (!isDone && endByLastRefresh_ == EndOfRefreshes::None) endByLastRefresh_ = EndOfRefreshes::RefusedClear;
         for (const auto& [serialNumber, removal] : std::exchange(toRemove_, {})) {
             const auto shown = items_.find(serialNumber);
             if (shown == items_.end() || !all.contains(identifierOf(serialNumber))) continue;

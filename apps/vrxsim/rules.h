@@ -180,7 +180,7 @@ private:
     Found cachedRecord(const std::string& serialNumber) const;
     Found failedLook(const Lookup& lookup) const;
     void refreshBegins(bool isWhole, bool isListed);
-    void refreshesEnd();
+    void refreshesEnd() { endOfRefreshes_ = endByLastRefresh_; }
     void finishWork();
     void posted(const platform::FollowUpItem& item, bool isDone);
     void cleared(const std::vector<std::string>& identifiers, bool isDone);
@@ -226,7 +226,7 @@ private:
     };
     std::map<std::string, Downloads> downloading_;
     int downloadingCount_ = 0;
-    bool wasListingRefused_ = false, wasClearRefused_ = false;  // of the last refresh
+    EndOfRefreshes endByLastRefresh_ = EndOfRefreshes::None;  // if it should turn out to be the last of all
     EndOfRefreshes endOfRefreshes_ = EndOfRefreshes::None;
     double lastLookupAt_ = 0;
     std::map<std::string, std::vector<Found>> found_;  // since nothing was under way

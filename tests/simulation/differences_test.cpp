@@ -61,6 +61,7 @@ TEST(Differences, HaveTheNameOfTheirCause) {
          watch + "0 40 - 1 -\nday 4.9 fail clear 1\nday 4.9 flag off\nday 5.5 flag on\nday 5.6 ask 0 serial WATCH1 0",
          {watchEarly, "refused"},
          Way::OldText},
+        // Killed between the post and the plan of its refresh.
         {9,
          "record PHONE 10 10 0 1 -\npair WATCH1 0\nrecord WATCH1 6 40.75 - 1 -\nday 5 kill-before-call 58 0",
          {"plan-cut-short"},
